@@ -1,0 +1,11 @@
+#pragma once
+
+#include "Decimal.h"
+
+#include <QString>
+
+// Money for people: grouped thousands and two places ("#,##0.00") in the user's locale, rounded half
+// away from zero from the exact decimal (never through binary floating point).
+namespace MoneyFormat {
+QString format(const Decimal& amount);
+}

@@ -1,0 +1,14 @@
+#!/usr/bin/env bash
+# Installs what Tessal needs, builds every test and runs them all through ctest.
+# TESSAL_BUILD_DIR and extra CMake options (TESSAL_CMAKE_ARGS) let CI reuse it for the sanitizer build.
+set -euo pipefail
+cd "$(dirname "$0")/.."
+bash scripts/install-deps.sh
+build=${TESSAL_BUILD_DIR:-build-tests}
+# shellcheck disable=SC2086
+cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE="${TESSAL_BUILD_TYPE:-RelWithDebInfo}" \
+  -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=ON ${TESSAL_CMAKE_ARGS:-}
+cmake --build "$build"
+# No test may reach the developer's session bus or display.
+env -u DBUS_SESSION_BUS_ADDRESS -u DISPLAY -u WAYLAND_DISPLAY QT_QPA_PLATFORM=offscreen \
+  ctest --test-dir "$build" --output-on-failure --timeout 300 -j2
