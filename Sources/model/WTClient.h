@@ -1,0 +1,51 @@
+#pragma once
+
+#include "WTObject.h"
+
+#include <functional>
+
+class WTProject;
+
+// A client: owns projects (unordered). Its rate tops the inheritance chain below the user's default.
+class WTClient final : public WTObject {
+  WT_ENTITY_CLASS(WTClient, Client)
+ public:
+  explicit WTClient(WTObjectContext* context) : WTObject(WTEntity::Client, context) {}
+
+  QString addressBookUID() const { return addressBookUID_; }
+  void setAddressBookUID(const QString& uid);
+  QString totalsUID() const { return totalsUID_; }
+  void setTotalsUID(const QString& uid);
+
+  const QList<WTProject*>& projects() const { return projects_; }
+
+  // Own rate, else "WTDefaultRate", else 100.
+  Decimal inheritedRate() const override;
+  void setRate(const std::optional<Decimal>& rate) override;
+  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
+
+  int duration() const;
+  Decimal cost() const;
+  void durationDidChange();
+  void costDidChange();
+
+  // Name of the list image: "admin_2_32", or "admin_2_32_dis" when archived.
+  QString tableImage() const;
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  QVariant primitiveValue(const QString& key) const override;
+  bool writePrimitive(const QString& key, const QVariant& value) override;
+  QList<WTObject*> relatedObjects(const QString& relationship) const override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+ private:
+  friend class WTProject;
+  QString addressBookUID_;
+  QString totalsUID_;
+  QList<WTProject*> projects_;
+};

@@ -1,0 +1,30 @@
+#pragma once
+
+#include "WTItem.h"
+
+// An expense: costs its amount whatever the rate.
+class WTExpense final : public WTItem {
+  WT_ENTITY_CLASS(WTExpense, Expense)
+ public:
+  explicit WTExpense(WTObjectContext* context) : WTItem(WTEntity::Expense, context) {}
+
+  std::optional<Decimal> expense() const { return expense_; }
+  // Stores the amount and tells the task its cost changed.
+  void setExpense(const std::optional<Decimal>& amount);
+  Decimal cost() const override { return expense_.value_or(Decimal()); }
+  Decimal costAtRate(const Decimal&) const override { return cost(); }
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  QVariant primitiveValue(const QString& key) const override;
+  bool writePrimitive(const QString& key, const QVariant& value) override;
+  void storedValueDidChange(const QString& key) override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+ private:
+  std::optional<Decimal> expense_;
+};

@@ -1,0 +1,57 @@
+#pragma once
+
+#include "Date.h"
+#include "WTObject.h"
+
+class WTTask;
+
+// Reads a date value (Date or QDateTime; null is none). `ok` is false for anything else.
+std::optional<Date> dateFromVariant(const QVariant& value, bool* ok);
+
+// Base of the five kinds of item a task holds. An item is dated by `startDate` (its `date`).
+class WTItem : public WTObject {
+ public:
+  WTTask* task() const { return task_; }
+  void setTask(WTTask* task);
+
+  std::optional<Date> startDate() const { return startDate_; }
+  void setStartDate(const std::optional<Date>& date);
+  std::optional<Date> date() const { return startDate_; }
+  // Books the item on another date; a time entry keeps its time of day and length.
+  virtual void setDate(const std::optional<Date>& date);
+
+  // Whole minutes this item stands for; 0 for kinds that are not time.
+  virtual int duration() const { return 0; }
+  // What the item costs: its task's inherited rate times its hours.
+  virtual Decimal cost() const;
+  // The same at a rate already known (sums over a task's items read the rate once).
+  virtual Decimal costAtRate(const Decimal& rate) const;
+  // The rate in force for the item: always its task's inherited rate (a rate stored on an item is
+  // never used); none without a task, and the item then costs nothing.
+  std::optional<Decimal> rate() const;
+  virtual QString title() const { return name(); }
+  bool isLeaf() const { return true; }
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  WTItem(WTEntity entity, WTObjectContext* context) : WTObject(entity, context) {}
+  void awakeFromInsert() override;
+  QVariant primitiveValue(const QString& key) const override;
+  bool writePrimitive(const QString& key, const QVariant& value) override;
+  WTObject* owner() const override;
+  QString ownerKey() const override { return QStringLiteral("task"); }
+  void relinkOwner(WTObject* owner, int index) override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+  // rate x (minutes / 60), exactly.
+  static Decimal timeCost(const Decimal& rate, int minutes);
+
+ private:
+  friend class WTTask;
+  WTTask* task_ = nullptr;
+  std::optional<Date> startDate_;
+};

@@ -1,0 +1,157 @@
+#include "WTItemContainer.h"
+
+#include "RZDate.h"
+#include "WTItem.h"
+#include "WTTask.h"
+
+#include <QCoreApplication>
+
+#include <algorithm>
+
+namespace {
+
+// The grouping value of one item; the two date paths the app uses are answered without the generic
+// key-path machinery.
+QVariant groupValue(const WTItem* item, const QString& keyPath) {
+  if (keyPath == QLatin1String("startDate.midnight")) {
+    return item->startDate() ? QVariant::fromValue(RZDate::midnight(*item->startDate())) : QVariant();
+  }
+  if (keyPath == QLatin1String("startDate.beginOfMonth")) {
+    return item->startDate() ? QVariant::fromValue(RZDate::beginOfMonth(*item->startDate())) : QVariant();
+  }
+  return KeyPath::valueForKeyPath(KeyPath::variantFromObject(item), keyPath);
+}
+
+}  // namespace
+
+WTItemContainer::WTItemContainer(QList<WTItem*> items, std::optional<Date> date, WTTask* task)
+    : date_(date), task_(task) {
+  setItems(std::move(items));
+}
+
+WTItemContainer::~WTItemContainer() { stopObserving(); }
+
+std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(const QString& keyPath,
+                                                                                   const QList<WTItem*>& items) {
+  struct Keyed {
+    QVariant value;
+    WTItem* item;
+  };
+  std::vector<Keyed> keyed;
+  keyed.reserve(items.size());
+  for (WTItem* item : items) keyed.push_back({groupValue(item, keyPath), item});
+  // Groups by value, newest first; inside a group the newest item first.
+  std::stable_sort(keyed.begin(), keyed.end(), [](const Keyed& a, const Keyed& b) {
+    const int order = KeyPath::compareValues(a.value, b.value);
+    if (order != 0) return order > 0;
+    return a.item->startDate() > b.item->startDate();
+  });
+  std::vector<std::shared_ptr<WTItemContainer>> containers;
+  for (size_t begin = 0; begin < keyed.size();) {
+    size_t end = begin;
+    QList<WTItem*> group;
+    while (end < keyed.size() && KeyPath::compareValues(keyed[end].value, keyed[begin].value) == 0) {
+      group.append(keyed[end++].item);
+    }
+    WTItem* last = group.last();
+    containers.push_back(std::make_shared<WTItemContainer>(std::move(group), last->startDate(), last->task()));
+    begin = end;
+  }
+  return containers;
+}
+
+std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(const QString& keyPath,
+                                                                                   const QList<WTTask*>& tasks) {
+  QList<WTItem*> items;
+  for (const WTTask* task : tasks) items += task->valuableItems();
+  return containersByKeyPath(keyPath, items);
+}
+
+bool WTItemContainer::isValidUUID(const QVariant& uuid) { return uuid.metaType() == QMetaType::fromType<QVariantMap>(); }
+
+std::shared_ptr<WTItemContainer> WTItemContainer::objectWithUUID(const QVariant& uuid, WTObjectContext* context) {
+  if (!isValidUUID(uuid)) return nullptr;
+  const QVariantMap identity = uuid.toMap();
+  const QVariant taskUuid = identity.value(QStringLiteral("task"));
+  if (taskUuid.isNull()) return nullptr;
+  auto* task = dynamic_cast<WTTask*>(WTObjectContext::resolve(context)->objectWithUUID(taskUuid, false));
+  if (!task) return nullptr;
+  task->updateChildren();
+  const QVariant date = identity.value(QStringLiteral("date"));
+  // The "Pending" group stores no date, which matches no group: it is not found again this way.
+  if (date.metaType() != QMetaType::fromType<Date>()) return nullptr;
+  const auto& children = task->cachedChildren();
+  for (auto it = children.rbegin(); it != children.rend(); ++it) {
+    if ((*it)->date() == date.value<Date>()) return *it;
+  }
+  return nullptr;
+}
+
+bool WTItemContainer::isEqual(const WTItemContainer& other) const {
+  return date_ == other.date_ && task_ == other.task_;
+}
+
+QString WTItemContainer::title() const {
+  if (date_) return RZDate::shortFormat(*date_);
+  return QCoreApplication::translate("WTItemContainer", "Pending");
+}
+
+QVariantMap WTItemContainer::uuid() const {
+  return {{QStringLiteral("date"), date_ ? QVariant::fromValue(*date_) : QVariant()},
+          {QStringLiteral("task"), task_ ? QVariant(task_->uuid()) : QVariant()}};
+}
+
+int WTItemContainer::duration() const {
+  int total = 0;
+  for (const WTItem* item : items_) total += item->duration();
+  return total;
+}
+
+Decimal WTItemContainer::cost() const {
+  Decimal total;
+  for (const WTItem* item : items_) total += item->cost();
+  return total;
+}
+
+void WTItemContainer::setItems(QList<WTItem*> items) {
+  stopObserving();
+  items_ = std::move(items);
+  startObserving();
+}
+
+void WTItemContainer::startObserving() {
+  stopObserving();
+  if (items_.isEmpty()) return;
+  context_ = items_.first()->context();
+  observers_.reserve(items_.size());
+  for (WTItem* item : items_) {
+    observers_.push_back(context_->addObserver(item, QString(), [this](WTObject*, const QString& key) {
+      if (key == QLatin1String("duration") || key == QLatin1String("cost")) emit valueChanged(key);
+    }));
+  }
+}
+
+void WTItemContainer::stopObserving() {
+  if (context_) {
+    for (WTObjectContext::ObserverId id : observers_) context_->removeObserver(id);
+  }
+  observers_.clear();
+}
+
+QVariant WTItemContainer::valueForKey(const QString& key) const {
+  if (key == QLatin1String("items") || key == QLatin1String("children")) {
+    QVariantList list;
+    list.reserve(items_.size());
+    for (WTItem* item : items_) list.append(KeyPath::variantFromObject(item));
+    return list;
+  }
+  if (key == QLatin1String("date")) return date_ ? QVariant::fromValue(*date_) : QVariant();
+  if (key == QLatin1String("task")) return task_ ? KeyPath::variantFromObject(task_) : QVariant();
+  if (key == QLatin1String("type")) return type_;
+  if (key == QLatin1String("duration")) return duration();
+  if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
+  if (key == QLatin1String("title")) return title();
+  if (key == QLatin1String("uuid")) return uuid();
+  if (key == QLatin1String("isLeaf")) return false;
+  return {};
+}

@@ -1,0 +1,83 @@
+#pragma once
+
+#include "Date.h"
+#include "Decimal.h"
+#include "KeyPath.h"
+#include "WTObjectContext.h"
+
+#include <QList>
+#include <QObject>
+#include <QPointer>
+#include <QVariantMap>
+
+#include <memory>
+#include <optional>
+#include <vector>
+
+class WTItem;
+class WTTask;
+
+// A group of items shown together: the open to-dos of a task ("Pending", no date), or the items of one
+// day or month. Never stored; made afresh whenever a task's groups or a report are rebuilt. It keeps
+// an identity of date and task so the outline can find the same group again after a rebuild.
+//
+// While it holds items it observes their duration and cost and re-announces them as its own through
+// valueChanged, so a running entry's minutes reach the group's total.
+class WTItemContainer : public QObject, public KeyValueCoding {
+  Q_OBJECT
+ public:
+  // `task` is not owned; none for a group that spans tasks.
+  WTItemContainer(QList<WTItem*> items, std::optional<Date> date, WTTask* task);
+  ~WTItemContainer() override;
+
+  // Groups `items` by the value of `keyPath` ("startDate.midnight", "startDate.beginOfMonth" or any key
+  // path of the items), newest group first and the newest item first in each. A group's date is the
+  // start date of its last item (not cut to the day) and its task that item's task.
+  static std::vector<std::shared_ptr<WTItemContainer>> containersByKeyPath(const QString& keyPath,
+                                                                           const QList<WTItem*>& items);
+  // The same over the time entries, flat fees and expenses of all `tasks` together.
+  static std::vector<std::shared_ptr<WTItemContainer>> containersByKeyPath(const QString& keyPath,
+                                                                           const QList<WTTask*>& tasks);
+
+  // True when `uuid` has the shape of a group identity (a map).
+  static bool isValidUUID(const QVariant& uuid);
+  // Finds the group of that identity again by rebuilding its task's groups; none for the "Pending"
+  // group, which has no date to match.
+  static std::shared_ptr<WTItemContainer> objectWithUUID(const QVariant& uuid, WTObjectContext* context);
+
+  bool isEqual(const WTItemContainer& other) const;
+  // The short date, or "Pending" (translated) without a date.
+  QString title() const;
+  // {"date": date or null, "task": the task's uuid}.
+  QVariantMap uuid() const;
+  int duration() const;
+  Decimal cost() const;
+
+  const QList<WTItem*>& items() const { return items_; }
+  const QList<WTItem*>& children() const { return items_; }
+  void setItems(QList<WTItem*> items);
+  bool isLeaf() const { return false; }
+
+  std::optional<Date> date() const { return date_; }
+  void setDate(std::optional<Date> date) { date_ = date; }
+  WTTask* task() const { return task_; }
+  QString type() const { return type_; }
+  void setType(const QString& type) { type_ = type; }
+
+  void startObserving();
+  void stopObserving();
+
+  QVariant valueForKey(const QString& key) const override;
+
+ signals:
+  // "duration" or "cost" of the group changed because one of its items' did.
+  void valueChanged(const QString& key);
+
+ private:
+  QList<WTItem*> items_;
+  std::optional<Date> date_;
+  WTTask* task_;
+  QString type_;
+  QPointer<WTObjectContext> context_;
+  std::vector<WTObjectContext::ObserverId> observers_;
+};

@@ -1,0 +1,392 @@
+#include "WTObjectContext.h"
+
+#include "WTClient.h"
+#include "WTExpense.h"
+#include "WTFlat.h"
+#include "WTKeyDependencies.h"
+#include "WTNote.h"
+#include "WTProject.h"
+#include "WTStore.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTToDo.h"
+
+#include <QMetaObject>
+
+#include <algorithm>
+
+namespace {
+
+WTObjectContext* gDefaultContext = nullptr;
+
+// The to-many key on the owner's side of each entity's to-one relationship.
+QString inverseKey(WTEntity entity) {
+  switch (entity) {
+    case WTEntity::Client: return {};
+    case WTEntity::Project: return QStringLiteral("projects");
+    case WTEntity::Task: return QStringLiteral("tasks");
+    default: return QStringLiteral("items");
+  }
+}
+
+}  // namespace
+
+WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent) : QObject(parent), defaults_(defaults) {}
+
+WTObjectContext::~WTObjectContext() {
+  if (gDefaultContext == this) gDefaultContext = nullptr;
+  // Undo actions capture records; drop them before the records go.
+  undo_.removeAllActions();
+  observers_.clear();
+}
+
+WTObjectContext* WTObjectContext::defaultContext() { return gDefaultContext; }
+void WTObjectContext::setDefaultContext(WTObjectContext* context) { gDefaultContext = context; }
+
+WTObjectContext* WTObjectContext::resolve(WTObjectContext* context) {
+  WTObjectContext* resolved = context ? context : gDefaultContext;
+  Q_ASSERT_X(resolved, "WTObjectContext", "no object context: the application delegate sets the default one");
+  return resolved;
+}
+
+WTObject* WTObjectContext::makeObject(WTEntity entity) {
+  switch (entity) {
+    case WTEntity::Client: return new WTClient(this);
+    case WTEntity::Project: return new WTProject(this);
+    case WTEntity::Task: return new WTTask(this);
+    case WTEntity::Time: return new WTTime(this);
+    case WTEntity::Flat: return new WTFlat(this);
+    case WTEntity::Expense: return new WTExpense(this);
+    case WTEntity::Note: return new WTNote(this);
+    case WTEntity::ToDo: return new WTToDo(this);
+  }
+  return nullptr;
+}
+
+void WTObjectContext::registerObject(WTObject* object, bool adoptOwnership) {
+  if (adoptOwnership) owned_.emplace_back(object);
+  auto& list = objects_[static_cast<int>(object->entity())];
+  object->registryIndex_ = static_cast<int>(list.size());
+  list.push_back(object);
+  object->registered_ = true;
+  if (!object->uuid_.isEmpty()) byUuid_.insert(object->uuid_, object);
+}
+
+void WTObjectContext::unregisterObject(WTObject* object) {
+  auto& list = objects_[static_cast<int>(object->entity())];
+  const int index = object->registryIndex_;
+  list[index] = list.back();
+  list[index]->registryIndex_ = index;
+  list.pop_back();
+  object->registryIndex_ = -1;
+  object->registered_ = false;
+  auto it = byUuid_.find(object->uuid_);
+  if (it != byUuid_.end() && it.value() == object) byUuid_.erase(it);
+}
+
+WTObject* WTObjectContext::insertNewObject(WTEntity entity) {
+  WTObject* object = makeObject(entity);
+  registerObject(object, true);
+  inserted_.insert(object);
+  turnInserted_.append(object);
+  undo_.registerUndo([this, object] { removeFromGraph(object); });
+  object->awakeFromInsert();
+  scheduleProcessing();
+  return object;
+}
+
+void WTObjectContext::removeFromGraph(WTObject* object) {
+  if (!object->registered_) return;
+  unregisterObject(object);
+  if (inserted_.erase(object) == 0 && object->persisted_) {
+    deleted_.insert(object);
+    updated_.erase(object);
+  }
+  turnDeleted_.append(object);
+  undo_.registerUndo([this, object] { reinsertObject(object); });
+  scheduleProcessing();
+}
+
+void WTObjectContext::reinsertObject(WTObject* object) {
+  if (object->registered_) return;
+  registerObject(object, false);
+  if (object->persisted_) {
+    deleted_.erase(object);
+    if (!object->changedKeys_.isEmpty()) updated_.insert(object);
+  } else {
+    inserted_.insert(object);
+  }
+  turnInserted_.append(object);
+  undo_.registerUndo([this, object] { removeFromGraph(object); });
+  scheduleProcessing();
+}
+
+void WTObjectContext::deleteObject(WTObject* object) {
+  if (!object || !object->registered_) return;
+  switch (object->entity()) {
+    case WTEntity::Client: {
+      // Projects outlive their client.
+      const QList<WTProject*> projects = static_cast<WTClient*>(object)->projects();
+      for (WTProject* project : projects) project->setClient(nullptr);
+      break;
+    }
+    case WTEntity::Project: {
+      const QList<WTTask*> tasks = static_cast<WTProject*>(object)->tasks();
+      for (WTTask* task : tasks) deleteObject(task);
+      object->changeOwner(nullptr);
+      break;
+    }
+    case WTEntity::Task: {
+      const QList<WTItem*> items = static_cast<WTTask*>(object)->items();
+      for (WTItem* item : items) deleteObject(item);
+      object->changeOwner(nullptr);
+      break;
+    }
+    default: object->changeOwner(nullptr); break;
+  }
+  removeFromGraph(object);
+}
+
+WTObject* WTObjectContext::objectWithUUID(const QVariant& uuid, bool forceInsert) {
+  if (uuid.typeId() != QMetaType::QString) return nullptr;
+  const QString identity = uuid.toString();
+  const QString entityName = identity.section(u'@', -1);
+  if (!WTEntities::isEntityName(entityName)) return nullptr;
+  WTObject* found = byUuid_.value(identity);
+  if (found && !WTEntities::isKindOf(found->entity(), entityName)) found = nullptr;
+  if (found || !forceInsert) return found;
+  const std::optional<WTEntity> entity = WTEntities::fromName(entityName);
+  if (!entity) return nullptr;  // an abstract entity cannot be made
+  WTObject* object = insertNewObject(*entity);
+  object->setUuid(identity);
+  return object;
+}
+
+void WTObjectContext::uuidChanged(WTObject* object, const QString& oldUuid) {
+  if (!object->registered_) return;
+  auto it = byUuid_.find(oldUuid);
+  if (it != byUuid_.end() && it.value() == object) byUuid_.erase(it);
+  byUuid_.insert(object->uuid_, object);
+}
+
+std::optional<QList<WTObject*>> WTObjectContext::fetchObjectsForEntityName(
+    const QString& entityName, const QList<KeyPath::SortDescriptor>& sortDescriptors,
+    const std::function<bool(const WTObject*)>& predicate) const {
+  if (!WTEntities::isEntityName(entityName)) return std::nullopt;
+  QList<WTObject*> result;
+  for (WTEntity entity : WTEntities::kAll) {
+    if (!WTEntities::isKindOf(entity, entityName)) continue;
+    for (WTObject* object : objects_[static_cast<int>(entity)]) {
+      if (!predicate || predicate(object)) result.append(object);
+    }
+  }
+  if (sortDescriptors.isEmpty()) return result;
+  QVariantList values;
+  values.reserve(result.size());
+  for (WTObject* object : result) values.append(KeyPath::variantFromObject(object));
+  values = KeyPath::sorted(std::move(values), sortDescriptors);
+  result.clear();
+  for (const QVariant& value : values) result.append(static_cast<WTObject*>(KeyPath::objectFromVariant(value)));
+  return result;
+}
+
+qsizetype WTObjectContext::count() const {
+  qsizetype total = 0;
+  for (const auto& list : objects_) total += static_cast<qsizetype>(list.size());
+  return total;
+}
+
+void WTObjectContext::setChangeJournal(WTChangeJournal* journal) { journal_ = journal ? journal : &nullJournal_; }
+
+void WTObjectContext::storedValueChanged(WTObject* object, const QString& key, const QVariant& oldValue) {
+  markChanged(object, key);
+  if (key == QLatin1String("uuid")) {
+    undo_.registerUndo([object, oldValue] { object->setUuid(oldValue.toString()); });
+  } else {
+    undo_.registerUndo([object, key, oldValue] { object->setStoredValue(key, oldValue); });
+  }
+}
+
+void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int oldIndex) {
+  WTObject* newOwner = object->owner();
+  const QString key = object->ownerKey();
+  const QString inverse = inverseKey(object->entity());
+  markChanged(object, key);
+  if (oldOwner) markChanged(oldOwner, inverse);
+  if (newOwner && newOwner != oldOwner) markChanged(newOwner, inverse);
+  undo_.registerUndo([object, oldOwner, oldIndex] { object->changeOwner(oldOwner, oldIndex); });
+
+  announce(object, key);
+  for (WTObject* owner : {oldOwner, newOwner == oldOwner ? nullptr : newOwner}) {
+    if (!owner) continue;
+    announce(owner, inverse);
+    // A task's totals follow its items; the chain goes on up to project and client.
+    if (owner->entity() == WTEntity::Task) static_cast<WTTask*>(owner)->itemsDidChange();
+  }
+}
+
+void WTObjectContext::markChanged(WTObject* object, const QString& key) {
+  if (!object->changedKeys_.contains(key)) object->changedKeys_.append(key);
+  if (object->registered_ && !inserted_.count(object) && updated_.insert(object).second) {
+    turnUpdated_.append(object);
+  }
+  scheduleProcessing();
+}
+
+bool WTObjectContext::hasChanges() const { return !inserted_.empty() || !updated_.empty() || !deleted_.empty(); }
+
+Result<void> WTObjectContext::save() {
+  processPendingChanges();
+  if (!hasChanges()) return {};
+  if (!store_) return Error{1, tr("There is no data file to save to.")};
+
+  std::vector<WTObject*> written(inserted_.begin(), inserted_.end());
+  written.insert(written.end(), updated_.begin(), updated_.end());
+  for (WTObject* object : written) object->willSave();
+  for (WTObject* object : deleted_) object->willSave();
+
+  // A project whose task order changed rewrites the positions of all its tasks.
+  std::unordered_set<WTObject*> rows(written.begin(), written.end());
+  for (WTObject* object : written) {
+    if (object->entity() != WTEntity::Project || !object->changedKeys_.contains(QLatin1String("tasks"))) continue;
+    for (WTTask* task : static_cast<WTProject*>(object)->tasks()) rows.insert(task);
+  }
+  std::vector<WTStoreRecord> records(rows.size());
+  size_t index = 0;
+  for (WTObject* object : rows) object->writeRecord(records[index++]);
+
+  QStringList deletedUuids;
+  for (WTObject* object : deleted_) {
+    // A record deleted and then made again under its identity (by the sync) is written, not removed.
+    if (!byUuid_.contains(object->uuid_)) deletedUuids.append(object->uuid_);
+  }
+
+  Result<void> result = store_->save(records, deletedUuids);
+  if (!result) return result;
+
+  for (WTObject* object : rows) {
+    object->persisted_ = true;
+    object->changedKeys_.clear();
+  }
+  for (WTObject* object : deleted_) {
+    object->persisted_ = false;
+    object->changedKeys_.clear();
+  }
+  inserted_.clear();
+  updated_.clear();
+  deleted_.clear();
+  emit didSave();
+  return {};
+}
+
+Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
+  Q_ASSERT(count() == 0 && !store_);
+  struct Link {
+    WTObject* object;
+    QString ownerUuid;
+    int position;
+  };
+  std::vector<Link> links;
+  undo_.disableRegistration();
+  Result<void> loaded = store->loadAll([&](WTStoreRecord&& record) {
+    const std::optional<WTEntity> entity = WTEntities::fromName(record.entity);
+    if (!entity) return;  // rows of entities this version does not know stay in the file untouched
+    WTObject* object = makeObject(*entity);
+    object->readRecord(record);
+    object->persisted_ = true;
+    registerObject(object, true);
+    QString& ownerUuid = *entity == WTEntity::Project ? record.clientUuid
+                         : *entity == WTEntity::Task  ? record.projectUuid
+                                                      : record.taskUuid;
+    if (!ownerUuid.isEmpty()) links.push_back({object, std::move(ownerUuid), record.position});
+  });
+  if (loaded) {
+    // Tasks join their projects in stored order.
+    std::stable_sort(links.begin(), links.end(), [](const Link& a, const Link& b) { return a.position < b.position; });
+    for (const Link& link : links) {
+      WTObject* owner = byUuid_.value(link.ownerUuid);
+      if (owner) link.object->relinkOwner(owner, -1);
+    }
+    for (WTEntity entity : WTEntities::kAll) {
+      for (WTObject* object : objects_[static_cast<int>(entity)]) object->awakeFromFetch();
+    }
+    store_ = std::move(store);
+  } else {
+    for (auto& list : objects_) list.clear();
+    byUuid_.clear();
+    owned_.clear();
+  }
+  undo_.enableRegistration();
+  return loaded;
+}
+
+void WTObjectContext::scheduleProcessing() {
+  if (processingScheduled_) return;
+  processingScheduled_ = true;
+  QMetaObject::invokeMethod(
+      this, [this] { if (processingScheduled_) processPendingChanges(); }, Qt::QueuedConnection);
+}
+
+void WTObjectContext::processPendingChanges() {
+  processingScheduled_ = false;
+  undo_.closeGroup();
+  if (turnInserted_.isEmpty() && turnUpdated_.isEmpty() && turnDeleted_.isEmpty()) return;
+  const QList<WTObject*> inserted = std::exchange(turnInserted_, {});
+  const QList<WTObject*> updated = std::exchange(turnUpdated_, {});
+  const QList<WTObject*> deleted = std::exchange(turnDeleted_, {});
+  emit objectsDidChange(inserted, updated, deleted);
+}
+
+WTObjectContext::ObserverId WTObjectContext::addObserver(const WTObject* object, const QString& key,
+                                                         Observer observer) {
+  const ObserverId id = nextObserverId_++;
+  observers_[object].push_back({id, key, std::move(observer)});
+  observerOwners_.insert(id, object);
+  return id;
+}
+
+void WTObjectContext::removeObserver(ObserverId id) {
+  auto owner = observerOwners_.find(id);
+  if (owner == observerOwners_.end()) return;
+  auto entries = observers_.find(owner.value());
+  observerOwners_.erase(owner);
+  if (entries == observers_.end()) return;
+  auto& list = entries.value();
+  list.erase(std::remove_if(list.begin(), list.end(), [id](const ObserverEntry& e) { return e.id == id; }),
+             list.end());
+  if (list.empty()) observers_.erase(entries);
+}
+
+void WTObjectContext::announce(WTObject* object, const QString& key) {
+  std::vector<std::pair<WTObject*, QString>> seen;
+  announceClosure(object, key, seen);
+}
+
+void WTObjectContext::announceClosure(WTObject* object, const QString& key,
+                                      std::vector<std::pair<WTObject*, QString>>& seen) {
+  for (const auto& [o, k] : seen) {
+    if (o == object && k == key) return;
+  }
+  seen.emplace_back(object, key);
+  notifyObservers(object, key);
+  for (const QString& dependent : WTKeyDependencies::dependentKeys(object->entity(), key)) {
+    announceClosure(object, dependent, seen);
+  }
+  for (const auto& related : WTKeyDependencies::relatedDependents(object->entity(), key)) {
+    for (WTObject* other : object->relatedObjects(related.relationship)) {
+      announceClosure(other, related.dependentKey, seen);
+    }
+  }
+}
+
+void WTObjectContext::notifyObservers(WTObject* object, const QString& key) {
+  emit objectValueDidChange(object, key);
+  auto it = observers_.constFind(object);
+  if (it == observers_.constEnd()) return;
+  // Copied: a callback may add or remove observers.
+  const std::vector<ObserverEntry> entries = it.value();
+  for (const ObserverEntry& entry : entries) {
+    if (!observerOwners_.contains(entry.id)) continue;
+    if (entry.key.isEmpty() || entry.key == key) entry.callback(object, key);
+  }
+}

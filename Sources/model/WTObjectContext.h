@@ -1,0 +1,164 @@
+#pragma once
+
+#include "KeyPath.h"
+#include "Result.h"
+#include "WTChangeJournal.h"
+#include "WTEntity.h"
+#include "WTObject.h"
+#include "WTUndoManager.h"
+
+#include <QHash>
+#include <QList>
+#include <QObject>
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <unordered_set>
+#include <vector>
+
+class UserDefaults;
+class WTStore;
+
+// The one object graph of the application: every record lives here, in memory, found by identity. A
+// store file (WTStore) mirrors it; save() writes what changed since the last save in one transaction
+// and reports each record to the change journal on the way.
+//
+// Changes are announced synchronously to observers of (record, key), with every key that depends on the
+// changed one, and once per event-loop turn as objectsDidChange (which also closes the undo group).
+// Main thread only.
+class WTObjectContext : public QObject {
+  Q_OBJECT
+ public:
+  // `defaults` (not owned, may be null) answers "WTDefaultRate" and "WTStopsOtherTimes".
+  explicit WTObjectContext(UserDefaults* defaults = nullptr, QObject* parent = nullptr);
+  ~WTObjectContext() override;
+
+  // The context that class operations taking no context use (WTTask::insertNewObject()); set by the
+  // application delegate, or by a test. May be null.
+  static WTObjectContext* defaultContext();
+  static void setDefaultContext(WTObjectContext* context);
+  // `context` when given, else the default context; asserts that one exists.
+  static WTObjectContext* resolve(WTObjectContext* context);
+
+  UserDefaults* userDefaults() const { return defaults_; }
+
+  // Store. Attaching loads every record of the store into this (empty) context.
+  Result<void> attachStore(std::unique_ptr<WTStore> store);
+  bool hasStore() const { return store_ != nullptr; }
+  WTStore* store() const { return store_.get(); }
+
+  // The journal that saved records report to; null restores the one that records nothing.
+  void setChangeJournal(WTChangeJournal* journal);
+  WTChangeJournal* changeJournal() const { return journal_; }
+
+  // Records.
+  WTObject* insertNewObject(WTEntity entity);
+  template <class T>
+  T* insertNewObject() {
+    return static_cast<T*>(insertNewObject(T::kEntity));
+  }
+  // Removes a record; a client's projects stay (without client), a project's tasks and a task's items
+  // go with their owner.
+  void deleteObject(WTObject* object);
+
+  // The record with this identity, or none. With `forceInsert`, an unknown identity makes a new record
+  // of the entity named after its last "@", under exactly that identity; a value that is not a string,
+  // or names no entity, still gives none.
+  WTObject* objectWithUUID(const QVariant& uuid, bool forceInsert = false);
+  WTObject* objectWithUUID(const QString& uuid, bool forceInsert = false) {
+    return objectWithUUID(QVariant(uuid), forceInsert);
+  }
+
+  // Every live record of that entity or kind ("WTItem" gives every item); none when the model has no
+  // entity of that name. The predicate and sort descriptors apply when given.
+  std::optional<QList<WTObject*>> fetchObjectsForEntityName(
+      const QString& entityName, const QList<KeyPath::SortDescriptor>& sortDescriptors = {},
+      const std::function<bool(const WTObject*)>& predicate = {}) const;
+  template <class T>
+  QList<T*> fetch(const std::function<bool(const T*)>& predicate = {}) const {
+    QList<T*> result;
+    for (WTObject* object : objects_[static_cast<int>(T::kEntity)]) {
+      T* typed = static_cast<T*>(object);
+      if (!predicate || predicate(typed)) result.append(typed);
+    }
+    return result;
+  }
+  qsizetype count() const;
+
+  // Saving.
+  bool hasChanges() const;
+  // Writes every change since the last save in one transaction, reporting each record to the journal.
+  // On failure nothing is forgotten: the changes stay and the next save tries again.
+  Result<void> save();
+
+  // Undo and redo of whole event-loop turns.
+  WTUndoManager& undoManager() { return undo_; }
+
+  // Observation. An empty `key` observes every key of the record. The callback runs synchronously on
+  // each announcement; it may add or remove observers.
+  using Observer = std::function<void(WTObject* object, const QString& key)>;
+  using ObserverId = quint64;
+  ObserverId addObserver(const WTObject* object, const QString& key, Observer observer);
+  void removeObserver(ObserverId id);
+
+  // Announces `key` of `object` and everything that depends on it, in this record and related ones.
+  void announce(WTObject* object, const QString& key);
+
+  // Ends the present event-loop turn now: posts objectsDidChange and closes the undo group. Runs by
+  // itself at the end of every turn in which something changed.
+  void processPendingChanges();
+
+ signals:
+  // Once per event-loop turn in which records were inserted, changed or deleted.
+  void objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
+                        const QList<WTObject*>& deleted);
+  // Every announcement of a key, derived keys included.
+  void objectValueDidChange(WTObject* object, const QString& key);
+  void didSave();
+
+ private:
+  friend class WTObject;
+
+  WTObject* makeObject(WTEntity entity);
+  void registerObject(WTObject* object, bool adoptOwnership);
+  void unregisterObject(WTObject* object);
+  void reinsertObject(WTObject* object);
+  void removeFromGraph(WTObject* object);
+  void storedValueChanged(WTObject* object, const QString& key, const QVariant& oldValue);
+  void ownerChanged(WTObject* object, WTObject* oldOwner, int oldIndex);
+  void markChanged(WTObject* object, const QString& key);
+  void scheduleProcessing();
+  void notifyObservers(WTObject* object, const QString& key);
+  void announceClosure(WTObject* object, const QString& key,
+                       std::vector<std::pair<WTObject*, QString>>& seen);
+  void uuidChanged(WTObject* object, const QString& oldUuid);
+
+  UserDefaults* defaults_;
+  std::unique_ptr<WTStore> store_;
+  WTNullChangeJournal nullJournal_;
+  WTChangeJournal* journal_ = &nullJournal_;
+  WTUndoManager undo_;
+
+  // Live records per entity, and by identity. Records are owned through `owned_`; deleted ones stay
+  // alive there so that undo can bring them back and nobody holding one is left dangling.
+  std::vector<WTObject*> objects_[8];
+  QHash<QString, WTObject*> byUuid_;
+  std::vector<std::unique_ptr<WTObject>> owned_;
+
+  // Since the last save.
+  std::unordered_set<WTObject*> inserted_, updated_, deleted_;
+  // Since the last processPendingChanges.
+  QList<WTObject*> turnInserted_, turnUpdated_, turnDeleted_;
+  bool processingScheduled_ = false;
+
+  struct ObserverEntry {
+    ObserverId id;
+    QString key;
+    Observer callback;
+  };
+  QHash<const WTObject*, std::vector<ObserverEntry>> observers_;
+  QHash<ObserverId, const WTObject*> observerOwners_;
+  ObserverId nextObserverId_ = 1;
+  int announceDepth_ = 0;
+};

@@ -1,0 +1,56 @@
+#pragma once
+
+#include "WTObject.h"
+
+#include <functional>
+
+class WTClient;
+class WTTask;
+
+// A project: belongs to a client (or none) and owns its tasks in the user's order.
+class WTProject final : public WTObject {
+  WT_ENTITY_CLASS(WTProject, Project)
+ public:
+  explicit WTProject(WTObjectContext* context) : WTObject(WTEntity::Project, context) {}
+
+  WTClient* client() const { return client_; }
+  void setClient(WTClient* client);
+
+  // The tasks in their stored order (`tasksArray` is the same list).
+  const QList<WTTask*>& tasks() const { return tasks_; }
+  const QList<WTTask*>& tasksArray() const { return tasks_; }
+  // Moves one of this project's tasks to `index` among the others (clamped to the list).
+  void moveTask(WTTask* task, int index);
+
+  // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else 50.
+  Decimal inheritedRate() const override;
+  void setRate(const std::optional<Decimal>& rate) override;
+  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
+
+  int duration() const;
+  Decimal cost() const;
+  void durationDidChange();
+  void costDidChange();
+
+  // "folder_32", or "folder_32_dis" when archived.
+  QString tableImage() const;
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  WTObject* owner() const override;
+  QString ownerKey() const override { return QStringLiteral("client"); }
+  void relinkOwner(WTObject* owner, int index) override;
+  QList<WTObject*> relatedObjects(const QString& relationship) const override;
+  bool isOrderedRelationship(const QString& relationship) const override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+ private:
+  friend class WTTask;
+  friend class WTObjectContext;
+  WTClient* client_ = nullptr;
+  QList<WTTask*> tasks_;
+};

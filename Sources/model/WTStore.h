@@ -1,0 +1,46 @@
+#pragma once
+
+#include "Result.h"
+#include "WTStoreRecord.h"
+
+#include <QString>
+#include <QStringList>
+
+#include <functional>
+#include <memory>
+#include <vector>
+
+struct sqlite3;
+
+// The one store file: every record in one SQLite table, written in WAL mode with full syncing, one
+// transaction per save. The schema version lives in PRAGMA user_version; a file written by an older
+// version is migrated in order when opened. A file that is not a store, is damaged or was written by a
+// newer version is refused without being changed in any way.
+class WTStore {
+ public:
+  static constexpr int kSchemaVersion = 1;
+
+  enum ErrorCode { OpenFailed = 1, NotAStore = 2, NewerVersion = 3, MigrationFailed = 4, ReadFailed = 5, WriteFailed = 6 };
+
+  // Opens the store at `path`, creating the file (not its folder) when missing. The error's message
+  // names the file and says what is wrong, ready to show to the user.
+  static Result<std::unique_ptr<WTStore>> open(const QString& path);
+  ~WTStore();
+
+  WTStore(const WTStore&) = delete;
+  WTStore& operator=(const WTStore&) = delete;
+
+  QString path() const { return path_; }
+
+  // Reads every record, handing each to `sink` in no particular order.
+  Result<void> loadAll(const std::function<void(WTStoreRecord&&)>& sink);
+
+  // Writes the given records (inserted or replaced whole) and removes the deleted ones, all in one
+  // transaction: after a failure nothing of this save is in the file.
+  Result<void> save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids);
+
+ private:
+  WTStore(QString path, sqlite3* db);
+  QString path_;
+  sqlite3* db_ = nullptr;
+};

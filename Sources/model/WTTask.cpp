@@ -1,0 +1,309 @@
+#include "WTTask.h"
+
+#include "RZDate.h"
+#include "UserDefaults.h"
+#include "WTItemContainer.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTStoreRecord.h"
+#include "WTTime.h"
+#include "WTToDo.h"
+
+#include <QCoreApplication>
+
+#include <algorithm>
+
+WT_ENTITY_CLASS_IMPL(WTTask)
+
+WTTask::~WTTask() = default;
+
+void WTTask::setProject(WTProject* project, int index) { changeOwner(project, index); }
+
+void WTTask::setBudget(const std::optional<Decimal>& budget) {
+  setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
+}
+
+WTObject* WTTask::owner() const { return project_; }
+
+int WTTask::indexInOwner() const { return project_ ? static_cast<int>(project_->tasks_.indexOf(this)) : -1; }
+
+void WTTask::relinkOwner(WTObject* owner, int index) {
+  if (project_) project_->tasks_.removeOne(this);
+  project_ = static_cast<WTProject*>(owner);
+  if (!project_) return;
+  auto& tasks = project_->tasks_;
+  if (index < 0 || index > tasks.size()) index = static_cast<int>(tasks.size());
+  tasks.insert(index, this);
+}
+
+Decimal WTTask::inheritedRate() const {
+  if (storedRate()) return *storedRate();
+  if (project_) return project_->inheritedRate();
+  return userDefaultRate().value_or(Decimal(75));
+}
+
+void WTTask::setRate(const std::optional<Decimal>& rate) {
+  WTObject::setRate(rate);
+  if (project_) project_->costDidChange();
+}
+
+int WTTask::duration() const {
+  int total = 0;
+  for (const WTItem* item : items_) total += item->duration();
+  return total;
+}
+
+Decimal WTTask::cost() const {
+  // Every item bills at the task's rate: read it once for all of them.
+  const Decimal rate = inheritedRate();
+  Decimal total;
+  for (const WTItem* item : items_) total += item->costAtRate(rate);
+  return total;
+}
+
+void WTTask::durationDidChange() {
+  announce(QStringLiteral("duration"));
+  announce(QStringLiteral("cost"));
+  if (project_) project_->durationDidChange();
+}
+
+void WTTask::costDidChange() {
+  announce(QStringLiteral("cost"));
+  if (project_) project_->costDidChange();
+}
+
+void WTTask::itemsDidChange() { durationDidChange(); }
+
+QList<WTTime*> WTTask::times() const {
+  QList<WTTime*> result;
+  for (WTItem* item : items_) {
+    if (item->entity() == WTEntity::Time) result.append(static_cast<WTTime*>(item));
+  }
+  return result;
+}
+
+QList<WTItem*> WTTask::pendingToDos() const {
+  QList<WTItem*> result;
+  for (WTItem* item : items_) {
+    if (item->entity() == WTEntity::ToDo && !static_cast<WTToDo*>(item)->completed()) result.append(item);
+  }
+  std::stable_sort(result.begin(), result.end(),
+                   [](const WTItem* a, const WTItem* b) { return a->startDate() > b->startDate(); });
+  return result;
+}
+
+QList<WTItem*> WTTask::itemsWithoutPendingToDos() const {
+  QList<WTItem*> result;
+  for (WTItem* item : items_) {
+    if (item->entity() != WTEntity::ToDo || static_cast<WTToDo*>(item)->completed()) result.append(item);
+  }
+  return result;
+}
+
+QList<WTItem*> WTTask::filteredItems(const QStringList& entityNames) const {
+  QList<WTItem*> result;
+  for (WTItem* item : items_) {
+    if (entityNames.contains(item->entityName())) result.append(item);
+  }
+  return result;
+}
+
+QList<WTItem*> WTTask::valuableItems() const {
+  return filteredItems({QStringLiteral("WTTime"), QStringLiteral("WTFlat"), QStringLiteral("WTExpense")});
+}
+
+WTItemContainerList WTTask::dailyItems() const {
+  return WTItemContainer::containersByKeyPath(QStringLiteral("startDate.midnight"), valuableItems());
+}
+
+WTItemContainerList WTTask::monthlyItems() const {
+  return WTItemContainer::containersByKeyPath(QStringLiteral("startDate.beginOfMonth"), valuableItems());
+}
+
+const WTItemContainerList& WTTask::children() {
+  updateChildren();
+  return cachedChildren_;
+}
+
+void WTTask::updateChildren() {
+  cachedChildren_.clear();
+  WTItemContainerList children;
+  const QList<WTItem*> pending = pendingToDos();
+  if (!pending.isEmpty()) children.push_back(std::make_shared<WTItemContainer>(pending, std::nullopt, this));
+
+  // Newest day first, and the newest item first within a day.
+  struct Dated {
+    Date day;
+    WTItem* item;
+  };
+  std::vector<Dated> dated;
+  const QList<WTItem*> rest = itemsWithoutPendingToDos();
+  dated.reserve(rest.size());
+  for (WTItem* item : rest) dated.push_back({RZDate::midnight(item->startDate().value_or(Date())), item});
+  std::stable_sort(dated.begin(), dated.end(), [](const Dated& a, const Dated& b) {
+    if (a.day != b.day) return a.day > b.day;
+    return a.item->startDate() > b.item->startDate();
+  });
+  for (size_t begin = 0; begin < dated.size();) {
+    size_t end = begin;
+    QList<WTItem*> group;
+    while (end < dated.size() && dated[end].day == dated[begin].day) group.append(dated[end++].item);
+    const Date day = RZDate::midnight(group.last()->startDate().value_or(Date()));
+    children.push_back(std::make_shared<WTItemContainer>(std::move(group), day, this));
+    begin = end;
+  }
+  cachedChildren_ = std::move(children);
+}
+
+std::shared_ptr<WTItemContainer> WTTask::itemContainerForItem(const WTItem* item) const {
+  if (!item) return nullptr;
+  std::optional<Date> date = item->date();
+  if (item->entity() == WTEntity::ToDo && !static_cast<const WTToDo*>(item)->completed()) date.reset();
+  if (date) date = RZDate::midnight(*date);
+  for (auto it = cachedChildren_.rbegin(); it != cachedChildren_.rend(); ++it) {
+    // The "Pending" group has no date and is found for open to-dos only.
+    if ((*it)->date() == date) return *it;
+  }
+  return nullptr;
+}
+
+QList<WTTime*> WTTask::runningTimes() const {
+  QList<WTTime*> result;
+  for (WTTime* time : times()) {
+    if (time->running()) result.append(time);
+  }
+  return result;
+}
+
+int WTTask::runningDuration() const {
+  int total = 0;
+  for (const WTTime* time : runningTimes()) total += time->duration();
+  return total;
+}
+
+bool WTTask::running() const {
+  for (const WTItem* item : items_) {
+    if (item->entity() == WTEntity::Time && static_cast<const WTTime*>(item)->running()) return true;
+  }
+  return false;
+}
+
+std::optional<Date> WTTask::maxTimeEndDate() const {
+  std::optional<Date> latest;
+  for (const WTTime* time : times()) {
+    if (time->endDate() && (!latest || *time->endDate() > *latest)) latest = time->endDate();
+  }
+  return latest;
+}
+
+void WTTask::runningDidChange() { announce(QStringLiteral("running")); }
+
+void WTTask::stopAllTimers() {
+  for (WTTime* time : times()) {
+    if (time->running()) time->setRunning(false);
+  }
+}
+
+WTTime* WTTask::toggleTimer() {
+  if (running()) {
+    stopAllTimers();
+    return nullptr;
+  }
+  const UserDefaults* defaults = context()->userDefaults();
+  if (defaults && defaults->boolForKey(QStringLiteral("WTStopsOtherTimes"))) {
+    for (WTTask* task : context()->fetch<WTTask>()) task->stopAllTimers();
+  }
+  auto* time = WTTime::insertNewObject(context());
+  time->setTask(this);
+  time->setRunning(true);
+  return time;
+}
+
+QString WTTask::tableImage() const {
+  return running() ? QStringLiteral("notepad_clock_32") : QStringLiteral("notepad_32");
+}
+
+QString WTTask::timerButtonImage() const { return running() ? QStringLiteral("stop_32") : QStringLiteral("play_32"); }
+
+QString WTTask::buttonTitle() const {
+  return running() ? QCoreApplication::translate("WTTask", "Stop") : QCoreApplication::translate("WTTask", "Start");
+}
+
+QVariant WTTask::valueForKey(const QString& key) const {
+  auto records = [](const auto& list) {
+    QVariantList result;
+    result.reserve(list.size());
+    for (auto* object : list) result.append(KeyPath::variantFromObject(object));
+    return result;
+  };
+  if (key == QLatin1String("items")) return records(items_);
+  if (key == QLatin1String("project")) return project_ ? KeyPath::variantFromObject(project_) : QVariant();
+  if (key == QLatin1String("duration")) return duration();
+  if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
+  if (key == QLatin1String("times")) return records(times());
+  if (key == QLatin1String("runningTimes")) return records(runningTimes());
+  if (key == QLatin1String("runningDuration")) return runningDuration();
+  if (key == QLatin1String("running")) return running();
+  if (key == QLatin1String("maxTimeEndDate")) {
+    const auto date = maxTimeEndDate();
+    return date ? QVariant::fromValue(*date) : QVariant();
+  }
+  if (key == QLatin1String("pendingToDos")) return records(pendingToDos());
+  if (key == QLatin1String("valuableItems")) return records(valuableItems());
+  if (key == QLatin1String("tableImage")) return tableImage();
+  if (key == QLatin1String("timerButtonImage")) return timerButtonImage();
+  if (key == QLatin1String("buttonTitle")) return buttonTitle();
+  // The time-entry export reads a task's "title": it is the task's name.
+  if (key == QLatin1String("title")) return name();
+  return WTObject::valueForKey(key);
+}
+
+bool WTTask::setValue(const QString& key, const QVariant& value) {
+  if (key == QLatin1String("project")) {
+    auto* project = dynamic_cast<WTProject*>(KeyPath::objectFromVariant(value));
+    if (!value.isNull() && !project) return false;
+    setProject(project);
+    return true;
+  }
+  if (key == QLatin1String("budget")) {
+    const std::optional<Decimal> budget = Decimal::fromVariant(value);
+    if (!value.isNull() && !budget) return false;
+    setBudget(budget);
+    return true;
+  }
+  return WTObject::setValue(key, value);
+}
+
+QStringList WTTask::storedKeys() const {
+  return WTObject::storedKeys() << QStringLiteral("budget") << QStringLiteral("project");
+}
+
+QVariant WTTask::primitiveValue(const QString& key) const {
+  if (key == QLatin1String("budget")) return budget_ ? QVariant::fromValue(*budget_) : QVariant();
+  return WTObject::primitiveValue(key);
+}
+
+bool WTTask::writePrimitive(const QString& key, const QVariant& value) {
+  if (key == QLatin1String("budget")) {
+    budget_ = Decimal::fromVariant(value);
+    return true;
+  }
+  return WTObject::writePrimitive(key, value);
+}
+
+QList<WTObject*> WTTask::relatedObjects(const QString& relationship) const {
+  if (relationship != QLatin1String("items")) return {};
+  return QList<WTObject*>(items_.begin(), items_.end());
+}
+
+void WTTask::readRecord(const WTStoreRecord& record) {
+  WTObject::readRecord(record);
+  budget_ = record.budget;
+}
+
+void WTTask::writeRecord(WTStoreRecord& record) const {
+  WTObject::writeRecord(record);
+  record.budget = budget_;
+  record.projectUuid = project_ ? project_->uuid() : QString();
+  record.position = static_cast<int>(indexInOwner());
+}

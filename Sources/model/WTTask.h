@@ -1,0 +1,106 @@
+#pragma once
+
+#include "Date.h"
+#include "WTObject.h"
+
+#include <QSet>
+
+#include <memory>
+#include <vector>
+
+class WTItem;
+class WTItemContainer;
+class WTProject;
+class WTTime;
+
+using WTItemContainerList = std::vector<std::shared_ptr<WTItemContainer>>;
+
+// A task of a project: owns its items of every kind, sums them and runs their timers.
+class WTTask final : public WTObject {
+  WT_ENTITY_CLASS(WTTask, Task)
+ public:
+  explicit WTTask(WTObjectContext* context) : WTObject(WTEntity::Task, context) {}
+  ~WTTask() override;
+
+  WTProject* project() const { return project_; }
+  // Files the task at the end of `project`'s tasks (or at `index` among them).
+  void setProject(WTProject* project, int index = -1);
+  std::optional<Decimal> budget() const { return budget_; }
+  void setBudget(const std::optional<Decimal>& budget);
+
+  // Every item of the task, of every kind, in no particular order.
+  const QList<WTItem*>& items() const { return items_; }
+
+  // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else 75.
+  Decimal inheritedRate() const override;
+  void setRate(const std::optional<Decimal>& rate) override;
+  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
+
+  int duration() const;
+  Decimal cost() const;
+  // Announce the change upward: task, then project, then client.
+  void durationDidChange();
+  void costDidChange();
+
+  // Subsets of the items.
+  QList<WTTime*> times() const;
+  QList<WTItem*> pendingToDos() const;  // open to-dos, newest first
+  QList<WTItem*> itemsWithoutPendingToDos() const;
+  QList<WTItem*> filteredItems(const QStringList& entityNames) const;
+  QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses
+  WTItemContainerList dailyItems() const;
+  WTItemContainerList monthlyItems() const;
+
+  // Groups for the items outline: "Pending" first, then one group per day, newest first.
+  const WTItemContainerList& cachedChildren() const { return cachedChildren_; }
+  const WTItemContainerList& children();
+  void updateChildren();
+  bool isLeaf() const { return false; }
+  // The cached group that holds `item` (its day's group, or "Pending" for an open to-do); never rebuilds.
+  std::shared_ptr<WTItemContainer> itemContainerForItem(const WTItem* item) const;
+
+  // Timers.
+  QList<WTTime*> runningTimes() const;
+  int runningDuration() const;
+  bool running() const;
+  std::optional<Date> maxTimeEndDate() const;
+  void runningDidChange();
+  void stopAllTimers();
+  // Stops the task's timers when one runs (returns none); otherwise starts a new entry and returns it,
+  // first stopping every other task's timers when "WTStopsOtherTimes" is set.
+  WTTime* toggleTimer();
+
+  // "notepad_clock_32" while running, else "notepad_32".
+  QString tableImage() const;
+  // "stop_32" while running, else "play_32".
+  QString timerButtonImage() const;
+  // "Stop" while running, else "Start" (translated).
+  QString buttonTitle() const;
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  QVariant primitiveValue(const QString& key) const override;
+  bool writePrimitive(const QString& key, const QVariant& value) override;
+  WTObject* owner() const override;
+  QString ownerKey() const override { return QStringLiteral("project"); }
+  void relinkOwner(WTObject* owner, int index) override;
+  int indexInOwner() const override;
+  QList<WTObject*> relatedObjects(const QString& relationship) const override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+ private:
+  friend class WTItem;
+  friend class WTProject;
+  friend class WTObjectContext;
+  // Runs whenever an item joins or leaves the task.
+  void itemsDidChange();
+
+  WTProject* project_ = nullptr;
+  std::optional<Decimal> budget_;
+  QList<WTItem*> items_;
+  WTItemContainerList cachedChildren_;
+};

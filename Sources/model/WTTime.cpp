@@ -1,0 +1,154 @@
+#include "WTTime.h"
+
+#include "RZDate.h"
+#include "WTObjectContext.h"
+#include "WTStoreRecord.h"
+#include "WTTask.h"
+
+#include <cmath>
+#include <limits>
+
+WT_ENTITY_CLASS_IMPL(WTTime)
+
+namespace {
+QVariant dateVariant(const std::optional<Date>& date) { return date ? QVariant::fromValue(*date) : QVariant(); }
+}  // namespace
+
+void WTTime::awakeFromInsert() {
+  WTItem::awakeFromInsert();
+  setEndDate(startDate());
+}
+
+void WTTime::setEndDate(const std::optional<Date>& date) { setStoredValue(QStringLiteral("endDate"), dateVariant(date)); }
+
+void WTTime::setRunning(bool running) {
+  setStoredValue(QStringLiteral("running"), running);
+  if (running) {
+    setEndDate(std::nullopt);
+  } else if (!endDate()) {
+    setEndDate(Date::now());
+  }
+  if (task()) task()->runningDidChange();
+}
+
+void WTTime::storedValueDidChange(const QString& key) {
+  if (key == QLatin1String("endDate")) {
+    if (task()) task()->durationDidChange();
+  } else if (key == QLatin1String("running")) {
+    // The setter tells the task itself once the end date is settled; undo and redo replay values only.
+    const WTUndoManager& undo = context()->undoManager();
+    if (task() && (undo.isUndoing() || undo.isRedoing())) task()->runningDidChange();
+  }
+}
+
+int WTTime::duration() const {
+  const std::optional<Date> start = startDate();
+  const std::optional<Date> end = running() ? std::optional<Date>(Date::now()) : endDate();
+  if (!start || !end) return 0;
+  // Minute boundaries crossed, not elapsed seconds: both ends are cut to their minute first.
+  const double seconds = RZDate::beginOfMinute(*end).timeIntervalSince(RZDate::beginOfMinute(*start));
+  const double clamped = std::clamp(std::trunc(seconds), double(std::numeric_limits<std::int32_t>::min()),
+                                    double(std::numeric_limits<std::int32_t>::max()));
+  return static_cast<std::int32_t>(clamped) / 60;
+}
+
+void WTTime::setDuration(int minutes) {
+  if (!startDate()) return;
+  setEndDate(startDate()->addingSeconds(double(minutes) * 60.0));
+}
+
+void WTTime::setDate(const std::optional<Date>& date) {
+  if (!date || !startDate()) {
+    WTItem::setDate(date);
+    return;
+  }
+  // The new day, the old hour and minute; seconds are dropped on purpose.
+  RZDate::DateComponents components;
+  RZDate::assignFlags(*date, RZDate::DayUnits, components);
+  RZDate::assignFlags(*startDate(), RZDate::Hour | RZDate::Minute, components);
+  components.second = 0;
+  const std::optional<Date> end = endDate();
+  const double length = end ? end->timeIntervalSince(*startDate()) : 0;
+  const Date start = RZDate::dateFromComponents(components);
+  setStartDate(start);
+  // A running entry has no end to move.
+  if (end) setEndDate(start.addingSeconds(length));
+}
+
+QString WTTime::title() const {
+  return startDate() ? RZDate::stringWithPattern(*startDate(), QStringLiteral("HH:mm")) : QString();
+}
+
+bool WTTime::peek() {
+  const int minutes = duration();
+  const bool changed = !lastDuration_ || *lastDuration_ != minutes;
+  if (changed) {
+    announce(QStringLiteral("duration"));
+    if (task()) task()->durationDidChange();
+  }
+  lastDuration_ = minutes;
+  return changed;
+}
+
+QVariant WTTime::valueForKey(const QString& key) const {
+  if (key == QLatin1String("endDate")) return dateVariant(endDate_);
+  if (key == QLatin1String("running")) return running_;
+  if (key == QLatin1String("lastDuration")) return lastDuration_ ? QVariant(*lastDuration_) : QVariant();
+  return WTItem::valueForKey(key);
+}
+
+bool WTTime::setValue(const QString& key, const QVariant& value) {
+  if (key == QLatin1String("endDate")) {
+    bool ok = false;
+    const std::optional<Date> date = dateFromVariant(value, &ok);
+    if (!ok) return false;
+    setEndDate(date);
+    return true;
+  }
+  if (key == QLatin1String("running")) {
+    setRunning(value.toBool());
+    return true;
+  }
+  if (key == QLatin1String("duration")) {
+    bool ok = false;
+    const int minutes = value.toInt(&ok);
+    if (!ok) return false;
+    setDuration(minutes);
+    return true;
+  }
+  return WTItem::setValue(key, value);
+}
+
+QStringList WTTime::storedKeys() const {
+  return WTItem::storedKeys() << QStringLiteral("endDate") << QStringLiteral("running");
+}
+
+QVariant WTTime::primitiveValue(const QString& key) const {
+  if (key == QLatin1String("endDate")) return dateVariant(endDate_);
+  if (key == QLatin1String("running")) return running_;
+  return WTItem::primitiveValue(key);
+}
+
+bool WTTime::writePrimitive(const QString& key, const QVariant& value) {
+  if (key == QLatin1String("endDate")) {
+    endDate_ = value.isNull() ? std::nullopt : std::optional<Date>(value.value<Date>());
+    return true;
+  }
+  if (key == QLatin1String("running")) {
+    running_ = value.toBool();
+    return true;
+  }
+  return WTItem::writePrimitive(key, value);
+}
+
+void WTTime::readRecord(const WTStoreRecord& record) {
+  WTItem::readRecord(record);
+  endDate_ = record.endDate;
+  running_ = record.running;
+}
+
+void WTTime::writeRecord(WTStoreRecord& record) const {
+  WTItem::writeRecord(record);
+  record.endDate = endDate_;
+  record.running = running_;
+}

@@ -1,0 +1,49 @@
+#pragma once
+
+#include "WTItem.h"
+
+// A time entry: a timer while `running`, otherwise the span from `startDate` to `endDate`.
+class WTTime final : public WTItem {
+  WT_ENTITY_CLASS(WTTime, Time)
+ public:
+  explicit WTTime(WTObjectContext* context) : WTItem(WTEntity::Time, context) {}
+
+  std::optional<Date> endDate() const { return endDate_; }
+  // Stores the end and tells the task its duration changed.
+  void setEndDate(const std::optional<Date>& date);
+  bool running() const { return running_; }
+  // Starting clears the end; stopping stamps it with now unless one is set; the task is told either way.
+  void setRunning(bool running);
+
+  // Minute boundaries crossed between start and end (now while running), both cut to the minute.
+  int duration() const override;
+  // Makes the entry last `minutes` from its start.
+  void setDuration(int minutes);
+  // Moves the entry to the day of `date`, keeping hour and minute (seconds dropped) and its length.
+  void setDate(const std::optional<Date>& date) override;
+  // The start time as "HH:mm".
+  QString title() const override;
+
+  // Refreshes observers of a running entry when its minute count moved since the last look; returns
+  // whether it did.
+  bool peek();
+  std::optional<int> lastDuration() const { return lastDuration_; }
+  void setLastDuration(std::optional<int> minutes) { lastDuration_ = minutes; }
+
+  QVariant valueForKey(const QString& key) const override;
+  bool setValue(const QString& key, const QVariant& value) override;
+  QStringList storedKeys() const override;
+
+ protected:
+  void awakeFromInsert() override;
+  QVariant primitiveValue(const QString& key) const override;
+  bool writePrimitive(const QString& key, const QVariant& value) override;
+  void storedValueDidChange(const QString& key) override;
+  void readRecord(const WTStoreRecord& record) override;
+  void writeRecord(WTStoreRecord& record) const override;
+
+ private:
+  std::optional<Date> endDate_;
+  std::optional<int> lastDuration_;
+  bool running_ = false;
+};

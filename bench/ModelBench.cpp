@@ -1,0 +1,160 @@
+// Opening a large store, saving one change and grouping a big task, against the floor of reading the
+// same rows with plain sqlite3.
+#include "RZDate.h"
+#include "WTItem.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTStore.h"
+#include "WTTask.h"
+
+#include <benchmark/benchmark.h>
+#include <sqlite3.h>
+
+#include <QCoreApplication>
+#include <QTemporaryDir>
+
+#include <memory>
+
+namespace {
+
+constexpr int kProjects = 50;
+constexpr int kTasks = 500;
+constexpr int kItems = 100000;
+
+// One store file of 100,000 items under 500 tasks in 50 projects, made once per run.
+class LargeStore {
+ public:
+  static LargeStore& instance() {
+    static LargeStore store;
+    return store;
+  }
+  QString path() const { return dir_.filePath(QStringLiteral("Tessal.sqlite")); }
+
+ private:
+  LargeStore() {
+    auto store = WTStore::open(path());
+    std::vector<WTStoreRecord> records;
+    records.reserve(kProjects + kTasks + kItems);
+    const char* kinds[] = {"WTTime", "WTTime", "WTTime", "WTFlat", "WTExpense", "WTNote", "WTToDo"};
+    const double start = 1700000000;
+    for (int p = 0; p < kProjects; ++p) {
+      WTStoreRecord project;
+      project.uuid = QStringLiteral("P%1@WTProject").arg(p);
+      project.entity = QStringLiteral("WTProject");
+      project.name = QStringLiteral("Project %1").arg(p);
+      if (p % 3 == 0) project.rate = Decimal::fromString(u"85.50");
+      records.push_back(project);
+    }
+    for (int t = 0; t < kTasks; ++t) {
+      WTStoreRecord task;
+      task.uuid = QStringLiteral("T%1@WTTask").arg(t);
+      task.entity = QStringLiteral("WTTask");
+      task.name = QStringLiteral("Task %1").arg(t);
+      task.projectUuid = QStringLiteral("P%1@WTProject").arg(t % kProjects);
+      task.position = t / kProjects;
+      records.push_back(task);
+    }
+    for (int i = 0; i < kItems; ++i) {
+      WTStoreRecord item;
+      const char* kind = kinds[i % 7];
+      item.uuid = QStringLiteral("I%1@%2").arg(i).arg(QLatin1String(kind));
+      item.entity = QLatin1String(kind);
+      item.name = QStringLiteral("Item number %1").arg(i);
+      item.taskUuid = QStringLiteral("T%1@WTTask").arg(i % kTasks);
+      item.startDate = Date::fromSeconds(start + i * 1800.0);
+      if (item.entity == QLatin1String("WTTime")) item.endDate = item.startDate->addingSeconds(60.0 * (i % 240));
+      if (item.entity == QLatin1String("WTFlat")) item.minutes = 15 + i % 100;
+      if (item.entity == QLatin1String("WTExpense")) item.expense = Decimal::fromString(u"12.30");
+      records.push_back(item);
+    }
+    store.value()->save(records, {});
+  }
+  QTemporaryDir dir_;
+};
+
+std::unique_ptr<WTObjectContext> openContext() {
+  auto context = std::make_unique<WTObjectContext>();
+  auto store = WTStore::open(LargeStore::instance().path());
+  if (!store || !context->attachStore(std::move(store.value()))) return nullptr;
+  return context;
+}
+
+void BM_PlainSqliteRead(benchmark::State& state) {
+  const QByteArray path = LargeStore::instance().path().toUtf8();
+  for (auto _ : state) {
+    sqlite3* db = nullptr;
+    sqlite3_open_v2(path.constData(), &db, SQLITE_OPEN_READONLY, nullptr);
+    sqlite3_stmt* statement = nullptr;
+    sqlite3_prepare_v2(db, "SELECT * FROM " "records", -1, &statement, nullptr);
+    std::int64_t bytes = 0;
+    while (sqlite3_step(statement) == SQLITE_ROW) {
+      const int columns = sqlite3_column_count(statement);
+      for (int c = 0; c < columns; ++c) {
+        if (sqlite3_column_type(statement, c) == SQLITE_TEXT) {
+          bytes += sqlite3_column_bytes(statement, c);
+          benchmark::DoNotOptimize(sqlite3_column_text(statement, c));
+        } else {
+          benchmark::DoNotOptimize(sqlite3_column_double(statement, c));
+        }
+      }
+    }
+    sqlite3_finalize(statement);
+    sqlite3_close(db);
+    benchmark::DoNotOptimize(bytes);
+  }
+}
+BENCHMARK(BM_PlainSqliteRead)->Unit(benchmark::kMillisecond);
+
+void BM_OpenStoreAndTotalEveryProject(benchmark::State& state) {
+  for (auto _ : state) {
+    auto context = openContext();
+    int minutes = 0;
+    Decimal money;
+    for (WTProject* project : context->fetch<WTProject>()) {
+      minutes += project->duration();
+      money += project->cost();
+    }
+    benchmark::DoNotOptimize(minutes);
+    benchmark::DoNotOptimize(money);
+  }
+}
+BENCHMARK(BM_OpenStoreAndTotalEveryProject)->Unit(benchmark::kMillisecond);
+
+void BM_SaveOneChangedItem(benchmark::State& state) {
+  auto context = openContext();
+  WTObject* item = context->objectWithUUID(QStringLiteral("I4242@WTTime"));
+  int round = 0;
+  for (auto _ : state) {
+    item->setName(QStringLiteral("renamed %1").arg(++round));
+    if (!context->save()) state.SkipWithError("save failed");
+  }
+}
+BENCHMARK(BM_SaveOneChangedItem)->Unit(benchmark::kMillisecond);
+
+void BM_GroupATaskOf5000Items(benchmark::State& state) {
+  WTObjectContext context;
+  auto* task = WTTask::insertNewObject(&context);
+  const char* kinds[] = {"WTTime", "WTNote", "WTToDo", "WTFlat", "WTExpense"};
+  for (int i = 0; i < 5000; ++i) {
+    auto* item = static_cast<WTItem*>(context.insertNewObject(*WTEntities::fromName(QLatin1String(kinds[i % 5]))));
+    item->setTask(task);
+    item->setStartDate(Date::fromSeconds(1700000000 + i * 2700.0));
+  }
+  context.processPendingChanges();
+  for (auto _ : state) {
+    task->updateChildren();
+    benchmark::DoNotOptimize(task->cachedChildren().size());
+  }
+}
+BENCHMARK(BM_GroupATaskOf5000Items)->Unit(benchmark::kMillisecond);
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  QCoreApplication app(argc, argv);
+  RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin"));
+  benchmark::Initialize(&argc, argv);
+  benchmark::RunSpecifiedBenchmarks();
+  benchmark::Shutdown();
+  return 0;
+}

@@ -1,0 +1,138 @@
+#include "ModelFixture.h"
+#include "WTCollections.h"
+#include "WTItemContainer.h"
+
+#include <QSignalSpy>
+
+class WTItemContainerTest : public ModelTest {};
+
+TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
+  WTTask* task = makeTask();
+  auto* olderOpen = makeItem<WTToDo>(task, berlin(2026, 4, 1, 9));
+  auto* newerOpen = makeItem<WTToDo>(task, berlin(2026, 4, 3, 9));
+  auto* done = makeItem<WTToDo>(task, berlin(2026, 4, 2, 16));
+  done->setCompleted(true);
+  WTTime* morning = makeTime(task, berlin(2026, 4, 2, 8), berlin(2026, 4, 2, 9));
+  WTTime* evening = makeTime(task, berlin(2026, 4, 2, 23, 59), berlin(2026, 4, 3, 0, 30));
+  WTTime* earlier = makeTime(task, berlin(2026, 3, 31, 0, 0), berlin(2026, 3, 31, 1));
+
+  const auto& children = task->children();
+  ASSERT_EQ(children.size(), 3u);
+  EXPECT_FALSE(children[0]->date().has_value());
+  EXPECT_EQ(children[0]->title(), "Pending");
+  EXPECT_EQ(children[0]->items(), (QList<WTItem*>{newerOpen, olderOpen}));
+  EXPECT_EQ(children[1]->date(), berlin(2026, 4, 2));
+  EXPECT_EQ(children[1]->items(), (QList<WTItem*>{evening, done, morning}));
+  EXPECT_EQ(children[2]->date(), berlin(2026, 3, 31));
+  EXPECT_EQ(children[2]->items(), QList<WTItem*>{earlier});
+  EXPECT_EQ(children[1]->duration(), 60 + 31);
+
+  EXPECT_EQ(task->itemContainerForItem(olderOpen), children[0]);
+  EXPECT_EQ(task->itemContainerForItem(done), children[1]);
+  auto* elsewhere = makeItem<WTNote>(task, berlin(2026, 1, 1));
+  EXPECT_EQ(task->itemContainerForItem(elsewhere), nullptr);  // not rebuilt yet
+
+  WTTask* empty = makeTask();
+  EXPECT_TRUE(empty->children().empty());
+}
+
+TEST_F(WTItemContainerTest, GroupsFollowTheLocalDayAcrossADaylightSavingChange) {
+  WTTask* task = makeTask();
+  // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
+  makeTime(task, berlin(2026, 3, 29, 0, 30), berlin(2026, 3, 29, 0, 45));
+  makeTime(task, berlin(2026, 3, 29, 23, 30), berlin(2026, 3, 29, 23, 45));
+  makeTime(task, berlin(2026, 3, 30, 0, 10), berlin(2026, 3, 30, 0, 20));
+  const auto& children = task->children();
+  ASSERT_EQ(children.size(), 2u);
+  EXPECT_EQ(children[1]->items().size(), 2);
+  EXPECT_EQ(children[1]->date(), berlin(2026, 3, 29));
+}
+
+TEST_F(WTItemContainerTest, IdentityFindsTheSameDayGroupAgainButNeverPending) {
+  WTTask* task = makeTask();
+  makeItem<WTToDo>(task, berlin(2026, 4, 1, 9));
+  makeItem<WTNote>(task, berlin(2026, 4, 2, 9));
+  const auto children = task->children();
+  ASSERT_EQ(children.size(), 2u);
+
+  const QVariantMap dayId = children[1]->uuid();
+  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId));
+  EXPECT_FALSE(WTItemContainer::isValidUUID(QStringLiteral("x")));
+  auto again = WTItemContainer::objectWithUUID(dayId, context.get());
+  ASSERT_NE(again, nullptr);
+  EXPECT_NE(again, children[1]);  // rebuilt
+  EXPECT_TRUE(again->isEqual(*children[1]));
+  EXPECT_EQ(WTItemContainer::objectWithUUID(children[0]->uuid(), context.get()), nullptr);
+  EXPECT_EQ(WTItemContainer::objectWithUUID(QVariantMap{{"date", QVariant::fromValue(berlin(2026, 4, 2))}},
+                                            context.get()),
+            nullptr);
+}
+
+TEST_F(WTItemContainerTest, AGroupRelaysItsRunningEntrysMinutes) {
+  WTTask* task = makeTask();
+  setNow(berlin(2026, 4, 2, 10, 0, 10));
+  WTTime* time = task->toggleTimer();
+  const auto children = task->children();
+  ASSERT_EQ(children.size(), 1u);
+  QSignalSpy spy(children[0].get(), &WTItemContainer::valueChanged);
+
+  EXPECT_TRUE(time->peek());  // first look
+  spy.clear();
+  clockNow = berlin(2026, 4, 2, 10, 0, 50);
+  EXPECT_FALSE(time->peek());
+  EXPECT_EQ(spy.count(), 0);
+  clockNow = berlin(2026, 4, 2, 10, 2, 0);
+  EXPECT_TRUE(time->peek());
+  QStringList keys;
+  for (const auto& args : spy) keys << args[0].toString();
+  EXPECT_TRUE(keys.contains("duration"));
+  EXPECT_TRUE(keys.contains("cost"));
+  EXPECT_EQ(children[0]->duration(), 2);
+}
+
+TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
+  WTTask* a = makeTask();
+  WTTask* b = makeTask();
+  makeTime(a, berlin(2026, 1, 15, 9), berlin(2026, 1, 15, 10));
+  auto* flat = makeItem<WTFlat>(b, berlin(2026, 1, 20, 9));
+  flat->setMinutes(30);
+  makeItem<WTExpense>(b, berlin(2026, 2, 1, 12))->setExpense(dec("3"));
+  makeItem<WTNote>(a, berlin(2026, 2, 3, 12));
+
+  const auto months = WTItemContainer::containersByKeyPath("startDate.beginOfMonth", QList<WTTask*>{a, b});
+  ASSERT_EQ(months.size(), 2u);
+  EXPECT_EQ(months[0]->items().size(), 1);  // February: the expense, not the note
+  EXPECT_EQ(months[1]->items().size(), 2);
+  EXPECT_EQ(months[1]->duration(), 90);
+  // A group's date is its last item's start, not the month start.
+  EXPECT_EQ(months[1]->date(), berlin(2026, 1, 15, 9));
+  EXPECT_EQ(months[1]->task(), a);
+  EXPECT_EQ(a->dailyItems().size(), 1u);
+}
+
+TEST(WTCollectionsTest, MovingAnElementReportsWhereItLanded) {
+  QList<int> list{0, 1, 2, 3, 4};
+  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 0, 3), 2);
+  EXPECT_EQ(list, (QList<int>{1, 2, 0, 3, 4}));
+  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 0, 0), 0);
+  EXPECT_EQ(list, (QList<int>{1, 2, 0, 3, 4}));
+  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 4, 1), 1);
+  EXPECT_EQ(list, (QList<int>{1, 4, 2, 0, 3}));
+}
+
+TEST(WTCollectionsTest, SplittingByKeyPath) {
+  QVariantList values;
+  for (auto [kind, n] : std::initializer_list<std::pair<const char*, int>>{{"b", 1}, {"a", 2}, {"b", 3}, {"c", 4}}) {
+    values.append(QVariantMap{{"kind", kind}, {"n", n}});
+  }
+  const auto groups = WTCollections::arrayBySplittingByKeyPath(values, "kind", {{"self", false, false}},
+                                                                {{"n", false, false}});
+  ASSERT_EQ(groups.size(), 3);
+  EXPECT_EQ(groups[0].size(), 1);
+  EXPECT_EQ(groups[1][0].toMap()["n"], 3);
+  EXPECT_EQ(groups[1][1].toMap()["n"], 1);
+  const auto maps = WTCollections::arrayBySplittingByKey(values, "kind", "items");
+  ASSERT_EQ(maps.size(), 3);
+  EXPECT_EQ(maps[0]["kind"], "b");  // first seen
+  EXPECT_EQ(maps[0]["items"].toList().size(), 2);
+}

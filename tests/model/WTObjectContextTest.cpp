@@ -1,0 +1,273 @@
+#include "ModelFixture.h"
+
+#include <QCoreApplication>
+#include <QSignalSpy>
+
+class WTObjectContextTest : public ModelTest {};
+
+TEST_F(WTObjectContextTest, IdentitiesNameTheirEntityAndFindTheirRecord) {
+  WTTask* task = makeTask();
+  auto* time = makeItem<WTTime>(task, berlin(2026, 1, 1, 9));
+  EXPECT_TRUE(time->uuid().endsWith(QStringLiteral("@WTTime")));
+  EXPECT_TRUE(task->uuid().endsWith(QStringLiteral("@WTTask")));
+  EXPECT_NE(time->uuid(), task->uuid());
+  EXPECT_EQ(WTTime::objectWithUUID(time->uuid(), context.get()), time);
+  EXPECT_EQ(context->objectWithUUID(time->uuid()), time);
+  // The class operation answers only its own entity.
+  EXPECT_EQ(WTTask::objectWithUUID(time->uuid(), context.get()), nullptr);
+}
+
+TEST_F(WTObjectContextTest, ObjectWithUUIDForceInsertMakesARecordOfTheNamedEntity) {
+  const qsizetype before = context->count();
+  EXPECT_EQ(context->objectWithUUID(QVariant(42), true), nullptr);
+  EXPECT_EQ(context->objectWithUUID(QVariant(), true), nullptr);
+  EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTNothing"), true), nullptr);
+  EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTItem"), true), nullptr);  // abstract
+  EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTFlat"), false), nullptr);
+  EXPECT_EQ(context->count(), before);
+
+  WTObject* made = context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true);
+  ASSERT_NE(made, nullptr);
+  EXPECT_EQ(made->entity(), WTEntity::Flat);
+  EXPECT_EQ(made->uuid(), QStringLiteral("X-1@Y@WTFlat"));
+  EXPECT_EQ(context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true), made);
+  saveAndReopen();
+  EXPECT_NE(context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat")), nullptr);
+}
+
+TEST_F(WTObjectContextTest, FetchingByEntityName) {
+  WTTask* task = makeTask();
+  makeItem<WTNote>(task, berlin(2026, 1, 1));
+  makeItem<WTToDo>(task, berlin(2026, 1, 2));
+  auto* b = WTProject::insertNewObject(context.get());
+  auto* a = WTProject::insertNewObject(context.get());
+  a->setName("alpha");
+  b->setName("Beta");
+
+  EXPECT_FALSE(context->fetchObjectsForEntityName("WTInvoice").has_value());
+  EXPECT_EQ(context->fetchObjectsForEntityName("WTItem")->size(), 2);
+  EXPECT_EQ(context->fetchObjectsForEntityName("WTObject")->size(), 5);
+  const auto sorted = context->fetchObjectsForEntityName("WTProject", {{"name", false, true}});
+  ASSERT_EQ(sorted->size(), 2);
+  EXPECT_EQ(sorted->at(0), b);
+  const auto filtered =
+      context->fetchObjectsForEntityName("WTProject", {}, [](const WTObject* o) { return o->name() == "alpha"; });
+  EXPECT_EQ(filtered->size(), 1);
+  EXPECT_EQ(WTProject::fetchByPredicate({}, context.get()).size(), 2);
+}
+
+TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setName("P");
+  WTTask* task = makeTask(project, "first");
+  task->setName("renamed before saving");
+  ASSERT_TRUE(context->save().ok());
+
+  auto calls = journal.callsFor(task->uuid());
+  ASSERT_EQ(calls.size(), 1u);
+  EXPECT_EQ(calls[0].kind, "insert");
+  EXPECT_EQ(calls[0].values.value("name").toString(), "renamed before saving");
+  EXPECT_EQ(KeyPath::objectFromVariant(calls[0].values.value("project")), project);
+  EXPECT_TRUE(calls[0].values.contains("uuid"));
+  // The project's ordered tasks travel as an ordered relationship.
+  auto projectCalls = journal.callsFor(project->uuid());
+  ASSERT_EQ(projectCalls.size(), 1u);
+  const auto tasks = projectCalls[0].values.value("tasks").value<WTOrderedRelationship>();
+  EXPECT_EQ(tasks.objects, QList<WTObject*>{task});
+
+  journal.calls.clear();
+  task->setBudget(dec("500"));
+  ASSERT_TRUE(context->save().ok());
+  calls = journal.callsFor(task->uuid());
+  ASSERT_EQ(calls.size(), 1u);
+  EXPECT_EQ(calls[0].kind, "update");
+  EXPECT_EQ(calls[0].values.keys(), QStringList{"budget"});
+
+  journal.calls.clear();
+  const QString uuid = task->uuid();
+  context->deleteObject(task);
+  ASSERT_TRUE(context->save().ok());
+  calls = journal.callsFor(uuid);
+  ASSERT_EQ(calls.size(), 1u);
+  EXPECT_EQ(calls[0].kind, "delete");
+
+  // A record made and removed between two saves leaves no trace.
+  journal.calls.clear();
+  WTTask* fleeting = makeTask();
+  const QString fleetingUuid = fleeting->uuid();
+  context->deleteObject(fleeting);
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_TRUE(journal.callsFor(fleetingUuid).empty());
+}
+
+TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setName("Client Ü");
+  client->setAddressBookUID("ab:1");
+  client->setTotalsUID("tot");
+  client->setRate(dec("120.00"));
+  client->setColor(QColor(10, 20, 30, 40));
+  client->setArchived(true);
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setClient(client);
+  WTTask* first = makeTask(project, "first");
+  WTTask* second = makeTask(project, "second");
+  WTTask* third = makeTask(project, "third");
+  project->moveTask(third, 0);
+  second->setBudget(dec("1000.50"));
+  second->setNotes("notes\nwith lines");
+  const Date start = Date::fromSeconds(1767000000.25);
+  WTTime* time = makeTime(first, start, start.addingSeconds(3600));
+  auto* flat = makeItem<WTFlat>(first, start);
+  flat->setMinutes(45);
+  auto* expense = makeItem<WTExpense>(second, start);
+  expense->setExpense(dec("12.30"));
+  auto* todo = makeItem<WTToDo>(third, start);
+  todo->setCompleted(true);
+  auto* running = third->toggleTimer();
+  const QString timeId = time->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(), todoId = todo->uuid(),
+                runningId = running->uuid(), clientId = client->uuid(), projectId = project->uuid();
+
+  saveAndReopen();
+  auto* c = WTClient::objectWithUUID(clientId, context.get());
+  ASSERT_NE(c, nullptr);
+  EXPECT_EQ(c->name(), "Client Ü");
+  EXPECT_EQ(c->addressBookUID(), "ab:1");
+  EXPECT_EQ(c->totalsUID(), "tot");
+  EXPECT_TRUE(c->storedRate()->isIdenticalTo(dec("120.00")));
+  EXPECT_EQ(c->color(), QColor(10, 20, 30, 40));
+  EXPECT_TRUE(c->archived());
+  auto* p = WTProject::objectWithUUID(projectId, context.get());
+  ASSERT_EQ(c->projects(), QList<WTProject*>{p});
+  QStringList names;
+  for (WTTask* task : p->tasks()) names << task->name();
+  EXPECT_EQ(names, QStringList({"third", "first", "second"}));
+  EXPECT_TRUE(p->tasks()[2]->budget()->isIdenticalTo(dec("1000.50")));
+  EXPECT_EQ(p->tasks()[2]->notes(), "notes\nwith lines");
+  auto* t = WTTime::objectWithUUID(timeId, context.get());
+  EXPECT_EQ(*t->startDate(), start);
+  EXPECT_EQ(*t->endDate(), start.addingSeconds(3600));
+  EXPECT_EQ(t->task(), p->tasks()[1]);
+  EXPECT_EQ(*WTFlat::objectWithUUID(flatId, context.get())->minutes(), 45);
+  EXPECT_TRUE(WTExpense::objectWithUUID(expenseId, context.get())->expense()->isIdenticalTo(dec("12.30")));
+  EXPECT_TRUE(WTToDo::objectWithUUID(todoId, context.get())->completed());
+  auto* r = WTTime::objectWithUUID(runningId, context.get());
+  EXPECT_TRUE(r->running());
+  EXPECT_FALSE(r->endDate().has_value());
+  EXPECT_TRUE(p->tasks()[0]->running());
+  EXPECT_FALSE(context->hasChanges());
+}
+
+TEST_F(WTObjectContextTest, DeletingCascadesDownButNotFromClients) {
+  auto* client = WTClient::insertNewObject(context.get());
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setClient(client);
+  WTTask* task = makeTask(project);
+  makeItem<WTNote>(task, berlin(2026, 1, 1));
+  makeItem<WTNote>(task, berlin(2026, 1, 2));
+  ASSERT_TRUE(context->save().ok());
+
+  context->deleteObject(client);
+  EXPECT_EQ(project->client(), nullptr);
+  EXPECT_EQ(context->fetch<WTProject>().size(), 1);
+  context->deleteObject(project);
+  EXPECT_TRUE(context->fetch<WTTask>().isEmpty());
+  EXPECT_TRUE(context->fetchObjectsForEntityName("WTItem")->isEmpty());
+  saveAndReopen();
+  EXPECT_EQ(context->count(), 0);
+}
+
+TEST_F(WTObjectContextTest, UndoTakesBackOneEventLoopTurnAtATime) {
+  WTTask* task = makeTask(nullptr, "before");
+  context->processPendingChanges();
+
+  task->setName("after");
+  task->setRate(dec("90"));
+  QCoreApplication::processEvents();  // the turn ends
+  task->setBudget(dec("5"));
+  context->processPendingChanges();
+
+  context->undoManager().undo();
+  EXPECT_FALSE(task->budget().has_value());
+  EXPECT_EQ(task->name(), "after");
+  context->undoManager().undo();
+  EXPECT_EQ(task->name(), "before");
+  EXPECT_FALSE(task->storedRate().has_value());
+  context->undoManager().redo();
+  EXPECT_EQ(task->name(), "after");
+  EXPECT_EQ(task->inheritedRate(), dec("90"));
+
+  // A new change forgets what could be redone.
+  context->processPendingChanges();
+  task->setNotes("n");
+  EXPECT_FALSE(context->undoManager().canRedo());
+}
+
+TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
+  auto* project = WTProject::insertNewObject(context.get());
+  WTTask* task = makeTask(project);
+  task->setRate(dec("60"));
+  const Date start = berlin(2026, 6, 1, 9);
+  makeTime(task, start, start.addingSeconds(1800));
+  makeTime(task, start, start.addingSeconds(600));
+  ASSERT_TRUE(context->save().ok());
+  context->processPendingChanges();
+
+  context->deleteObject(task);
+  context->processPendingChanges();
+  EXPECT_EQ(project->duration(), 0);
+  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+
+  context->undoManager().undo();
+  EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
+  EXPECT_EQ(project->duration(), 40);
+  EXPECT_EQ(project->cost(), dec("40"));
+  EXPECT_EQ(context->fetch<WTTime>().size(), 2);
+  EXPECT_EQ(context->objectWithUUID(task->uuid()), task);
+
+  // The undone delete must not reach the file or the journal.
+  journal.calls.clear();
+  saveAndReopen();
+  EXPECT_EQ(context->fetch<WTTime>().size(), 2);
+  for (const auto& call : journal.calls) EXPECT_NE(call.kind, "delete");
+}
+
+TEST_F(WTObjectContextTest, UndoingAnInsertForgetsTheRecord) {
+  context->processPendingChanges();
+  auto* project = WTProject::insertNewObject(context.get());
+  makeTask(project);
+  context->processPendingChanges();
+  context->undoManager().undo();
+  EXPECT_EQ(context->count(), 0);
+  EXPECT_FALSE(context->hasChanges());
+  context->undoManager().redo();
+  EXPECT_EQ(context->fetch<WTTask>().size(), 1);
+  EXPECT_EQ(context->fetch<WTTask>()[0]->project(), project);
+}
+
+TEST_F(WTObjectContextTest, ChangesAreAnnouncedOncePerTurn) {
+  QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
+  WTTask* task = makeTask();
+  task->setName("a");
+  task->setName("b");
+  QCoreApplication::processEvents();
+  ASSERT_EQ(spy.count(), 1);
+  EXPECT_EQ(spy[0][0].value<QList<WTObject*>>(), QList<WTObject*>{task});
+  QCoreApplication::processEvents();
+  EXPECT_EQ(spy.count(), 1);
+}
+
+TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
+  WTTask* task = makeTask();
+  auto* expense = makeItem<WTExpense>(task, berlin(2026, 1, 1));
+  EXPECT_TRUE(expense->setValue("expense", QStringLiteral("7.10")));
+  EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")));
+  EXPECT_FALSE(expense->setValue("expense", QStringLiteral("seven")));
+  EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")));
+  EXPECT_FALSE(expense->setValue("cost", 3));
+  EXPECT_FALSE(expense->setValue("task", QStringLiteral("not a record")));
+  EXPECT_EQ(expense->task(), task);
+  EXPECT_TRUE(expense->setValue("task", QVariant()));
+  EXPECT_EQ(expense->task(), nullptr);
+  EXPECT_TRUE(task->items().isEmpty());
+}
