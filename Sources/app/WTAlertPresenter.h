@@ -1,0 +1,13 @@
+#pragma once
+
+#include <QString>
+
+// How the delegate speaks to the user: the desktop shows dialogs, tests record what was said.
+class WTAlertPresenter {
+ public:
+  virtual ~WTAlertPresenter() = default;
+  // Shows an error; returns true when the user dealt with it (a recovery was chosen).
+  virtual bool presentError(const QString& message) = 0;
+  // Asks "Could not save changes while quitting. Quit anyway?"; true for "Quit anyway".
+  virtual bool confirmQuitAnyway() = 0;
+};

@@ -1,0 +1,97 @@
+#include "WTAppDelegate.h"
+
+#include "UserDefaults.h"
+#include "WTAlertPresenter.h"
+#include "WTObject.h"
+#include "WTObjectContext.h"
+#include "WTStore.h"
+
+#include <QDir>
+#include <QFileInfo>
+#include <QStandardPaths>
+#include <QTimer>
+#include <QtDebug>
+
+WTAppDelegate::WTAppDelegate(UserDefaults* defaults, WTAlertPresenter* presenter, QObject* parent)
+    : QObject(parent), defaults_(defaults), presenter_(presenter) {}
+
+WTAppDelegate::~WTAppDelegate() {
+  if (WTObjectContext::defaultContext() == context_.get()) WTObjectContext::setDefaultContext(nullptr);
+}
+
+QString WTAppDelegate::applicationSupportFolder() {
+  QString base = QStandardPaths::writableLocation(QStandardPaths::GenericDataLocation);
+  if (base.isEmpty()) base = QDir::tempPath();
+  return base + QStringLiteral("/Tessal2");
+}
+
+QString WTAppDelegate::storePath() const { return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite"); }
+
+QString WTAppDelegate::syncJournalPath() const {
+  const QFileInfo store(storePath());
+  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+}
+
+WTObjectContext* WTAppDelegate::managedObjectContext() {
+  if (context_) return context_.get();
+  const QString folder = applicationSupportFolder();
+  if (!QFileInfo::exists(folder)) QDir().mkpath(folder);
+
+  context_ = std::make_unique<WTObjectContext>(defaults_);
+  WTObjectContext::setDefaultContext(context_.get());
+  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath());
+  if (store) {
+    Result<void> loaded = context_->attachStore(std::move(store.value()));
+    if (!loaded) presenter_->presentError(loaded.error().message);
+  } else {
+    presenter_->presentError(store.error().message);
+  }
+  connect(context_.get(), &WTObjectContext::objectsDidChange, this,
+          &WTAppDelegate::managedObjectContextObjectsDidChange);
+  // The sync manager joins here once it exists, with syncJournalPath().
+  return context_.get();
+}
+
+void WTAppDelegate::managedObjectContextObjectsDidChange() {
+  // One save per notice, not merged: a save that finds nothing to do does nothing.
+  QTimer::singleShot(500, this, &WTAppDelegate::saveAction);
+}
+
+void WTAppDelegate::saveAction() {
+  if (!context_ || !context_->hasChanges()) return;
+  const Result<void> saved = context_->save();
+  if (!saved && context_->hasStore()) presenter_->presentError(saved.error().message);
+  qInfo("Saved");
+}
+
+std::function<bool(const WTObject*)> WTAppDelegate::archivedPredicate() const {
+  if (displayArchived_) return [](const WTObject*) { return true; };
+  return [](const WTObject* object) { return !object->archived(); };
+}
+
+void WTAppDelegate::toggleArchived() {
+  displayArchived_ = !displayArchived_;
+  emit archivedPredicateChanged();
+}
+
+QString WTAppDelegate::syncNetworkRequestsUser() const {
+  return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncUser")) : QString();
+}
+
+QString WTAppDelegate::syncNetworkRequestsPassword() const {
+  return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncPassword")) : QString();
+}
+
+WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
+  if (!context_) return TerminateReply::TerminateNow;
+  if (commitEditing_ && !commitEditing_()) return TerminateReply::TerminateCancel;
+  if (!context_->hasChanges()) return TerminateReply::TerminateNow;
+  const Result<void> saved = context_->save();
+  if (saved) return TerminateReply::TerminateNow;
+  if (presenter_->presentError(saved.error().message)) return TerminateReply::TerminateCancel;
+  return presenter_->confirmQuitAnyway() ? TerminateReply::TerminateNow : TerminateReply::TerminateCancel;
+}
+
+void WTAppDelegate::applicationWillTerminate() {
+  // Switches the sync off once there is one.
+}

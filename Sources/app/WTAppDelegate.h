@@ -1,0 +1,69 @@
+#pragma once
+
+#include "Result.h"
+
+#include <QObject>
+#include <QString>
+
+#include <functional>
+#include <memory>
+
+class UserDefaults;
+class WTAlertPresenter;
+class WTObject;
+class WTObjectContext;
+
+// Owns the one object context and its store file, saves half a second after every change, and decides
+// what happens when the application quits. The context, the store and (later) the sync are made on the
+// first call of managedObjectContext(), not at launch.
+class WTAppDelegate : public QObject {
+  Q_OBJECT
+ public:
+  // Neither is owned; both must outlive the delegate.
+  WTAppDelegate(UserDefaults* defaults, WTAlertPresenter* presenter, QObject* parent = nullptr);
+  ~WTAppDelegate() override;
+
+  // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
+  static QString applicationSupportFolder();
+  QString storePath() const;
+  // The store's path with the extension "sync": where the change journal lives.
+  QString syncJournalPath() const;
+
+  // The context, made with the store on first use. A store that cannot be opened is reported once;
+  // the context then works without one, finds nothing and cannot save, and the file is left untouched.
+  WTObjectContext* managedObjectContext();
+  bool hasContext() const { return context_ != nullptr; }
+
+  // Saves when there are changes; a failure is shown (unless there is no store at all, which was
+  // reported when opening) and the changes stay for the next attempt. Logs "Saved" either way.
+  void saveAction();
+
+  // Whether archived clients and projects are listed, and the filter that says so.
+  bool displayArchived() const { return displayArchived_; }
+  std::function<bool(const WTObject*)> archivedPredicate() const;
+  void toggleArchived();
+
+  // Credentials for the sync client.
+  QString syncNetworkRequestsUser() const;
+  QString syncNetworkRequestsPassword() const;
+
+  enum class TerminateReply { TerminateNow, TerminateCancel };
+  // Commits editing, saves, and on a failed save asks whether to quit anyway.
+  TerminateReply applicationShouldTerminate();
+  void applicationWillTerminate();
+
+  // Runs before quitting and before each safe save, to commit an edit in progress; false refuses.
+  void setCommitEditingHandler(std::function<bool()> handler) { commitEditing_ = std::move(handler); }
+
+ signals:
+  void archivedPredicateChanged();
+
+ private:
+  void managedObjectContextObjectsDidChange();
+
+  UserDefaults* defaults_;
+  WTAlertPresenter* presenter_;
+  std::unique_ptr<WTObjectContext> context_;
+  std::function<bool()> commitEditing_;
+  bool displayArchived_ = false;
+};

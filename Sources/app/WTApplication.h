@@ -1,0 +1,38 @@
+#pragma once
+
+#include <QApplication>
+
+#include <memory>
+
+class QMainWindow;
+class UserDefaults;
+class WTAppDelegate;
+class WTDialogAlertPresenter;
+class WTMainWindowController;
+
+// The application object: registers the defaults of the user's settings, owns the delegate and the
+// main window, and routes quitting through the delegate so that nothing unsaved is lost.
+class WTApplication : public QApplication {
+  Q_OBJECT
+ public:
+  WTApplication(int& argc, char** argv);
+  ~WTApplication() override;
+
+  // Registers the defaults that stand for keys the user never set.
+  static void registerDefaults(UserDefaults& defaults);
+
+  UserDefaults& userDefaults() { return *defaults_; }
+  WTAppDelegate& delegate() { return *delegate_; }
+  // Made and shown on first call.
+  WTMainWindowController* mainWindowController();
+  QMainWindow* mainWindow();
+
+  // Launch: brings the main window forward, which opens the store through the delegate.
+  void applicationDidFinishLaunching();
+
+ private:
+  std::unique_ptr<UserDefaults> defaults_;
+  std::unique_ptr<WTDialogAlertPresenter> presenter_;
+  std::unique_ptr<WTAppDelegate> delegate_;
+  std::unique_ptr<WTMainWindowController> mainWindowController_;
+};

@@ -1,0 +1,23 @@
+#include "WTDialogAlertPresenter.h"
+
+#include <QCoreApplication>
+#include <QMessageBox>
+#include <QPushButton>
+
+bool WTDialogAlertPresenter::presentError(const QString& message) {
+  QMessageBox box(QMessageBox::Warning, QCoreApplication::applicationName(), message, QMessageBox::Ok, parent_);
+  box.exec();
+  return false;
+}
+
+bool WTDialogAlertPresenter::confirmQuitAnyway() {
+  QMessageBox box(parent_);
+  box.setIcon(QMessageBox::Warning);
+  box.setText(QCoreApplication::translate("WTAppDelegate", "Could not save changes while quitting. Quit anyway?"));
+  QPushButton* quit = box.addButton(QCoreApplication::translate("WTAppDelegate", "Quit anyway"), QMessageBox::AcceptRole);
+  QPushButton* cancel = box.addButton(QCoreApplication::translate("WTAppDelegate", "Cancel"), QMessageBox::RejectRole);
+  box.setDefaultButton(quit);
+  box.setEscapeButton(cancel);
+  box.exec();
+  return box.clickedButton() != cancel;
+}

@@ -1,0 +1,159 @@
+#include "UserDefaults.h"
+#include "WTAlertPresenter.h"
+#include "WTAppDelegate.h"
+#include "WTApplication.h"
+#include "WTClient.h"
+#include "WTMainWindowController.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <gtest/gtest.h>
+
+#include <QDir>
+#include <QFile>
+#include <QTemporaryDir>
+#include <QTest>
+#include <QTreeWidget>
+
+namespace {
+
+class RecordingPresenter final : public WTAlertPresenter {
+ public:
+  bool presentError(const QString& message) override {
+    errors << message;
+    return false;
+  }
+  bool confirmQuitAnyway() override {
+    ++questions;
+    return quitAnyway;
+  }
+  QStringList errors;
+  int questions = 0;
+  bool quitAnyway = false;
+};
+
+// Each test gets its own data and settings folders.
+class WTAppDelegateTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_TRUE(home.isValid());
+    previousData = qgetenv("XDG_DATA_HOME");
+    qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
+    defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
+    WTApplication::registerDefaults(*defaults);
+  }
+  void TearDown() override { qputenv("XDG_DATA_HOME", previousData); }
+
+  std::unique_ptr<WTAppDelegate> makeDelegate() {
+    return std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
+  }
+
+  QTemporaryDir home;
+  QByteArray previousData;
+  std::unique_ptr<UserDefaults> defaults;
+  RecordingPresenter presenter;
+};
+
+}  // namespace
+
+TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
+  {
+    auto delegate = makeDelegate();
+    EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
+    EXPECT_TRUE(delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
+    EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
+    WTMainWindowController window(*delegate);
+    EXPECT_TRUE(QFile::exists(delegate->storePath()));
+    const QList<WTProject*> projects = window.fetchProjects();
+    ASSERT_EQ(projects.size(), 1);
+    EXPECT_EQ(projects[0]->name(), "Default Project");
+    ASSERT_EQ(projects[0]->tasks().size(), 1);
+    EXPECT_EQ(projects[0]->tasks()[0]->name(), "Default Task");
+
+    QTreeWidgetItem* row = window.projectsList()->topLevelItem(0);
+    ASSERT_NE(row, nullptr);
+    EXPECT_EQ(row->text(0), "Default Project");
+    EXPECT_EQ(row->text(1), "00:00");
+    ASSERT_EQ(row->childCount(), 1);
+    EXPECT_EQ(row->child(0)->text(0), "Default Task");
+
+    EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
+    EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
+  }
+  auto delegate = makeDelegate();
+  WTMainWindowController window(*delegate);
+  EXPECT_EQ(window.fetchProjects().size(), 1);  // not filled a second time
+  EXPECT_TRUE(presenter.errors.isEmpty());
+}
+
+TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
+  const QString folder = WTAppDelegate::applicationSupportFolder();
+  ASSERT_TRUE(QDir().mkpath(folder));
+  const QByteArray garbage = "these are somebody's notes, not a data file\n";
+  {
+    QFile file(folder + "/Tessal.sqlite");
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+    file.write(garbage);
+  }
+  auto delegate = makeDelegate();
+  WTMainWindowController window(*delegate);
+  ASSERT_EQ(presenter.errors.size(), 1);
+  EXPECT_TRUE(presenter.errors[0].contains(folder + "/Tessal.sqlite")) << presenter.errors[0].toStdString();
+  WTObjectContext* context = delegate->managedObjectContext();
+  EXPECT_FALSE(context->hasStore());
+  EXPECT_TRUE(window.fetchProjects().isEmpty());  // and nothing was made up in its place
+
+  // The user carries on; saving cannot work, and says so only when quitting.
+  WTClient::insertNewObject(context)->setName("typed anyway");
+  delegate->saveAction();
+  EXPECT_EQ(presenter.errors.size(), 1);
+  presenter.quitAnyway = false;
+  EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateCancel);
+  EXPECT_EQ(presenter.questions, 1);
+  EXPECT_TRUE(context->hasChanges());  // still in memory
+  presenter.quitAnyway = true;
+  EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
+
+  QFile file(folder + "/Tessal.sqlite");
+  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
+  EXPECT_EQ(file.readAll(), garbage);
+  EXPECT_FALSE(QFile::exists(folder + "/Tessal.sqlite-wal"));
+}
+
+TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  auto* project = WTProject::insertNewObject(context);
+  project->setName("autosaved");
+  EXPECT_TRUE(context->hasChanges());
+  EXPECT_TRUE(QTest::qWaitFor([&] { return !context->hasChanges(); }, 5000));
+
+  auto other = std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
+  delegate.reset();
+  ASSERT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(), 1);
+}
+
+TEST_F(WTAppDelegateTest, ArchivedRecordsAreHiddenUntilShown) {
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  auto* archived = WTClient::insertNewObject(context);
+  archived->setArchived(true);
+  auto* active = WTClient::insertNewObject(context);
+  auto visible = [&] { return WTClient::fetchByPredicate(delegate->archivedPredicate(), context); };
+  EXPECT_EQ(visible(), QList<WTClient*>{active});
+  int announced = 0;
+  QObject::connect(delegate.get(), &WTAppDelegate::archivedPredicateChanged, [&] { ++announced; });
+  delegate->toggleArchived();
+  EXPECT_EQ(announced, 1);
+  EXPECT_EQ(visible().size(), 2);
+}
+
+TEST_F(WTAppDelegateTest, RegisteredDefaultsGiveWayToStoredValues) {
+  EXPECT_EQ(defaults->stringForKey("wtInvoiceUnit"), "h");
+  EXPECT_EQ(defaults->integerForKey("WTIdleTime"), 5);
+  defaults->setValue("WTIdleTime", 10);
+  EXPECT_EQ(defaults->integerForKey("WTIdleTime"), 10);
+  defaults->setValue("WTSyncUser", "me@example.org");
+  EXPECT_EQ(makeDelegate()->syncNetworkRequestsUser(), "me@example.org");
+}
