@@ -32,6 +32,14 @@ WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget*
   file->addSeparator();
   file->addAction(tr("&Quit"), QKeySequence::Quit, this, &QWidget::close);
 
+  QMenu* edit = menuBar()->addMenu(tr("&Edit"));
+  edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
+    delegate_.managedObjectContext()->undoManager().undo();
+  });
+  edit->addAction(tr("&Redo"), QKeySequence::Redo, [this] {
+    delegate_.managedObjectContext()->undoManager().redo();
+  });
+
   // Many changes in one turn refill the list once.
   reload_.setSingleShot(true);
   reload_.setInterval(0);
