@@ -12,6 +12,9 @@
 // Every arithmetic result is rounded to 38 significant digits, half away from zero. The exponent is kept
 // as written ("12.30" stays 12.30, with two places), following the General Decimal Arithmetic rules for
 // the exponent of sums, products and quotients. Money is never held as binary floating point.
+// Exponents stay within the default context of those rules (adjusted exponent -999999 to 999999): tinier
+// results lose digits as subnormals down to zero, larger ones saturate at the largest finite value with
+// their sign (+-9.99...9E+999999), and text beyond that range is rejected.
 class Decimal {
  public:
   static constexpr int kPrecision = 38;
@@ -27,7 +30,8 @@ class Decimal {
   // Decimal, integers, booleans, doubles and numeric strings; none for anything else (and for null).
   static std::optional<Decimal> fromVariant(const QVariant& value);
 
-  // Plain text with no exponent: "12.30", "-0.5", "1200". Never scientific notation.
+  // Plain text with no exponent: "12.30", "-0.5", "1200". Never scientific notation; zero has no sign
+  // ("0.00", even for a negative zero).
   QString toString() const;
   double toDouble() const;
   // Truncated toward zero; saturates at the int64 limits.
@@ -54,9 +58,16 @@ class Decimal {
   bool isIdenticalTo(const Decimal& other) const;
 
  private:
+  Decimal(unsigned __int128 coefficient, int exponent, bool negative)
+      : coefficient_(coefficient), exponent_(exponent), negative_(negative) {}
+
   unsigned __int128 coefficient_ = 0;
   int exponent_ = 0;
   bool negative_ = false;
 };
+
+class QDebug;
+// Writes "Decimal(12.30)".
+QDebug operator<<(QDebug debug, const Decimal& value);
 
 Q_DECLARE_METATYPE(Decimal)

@@ -37,6 +37,10 @@ WTObjectContext::~WTObjectContext() {
   if (gDefaultContext == this) gDefaultContext = nullptr;
   // Undo actions capture records; drop them before the records go.
   undo_.removeAllActions();
+  // Records go first, while the observer tables they may still unregister from are alive.
+  for (auto& list : objects_) list.clear();
+  byUuid_.clear();
+  owned_.clear();
   observers_.clear();
 }
 
