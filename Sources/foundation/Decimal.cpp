@@ -1,0 +1,658 @@
+#include "Decimal.h"
+
+#include <QByteArray>
+#include <QDebug>
+
+#include <algorithm>
+#include <array>
+#include <bit>
+#include <charconv>
+#include <cmath>
+#include <limits>
+#include <type_traits>
+
+namespace {
+
+using u128 = unsigned __int128;
+using u64 = std::uint64_t;
+using u32 = std::uint32_t;
+
+constexpr int kPrec = Decimal::kPrecision;
+// The default exponent range of the General Decimal Arithmetic context (and of Python's decimal).
+constexpr int kEmax = 999999;
+constexpr int kEmin = -999999;
+constexpr int kEtiny = kEmin - kPrec + 1;  // exponent of the smallest subnormal
+constexpr int kEtop = kEmax - kPrec + 1;   // largest exponent of a full-length coefficient
+
+constexpr std::array<u128, kPrec + 1> kPow10 = [] {
+  std::array<u128, kPrec + 1> table{};
+  table[0] = 1;
+  for (std::size_t i = 1; i < table.size(); ++i) table[i] = table[i - 1] * 10;
+  return table;
+}();
+constexpr u128 kCoefficientLimit = kPow10[kPrec];  // first value with too many digits
+
+// (high * 2^64 + low) / divisor, for high < divisor so that the quotient fits one word.
+constexpr u64 divideWord(u64 high, u64 low, u64 divisor, u64& remainder) {
+#if defined(__x86_64__)
+  if (!std::is_constant_evaluated()) {
+    u64 quotient;
+    asm("divq %[d]" : "=a"(quotient), "=d"(remainder) : [d] "rm"(divisor), "a"(low), "d"(high));
+    return quotient;
+  }
+#endif
+  const u128 current = (u128(high) << 64) | low;
+  const u64 quotient = u64(current / divisor);
+  remainder = u64(current - u128(quotient) * divisor);
+  return quotient;
+}
+
+// Unsigned 256-bit integer, just wide enough for every exact intermediate: a product of two 38-digit
+// coefficients (76 digits), a dividend widened to 77 digits and an aligned sum of at most 77 digits
+// (10^77 < 2^256).
+struct U256 {
+  u64 w[4] = {0, 0, 0, 0};  // least significant word first
+
+  static constexpr U256 from(u128 v) {
+    U256 r;
+    r.w[0] = u64(v);
+    r.w[1] = u64(v >> 64);
+    return r;
+  }
+
+  static constexpr U256 product(u128 a, u128 b) {
+    const u64 a0 = u64(a), a1 = u64(a >> 64), b0 = u64(b), b1 = u64(b >> 64);
+    if (a1 == 0 && b1 == 0) return from(u128(a0) * b0);
+    const u128 p00 = u128(a0) * b0, p01 = u128(a0) * b1, p10 = u128(a1) * b0, p11 = u128(a1) * b1;
+    const u128 middle = (p00 >> 64) + u64(p01) + u64(p10);
+    const u128 high = (middle >> 64) + (p01 >> 64) + (p10 >> 64) + p11;
+    U256 r;
+    r.w[0] = u64(p00);
+    r.w[1] = u64(middle);
+    r.w[2] = u64(high);
+    r.w[3] = u64(high >> 64);
+    return r;
+  }
+
+  constexpr bool isZero() const { return (w[0] | w[1] | w[2] | w[3]) == 0; }
+  constexpr bool fitsU128() const { return (w[2] | w[3]) == 0; }
+  constexpr u128 low() const { return (u128(w[1]) << 64) | w[0]; }
+
+  constexpr int bitLength() const {
+    for (int i = 3; i >= 0; --i)
+      if (w[i] != 0) return 64 * i + 64 - std::countl_zero(w[i]);
+    return 0;
+  }
+
+  constexpr int compare(const U256& other) const {
+    for (int i = 3; i >= 0; --i)
+      if (w[i] != other.w[i]) return w[i] < other.w[i] ? -1 : 1;
+    return 0;
+  }
+
+  constexpr void add(const U256& other) {
+    u128 carry = 0;
+    for (int i = 0; i < 4; ++i) {
+      const u128 t = u128(w[i]) + other.w[i] + carry;
+      w[i] = u64(t);
+      carry = t >> 64;
+    }
+  }
+
+  // Requires other <= *this.
+  constexpr void subtract(const U256& other) {
+    u64 borrow = 0;
+    for (int i = 0; i < 4; ++i) {
+      const u64 t = w[i] - other.w[i] - borrow;
+      borrow = (w[i] < other.w[i] || (w[i] == other.w[i] && borrow)) ? 1 : 0;
+      w[i] = t;
+    }
+  }
+
+  // The callers' digit bounds keep the product below 2^256.
+  constexpr void multiplySmall(u64 factor) {
+    u128 carry = 0;
+    for (int i = 0; i < 4; ++i) {
+      const u128 t = u128(w[i]) * factor + carry;
+      w[i] = u64(t);
+      carry = t >> 64;
+    }
+  }
+
+  // Quotient in place; returns the remainder. divisor != 0.
+  constexpr u64 divideSmall(u64 divisor) {
+    u64 remainder = 0;
+    for (int i = 3; i >= 0; --i) {
+      if (remainder == 0 && w[i] < divisor) {  // leading words: nothing to divide yet
+        remainder = w[i];
+        w[i] = 0;
+        continue;
+      }
+      w[i] = divideWord(remainder, w[i], divisor, remainder);
+    }
+    return remainder;
+  }
+
+  // Quotient in place; returns the remainder. divisor != 0.
+  u128 divide(u128 divisor) { return (divisor >> 64) == 0 ? divideSmall(u64(divisor)) : divideWide(divisor); }
+
+  // Knuth's algorithm D (TAOCP 4.3.1) on 32-bit digits for a divisor of three or four digits.
+  u128 divideWide(u128 divisor) {
+    u32 u[8], v[4];
+    for (int i = 0; i < 4; ++i) {
+      u[2 * i] = u32(w[i]);
+      u[2 * i + 1] = u32(w[i] >> 32);
+      v[i] = u32(divisor >> (32 * i));
+    }
+    int n = 4;
+    while (v[n - 1] == 0) --n;
+    int m = 8;
+    while (m > 0 && u[m - 1] == 0) --m;
+    if (m < n) {  // the dividend is already the remainder
+      const u128 remainder = low();
+      *this = U256{};
+      return remainder;
+    }
+
+    // Normalise so that the divisor's top digit has its high bit set; the dividend gains a digit.
+    const int s = std::countl_zero(v[n - 1]);
+    u32 vn[4] = {}, un[9] = {}, q[8] = {};
+    for (int i = n - 1; i > 0; --i) vn[i] = (v[i] << s) | u32(u64(v[i - 1]) >> (32 - s));
+    vn[0] = v[0] << s;
+    un[m] = u32(u64(u[m - 1]) >> (32 - s));
+    for (int i = m - 1; i > 0; --i) un[i] = (u[i] << s) | u32(u64(u[i - 1]) >> (32 - s));
+    un[0] = u[0] << s;
+
+    constexpr u64 base = u64(1) << 32;
+    for (int j = m - n; j >= 0; --j) {
+      // Estimate the quotient digit from the top two digits, then correct it (at most twice).
+      const u64 top = (u64(un[j + n]) << 32) | un[j + n - 1];
+      u64 qhat = top / vn[n - 1];
+      u64 rhat = top - qhat * vn[n - 1];
+      while (qhat >= base || qhat * vn[n - 2] > ((rhat << 32) | un[j + n - 2])) {
+        --qhat;
+        rhat += vn[n - 1];
+        if (rhat >= base) break;
+      }
+      // Multiply and subtract.
+      std::int64_t borrow = 0, t = 0;
+      for (int i = 0; i < n; ++i) {
+        const u64 p = qhat * vn[i];
+        t = std::int64_t(un[i + j]) - borrow - std::int64_t(p & 0xFFFFFFFFu);
+        un[i + j] = u32(t);
+        borrow = std::int64_t(p >> 32) - (t >> 32);
+      }
+      t = std::int64_t(un[j + n]) - borrow;
+      un[j + n] = u32(t);
+      q[j] = u32(qhat);
+      if (t < 0) {  // the estimate was one too large: add the divisor back
+        --q[j];
+        u64 carry = 0;
+        for (int i = 0; i < n; ++i) {
+          const u64 sum = u64(un[i + j]) + vn[i] + carry;
+          un[i + j] = u32(sum);
+          carry = sum >> 32;
+        }
+        un[j + n] = u32(un[j + n] + carry);
+      }
+    }
+
+    u128 remainder = 0;
+    for (int i = n - 1; i >= 0; --i) {
+      const u32 digit = (un[i] >> s) | u32(i == n - 1 ? 0 : u64(un[i + 1]) << (32 - s));
+      remainder = (remainder << 32) | digit;
+    }
+    for (int i = 0; i < 4; ++i) w[i] = (u64(q[2 * i + 1]) << 32) | q[2 * i];
+    return remainder;
+  }
+};
+
+constexpr int kWidestDigits = 77;
+constexpr std::array<U256, kWidestDigits + 1> kWidePow10 = [] {
+  std::array<U256, kWidestDigits + 1> table{};
+  table[0] = U256::from(1);
+  for (std::size_t i = 1; i < table.size(); ++i) {
+    table[i] = table[i - 1];
+    table[i].multiplySmall(10);
+  }
+  return table;
+}();
+
+// Decimal digits of the value; zero counts as one digit.
+int digitCount(u128 value);
+
+int digitCount(const U256& value) {
+  if (value.fitsU128()) return digitCount(value.low());
+  // bits * log10(2) is within one of the answer; the table settles it.
+  int n = std::min((value.bitLength() * 1233) >> 12, kWidestDigits);
+  while (n < kWidestDigits && value.compare(kWidePow10[n]) >= 0) ++n;
+  while (n > 1 && value.compare(kWidePow10[n - 1]) < 0) --n;
+  return n;
+}
+
+int digitCount(u128 value) {
+  if (value < 10) return 1;
+  if (value >= kCoefficientLimit) return kPrec + 1;  // the most a u128 holds
+  const int bits =
+      128 - (u64(value >> 64) ? std::countl_zero(u64(value >> 64)) : 64 + std::countl_zero(u64(value)));
+  int n = std::min((bits * 1233) >> 12, kPrec);
+  while (n < kPrec && value >= kPow10[n]) ++n;
+  while (n > 1 && value < kPow10[n - 1]) --n;
+  return n;
+}
+
+// value * 10^n for n up to 77 - digits(value).
+U256 scaledUp(u128 value, long long n) {
+  U256 r = U256::product(value, kPow10[std::min<long long>(n, kPrec)]);
+  for (n -= kPrec; n > 0; n -= 19) r.multiplySmall(u64(kPow10[std::min<long long>(n, 19)]));
+  return r;
+}
+
+// value / 10^n, truncated.
+U256 scaledDown(U256 value, long long n) {
+  if (value.fitsU128()) return U256::from(n > kPrec ? 0 : value.low() / kPow10[n]);
+  for (; n > 0 && !value.isZero(); n -= 19) value.divideSmall(u64(kPow10[std::min<long long>(n, 19)]));
+  return value;
+}
+
+// A decimal taken apart, for the arithmetic below.
+struct Parts {
+  u128 coefficient = 0;
+  int exponent = 0;
+  bool negative = false;
+};
+
+Parts saturated(bool negative) {
+  return {kCoefficientLimit - 1, kEtop, negative};
+}
+
+// Rounds an exact result to kPrec digits, half away from zero, and brings its exponent into range.
+// Only the first dropped digit decides the rounding, so the digits below it need not be kept.
+Parts finish(U256 coefficient, long long exponent, bool negative) {
+  // Most money results already fit: at most kPrec digits at an exponent well inside the range.
+  if (coefficient.fitsU128() && coefficient.low() < kCoefficientLimit && exponent >= kEtiny &&
+      exponent <= kEtop)
+    return {coefficient.low(), int(exponent), negative};
+  if (coefficient.isZero()) return {0, int(std::clamp<long long>(exponent, kEtiny, kEmax)), negative};
+  const int length = digitCount(coefficient);
+  long long minimum = length + exponent - kPrec;  // the exponent that leaves exactly kPrec digits
+  if (minimum > kEtop) return saturated(negative);
+  minimum = std::max<long long>(minimum, kEtiny);
+  if (exponent >= minimum) return {coefficient.low(), int(exponent), negative};
+
+  const long long drop = minimum - exponent;
+  u128 kept = 0;
+  bool roundUp = false;
+  if (drop <= 19) {  // the dropped digits fit one word: a single division
+    const u64 dropped = coefficient.divideSmall(u64(kPow10[drop]));
+    roundUp = dropped >= 5 * u64(kPow10[drop - 1]);
+    kept = coefficient.low();
+  } else if (drop <= length) {
+    coefficient = scaledDown(coefficient, drop - 1);
+    roundUp = coefficient.divideSmall(10) >= 5;
+    kept = coefficient.low();
+  }
+  if (roundUp && ++kept == kCoefficientLimit) {
+    kept = kPow10[kPrec - 1];
+    if (++minimum > kEtop) return saturated(negative);
+  }
+  return {kept, int(minimum), negative};
+}
+
+Parts add(Parts x, Parts y) {
+  const long long exponent = std::min(x.exponent, y.exponent);
+  if (x.coefficient == 0 && y.coefficient == 0) return finish(U256{}, exponent, x.negative && y.negative);
+  if (x.coefficient == 0 || y.coefficient == 0) {
+    const Parts& value = x.coefficient == 0 ? y : x;
+    // Zeros padded beyond the precision would only be rounded away again.
+    const long long target = std::max<long long>(exponent, value.exponent - kPrec - 1);
+    return finish(scaledUp(value.coefficient, value.exponent - target), target, value.negative);
+  }
+
+  Parts& high = x.exponent < y.exponent ? y : x;  // the operand with the larger exponent
+  Parts& low = x.exponent < y.exponent ? x : y;
+  // An operand lying wholly below the rounding position of the other counts like any amount that small:
+  // one unit just below that position stands in for it, which keeps the aligned numbers short.
+  const long long floor = high.exponent + std::min(-1, digitCount(high.coefficient) - kPrec - 2);
+  if (digitCount(low.coefficient) + low.exponent - 1 < floor) {
+    low.coefficient = 1;
+    low.exponent = int(floor);
+  }
+  U256 big = scaledUp(high.coefficient, (long long)high.exponent - low.exponent);
+  U256 small = U256::from(low.coefficient);
+  if (high.negative == low.negative) {
+    big.add(small);
+    return finish(big, low.exponent, high.negative);
+  }
+  const int order = big.compare(small);
+  if (order == 0) return finish(U256{}, exponent, false);  // x - x is a positive zero
+  if (order > 0) {
+    big.subtract(small);
+    return finish(big, low.exponent, high.negative);
+  }
+  small.subtract(big);
+  return finish(small, low.exponent, low.negative);
+}
+
+// Divides by 10 as often as it divides evenly, at most `room` times; returns how often.
+long long stripZeros(U256& value, long long room) {
+  long long stripped = 0;
+  auto tryStrip = [&](int digits) {
+    if (room - stripped < digits) return false;
+    U256 quotient = value;
+    if (quotient.divideSmall(u64(kPow10[digits])) != 0) return false;
+    value = quotient;
+    stripped += digits;
+    return true;
+  };
+  while (tryStrip(19)) {
+  }
+  for (int digits : {16, 8, 4, 2, 1}) tryStrip(digits);  // fewer than 19 left: binary steps find them
+  return stripped;
+}
+
+Parts divide(const Parts& x, const Parts& y) {
+  const bool negative = x.negative != y.negative;
+  const long long ideal = (long long)x.exponent - y.exponent;
+  if (x.coefficient == 0) return finish(U256{}, ideal, negative);
+  // Widen the dividend so that the quotient has kPrec + 1 or kPrec + 2 digits: enough to round.
+  const int shift = digitCount(y.coefficient) - digitCount(x.coefficient) + kPrec + 1;
+  U256 quotient = scaledUp(x.coefficient, shift);
+  long long exponent = ideal - shift;
+  // An exact quotient keeps no more trailing zeros than the ideal exponent asks for (90 / 60 = 1.5).
+  if (quotient.divide(y.coefficient) == 0) exponent += stripZeros(quotient, shift);
+  return finish(quotient, exponent, negative);
+}
+
+bool isBlank(char16_t c) {
+  return QChar(c).isSpace();
+}
+bool isBlank(char c) {
+  return QChar::fromLatin1(c).isSpace();
+}
+
+// Exponents in text are read up to this magnitude; anything beyond is far outside the range anyway.
+constexpr long long kExponentTextLimit = 1'000'000'000'000'000LL;
+
+// [sign] (digits [. [digits]] | . digits) [(e|E) [sign] digits], with blanks around it. Digits beyond
+// the precision are rounded half away from zero.
+template <typename Char>
+std::optional<Parts> parse(const Char* text, qsizetype size) {
+  qsizetype i = 0, end = size;
+  while (i < end && isBlank(text[i])) ++i;
+  while (end > i && isBlank(text[end - 1])) --end;
+  auto isDigit = [&](qsizetype at) { return text[at] >= Char('0') && text[at] <= Char('9'); };
+
+  bool negative = false;
+  if (i < end && (text[i] == Char('+') || text[i] == Char('-'))) negative = text[i++] == Char('-');
+  const qsizetype mantissaBegin = i;
+  long long digits = 0, fractionDigits = 0;
+  bool point = false;
+  for (; i < end; ++i) {
+    if (isDigit(i)) {
+      ++digits;
+      if (point) ++fractionDigits;
+    } else if (text[i] == Char('.') && !point) {
+      point = true;
+    } else {
+      break;
+    }
+  }
+  const qsizetype mantissaEnd = i;
+  if (digits == 0) return std::nullopt;
+
+  long long exponent = 0;
+  if (i < end && (text[i] == Char('e') || text[i] == Char('E'))) {
+    ++i;
+    bool negativeExponent = false;
+    if (i < end && (text[i] == Char('+') || text[i] == Char('-'))) negativeExponent = text[i++] == Char('-');
+    const qsizetype exponentBegin = i;
+    for (; i < end && isDigit(i); ++i)
+      exponent = std::min(exponent * 10 + (text[i] - Char('0')), kExponentTextLimit);
+    if (i == exponentBegin) return std::nullopt;
+    if (negativeExponent) exponent = -exponent;
+  }
+  if (i != end) return std::nullopt;
+  exponent -= fractionDigits;
+
+  // The significant digits start after the leading zeros.
+  qsizetype first = mantissaBegin;
+  long long length = digits;
+  for (; first < mantissaEnd && (text[first] == Char('0') || text[first] == Char('.')); ++first)
+    if (text[first] == Char('0')) --length;
+  if (length == 0) return Parts{0, int(std::clamp<long long>(exponent, kEtiny, kEmax)), negative};
+
+  long long minimum = length + exponent - kPrec;
+  if (minimum > kEtop) return std::nullopt;
+  minimum = std::max<long long>(minimum, kEtiny);
+  const bool rounds = exponent < minimum;
+  const long long keep = rounds ? length - (minimum - exponent) : length;
+  u128 coefficient = 0;
+  int firstDropped = 0;
+  long long taken = 0;
+  for (qsizetype at = first; at < mantissaEnd && taken <= keep; ++at) {
+    if (text[at] == Char('.')) continue;
+    const int digit = int(text[at] - Char('0'));
+    if (taken++ < keep)
+      coefficient = coefficient * 10 + u128(digit);
+    else
+      firstDropped = digit;
+  }
+  if (!rounds) return Parts{coefficient, int(exponent), negative};
+  if (firstDropped >= 5 && ++coefficient == kCoefficientLimit) {
+    coefficient = kPow10[kPrec - 1];
+    if (++minimum > kEtop) return std::nullopt;
+  }
+  return Parts{coefficient, int(minimum), negative};
+}
+
+// Writes the coefficient's digits to the end of buffer; returns where they start.
+char* writeDigits(u128 value, char* end) {
+  char* p = end;
+  do {
+    *--p = char('0' + int(value % 10));
+    value /= 10;
+  } while (value != 0);
+  return p;
+}
+
+// Lets QVariant find the type by name and read it as text or as a double.
+[[maybe_unused]] const bool kMetaTypeRegistered = [] {
+  qRegisterMetaType<Decimal>();
+  QMetaType::registerConverter<Decimal, QString>(&Decimal::toString);
+  QMetaType::registerConverter<Decimal, double>(&Decimal::toDouble);
+  return true;
+}();
+
+}  // namespace
+
+// Negated in unsigned arithmetic so that INT64_MIN works too.
+Decimal::Decimal(std::int64_t value)
+    : coefficient_(value < 0 ? u128(u64(0) - u64(value)) : u128(value)), negative_(value < 0) {}
+
+std::optional<Decimal> Decimal::fromString(QStringView text) {
+  const std::optional<Parts> parts = parse(text.utf16(), text.size());
+  if (!parts) return std::nullopt;
+  return Decimal(parts->coefficient, parts->exponent, parts->negative);
+}
+
+std::optional<Decimal> Decimal::fromDouble(double value) {
+  if (!std::isfinite(value)) return std::nullopt;
+  char buffer[64];
+  const auto written = std::to_chars(buffer, buffer + sizeof buffer, value);
+  const std::optional<Parts> parts = parse(buffer, written.ptr - buffer);
+  if (!parts) return std::nullopt;
+  return Decimal(parts->coefficient, parts->exponent, parts->negative);
+}
+
+std::optional<Decimal> Decimal::fromVariant(const QVariant& value) {
+  if (!value.isValid()) return std::nullopt;
+  if (value.metaType() == QMetaType::fromType<Decimal>()) return value.value<Decimal>();
+  switch (value.typeId()) {
+    case QMetaType::Bool:
+      return Decimal(value.toBool() ? 1 : 0);
+    case QMetaType::Int:
+    case QMetaType::Long:
+    case QMetaType::LongLong:
+    case QMetaType::Short:
+    case QMetaType::SChar:
+    case QMetaType::Char:
+      return Decimal(std::int64_t(value.toLongLong()));
+    case QMetaType::UInt:
+    case QMetaType::ULong:
+    case QMetaType::ULongLong:
+    case QMetaType::UShort:
+    case QMetaType::UChar:
+      return Decimal(u128(value.toULongLong()), 0, false);
+    case QMetaType::Double:
+      return fromDouble(value.toDouble());
+    case QMetaType::Float: {
+      // The float's own shortest text: 0.1f is 0.1, not 0.100000001490116...
+      const float single = value.toFloat();
+      if (!std::isfinite(single)) return std::nullopt;
+      char buffer[64];
+      const auto written = std::to_chars(buffer, buffer + sizeof buffer, single);
+      const std::optional<Parts> parts = parse(buffer, written.ptr - buffer);
+      if (!parts) return std::nullopt;
+      return Decimal(parts->coefficient, parts->exponent, parts->negative);
+    }
+    case QMetaType::QString:
+      return fromString(value.toString());
+    case QMetaType::QByteArray: {
+      const QByteArray bytes = value.toByteArray();
+      const std::optional<Parts> parts = parse(bytes.constData(), bytes.size());
+      if (!parts) return std::nullopt;
+      return Decimal(parts->coefficient, parts->exponent, parts->negative);
+    }
+    default:
+      return std::nullopt;
+  }
+}
+
+QString Decimal::toString() const {
+  char buffer[kPrec + 1];
+  char* const end = buffer + sizeof buffer;
+  const char* digits = writeDigits(coefficient_, end);
+  const qsizetype length = end - digits;
+  const bool minus = isNegative();
+  QString text;
+  if (exponent_ >= 0) {
+    if (coefficient_ == 0) return QStringLiteral("0");  // 0E+2 is plain "0"
+    text.reserve(minus + length + exponent_);
+    if (minus) text += QLatin1Char('-');
+    text += QLatin1StringView(digits, length);
+    text += QString(exponent_, QLatin1Char('0'));
+    return text;
+  }
+  const qsizetype places = -qsizetype(exponent_);
+  text.reserve(minus + std::max(length, places + 1) + 1);
+  if (minus) text += QLatin1Char('-');
+  if (length > places) {
+    text += QLatin1StringView(digits, length - places);
+    text += QLatin1Char('.');
+    text += QLatin1StringView(digits + (length - places), places);
+  } else {
+    text += QLatin1StringView("0.");
+    text += QString(places - length, QLatin1Char('0'));
+    text += QLatin1StringView(digits, length);
+  }
+  return text;
+}
+
+double Decimal::toDouble() const {
+  // "<digits>e<exponent>" read back by from_chars is correctly rounded.
+  char buffer[kPrec + 16];
+  char* p = buffer;
+  if (isNegative()) *p++ = '-';
+  char digits[kPrec + 1];
+  const char* first = writeDigits(coefficient_, digits + sizeof digits);
+  p = std::copy(first, static_cast<const char*>(digits + sizeof digits), p);
+  *p++ = 'e';
+  p = std::to_chars(p, buffer + sizeof buffer, exponent_).ptr;
+  double value = 0;
+  const auto read = std::from_chars(buffer, p, value);
+  if (read.ec == std::errc::result_out_of_range) {
+    const bool huge = digitCount(coefficient_) + exponent_ > 0;
+    value = huge ? std::numeric_limits<double>::infinity() : 0.0;
+    if (isNegative()) value = -value;
+  }
+  return value;
+}
+
+std::int64_t Decimal::toInt64() const {
+  if (coefficient_ == 0) return 0;
+  const u128 limit = u128(std::numeric_limits<std::int64_t>::max()) + (negative_ ? 1 : 0);
+  u128 magnitude;
+  if (exponent_ >= 0) {
+    if (exponent_ > 19 || (coefficient_ >> 64) != 0) {
+      magnitude = limit;
+    } else {
+      magnitude = coefficient_ * kPow10[exponent_];  // < 2^64 * 10^19, no overflow
+    }
+  } else {
+    magnitude = exponent_ < -kPrec ? 0 : coefficient_ / kPow10[-exponent_];
+  }
+  magnitude = std::min(magnitude, limit);
+  return negative_ ? std::int64_t(u64(0) - u64(magnitude)) : std::int64_t(magnitude);
+}
+
+Decimal Decimal::operator-() const {
+  // The negation of a zero is a positive zero, as in the decimal arithmetic rules.
+  return Decimal(coefficient_, exponent_, coefficient_ != 0 && !negative_);
+}
+
+Decimal operator+(const Decimal& a, const Decimal& b) {
+  const Parts r = add({a.coefficient_, a.exponent_, a.negative_}, {b.coefficient_, b.exponent_, b.negative_});
+  return Decimal(r.coefficient, r.exponent, r.negative);
+}
+
+Decimal operator-(const Decimal& a, const Decimal& b) {
+  const Parts r =
+      add({a.coefficient_, a.exponent_, a.negative_}, {b.coefficient_, b.exponent_, !b.negative_});
+  return Decimal(r.coefficient, r.exponent, r.negative);
+}
+
+Decimal operator*(const Decimal& a, const Decimal& b) {
+  const Parts r = finish(U256::product(a.coefficient_, b.coefficient_), (long long)a.exponent_ + b.exponent_,
+                         a.negative_ != b.negative_);
+  return Decimal(r.coefficient, r.exponent, r.negative);
+}
+
+std::optional<Decimal> Decimal::divide(const Decimal& dividend, const Decimal& divisor) {
+  if (divisor.coefficient_ == 0) return std::nullopt;
+  const Parts r = ::divide({dividend.coefficient_, dividend.exponent_, dividend.negative_},
+                           {divisor.coefficient_, divisor.exponent_, divisor.negative_});
+  return Decimal(r.coefficient, r.exponent, r.negative);
+}
+
+std::strong_ordering operator<=>(const Decimal& a, const Decimal& b) {
+  const bool aNegative = a.isNegative(), bNegative = b.isNegative();
+  if (aNegative != bNegative) return aNegative ? std::strong_ordering::less : std::strong_ordering::greater;
+  // Same sign from here: compare magnitudes, reversed for negatives.
+  std::strong_ordering magnitude = std::strong_ordering::equal;
+  if (a.coefficient_ == 0 || b.coefficient_ == 0) {
+    magnitude = (a.coefficient_ != 0) <=> (b.coefficient_ != 0);
+  } else {
+    const int aAdjusted = digitCount(a.coefficient_) + a.exponent_;
+    const int bAdjusted = digitCount(b.coefficient_) + b.exponent_;
+    if (aAdjusted != bAdjusted) {
+      magnitude = aAdjusted <=> bAdjusted;
+    } else if (a.exponent_ >= b.exponent_) {
+      // Equal leading positions: the one with the larger exponent, widened, has at most 38 digits.
+      magnitude = a.coefficient_ * kPow10[a.exponent_ - b.exponent_] <=> b.coefficient_;
+    } else {
+      magnitude = a.coefficient_ <=> b.coefficient_ * kPow10[b.exponent_ - a.exponent_];
+    }
+  }
+  return aNegative ? 0 <=> magnitude : magnitude;
+}
+
+bool Decimal::isIdenticalTo(const Decimal& other) const {
+  return exponent_ == other.exponent_ && *this == other;
+}
+
+QDebug operator<<(QDebug debug, const Decimal& value) {
+  QDebugStateSaver saver(debug);
+  debug.nospace().noquote() << "Decimal(" << value.toString() << ')';
+  return debug;
+}
