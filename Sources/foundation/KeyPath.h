@@ -20,6 +20,7 @@ Q_DECLARE_METATYPE(KeyValueCoding*)
 
 namespace KeyPath {
 
+// A null pointer gives a null variant.
 QVariant variantFromObject(const KeyValueCoding* object);
 // The object in a variant made by variantFromObject, or null for any other variant.
 KeyValueCoding* objectFromVariant(const QVariant& value);
@@ -31,6 +32,9 @@ KeyValueCoding* objectFromVariant(const QVariant& value);
 //    evaluate "rest" on every element and combine the non-null results.
 // @sum of integers (and booleans) is an integer; once a Decimal or double is involved it is a Decimal.
 // @avg is a Decimal. @sum of nothing is the integer 0; @max, @min and @avg of nothing are null.
+// Numeric text counts as a Decimal in @sum and @avg; other non-numbers are skipped there. An operator
+// with no rest ("@max") uses the elements themselves; "@count" on a map counts its entries.
+// "self" answers the value itself (a map answers its entry); an empty key path answers the root.
 // Anything that cannot be answered yields a null variant, never an error.
 QVariant valueForKeyPath(const QVariant& root, QStringView keyPath);
 

@@ -26,14 +26,17 @@ class UserDefaults : public QObject {
   // Adds to (or replaces among) the registered defaults; stored values are untouched.
   void registerDefaults(const QVariantMap& defaults);
 
-  // The stored value, else the registered default, else a null variant.
+  // The stored value, else the registered default, else a null variant. A stored Decimal or Date comes
+  // back as such; other stored scalars (numbers, booleans) come back as their text, as the file keeps
+  // them, so use the typed reads below for those.
   QVariant value(const QString& key) const;
   // Stores a value and writes it out; a null variant removes the stored value.
   void setValue(const QString& key, const QVariant& value);
   void removeValue(const QString& key);
   bool hasStoredValue(const QString& key) const;
 
-  // Typed reads; booleans and integers read "YES"/"true"/"1" and numeric strings.
+  // Typed reads; booleans and integers read "YES"/"true"/"1" and numeric strings (an integer is truncated
+  // toward zero). Unset or unreadable values give false, 0, empty text or none.
   bool boolForKey(const QString& key) const;
   qint64 integerForKey(const QString& key) const;
   QString stringForKey(const QString& key) const;
