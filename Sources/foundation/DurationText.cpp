@@ -1,0 +1,97 @@
+#include "DurationText.h"
+
+#include "Decimal.h"
+
+#include <QLocale>
+#include <QStringList>
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+
+namespace {
+
+// "00" for zero, plain digits above 9, otherwise a "0" in front, negative values included: -5 is "0-5".
+// The odd text for negative values is what the lists have always shown and is kept.
+QString twoDigits(std::int32_t value) {
+  if (value == 0) return QStringLiteral("00");
+  if (value > 9) return QString::number(value);
+  return QLatin1Char('0') + QString::number(value);
+}
+
+int clampToInt(long long value) {
+  return int(std::clamp<long long>(value, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
+}
+
+// One piece of typed duration text as an integer: a whole number in the user's locale (or in the C
+// locale, so "2.5" is read the same everywhere), blanks around it ignored, fractions cut off.
+// Anything else is 0.
+long long readPiece(const QString& piece) {
+  const QString text = piece.trimmed();
+  if (text.isEmpty()) return 0;
+  for (const QLocale& locale : {QLocale(), QLocale::c()}) {
+    bool ok = false;
+    const qlonglong whole = locale.toLongLong(text, &ok);
+    if (ok) return clampToInt(whole);
+    const double number = locale.toDouble(text, &ok);
+    if (ok && std::isfinite(number)) {
+      return clampToInt(
+          static_cast<long long>(std::clamp(std::trunc(number), double(std::numeric_limits<int>::min()),
+                                            double(std::numeric_limits<int>::max()))));
+    }
+  }
+  return 0;
+}
+
+}  // namespace
+
+namespace DurationText {
+
+QString stringWithMinutes(std::int32_t minutes) {
+  // Truncating division: the remainder keeps the sign of the minutes.
+  return twoDigits(minutes / 60) + QLatin1Char(':') + twoDigits(minutes % 60);
+}
+
+QString stringWithSeconds(std::int32_t seconds) {
+  return stringWithMinutes(seconds / 60) + QLatin1Char(':') + twoDigits(seconds % 60);
+}
+
+QString durationString(const QVariant& number) {
+  // Truncated toward zero (2.9 is 2), whether the number is an integer, a double, a decimal or numeric
+  // text; values beyond 32 bits saturate.
+  const std::optional<Decimal> value = Decimal::fromVariant(number);
+  return stringWithMinutes(value ? clampToInt(value->toInt64()) : 0);
+}
+
+int minutesFromString(const QString& text) {
+  // Minutes last, then hours, then days; anything further left is ignored.
+  static constexpr long long kWeights[] = {1, 60, 1440};
+  const QStringList pieces = text.split(QLatin1Char(':'));
+  long long minutes = 0;
+  for (qsizetype i = 0; i < 3 && i < pieces.size(); ++i)
+    minutes += kWeights[i] * readPiece(pieces[pieces.size() - 1 - i]);
+  return clampToInt(minutes);
+}
+
+}  // namespace DurationText
+
+QString WTDurationFormatter::stringForObjectValue(const QVariant& value) const {
+  return DurationText::durationString(value);
+}
+
+bool WTDurationFormatter::getObjectValue(QVariant* result, const QString& text,
+                                         QString* errorDescription) const {
+  Q_UNUSED(errorDescription);  // parsing never fails, so there is never an error text
+  if (result) *result = QVariant(DurationText::minutesFromString(text));
+  return true;
+}
+
+QVariant WTDurationTransformer::transformedValue(const QVariant& value) const {
+  // No value stays no value, so an empty field shows nothing rather than "00:00".
+  if (!value.isValid() || value.isNull()) return QVariant();
+  return DurationText::durationString(value);
+}
+
+QVariant WTDurationTransformer::reverseTransformedValue(const QVariant& value) const {
+  return QVariant(DurationText::minutesFromString(value.toString()));
+}

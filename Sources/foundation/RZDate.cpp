@@ -1,0 +1,371 @@
+#include "RZDate.h"
+
+#include <QtGlobal>
+
+#include <unicode/datefmt.h>
+#include <unicode/gregocal.h>
+#include <unicode/locid.h>
+#include <unicode/timezone.h>
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <memory>
+#include <string>
+
+// How days and fields are found:
+// - One lenient GregorianCalendar in ICU's default zone is kept for the life of the process (or until
+//   setDefaultTimeZone) because making one per call costs more than the arithmetic itself; grouping
+//   thousands of items asks for midnight() once per item. Everything here is main-thread only. The zone
+//   must therefore be changed through setDefaultTimeZone: a change made directly through ICU is not seen.
+// - Stepping reads the fields of the receiver, changes one of them and builds a new instant from the
+//   fields on a cleared calendar. The lenient calendar normalises out-of-range fields (day 0 is the last
+//   day of the month before, 31 February is early March); Calendar::add would clamp instead. Fields
+//   beyond ICU's span of years (addMonth by millions) give an unspecified instant.
+// - Wall times that a zone transition skips or repeats are resolved as ICU does by default: a skipped
+//   time is read with the offset in force before the transition (00:30 on a day whose clocks jump from
+//   00:00 to 01:00 is 01:30, and a skipped midnight is therefore the first instant of that day), and a
+//   repeated time is its later occurrence. So beginOfMinute of 02:30:45 in the first pass through a
+//   repeated hour is 02:30:00 of the second pass, one hour minus 45 seconds later, and where midnight
+//   itself repeats, the hour before the later midnight has its midnight ahead of it.
+// - ICU counts in whole milliseconds: instants go in snapped to the millisecond (rounding noise of the
+//   double is ignored, true fractions of a millisecond are dropped).
+
+namespace RZDate {
+
+namespace {
+
+struct Fields {
+  int year = 0, month = 0, day = 0, hour = 0, minute = 0, second = 0;
+  int weekday = 0;  // 1 for Sunday to 7 for Saturday
+};
+
+struct CachedFormat {
+  std::unique_ptr<icu::DateFormat> format;
+  std::string locale;  // the default locale the format was made for
+};
+
+struct State {
+  std::unique_ptr<icu::GregorianCalendar> calendar;
+  // [dayStart, nextDayStart): instants known to share the local day whose midnight is dayStart.
+  UDate dayStart = std::numeric_limits<double>::quiet_NaN();
+  UDate nextDayStart = std::numeric_limits<double>::quiet_NaN();
+  CachedFormat shortDate;
+  CachedFormat shortDateTime;
+
+  void reset() {
+    calendar.reset();
+    dayStart = nextDayStart = std::numeric_limits<double>::quiet_NaN();
+    shortDate.format.reset();
+    shortDateTime.format.reset();
+  }
+};
+
+State& state() {
+  static State shared;
+  return shared;
+}
+
+icu::GregorianCalendar& calendar() {
+  State& s = state();
+  if (!s.calendar) {
+    UErrorCode status = U_ZERO_ERROR;
+    // Default zone and locale; the locale only sets the first weekday, which nothing here uses.
+    s.calendar = std::make_unique<icu::GregorianCalendar>(status);
+    if (U_FAILURE(status)) qWarning("ICU calendar: %s", u_errorName(status));
+    s.calendar->setLenient(true);
+  }
+  return *s.calendar;
+}
+
+UDate toUDate(Date date) {
+  const double ms = date.secondsSince1970() * 1000.0;
+  const double nearest = std::round(ms);
+  return std::abs(ms - nearest) < 1e-3 ? nearest : std::floor(ms);
+}
+
+Date fromUDate(UDate ms) {
+  return Date::fromSeconds(ms / 1000.0);
+}
+
+int clampedSum(int a, long long b) {
+  const long long sum = static_cast<long long>(a) + b;
+  return int(std::clamp<long long>(sum, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
+}
+
+Fields fieldsOf(UDate ms) {
+  icu::GregorianCalendar& cal = calendar();
+  UErrorCode status = U_ZERO_ERROR;
+  cal.setTime(ms, status);
+  Fields f;
+  // The extended year runs on through 0 and below, so years before the common era round-trip.
+  f.year = cal.get(UCAL_EXTENDED_YEAR, status);
+  f.month = cal.get(UCAL_MONTH, status) + 1;
+  f.day = cal.get(UCAL_DATE, status);
+  f.hour = cal.get(UCAL_HOUR_OF_DAY, status);
+  f.minute = cal.get(UCAL_MINUTE, status);
+  f.second = cal.get(UCAL_SECOND, status);
+  f.weekday = cal.get(UCAL_DAY_OF_WEEK, status);  // UCAL_SUNDAY is 1 in every locale
+  if (U_FAILURE(status)) qWarning("ICU calendar fields: %s", u_errorName(status));
+  return f;
+}
+
+Fields fieldsOf(Date date) {
+  return fieldsOf(toUDate(date));
+}
+
+// Builds an instant from wall-clock fields on a cleared lenient calendar; out-of-range fields roll over.
+// NaN when ICU reports an error.
+UDate build(int year, int month, int day, int hour = 0, int minute = 0, int second = 0) {
+  icu::GregorianCalendar& cal = calendar();
+  cal.clear();
+  cal.set(UCAL_EXTENDED_YEAR, year);
+  cal.set(UCAL_MONTH, month - 1);
+  cal.set(UCAL_DATE, day);
+  cal.set(UCAL_HOUR_OF_DAY, hour);
+  cal.set(UCAL_MINUTE, minute);
+  cal.set(UCAL_SECOND, second);
+  UErrorCode status = U_ZERO_ERROR;
+  const UDate ms = cal.getTime(status);
+  return U_SUCCESS(status) ? ms : std::numeric_limits<double>::quiet_NaN();
+}
+
+bool sameDay(const Fields& a, const Fields& b) {
+  return a.year == b.year && a.month == b.month && a.day == b.day;
+}
+
+QString fromUnicode(const icu::UnicodeString& text) {
+  return QString(reinterpret_cast<const QChar*>(text.getBuffer()), text.length());
+}
+
+QString formatShort(Date date, bool withTime) {
+  CachedFormat& cached = withTime ? state().shortDateTime : state().shortDate;
+  const char* locale = icu::Locale::getDefault().getName();
+  if (!cached.format || cached.locale != locale) {
+    // Made in the default zone and locale of the moment; setDefaultTimeZone drops it.
+    cached.format.reset(
+        withTime ? icu::DateFormat::createDateTimeInstance(icu::DateFormat::kShort, icu::DateFormat::kShort)
+                 : icu::DateFormat::createDateInstance(icu::DateFormat::kShort));
+    cached.locale = locale;
+    if (!cached.format) return {};
+  }
+  icu::UnicodeString text;
+  cached.format->format(toUDate(date), text);
+  return fromUnicode(text);
+}
+
+// The default zone's offset from GMT now, in seconds.
+double presentOffsetSeconds() {
+  int32_t raw = 0, dst = 0;
+  UErrorCode status = U_ZERO_ERROR;
+  calendar().getTimeZone().getOffset(toUDate(Date::now()), false, raw, dst, status);
+  return U_SUCCESS(status) ? (raw + dst) / 1000.0 : 0.0;
+}
+
+}  // namespace
+
+Date midnight(Date date) {
+  const UDate ms = toUDate(date);
+  State& s = state();
+  if (ms >= s.dayStart && ms < s.nextDayStart) return fromUDate(s.dayStart);
+
+  const Fields f = fieldsOf(ms);
+  const UDate start = build(f.year, f.month, f.day);
+  const UDate next = build(f.year, f.month, f.day + 1);
+  // Keep the bounds only when the whole span is on this day. It is not when midnight repeats (a
+  // transition from 01:00 back to 00:00 at the start of the next day): the later 00:00 is then the
+  // next day's start, and the hour before it already belongs to the next day.
+  if (start <= ms && ms < next && sameDay(fieldsOf(next - 1), f)) {
+    s.dayStart = start;
+    s.nextDayStart = next;
+  }
+  return fromUDate(start);
+}
+
+Date tomorrow(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day + 1));
+}
+
+Date yesterday(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day - 1));
+}
+
+Date nextWeek(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day + 7));
+}
+
+Date lastWeek(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day - 7));
+}
+
+Date beginOfMonth(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, 1));
+}
+
+Date beginOfNextMonth(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month + 1, 1));
+}
+
+Date beginOfLastMonth(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month - 1, 1));
+}
+
+Date beginOfWeek(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day + 1 - f.weekday));
+}
+
+Date beginOfYear(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, 1, 1));
+}
+
+Date beginOfNextYear(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(clampedSum(f.year, 1), 1, 1));
+}
+
+Date beginOfLastYear(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(clampedSum(f.year, -1), 1, 1));
+}
+
+Date beginOfMinute(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, f.month, f.day, f.hour, f.minute));
+}
+
+Date nextMonth(Date date) {
+  return addMonth(date, 1);
+}
+
+Date nextYear(Date date) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(clampedSum(f.year, 1), f.month, f.day));
+}
+
+Date addMonth(Date date, int months) {
+  const Fields f = fieldsOf(date);
+  return fromUDate(build(f.year, clampedSum(f.month, months), f.day));
+}
+
+Date dateByTakingDateUnitsFrom(Date date, Date other) {
+  return dateByTakingComponents(date, DayUnits, other);
+}
+
+void assignFlags(Date date, unsigned flags, DateComponents& components) {
+  if ((flags & AllFields) == 0) return;
+  const Fields f = fieldsOf(date);
+  if (flags & Year) components.year = f.year;
+  if (flags & Month) components.month = f.month;
+  if (flags & Day) components.day = f.day;
+  if (flags & Hour) components.hour = f.hour;
+  if (flags & Minute) components.minute = f.minute;
+  if (flags & Second) components.second = f.second;
+}
+
+Date dateByTakingComponents(Date date, unsigned flags, Date from) {
+  DateComponents components;
+  assignFlags(from, flags, components);
+  assignFlags(date, ~flags & AllFields, components);
+  return dateFromComponents(components);
+}
+
+Date dateFromComponents(const DateComponents& c) {
+  auto orMinimum = [](int value, int minimum) { return value == DateComponents::kUnset ? minimum : value; };
+  return fromUDate(build(orMinimum(c.year, 1), orMinimum(c.month, 1), orMinimum(c.day, 1),
+                         orMinimum(c.hour, 0), orMinimum(c.minute, 0), orMinimum(c.second, 0)));
+}
+
+bool isEarlierThen(Date date, Date other) {
+  return midnight(date) < midnight(other);
+}
+
+bool isEarlierThenToday(Date date) {
+  return midnight(date) < midnight(Date::now());
+}
+
+bool isLaterThenToday(Date date) {
+  return midnight(date) > midnight(Date::now());
+}
+
+QString shortFormat(Date date) {
+  return formatShort(date, false);
+}
+
+QString shortFormatWithTime(Date date) {
+  return formatShort(date, true);
+}
+
+// Both use the offset in force now, whatever the offset at the converted instant: converting a summer
+// date in winter shifts it by the winter offset.
+Date GMTFromLocalDate(Date date) {
+  return date.addingSeconds(-presentOffsetSeconds());
+}
+
+Date localDateFromGMT(Date date) {
+  return date.addingSeconds(presentOffsetSeconds());
+}
+
+Range rangeForToday() {
+  const Date now = Date::now();
+  return {midnight(now), midnight(tomorrow(now))};
+}
+
+Range rangeForYesterday() {
+  const Date now = Date::now();
+  return {midnight(yesterday(now)), midnight(now)};
+}
+
+Range rangeForThisWeek() {
+  const Date now = Date::now();
+  return {beginOfWeek(now), beginOfWeek(nextWeek(now))};
+}
+
+Range rangeForLastWeek() {
+  const Date now = Date::now();
+  return {beginOfWeek(lastWeek(now)), beginOfWeek(now)};
+}
+
+Range rangeForThisMonth() {
+  const Date now = Date::now();
+  return {beginOfMonth(now), beginOfNextMonth(now)};
+}
+
+Range rangeForLastMonth() {
+  const Date now = Date::now();
+  return {beginOfLastMonth(now), beginOfMonth(now)};
+}
+
+Range rangeForThisYear() {
+  const Date now = Date::now();
+  return {beginOfYear(now), beginOfNextYear(now)};
+}
+
+Range rangeForLastYear() {
+  const Date now = Date::now();
+  return {beginOfLastYear(now), beginOfYear(now)};
+}
+
+bool setDefaultTimeZone(const QString& zoneId) {
+  const icu::UnicodeString id(reinterpret_cast<const UChar*>(zoneId.utf16()), int32_t(zoneId.size()));
+  std::unique_ptr<icu::TimeZone> zone(icu::TimeZone::createTimeZone(id));
+  // ICU answers an id it does not know with the "Etc/Unknown" zone rather than with an error.
+  if (!zone) return false;
+  icu::UnicodeString resolved, unknown;
+  zone->getID(resolved);
+  icu::TimeZone::getUnknown().getID(unknown);
+  if (resolved == unknown) return false;
+  icu::TimeZone::adoptDefault(zone.release());
+  state().reset();
+  return true;
+}
+
+}  // namespace RZDate

@@ -1,0 +1,148 @@
+#include "DurationText.h"
+
+#include "Decimal.h"
+
+#include <gtest/gtest.h>
+
+#include <QLocale>
+
+#include <cstdint>
+#include <limits>
+
+namespace {
+
+struct Formatted {
+  std::int32_t value;
+  const char* text;
+};
+
+TEST(DurationText, MinutesAsHoursAndMinutes) {
+  const Formatted cases[] = {
+      {0, "00:00"},
+      {5, "00:05"},
+      {9, "00:09"},
+      {10, "00:10"},
+      {59, "00:59"},
+      {60, "01:00"},
+      {61, "01:01"},
+      {90, "01:30"},
+      {549, "09:09"},
+      {600, "10:00"},
+      {610, "10:10"},
+      {6000, "100:00"},  // hours never roll into days
+      // Negative values keep their historical look: a "0" in front of each signed part.
+      {-5, "00:0-5"},
+      {-60, "0-1:00"},
+      {-90, "0-1:0-30"},
+      {-600, "0-10:00"},
+      {std::numeric_limits<std::int32_t>::max(), "35791394:07"},
+      {std::numeric_limits<std::int32_t>::min(), "0-35791394:0-8"},
+  };
+  for (const Formatted& c : cases) EXPECT_EQ(DurationText::stringWithMinutes(c.value), c.text) << c.value;
+}
+
+TEST(DurationText, SecondsAsHoursMinutesAndSeconds) {
+  const Formatted cases[] = {
+      {0, "00:00:00"},       {59, "00:00:59"},       {60, "00:01:00"},
+      {3600, "01:00:00"},    {3725, "01:02:05"},     {36610, "10:10:10"},
+      {360000, "100:00:00"}, {-3725, "0-1:0-2:0-5"}, {-59, "00:00:0-59"},
+  };
+  for (const Formatted& c : cases) EXPECT_EQ(DurationText::stringWithSeconds(c.value), c.text) << c.value;
+}
+
+TEST(DurationText, NumbersAreTakenAsWholeMinutes) {
+  const struct {
+    QVariant number;
+    const char* text;
+  } cases[] = {
+      {QVariant(90), "01:30"},
+      {QVariant(qlonglong(75)), "01:15"},
+      {QVariant(2.9), "00:02"},  // truncated, not rounded
+      {QVariant(-2.9), "00:0-2"},
+      {QVariant(59.999), "00:59"},
+      {QVariant::fromValue(*Decimal::fromString(u"90.99")), "01:30"},
+      {QVariant(true), "00:01"},
+      {QVariant(), "00:00"},
+      {QVariant(qlonglong(1) << 40), "35791394:07"},  // beyond 32 bits: saturates
+  };
+  for (const auto& c : cases)
+    EXPECT_EQ(DurationText::durationString(c.number), c.text) << c.number.toString().toStdString();
+}
+
+struct Parsed {
+  const char* text;
+  int minutes;
+};
+
+TEST(DurationText, ParsesTypedDurationsLeniently) {
+  const Parsed cases[] = {
+      {"45", 45},
+      {"1:30", 90},
+      {"2:0", 120},
+      {"0:90", 90},
+      {"1:00:00", 1440},  // days, hours, minutes
+      {":15", 15},
+      {"1:2:3:4", 3064},  // the leftmost piece is ignored
+      {"0:0:0:0:0:7", 7},
+      {"abc", 0},
+      {"", 0},
+      {"::", 0},
+      {"1:abc", 60},
+      {"5m", 0},
+      {" 1 : 30 ", 90},
+      {"2.5", 2},
+      {"1:2.5", 62},
+      {"-5", -5},
+      {"1:-30", 30},
+      {"+7", 7},
+      {"99999999999", std::numeric_limits<int>::max()},
+  };
+  for (const Parsed& c : cases)
+    EXPECT_EQ(DurationText::minutesFromString(QString::fromUtf8(c.text)), c.minutes) << c.text;
+  EXPECT_EQ(DurationText::stringWithMinutes(DurationText::minutesFromString("0:90")), "01:30");
+}
+
+TEST(DurationText, PiecesAreReadInTheUsersLocale) {
+  const QLocale previous;
+  QLocale::setDefault(QLocale(QLocale::German, QLocale::Germany));
+  const Parsed cases[] = {{"2,5", 2}, {"1.000", 1000}, {"2.5", 2}, {"1:2,9", 62}, {"1.440:0", 1440 * 60}};
+  for (const Parsed& c : cases)
+    EXPECT_EQ(DurationText::minutesFromString(QString::fromUtf8(c.text)), c.minutes) << c.text;
+  QLocale::setDefault(previous);
+}
+
+TEST(WTDurationFormatter, FormatsAndAlwaysParses) {
+  const WTDurationFormatter formatter;
+  EXPECT_EQ(formatter.stringForObjectValue(QVariant(2.9)), "00:02");
+  EXPECT_EQ(formatter.stringForObjectValue(QVariant(6000)), "100:00");
+
+  for (const Parsed& c : {Parsed{"1:2:3:4", 3064}, Parsed{"abc", 0}, Parsed{"", 0}, Parsed{"1:30", 90}}) {
+    QVariant result(QStringLiteral("stale"));
+    QString error;
+    EXPECT_TRUE(formatter.getObjectValue(&result, QString::fromUtf8(c.text), &error)) << c.text;
+    EXPECT_EQ(result.typeId(), QMetaType::Int) << c.text;
+    EXPECT_EQ(result.toInt(), c.minutes) << c.text;
+    EXPECT_TRUE(error.isEmpty()) << c.text;
+  }
+}
+
+TEST(WTDurationTransformer, TransformsBothWays) {
+  const WTDurationTransformer transformer;
+  EXPECT_EQ(WTDurationTransformer::transformedValueClass(), QMetaType::fromType<QString>());
+  EXPECT_TRUE(WTDurationTransformer::allowsReverseTransformation());
+
+  const QVariant shown = transformer.transformedValue(QVariant(90));
+  EXPECT_EQ(shown.typeId(), QMetaType::QString);
+  EXPECT_EQ(shown.toString(), "01:30");
+  EXPECT_EQ(transformer.transformedValue(QVariant(2.9)).toString(), "00:02");
+  EXPECT_FALSE(transformer.transformedValue(QVariant()).isValid());
+
+  const QVariant minutes = transformer.reverseTransformedValue(QStringLiteral("1:00:00"));
+  EXPECT_EQ(minutes.typeId(), QMetaType::Int);
+  EXPECT_EQ(minutes.toInt(), 1440);
+  EXPECT_EQ(transformer.reverseTransformedValue(QStringLiteral("0:90")).toInt(), 90);
+  EXPECT_EQ(transformer.reverseTransformedValue(QStringLiteral("x")).toInt(), 0);
+  EXPECT_EQ(transformer.reverseTransformedValue(QVariant()).toInt(), 0);
+}
+
+}  // namespace

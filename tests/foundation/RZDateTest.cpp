@@ -1,0 +1,578 @@
+#include "RZDate.h"
+
+#include <gtest/gtest.h>
+
+#include <QDate>
+#include <QDateTime>
+#include <QTimeZone>
+
+#include <unicode/locid.h>
+#include <unicode/timezone.h>
+
+#include <algorithm>
+#include <cmath>
+#include <memory>
+#include <ostream>
+#include <random>
+#include <vector>
+
+// Failures show the instant in UTC with milliseconds.
+static void PrintTo(const Date& date, std::ostream* out) {
+  *out << date.toQDateTime().toUTC().toString(Qt::ISODateWithMs).toStdString();
+}
+
+namespace {
+
+// Expected instants are built by Qt's own time-zone code (the system's tz files), not by ICU.
+Date utc(int year, int month, int day, int hour = 0, int minute = 0, int second = 0, int ms = 0) {
+  return Date::fromQDateTime(
+      QDateTime(QDate(year, month, day), QTime(hour, minute, second, ms), QTimeZone::utc()));
+}
+
+QString defaultZoneId() {
+  std::unique_ptr<icu::TimeZone> zone(icu::TimeZone::createDefault());
+  icu::UnicodeString id;
+  zone->getID(id);
+  return QString(reinterpret_cast<const QChar*>(id.getBuffer()), id.length());
+}
+
+// Restores the default zone, the clock and the ICU locale whatever a test changed.
+class DateEnvironment {
+ public:
+  DateEnvironment() : zone_(defaultZoneId()), locale_(icu::Locale::getDefault()) {}
+  ~DateEnvironment() {
+    Date::setClockForTesting({});
+    UErrorCode status = U_ZERO_ERROR;
+    icu::Locale::setDefault(locale_, status);
+    RZDate::setDefaultTimeZone(zone_);
+  }
+  DateEnvironment(const DateEnvironment&) = delete;
+  DateEnvironment& operator=(const DateEnvironment&) = delete;
+
+ private:
+  QString zone_;
+  icu::Locale locale_;
+};
+
+void setLocale(const char* name) {
+  UErrorCode status = U_ZERO_ERROR;
+  icu::Locale::setDefault(icu::Locale(name), status);
+  ASSERT_TRUE(U_SUCCESS(status));
+}
+
+void fixClock(Date now) {
+  Date::setClockForTesting([now] { return now; });
+}
+
+// A wall-clock time in the zone under test.
+struct Wall {
+  int year, month, day, hour = 0, minute = 0, second = 0, ms = 0;
+};
+
+using Op = Date (*)(Date);
+
+// ---------------------------------------------------------------------------------------------------
+// Behaviour that must be the same in every zone, on days without a transition.
+
+class RZDateInZone : public ::testing::TestWithParam<const char*> {
+ protected:
+  void SetUp() override { ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(GetParam()))); }
+
+  Date at(const Wall& w) const {
+    const QDateTime local(QDate(w.year, w.month, w.day), QTime(w.hour, w.minute, w.second, w.ms),
+                          QTimeZone(QByteArray(GetParam())));
+    EXPECT_TRUE(local.isValid());
+    return Date::fromQDateTime(local);
+  }
+
+  DateEnvironment environment_;
+};
+
+struct StepCase {
+  const char* what;
+  Op op;
+  Wall from, expected;
+};
+
+TEST_P(RZDateInZone, SteppingOperations) {
+  const StepCase cases[] = {
+      {"midnight of 23:59:59.999", RZDate::midnight, {2024, 5, 14, 23, 59, 59, 999}, {2024, 5, 14}},
+      {"midnight of midnight", RZDate::midnight, {2024, 5, 14}, {2024, 5, 14}},
+      {"midnight of noon", RZDate::midnight, {2023, 11, 20, 12}, {2023, 11, 20}},
+      {"tomorrow", RZDate::tomorrow, {2024, 5, 14, 15}, {2024, 5, 15}},
+      {"tomorrow at month end", RZDate::tomorrow, {2024, 5, 31, 23, 59, 59}, {2024, 6, 1}},
+      {"tomorrow at year end", RZDate::tomorrow, {2024, 12, 31, 12}, {2025, 1, 1}},
+      {"yesterday into leap day", RZDate::yesterday, {2024, 3, 1}, {2024, 2, 29}},
+      {"yesterday into 28 February", RZDate::yesterday, {2023, 3, 1, 8}, {2023, 2, 28}},
+      {"yesterday into last year", RZDate::yesterday, {2024, 1, 1, 0, 30}, {2023, 12, 31}},
+      {"nextWeek over the year end", RZDate::nextWeek, {2024, 12, 28, 18}, {2025, 1, 4}},
+      {"lastWeek over a month end", RZDate::lastWeek, {2024, 5, 3, 1}, {2024, 4, 26}},
+      {"beginOfMonth", RZDate::beginOfMonth, {2024, 5, 31, 23, 59}, {2024, 5, 1}},
+      {"beginOfNextMonth in December", RZDate::beginOfNextMonth, {2024, 12, 15, 10}, {2025, 1, 1}},
+      {"beginOfNextMonth on 31 January", RZDate::beginOfNextMonth, {2024, 1, 31, 10}, {2024, 2, 1}},
+      {"beginOfLastMonth in January", RZDate::beginOfLastMonth, {2024, 1, 20, 10}, {2023, 12, 1}},
+      {"beginOfLastMonth on 31 March", RZDate::beginOfLastMonth, {2024, 3, 31, 12}, {2024, 2, 1}},
+      {"beginOfWeek on Sunday", RZDate::beginOfWeek, {2024, 5, 12, 10}, {2024, 5, 12}},
+      {"beginOfWeek on Sunday midnight", RZDate::beginOfWeek, {2024, 5, 12}, {2024, 5, 12}},
+      {"beginOfWeek on Saturday night", RZDate::beginOfWeek, {2024, 5, 18, 23, 59, 59}, {2024, 5, 12}},
+      {"beginOfWeek over a month end", RZDate::beginOfWeek, {2024, 6, 1, 12}, {2024, 5, 26}},
+      {"beginOfWeek over a year end", RZDate::beginOfWeek, {2025, 1, 1, 10}, {2024, 12, 29}},
+      {"beginOfYear", RZDate::beginOfYear, {2024, 12, 31, 23, 59, 59}, {2024, 1, 1}},
+      {"beginOfNextYear", RZDate::beginOfNextYear, {2024, 6, 15}, {2025, 1, 1}},
+      {"beginOfLastYear on 1 January", RZDate::beginOfLastYear, {2024, 1, 1}, {2023, 1, 1}},
+      {"beginOfMinute", RZDate::beginOfMinute, {2024, 5, 14, 12, 34, 56, 789}, {2024, 5, 14, 12, 34}},
+      {"beginOfMinute on the minute", RZDate::beginOfMinute, {2024, 5, 14, 12, 34}, {2024, 5, 14, 12, 34}},
+      {"nextMonth of 31 January", RZDate::nextMonth, {2023, 1, 31, 10}, {2023, 3, 3}},
+      {"nextMonth of 31 January, leap year", RZDate::nextMonth, {2024, 1, 31, 10}, {2024, 3, 2}},
+      {"nextMonth of 30 January", RZDate::nextMonth, {2024, 1, 30, 10}, {2024, 3, 1}},
+      {"nextMonth in December", RZDate::nextMonth, {2024, 12, 15, 8}, {2025, 1, 15}},
+      {"nextYear of a leap day", RZDate::nextYear, {2024, 2, 29, 12}, {2025, 3, 1}},
+      {"nextYear", RZDate::nextYear, {2024, 5, 14, 12}, {2025, 5, 14}},
+      {"addMonth -1 on 31 March",
+       [](Date d) { return RZDate::addMonth(d, -1); },
+       {2024, 3, 31, 12},
+       {2024, 3, 2}},
+      {"addMonth -1 on 31 March 2023",
+       [](Date d) { return RZDate::addMonth(d, -1); },
+       {2023, 3, 31},
+       {2023, 3, 3}},
+      {"addMonth -17", [](Date d) { return RZDate::addMonth(d, -17); }, {2024, 5, 15}, {2022, 12, 15}},
+      {"addMonth 25", [](Date d) { return RZDate::addMonth(d, 25); }, {2024, 5, 15}, {2026, 6, 15}},
+      {"addMonth 0", [](Date d) { return RZDate::addMonth(d, 0); }, {2024, 5, 15, 13}, {2024, 5, 15}},
+  };
+  for (const StepCase& c : cases) EXPECT_EQ(c.op(at(c.from)), at(c.expected)) << c.what;
+}
+
+TEST_P(RZDateInZone, TakingFieldsFromAnotherDate) {
+  const Date receiver = at({2024, 5, 14, 14, 30, 15, 250});
+  const Date other = at({2023, 11, 3, 8, 45, 50});
+  EXPECT_EQ(RZDate::dateByTakingDateUnitsFrom(receiver, at({2024, 5, 2, 8})), at({2024, 5, 2, 14, 30, 15}));
+
+  struct Case {
+    unsigned flags;
+    Wall expected;
+  };
+  const Case cases[] = {
+      {RZDate::DayUnits, {2023, 11, 3, 14, 30, 15}},
+      {RZDate::TimeUnits, {2024, 5, 14, 8, 45, 50}},
+      {RZDate::MinuteUnits, {2023, 11, 3, 8, 45, 15}},
+      {RZDate::AllFields, {2023, 11, 3, 8, 45, 50}},
+      {RZDate::Year, {2023, 5, 14, 14, 30, 15}},
+      {RZDate::Month, {2024, 11, 14, 14, 30, 15}},
+      {RZDate::Minute | RZDate::Second, {2024, 5, 14, 14, 45, 50}},
+      {0, {2024, 5, 14, 14, 30, 15}},
+      {RZDate::Weekday, {2024, 5, 14, 14, 30, 15}},
+      {RZDate::WeekUnits, {2023, 11, 3, 14, 30, 15}},
+  };
+  for (const Case& c : cases)
+    EXPECT_EQ(RZDate::dateByTakingComponents(receiver, c.flags, other), at(c.expected))
+        << "flags " << c.flags;
+
+  // Fields taken from two dates may name a day that does not exist; the calendar rolls it over.
+  EXPECT_EQ(
+      RZDate::dateByTakingComponents(at({2024, 1, 31, 10}), RZDate::Year | RZDate::Month, at({2023, 2, 10})),
+      at({2023, 3, 3, 10}));
+}
+
+TEST_P(RZDateInZone, AssignFlagsCopiesOnlyTheNamedFields) {
+  RZDate::DateComponents components;
+  components.minute = 7;
+  RZDate::assignFlags(at({2024, 5, 14, 14, 30, 15}), RZDate::Year | RZDate::Hour | RZDate::Weekday,
+                      components);
+  EXPECT_EQ(components.year, 2024);
+  EXPECT_EQ(components.hour, 14);
+  EXPECT_EQ(components.minute, 7);
+  EXPECT_EQ(components.month, RZDate::DateComponents::kUnset);
+  EXPECT_EQ(components.day, RZDate::DateComponents::kUnset);
+  EXPECT_EQ(components.second, RZDate::DateComponents::kUnset);
+
+  RZDate::assignFlags(at({2023, 12, 31, 23, 59, 58}), RZDate::AllFields, components);
+  EXPECT_EQ(components.year, 2023);
+  EXPECT_EQ(components.month, 12);
+  EXPECT_EQ(components.day, 31);
+  EXPECT_EQ(components.hour, 23);
+  EXPECT_EQ(components.minute, 59);
+  EXPECT_EQ(components.second, 58);
+}
+
+TEST_P(RZDateInZone, DateFromComponentsRollsOverAndFillsUnsetFields) {
+  EXPECT_EQ(RZDate::dateFromComponents({2024, 2, 30, 25, 0, 0}), at({2024, 3, 2, 1}));
+  EXPECT_EQ(RZDate::dateFromComponents({2024, 13, 0, 0, 0, 0}), at({2024, 12, 31}));
+  RZDate::DateComponents partial;
+  partial.year = 2024;
+  partial.hour = 9;
+  EXPECT_EQ(RZDate::dateFromComponents(partial), at({2024, 1, 1, 9}));
+}
+
+TEST_P(RZDateInZone, DayComparisons) {
+  struct Case {
+    Wall a, b;
+    bool earlier;
+  };
+  const Case cases[] = {
+      {{2024, 5, 14, 8}, {2024, 5, 14, 20}, false},
+      {{2024, 5, 14, 20}, {2024, 5, 14, 8}, false},
+      {{2024, 5, 14}, {2024, 5, 14}, false},
+      {{2024, 5, 14, 23, 59, 59}, {2024, 5, 15}, true},
+      {{2024, 5, 15}, {2024, 5, 14, 23, 59, 59}, false},
+      {{2023, 12, 31, 12}, {2024, 1, 1, 1}, true},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(RZDate::isEarlierThen(at(c.a), at(c.b)), c.earlier)
+        << at(c.a).secondsSince1970() << " vs " << at(c.b).secondsSince1970();
+  }
+
+  fixClock(at({2024, 5, 15, 15}));
+  struct TodayCase {
+    Wall date;
+    bool earlier, later;
+  };
+  const TodayCase today[] = {
+      {{2024, 5, 14, 23, 59, 59}, true, false},
+      {{2024, 5, 15}, false, false},
+      {{2024, 5, 15, 23, 59, 59}, false, false},
+      {{2024, 5, 16}, false, true},
+      {{2023, 6, 1}, true, false},
+  };
+  for (const TodayCase& c : today) {
+    EXPECT_EQ(RZDate::isEarlierThenToday(at(c.date)), c.earlier) << c.date.day << " " << c.date.hour;
+    EXPECT_EQ(RZDate::isLaterThenToday(at(c.date)), c.later) << c.date.day << " " << c.date.hour;
+  }
+}
+
+TEST_P(RZDateInZone, RangesFromAFixedClock) {
+  struct Case {
+    const char* what;
+    RZDate::Range (*range)();
+    Wall start, end;
+  };
+  // Wednesday 15 May 2024, 15:00.
+  fixClock(at({2024, 5, 15, 15}));
+  const Case may[] = {
+      {"today", RZDate::rangeForToday, {2024, 5, 15}, {2024, 5, 16}},
+      {"yesterday", RZDate::rangeForYesterday, {2024, 5, 14}, {2024, 5, 15}},
+      {"this week", RZDate::rangeForThisWeek, {2024, 5, 12}, {2024, 5, 19}},
+      {"last week", RZDate::rangeForLastWeek, {2024, 5, 5}, {2024, 5, 12}},
+      {"this month", RZDate::rangeForThisMonth, {2024, 5, 1}, {2024, 6, 1}},
+      {"last month", RZDate::rangeForLastMonth, {2024, 4, 1}, {2024, 5, 1}},
+      {"this year", RZDate::rangeForThisYear, {2024, 1, 1}, {2025, 1, 1}},
+      {"last year", RZDate::rangeForLastYear, {2023, 1, 1}, {2024, 1, 1}},
+  };
+  for (const Case& c : may) {
+    const RZDate::Range range = c.range();
+    EXPECT_EQ(range[0], at(c.start)) << c.what;
+    EXPECT_EQ(range[1], at(c.end)) << c.what;
+  }
+
+  // Wednesday 1 January 2025, 00:00:00.5: every range but today's reaches into the year before.
+  fixClock(at({2025, 1, 1, 0, 0, 0, 500}));
+  const Case newYear[] = {
+      {"today", RZDate::rangeForToday, {2025, 1, 1}, {2025, 1, 2}},
+      {"yesterday", RZDate::rangeForYesterday, {2024, 12, 31}, {2025, 1, 1}},
+      {"this week", RZDate::rangeForThisWeek, {2024, 12, 29}, {2025, 1, 5}},
+      {"last week", RZDate::rangeForLastWeek, {2024, 12, 22}, {2024, 12, 29}},
+      {"this month", RZDate::rangeForThisMonth, {2025, 1, 1}, {2025, 2, 1}},
+      {"last month", RZDate::rangeForLastMonth, {2024, 12, 1}, {2025, 1, 1}},
+      {"this year", RZDate::rangeForThisYear, {2025, 1, 1}, {2026, 1, 1}},
+      {"last year", RZDate::rangeForLastYear, {2024, 1, 1}, {2025, 1, 1}},
+  };
+  for (const Case& c : newYear) {
+    const RZDate::Range range = c.range();
+    EXPECT_EQ(range[0], at(c.start)) << c.what;
+    EXPECT_EQ(range[1], at(c.end)) << c.what;
+  }
+}
+
+// The cached day bounds of midnight() must never hand out a day they do not cover: walk across two
+// transitions of the zone forwards, backwards and shuffled, and compare with Qt's start of the local day.
+TEST_P(RZDateInZone, MidnightAgreesWithTheZoneAroundTransitions) {
+  const QTimeZone zone{QByteArray(GetParam())};
+  std::vector<Date> instants;
+  for (const QDate& day : {QDate(2024, 3, 8), QDate(2024, 3, 29), QDate(2024, 4, 4), QDate(2024, 10, 3),
+                           QDate(2024, 10, 25), QDate(2024, 11, 1), QDate(2024, 9, 5)}) {
+    const Date from = Date::fromQDateTime(day.startOfDay(zone));
+    for (int step = 0; step < 4 * 24 * 5; ++step) instants.push_back(from.addingSeconds(step * 900.0 + 7.5));
+  }
+  auto check = [&](const std::vector<Date>& order) {
+    for (Date t : order) {
+      const QDate localDay = t.toQDateTime().toTimeZone(zone).date();
+      const Date expected = Date::fromQDateTime(localDay.startOfDay(zone));
+      ASSERT_EQ(RZDate::midnight(t), expected)
+          << "at " << t.toQDateTime().toUTC().toString(Qt::ISODate).toStdString();
+    }
+  };
+  check(instants);
+  std::reverse(instants.begin(), instants.end());
+  check(instants);
+  std::shuffle(instants.begin(), instants.end(), std::mt19937(42));
+  check(instants);
+}
+
+INSTANTIATE_TEST_SUITE_P(Zones, RZDateInZone,
+                         ::testing::Values("Europe/Berlin", "America/New_York", "Australia/Lord_Howe",
+                                           "America/Santiago"),
+                         [](const auto& info) {
+                           std::string name = info.param;
+                           std::replace(name.begin(), name.end(), '/', '_');
+                           return name;
+                         });
+
+// ---------------------------------------------------------------------------------------------------
+// Days with a transition. Expected instants are written in UTC from the zones' rules:
+// Berlin +1/+2, changes 31 Mar 2024 02:00->03:00 and 27 Oct 2024 03:00->02:00;
+// New York -5/-4, changes 10 Mar 2024 02:00->03:00 and 3 Nov 2024 02:00->01:00;
+// Lord Howe +10:30/+11, changes 7 Apr 2024 02:00->01:30 and 6 Oct 2024 02:00->02:30;
+// Santiago -4/-3, changes 7 Apr 2024 00:00->6 Apr 23:00 and 8 Sep 2024 00:00->01:00 (no midnight that day).
+// Wall times that a change skips are read with the offset before it; repeated ones as the later pass.
+
+struct TransitionCase {
+  const char* zone;
+  const char* what;
+  Op op;
+  Date from, expected;
+};
+
+TEST(RZDateTransitions, StepsOnDaysWithAChange) {
+  DateEnvironment environment;
+  const TransitionCase cases[] = {
+      {"Europe/Berlin", "midnight, 23-hour day", RZDate::midnight, utc(2024, 3, 31, 10),
+       utc(2024, 3, 30, 23)},
+      {"Europe/Berlin", "tomorrow, 23-hour day", RZDate::tomorrow, utc(2024, 3, 31, 10),
+       utc(2024, 3, 31, 22)},
+      {"Europe/Berlin", "tomorrow into it", RZDate::tomorrow, utc(2024, 3, 30, 12), utc(2024, 3, 30, 23)},
+      {"Europe/Berlin", "yesterday across it", RZDate::yesterday, utc(2024, 4, 1, 10), utc(2024, 3, 30, 23)},
+      {"Europe/Berlin", "nextWeek across it", RZDate::nextWeek, utc(2024, 3, 27, 12), utc(2024, 4, 2, 22)},
+      {"Europe/Berlin", "beginOfWeek across it", RZDate::beginOfWeek, utc(2024, 4, 3, 10),
+       utc(2024, 3, 30, 23)},
+      {"Europe/Berlin", "midnight, 25-hour day", RZDate::midnight, utc(2024, 10, 27, 11),
+       utc(2024, 10, 26, 22)},
+      {"Europe/Berlin", "tomorrow, 25-hour day", RZDate::tomorrow, utc(2024, 10, 27, 11),
+       utc(2024, 10, 27, 23)},
+      {"Europe/Berlin", "midnight, first 02:30", RZDate::midnight, utc(2024, 10, 27, 0, 30),
+       utc(2024, 10, 26, 22)},
+      {"Europe/Berlin", "midnight, second 02:30", RZDate::midnight, utc(2024, 10, 27, 1, 30),
+       utc(2024, 10, 26, 22)},
+      {"Europe/Berlin", "beginOfMinute, first 02:30", RZDate::beginOfMinute, utc(2024, 10, 27, 0, 30, 45),
+       utc(2024, 10, 27, 1, 30)},
+      {"Europe/Berlin", "beginOfMinute, second 02:30", RZDate::beginOfMinute, utc(2024, 10, 27, 1, 30, 45),
+       utc(2024, 10, 27, 1, 30)},
+      {"Europe/Berlin", "beginOfMinute after the gap", RZDate::beginOfMinute, utc(2024, 3, 31, 1, 0, 30),
+       utc(2024, 3, 31, 1)},
+      {"America/New_York", "midnight, 23-hour day", RZDate::midnight, utc(2024, 3, 10, 16),
+       utc(2024, 3, 10, 5)},
+      {"America/New_York", "tomorrow, 23-hour day", RZDate::tomorrow, utc(2024, 3, 10, 16),
+       utc(2024, 3, 11, 4)},
+      {"America/New_York", "yesterday across it", RZDate::yesterday, utc(2024, 3, 11, 16),
+       utc(2024, 3, 10, 5)},
+      {"America/New_York", "midnight, 25-hour day", RZDate::midnight, utc(2024, 11, 3, 17),
+       utc(2024, 11, 3, 4)},
+      {"America/New_York", "tomorrow, 25-hour day", RZDate::tomorrow, utc(2024, 11, 3, 17),
+       utc(2024, 11, 4, 5)},
+      {"America/New_York", "midnight, first 01:30", RZDate::midnight, utc(2024, 11, 3, 5, 30, 45),
+       utc(2024, 11, 3, 4)},
+      {"America/New_York", "beginOfMinute, first 01:30", RZDate::beginOfMinute, utc(2024, 11, 3, 5, 30, 45),
+       utc(2024, 11, 3, 6, 30)},
+      {"America/New_York", "beginOfMinute, second 01:30", RZDate::beginOfMinute, utc(2024, 11, 3, 6, 30, 45),
+       utc(2024, 11, 3, 6, 30)},
+      {"Australia/Lord_Howe", "midnight, 24.5-hour day", RZDate::midnight, utc(2024, 4, 7, 1, 30),
+       utc(2024, 4, 6, 13)},
+      {"Australia/Lord_Howe", "tomorrow, 24.5-hour day", RZDate::tomorrow, utc(2024, 4, 7, 1, 30),
+       utc(2024, 4, 7, 13, 30)},
+      {"Australia/Lord_Howe", "midnight, 23.5-hour day", RZDate::midnight, utc(2024, 10, 6, 1),
+       utc(2024, 10, 5, 13, 30)},
+      {"Australia/Lord_Howe", "tomorrow, 23.5-hour day", RZDate::tomorrow, utc(2024, 10, 6, 1),
+       utc(2024, 10, 6, 13)},
+      {"Australia/Lord_Howe", "midnight, first 01:45", RZDate::midnight, utc(2024, 4, 6, 14, 45, 45),
+       utc(2024, 4, 6, 13)},
+      {"Australia/Lord_Howe", "beginOfMinute, first 01:45", RZDate::beginOfMinute,
+       utc(2024, 4, 6, 14, 45, 45), utc(2024, 4, 6, 15, 15)},
+      {"Australia/Lord_Howe", "beginOfMinute, second 01:45", RZDate::beginOfMinute,
+       utc(2024, 4, 6, 15, 15, 45), utc(2024, 4, 6, 15, 15)},
+      {"Australia/Lord_Howe", "beginOfMinute after the gap", RZDate::beginOfMinute,
+       utc(2024, 10, 5, 15, 30, 30), utc(2024, 10, 5, 15, 30)},
+      {"America/Santiago", "midnight of a day without one", RZDate::midnight, utc(2024, 9, 8, 15),
+       utc(2024, 9, 8, 4)},
+      {"America/Santiago", "tomorrow into it", RZDate::tomorrow, utc(2024, 9, 7, 16), utc(2024, 9, 8, 4)},
+      {"America/Santiago", "midnight of its first instant", RZDate::midnight, utc(2024, 9, 8, 4),
+       utc(2024, 9, 8, 4)},
+      {"America/Santiago", "midnight of the instant before", RZDate::midnight, utc(2024, 9, 8, 3, 59, 59),
+       utc(2024, 9, 7, 4)},
+      {"America/Santiago", "midnight, first 23:30", RZDate::midnight, utc(2024, 4, 7, 2, 30),
+       utc(2024, 4, 6, 3)},
+      {"America/Santiago", "midnight, second 23:30", RZDate::midnight, utc(2024, 4, 7, 3, 30),
+       utc(2024, 4, 6, 3)},
+      {"America/Santiago", "tomorrow, 25-hour day", RZDate::tomorrow, utc(2024, 4, 6, 15),
+       utc(2024, 4, 7, 4)},
+  };
+  for (const TransitionCase& c : cases) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(c.zone)));
+    EXPECT_EQ(c.op(c.from), c.expected) << c.zone << ": " << c.what;
+  }
+}
+
+// Havana turns its clocks back from 01:00 to 00:00 (3 Nov 2024, -4 to -5), so that day's midnight comes
+// twice and the later one counts: the hour before it is already 3 November, yet its midnight lies ahead.
+// Cached day bounds of 2 November must not stretch over that hour.
+TEST(RZDateTransitions, RepeatedMidnightIsTheLaterOne) {
+  DateEnvironment environment;
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("America/Havana"));
+  const struct {
+    Date at, midnight;
+  } walk[] = {
+      {utc(2024, 11, 2, 16), utc(2024, 11, 2, 4)},    {utc(2024, 11, 3, 3, 59, 59), utc(2024, 11, 2, 4)},
+      {utc(2024, 11, 3, 4, 30), utc(2024, 11, 3, 5)}, {utc(2024, 11, 3, 4, 59, 59), utc(2024, 11, 3, 5)},
+      {utc(2024, 11, 3, 5), utc(2024, 11, 3, 5)},     {utc(2024, 11, 3, 5, 30), utc(2024, 11, 3, 5)},
+      {utc(2024, 11, 2, 16), utc(2024, 11, 2, 4)},    {utc(2024, 11, 3, 4, 15), utc(2024, 11, 3, 5)},
+  };
+  for (const auto& step : walk)
+    EXPECT_EQ(RZDate::midnight(step.at), step.midnight) << step.at.secondsSince1970();
+  EXPECT_EQ(RZDate::tomorrow(utc(2024, 11, 2, 16)), utc(2024, 11, 3, 5));
+  EXPECT_TRUE(RZDate::isEarlierThen(utc(2024, 11, 3, 3, 59, 59), utc(2024, 11, 3, 4, 30)));
+}
+
+TEST(RZDateTransitions, FieldsTakenOntoADayWithAChange) {
+  DateEnvironment environment;
+  struct Case {
+    const char* zone;
+    const char* what;
+    Date receiver, dayFrom, expected;
+  };
+  // Receivers are 02:30 / 01:45 wall time on an ordinary day; the argument names the day of the change.
+  const Case cases[] = {
+      {"Europe/Berlin", "02:30 skipped", utc(2024, 5, 14, 0, 30), utc(2024, 3, 31, 12),
+       utc(2024, 3, 31, 1, 30)},
+      {"Europe/Berlin", "02:30 repeated", utc(2024, 5, 14, 0, 30), utc(2024, 10, 27, 12),
+       utc(2024, 10, 27, 1, 30)},
+      {"America/New_York", "02:30 skipped", utc(2024, 5, 14, 6, 30), utc(2024, 3, 10, 18),
+       utc(2024, 3, 10, 7, 30)},
+      {"Australia/Lord_Howe", "02:15 skipped", utc(2024, 5, 13, 15, 45), utc(2024, 10, 6, 2),
+       utc(2024, 10, 5, 15, 45)},
+      {"Australia/Lord_Howe", "01:45 repeated", utc(2024, 5, 13, 15, 15), utc(2024, 4, 7, 2),
+       utc(2024, 4, 6, 15, 15)},
+  };
+  for (const Case& c : cases) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(c.zone)));
+    EXPECT_EQ(RZDate::dateByTakingDateUnitsFrom(c.receiver, c.dayFrom), c.expected)
+        << c.zone << ": " << c.what;
+  }
+}
+
+TEST(RZDateZone, ChangingTheZoneDropsCachedDays) {
+  DateEnvironment environment;
+  const Date t = utc(2024, 5, 14, 23, 30);
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("Europe/Berlin"));
+  EXPECT_EQ(RZDate::midnight(t), utc(2024, 5, 14, 22));
+  EXPECT_EQ(RZDate::midnight(t.addingSeconds(60)), utc(2024, 5, 14, 22));
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("America/New_York"));
+  EXPECT_EQ(RZDate::midnight(t), utc(2024, 5, 14, 4));
+  EXPECT_EQ(RZDate::tomorrow(t), utc(2024, 5, 15, 4));
+  EXPECT_EQ(defaultZoneId(), "America/New_York");
+}
+
+TEST(RZDateZone, UnknownZonesAreRefused) {
+  DateEnvironment environment;
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("Australia/Lord_Howe"));
+  const Date t = utc(2024, 5, 14, 12);
+  const Date before = RZDate::midnight(t);
+  for (const char* id : {"Not/AZone", "", "Europe/Atlantis", "Etc/Unknown"}) {
+    EXPECT_FALSE(RZDate::setDefaultTimeZone(QString::fromLatin1(id))) << id;
+    EXPECT_EQ(defaultZoneId(), "Australia/Lord_Howe") << id;
+    EXPECT_EQ(RZDate::midnight(t), before) << id;
+  }
+}
+
+// Weeks start on Sunday even where the locale starts them on Monday.
+TEST(RZDateZone, WeeksBeginOnSundayInAMondayLocale) {
+  DateEnvironment environment;
+  setLocale("de_DE");
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("Europe/Berlin"));  // the calendar is made afresh under de_DE
+  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 15, 10)), utc(2024, 5, 11, 22));
+  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 12, 10)), utc(2024, 5, 11, 22));
+  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 13, 10)), utc(2024, 5, 11, 22));
+  fixClock(utc(2024, 5, 13, 10));  // a Monday
+  EXPECT_EQ(RZDate::rangeForThisWeek()[0], utc(2024, 5, 11, 22));
+}
+
+TEST(RZDateFormat, ShortFormatsFollowLocaleAndZone) {
+  DateEnvironment environment;
+  const Date afternoon = utc(2024, 5, 14, 12, 30, 40);
+  const Date lateEvening = utc(2024, 5, 14, 23, 30);
+  struct Case {
+    const char* locale;
+    const char* zone;
+    Date date;
+    QString date_text, date_time_text;
+  };
+  const Case cases[] = {
+      {"en_US", "Europe/Berlin", afternoon, "5/14/24", QString::fromUtf8("5/14/24, 2:30\u202fPM")},
+      {"en_US", "America/New_York", afternoon, "5/14/24", QString::fromUtf8("5/14/24, 8:30\u202fAM")},
+      {"en_US", "Europe/Berlin", lateEvening, "5/15/24", QString::fromUtf8("5/15/24, 1:30\u202fAM")},
+      {"en_US", "America/New_York", lateEvening, "5/14/24", QString::fromUtf8("5/14/24, 7:30\u202fPM")},
+      {"de_DE", "Europe/Berlin", afternoon, "14.05.24", "14.05.24, 14:30"},
+      {"de_DE", "Australia/Lord_Howe", afternoon, "14.05.24", "14.05.24, 23:00"},
+  };
+  for (const Case& c : cases) {
+    setLocale(c.locale);
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(c.zone)));
+    EXPECT_EQ(RZDate::shortFormat(c.date), c.date_text) << c.locale << " " << c.zone;
+    EXPECT_EQ(RZDate::shortFormatWithTime(c.date), c.date_time_text) << c.locale << " " << c.zone;
+    EXPECT_EQ(RZDate::shortFormat(c.date), c.date_text) << "the time style must not stick";
+  }
+  // A change of locale alone is seen too.
+  setLocale("en_US");
+  EXPECT_EQ(RZDate::shortFormat(afternoon), "5/14/24");
+}
+
+TEST(RZDateZone, GMTShiftsUseTheOffsetOfNow) {
+  DateEnvironment environment;
+  const Date summer = utc(2024, 7, 1, 12);
+  const Date winter = utc(2024, 1, 15, 12);
+  struct Case {
+    const char* zone;
+    Date now;
+    double offset;
+  };
+  const Case cases[] = {
+      {"Europe/Berlin", winter, 3600},        {"Europe/Berlin", summer, 7200},
+      {"America/New_York", winter, -18000},   {"America/New_York", summer, -14400},
+      {"Australia/Lord_Howe", winter, 39600}, {"Australia/Lord_Howe", summer, 37800},
+  };
+  for (const Case& c : cases) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(c.zone)));
+    fixClock(c.now);
+    // The converted dates lie in the other season on purpose: the present offset applies to both.
+    for (Date d : {summer, winter}) {
+      EXPECT_EQ(RZDate::GMTFromLocalDate(d), d.addingSeconds(-c.offset)) << c.zone;
+      EXPECT_EQ(RZDate::localDateFromGMT(d), d.addingSeconds(c.offset)) << c.zone;
+    }
+  }
+}
+
+// ---------------------------------------------------------------------------------------------------
+// Date itself.
+
+TEST(DateTest, ClockCanBeReplacedAndRestored) {
+  DateEnvironment environment;
+  fixClock(Date::fromSeconds(1234.5));
+  EXPECT_EQ(Date::now(), Date::fromSeconds(1234.5));
+  Date::setClockForTesting({});
+  const double system = double(QDateTime::currentMSecsSinceEpoch()) / 1000.0;
+  EXPECT_NEAR(Date::now().secondsSince1970(), system, 5.0);
+  // Sub-second precision: successive readings differ within a second and carry fractions.
+  bool sawFraction = false;
+  for (int i = 0; i < 5 && !sawFraction; ++i) {
+    const double s = Date::now().secondsSince1970();
+    sawFraction = s != std::floor(s);
+  }
+  EXPECT_TRUE(sawFraction);
+}
+
+TEST(DateTest, QDateTimeRoundTripKeepsMilliseconds) {
+  const QDateTime dateTime(QDate(2024, 5, 14), QTime(12, 30, 40, 123), QTimeZone::utc());
+  const Date date = Date::fromQDateTime(dateTime);
+  EXPECT_DOUBLE_EQ(date.secondsSince1970(), 1715689840.123);
+  EXPECT_EQ(date.toQDateTime(), dateTime);
+  EXPECT_EQ(date.toQDateTime().toMSecsSinceEpoch(), dateTime.toMSecsSinceEpoch());
+}
+
+}  // namespace
