@@ -25,9 +25,9 @@
 // - Wall times that a zone transition skips or repeats are resolved as ICU does by default: a skipped
 //   time is read with the offset in force before the transition (00:30 on a day whose clocks jump from
 //   00:00 to 01:00 is 01:30, and a skipped midnight is therefore the first instant of that day), and a
-//   repeated time is its later occurrence. So beginOfMinute of 02:30:45 in the first pass through a
-//   repeated hour is 02:30:00 of the second pass, one hour minus 45 seconds later, and where midnight
-//   itself repeats, the hour before the later midnight has its midnight ahead of it.
+//   repeated time is its later occurrence. Where midnight itself repeats, the hour before the later
+//   midnight has its midnight ahead of it. beginOfMinute alone works on the instant, not on fields,
+//   and stays in the pass it was given.
 // - ICU counts in whole milliseconds: instants go in snapped to the millisecond (rounding noise of the
 //   double is ignored, true fractions of a millisecond are dropped).
 
@@ -238,8 +238,17 @@ Date beginOfLastYear(Date date) {
 }
 
 Date beginOfMinute(Date date) {
-  const Fields f = fieldsOf(date);
-  return fromUDate(build(f.year, f.month, f.day, f.hour, f.minute));
+  // Dropping the seconds of the local wall clock is subtracting them from the instant, so no calendar
+  // fields are needed: one offset look-up. Rebuilding from fields would also move an instant in the
+  // first pass of a repeated hour into the second pass, and a time entry across it would gain an hour.
+  // Durations call this twice per entry, so it must stay cheap.
+  const UDate ms = toUDate(date);
+  int32_t raw = 0, dst = 0;
+  UErrorCode status = U_ZERO_ERROR;
+  calendar().getTimeZone().getOffset(ms, false, raw, dst, status);
+  if (U_FAILURE(status)) raw = dst = 0;
+  const double local = ms + raw + dst;
+  return fromUDate(ms - (local - std::floor(local / 60000.0) * 60000.0));
 }
 
 Date nextMonth(Date date) {
