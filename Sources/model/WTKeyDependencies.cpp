@@ -6,7 +6,7 @@ namespace {
 
 struct Declaration {
   const char* key;
-  std::initializer_list<const char*> paths;
+  std::vector<const char*> paths;
 };
 
 // The declared dependencies. The circular pairs (a project's rate and inherited rate, a time entry's
