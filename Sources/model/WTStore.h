@@ -11,6 +11,7 @@
 #include <vector>
 
 struct sqlite3;
+struct sqlite3_stmt;
 
 // The one store file: every record in one SQLite table, written in WAL mode with full syncing, one
 // transaction per save. The schema version lives in PRAGMA user_version; a file written by an older
@@ -20,11 +21,20 @@ class WTStore {
  public:
   static constexpr int kSchemaVersion = 1;
 
-  enum ErrorCode { OpenFailed = 1, NotAStore = 2, NewerVersion = 3, MigrationFailed = 4, ReadFailed = 5, WriteFailed = 6 };
+  enum ErrorCode {
+    OpenFailed = 1,
+    NotAStore = 2,
+    NewerVersion = 3,
+    MigrationFailed = 4,
+    ReadFailed = 5,
+    WriteFailed = 6,
+    Damaged = 7
+  };
 
   // Opens the store at `path`, creating the file (not its folder) when missing. The error's message
-  // names the file and says what is wrong, ready to show to the user.
-  static Result<std::unique_ptr<WTStore>> open(const QString& path);
+  // names the file and says what is wrong, ready to show to the user. `vfs` names the SQLite VFS to
+  // use; none for the default (tests pass one that injects faults).
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr);
   ~WTStore();
 
   WTStore(const WTStore&) = delete;
@@ -32,15 +42,25 @@ class WTStore {
 
   QString path() const { return path_; }
 
-  // Reads every record, handing each to `sink` in no particular order.
+  // Reads every record, handing each to `sink` in no particular order. The sink may move out of the
+  // record it is given.
   Result<void> loadAll(const std::function<void(WTStoreRecord&&)>& sink);
 
   // Writes the given records (inserted or replaced whole) and removes the deleted ones, all in one
-  // transaction: after a failure nothing of this save is in the file.
+  // transaction: after a failure nothing of this save is in the file and the store stays usable.
   Result<void> save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids);
 
  private:
   WTStore(QString path, sqlite3* db);
+  Result<void> prepareStatements();
+  Error writeError(int code) const;
+
   QString path_;
   sqlite3* db_ = nullptr;
+  sqlite3_stmt* begin_ = nullptr;
+  sqlite3_stmt* commit_ = nullptr;
+  sqlite3_stmt* rollback_ = nullptr;
+  sqlite3_stmt* replace_ = nullptr;
+  sqlite3_stmt* remove_ = nullptr;
+  sqlite3_stmt* selectAll_ = nullptr;
 };

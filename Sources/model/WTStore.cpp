@@ -1,0 +1,465 @@
+#include "WTStore.h"
+
+#include <QCoreApplication>
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+
+#include <sqlite3.h>
+
+#include <array>
+#include <iterator>
+#include <utility>
+
+namespace {
+
+// "Tssl" in the header's application id marks a SQLite file as ours, so that another program's database
+// is never taken for a store and changed.
+constexpr int kApplicationId = 0x5473736c;
+
+// Another process may hold the write lock for a moment (a second copy of the application).
+constexpr int kBusyTimeoutMs = 2000;
+
+QString tr(const char* text) {
+  return QCoreApplication::translate("WTStore", text);
+}
+
+// The columns, in this order in every statement below: binding index = column + 1.
+enum Column {
+  kUuid,
+  kEntity,
+  kName,
+  kNotes,
+  kRate,
+  kColor,
+  kArchived,
+  kAddressBookUID,
+  kTotalsUID,
+  kClientUuid,
+  kProjectUuid,
+  kPosition,
+  kBudget,
+  kTaskUuid,
+  kStartDate,
+  kEndDate,
+  kRunning,
+  kMinutes,
+  kExpense,
+  kCompleted,
+};
+
+#define WT_STORE_COLUMNS                                                                                   \
+  "uuid, entity, name, notes, rate, color, archived, addressBookUID, totalsUID, clientUuid, projectUuid, " \
+  "position, budget, taskUuid, startDate, endDate, running, minutes, expense, completed"
+
+constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
+constexpr char kReplaceSql[] =
+    "INSERT OR REPLACE INTO records (" WT_STORE_COLUMNS
+    ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
+    "?17, ?18, ?19, ?20)";
+constexpr char kDeleteSql[] = "DELETE FROM records WHERE uuid = ?1";
+
+#undef WT_STORE_COLUMNS
+
+// Schema version 1. Money is the decimal's text (exact, with its exponent), dates are seconds since 1970,
+// colours "#aarrggbb"; NULL stands for "none" and is kept apart from an empty text. No index on the
+// owner columns: the whole graph is read at once and never queried by owner.
+int createVersion1(sqlite3* db) {
+  return sqlite3_exec(db,
+                      "CREATE TABLE records ("
+                      "  uuid TEXT PRIMARY KEY NOT NULL,"
+                      "  entity TEXT NOT NULL,"
+                      "  name TEXT,"
+                      "  notes TEXT,"
+                      "  rate TEXT,"
+                      "  color TEXT,"
+                      "  archived INTEGER NOT NULL DEFAULT 0,"
+                      "  addressBookUID TEXT,"
+                      "  totalsUID TEXT,"
+                      "  clientUuid TEXT,"
+                      "  projectUuid TEXT,"
+                      "  position INTEGER NOT NULL DEFAULT 0,"
+                      "  budget TEXT,"
+                      "  taskUuid TEXT,"
+                      "  startDate REAL,"
+                      "  endDate REAL,"
+                      "  running INTEGER NOT NULL DEFAULT 0,"
+                      "  minutes INTEGER,"
+                      "  expense TEXT,"
+                      "  completed INTEGER NOT NULL DEFAULT 0"
+                      ");"
+                      "PRAGMA application_id = 1416852332;",
+                      nullptr, nullptr, nullptr);
+}
+static_assert(kApplicationId == 1416852332);
+
+// kMigrations[n] takes a file from version n to n + 1. A new schema version appends its step here and
+// raises WTStore::kSchemaVersion; every step runs inside the one migration transaction.
+using Migration = int (*)(sqlite3*);
+constexpr Migration kMigrations[] = {createVersion1};
+static_assert(std::size(kMigrations) == WTStore::kSchemaVersion);
+
+// What went wrong, in words for the user, for SQLite's result code.
+QString reason(int code) {
+  switch (code & 0xff) {
+    case SQLITE_FULL:
+      return tr("the disk is full");
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+      return tr("the file is damaged");
+    case SQLITE_BUSY:
+    case SQLITE_LOCKED:
+      return tr("the file is in use by another program");
+    case SQLITE_READONLY:
+      return tr("the file cannot be written to");
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+      return tr("access to the file was denied");
+    case SQLITE_CANTOPEN:
+      return tr("the file cannot be opened");
+    case SQLITE_IOERR:
+      return tr("the disk could not be read or written");
+    case SQLITE_NOMEM:
+      return tr("there is not enough memory");
+    default:
+      return QString::fromUtf8(sqlite3_errstr(code));
+  }
+}
+
+bool isDamage(int code) {
+  return (code & 0xff) == SQLITE_CORRUPT || (code & 0xff) == SQLITE_NOTADB;
+}
+
+Error damagedError(const QString& path) {
+  return {WTStore::Damaged, tr("The data file “%1” is damaged and cannot be opened.").arg(path)};
+}
+
+Error notAStoreError(const QString& path) {
+  return {WTStore::NotAStore, tr("The file “%1” is not a Tessal data file and cannot be opened.").arg(path)};
+}
+
+// Runs a query to its end (a pragma that writes finishes its transaction only there) and keeps the
+// first value it answers: `read` is called with the first row.
+template <class Read>
+int query(sqlite3* db, const char* sql, Read read) {
+  sqlite3_stmt* statement = nullptr;
+  int code = sqlite3_prepare_v2(db, sql, -1, &statement, nullptr);
+  for (bool first = true; code == SQLITE_OK || code == SQLITE_ROW; first = false) {
+    code = sqlite3_step(statement);
+    if (code == SQLITE_ROW && first) read(statement);
+  }
+  const int finished = sqlite3_finalize(statement);
+  return code == SQLITE_DONE ? finished : code;
+}
+
+int readInteger(sqlite3* db, const char* sql, qint64* value) {
+  return query(db, sql, [&](sqlite3_stmt* statement) { *value = sqlite3_column_int64(statement, 0); });
+}
+
+// The first text a query answers; null when it answers none.
+int readText(sqlite3* db, const char* sql, QByteArray* text) {
+  return query(db, sql, [&](sqlite3_stmt* statement) {
+    *text = QByteArray(reinterpret_cast<const char*>(sqlite3_column_text(statement, 0)));
+  });
+}
+
+// Runs the migration steps from `version` to the current one in one transaction.
+int migrate(sqlite3* db, int version) {
+  int code = sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) return code;
+  for (int step = version; step < WTStore::kSchemaVersion && code == SQLITE_OK; ++step)
+    code = kMigrations[step](db);
+  if (code == SQLITE_OK) {
+    const QByteArray setVersion = "PRAGMA user_version = " + QByteArray::number(WTStore::kSchemaVersion);
+    code = sqlite3_exec(db, setVersion.constData(), nullptr, nullptr, nullptr);
+  }
+  if (code == SQLITE_OK) code = sqlite3_exec(db, "COMMIT", nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK && !sqlite3_get_autocommit(db))
+    sqlite3_exec(db, "ROLLBACK", nullptr, nullptr, nullptr);
+  return code;
+}
+
+// ---- Reading rows. The record is reused from row to row: every field is assigned on every row.
+
+void readString(sqlite3_stmt* statement, int column, QString& out) {
+  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, column));
+  if (!text) {
+    out = QString();
+    return;
+  }
+  const int size = sqlite3_column_bytes(statement, column);
+  // fromUtf8 of nothing may give a null string; an empty text must stay distinct from none.
+  out = size == 0 ? QString(QLatin1StringView("")) : QString::fromUtf8(text, size);
+}
+
+// Entity names repeat on every row: share one string per name instead of making one per row.
+void readEntity(sqlite3_stmt* statement, QString& out) {
+  static const std::array<QString, 8> kNames = {QStringLiteral("WTClient"), QStringLiteral("WTProject"),
+                                                QStringLiteral("WTTask"),   QStringLiteral("WTTime"),
+                                                QStringLiteral("WTFlat"),   QStringLiteral("WTExpense"),
+                                                QStringLiteral("WTNote"),   QStringLiteral("WTToDo")};
+  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, kEntity));
+  const int size = sqlite3_column_bytes(statement, kEntity);
+  const QLatin1StringView name(text, text ? size : 0);
+  for (const QString& known : kNames) {
+    if (known == name) {
+      out = known;
+      return;
+    }
+  }
+  readString(statement, kEntity, out);
+}
+
+// False when the column holds text that is not a number.
+bool readDecimal(sqlite3_stmt* statement, int column, std::optional<Decimal>& out) {
+  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, column));
+  if (!text) {
+    out.reset();
+    return true;
+  }
+  const int size = sqlite3_column_bytes(statement, column);
+  std::array<char16_t, 64> wide;
+  if (size <= int(wide.size())) {
+    // Numbers are ASCII; anything else fails to parse either way.
+    for (int i = 0; i < size; ++i) wide[i] = char16_t(static_cast<unsigned char>(text[i]));
+    out = Decimal::fromString(QStringView(wide.data(), size));
+  } else {
+    out = Decimal::fromString(QString::fromUtf8(text, size));
+  }
+  return out.has_value();
+}
+
+std::optional<Date> readDate(sqlite3_stmt* statement, int column) {
+  if (sqlite3_column_type(statement, column) == SQLITE_NULL) return std::nullopt;
+  return Date::fromSeconds(sqlite3_column_double(statement, column));
+}
+
+// ---- Writing rows.
+
+int bindString(sqlite3_stmt* statement, int column, const QString& text) {
+  if (text.isNull()) return sqlite3_bind_null(statement, column + 1);
+  // The records outlive the statement's step, so SQLite may read the text where it is.
+  return sqlite3_bind_text16(statement, column + 1, text.utf16(), int(text.size() * sizeof(char16_t)),
+                             SQLITE_STATIC);
+}
+
+// The decimal's plain text, except that a positive exponent is written out ("12E+2", not "1200") so that
+// the value reads back with its exponent, and a huge exponent does not turn into a million zeros of text.
+QByteArray decimalText(const Decimal& value) {
+  if (value.exponent() <= 0) return value.toString().toUtf8();
+  QString text = value.toString();
+  if (!value.isZero()) text.chop(value.exponent());
+  return text.toUtf8() + "E+" + QByteArray::number(value.exponent());
+}
+
+int bindDecimal(sqlite3_stmt* statement, int column, const std::optional<Decimal>& value) {
+  if (!value) return sqlite3_bind_null(statement, column + 1);
+  const QByteArray text = decimalText(*value);
+  return sqlite3_bind_text(statement, column + 1, text.constData(), int(text.size()), SQLITE_TRANSIENT);
+}
+
+int bindDate(sqlite3_stmt* statement, int column, const std::optional<Date>& value) {
+  if (!value) return sqlite3_bind_null(statement, column + 1);
+  return sqlite3_bind_double(statement, column + 1, value->secondsSince1970());
+}
+
+int bindRecord(sqlite3_stmt* s, const WTStoreRecord& r) {
+  const int codes[] = {
+      bindString(s, kUuid, r.uuid),
+      bindString(s, kEntity, r.entity),
+      bindString(s, kName, r.name),
+      bindString(s, kNotes, r.notes),
+      bindDecimal(s, kRate, r.rate),
+      bindString(s, kColor, r.color),
+      sqlite3_bind_int(s, kArchived + 1, r.archived),
+      bindString(s, kAddressBookUID, r.addressBookUID),
+      bindString(s, kTotalsUID, r.totalsUID),
+      bindString(s, kClientUuid, r.clientUuid),
+      bindString(s, kProjectUuid, r.projectUuid),
+      sqlite3_bind_int(s, kPosition + 1, r.position),
+      bindDecimal(s, kBudget, r.budget),
+      bindString(s, kTaskUuid, r.taskUuid),
+      bindDate(s, kStartDate, r.startDate),
+      bindDate(s, kEndDate, r.endDate),
+      sqlite3_bind_int(s, kRunning + 1, r.running),
+      r.minutes ? sqlite3_bind_int64(s, kMinutes + 1, *r.minutes) : sqlite3_bind_null(s, kMinutes + 1),
+      bindDecimal(s, kExpense, r.expense),
+      sqlite3_bind_int(s, kCompleted + 1, r.completed),
+  };
+  for (int code : codes) {
+    if (code != SQLITE_OK) return code;
+  }
+  return SQLITE_OK;
+}
+
+int stepOnce(sqlite3_stmt* statement) {
+  const int code = sqlite3_step(statement);
+  sqlite3_reset(statement);
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+}  // namespace
+
+WTStore::WTStore(QString path, sqlite3* db) : path_(std::move(path)), db_(db) {}
+
+WTStore::~WTStore() {
+  for (sqlite3_stmt* statement : {begin_, commit_, rollback_, replace_, remove_, selectAll_})
+    sqlite3_finalize(statement);
+  sqlite3_close(db_);
+}
+
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs) {
+  const QFileInfo file(path);
+  const bool existed = file.exists();
+  if (!existed && !file.dir().exists()) {
+    return Error{OpenFailed,
+                 tr("The data file “%1” cannot be created because its folder does not exist.").arg(path)};
+  }
+  if (existed && !file.isFile()) return notAStoreError(path);
+
+  // Until the file is accepted nothing may write to it. A connection that closes checkpoints what a
+  // leftover write-ahead log holds into the file; when there is such a log, keep it where it is.
+  const bool logHasFrames = QFileInfo(path + QStringLiteral("-wal")).size() > 0;
+
+  sqlite3* db = nullptr;
+  const int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | (existed ? 0 : SQLITE_OPEN_CREATE);
+  int code = sqlite3_open_v2(QFile::encodeName(path).constData(), &db, flags, vfs);
+  std::unique_ptr<WTStore> store(new WTStore(path, db));  // closes the connection on every way out
+  if (code != SQLITE_OK) {
+    return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
+  }
+  sqlite3_extended_result_codes(db, 1);
+  sqlite3_busy_timeout(db, kBusyTimeoutMs);
+  if (logHasFrames) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+
+  // Reads only: what the file is and which version wrote it.
+  qint64 applicationId = 0, version = 0, objects = 0;
+  code = readInteger(db, "PRAGMA application_id", &applicationId);
+  if (code == SQLITE_OK) code = readInteger(db, "PRAGMA user_version", &version);
+  if (code == SQLITE_OK) code = readInteger(db, "SELECT count(*) FROM sqlite_schema", &objects);
+  if ((code & 0xff) == SQLITE_NOTADB) return notAStoreError(path);
+  if (isDamage(code)) return damagedError(path);
+  if (code != SQLITE_OK) {
+    return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
+  }
+
+  const bool empty = applicationId == 0 && version == 0 && objects == 0;
+  if (!empty) {
+    if (applicationId != kApplicationId) return notAStoreError(path);
+    if (version > kSchemaVersion) {
+      return Error{
+          NewerVersion,
+          tr("The data file “%1” was written by a newer version of Tessal and cannot be opened.").arg(path)};
+    }
+    if (version < 1) return damagedError(path);
+    // Damage in pages that loading never visits (the identity index) would otherwise only show in a
+    // failed save, after the file had been changed.
+    QByteArray verdict;
+    code = readText(db, "PRAGMA quick_check(1)", &verdict);
+    if (isDamage(code) || (code == SQLITE_OK && verdict != "ok")) return damagedError(path);
+    if (code != SQLITE_OK) {
+      return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
+    }
+    // A current file must also have the shape this version reads and writes.
+    if (version == kSchemaVersion && !store->prepareStatements()) return damagedError(path);
+  }
+  if (sqlite3_db_readonly(db, "main") == 1) {
+    return Error{OpenFailed,
+                 tr("The data file “%1” could not be opened: %2.").arg(path, reason(SQLITE_READONLY))};
+  }
+
+  // Accepted: from here on the file may change.
+  if (logHasFrames) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
+  QByteArray mode;
+  code = readText(db, "PRAGMA journal_mode = WAL", &mode);
+  if (code == SQLITE_OK && mode != "wal") code = SQLITE_CANTOPEN;
+  if (code == SQLITE_OK) code = sqlite3_exec(db, "PRAGMA synchronous = FULL", nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) {
+    return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
+  }
+  if (version < kSchemaVersion) {
+    code = migrate(db, int(version));
+    if (code != SQLITE_OK) {
+      return Error{MigrationFailed,
+                   tr("The data file “%1” could not be updated for this version of Tessal: %2.")
+                       .arg(path, reason(code))};
+    }
+    if (!store->prepareStatements()) return damagedError(path);
+  }
+  return store;
+}
+
+Result<void> WTStore::prepareStatements() {
+  const std::pair<sqlite3_stmt**, const char*> statements[] = {
+      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
+      {&replace_, kReplaceSql},     {&remove_, kDeleteSql}, {&selectAll_, kSelectAllSql},
+  };
+  for (const auto& [statement, sql] : statements) {
+    const int code = sqlite3_prepare_v3(db_, sql, -1, SQLITE_PREPARE_PERSISTENT, statement, nullptr);
+    if (code != SQLITE_OK) return Error{ReadFailed, reason(code)};
+  }
+  return {};
+}
+
+Error WTStore::writeError(int code) const {
+  return {WriteFailed, tr("Changes could not be saved to the data file “%1”: %2.").arg(path_, reason(code))};
+}
+
+Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink) {
+  sqlite3_stmt* const s = selectAll_;
+  WTStoreRecord record;
+  int code;
+  while ((code = sqlite3_step(s)) == SQLITE_ROW) {
+    readString(s, kUuid, record.uuid);
+    readEntity(s, record.entity);
+    readString(s, kName, record.name);
+    readString(s, kNotes, record.notes);
+    readString(s, kColor, record.color);
+    record.archived = sqlite3_column_int(s, kArchived) != 0;
+    readString(s, kAddressBookUID, record.addressBookUID);
+    readString(s, kTotalsUID, record.totalsUID);
+    readString(s, kClientUuid, record.clientUuid);
+    readString(s, kProjectUuid, record.projectUuid);
+    record.position = sqlite3_column_int(s, kPosition);
+    readString(s, kTaskUuid, record.taskUuid);
+    record.startDate = readDate(s, kStartDate);
+    record.endDate = readDate(s, kEndDate);
+    record.running = sqlite3_column_int(s, kRunning) != 0;
+    if (sqlite3_column_type(s, kMinutes) == SQLITE_NULL)
+      record.minutes.reset();
+    else
+      record.minutes = sqlite3_column_int64(s, kMinutes);
+    record.completed = sqlite3_column_int(s, kCompleted) != 0;
+    if (!readDecimal(s, kRate, record.rate) || !readDecimal(s, kBudget, record.budget) ||
+        !readDecimal(s, kExpense, record.expense)) {
+      code = SQLITE_CORRUPT;
+      break;
+    }
+    sink(std::move(record));
+  }
+  sqlite3_reset(s);
+  if (code == SQLITE_DONE) return {};
+  if (isDamage(code))
+    return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};
+  return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
+}
+
+Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids) {
+  int code = stepOnce(begin_);
+  for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {
+    code = bindRecord(replace_, *record);
+    if (code == SQLITE_OK) code = stepOnce(replace_);
+  }
+  for (auto uuid = deletedUuids.begin(); code == SQLITE_OK && uuid != deletedUuids.end(); ++uuid) {
+    code = bindString(remove_, kUuid, *uuid);
+    if (code == SQLITE_OK) code = stepOnce(remove_);
+  }
+  if (code == SQLITE_OK) code = stepOnce(commit_);
+  // The statements must not keep pointers into the caller's records.
+  sqlite3_clear_bindings(replace_);
+  sqlite3_clear_bindings(remove_);
+  if (code == SQLITE_OK) return {};
+  // Some errors end the transaction by themselves; whatever is left of it is undone.
+  if (!sqlite3_get_autocommit(db_)) stepOnce(rollback_);
+  return writeError(code);
+}
