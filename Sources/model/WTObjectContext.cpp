@@ -73,7 +73,23 @@ void WTObjectContext::registerObject(WTObject* object, bool adoptOwnership) {
   object->registryIndex_ = static_cast<int>(list.size());
   list.push_back(object);
   object->registered_ = true;
-  if (!object->uuid_.isEmpty()) byUuid_.insert(object->uuid_, object);
+  if (!object->uuid_.isEmpty() && (itemsIndexed_ || !WTEntities::isItem(object->entity()))) {
+    byUuid_.insert(object->uuid_, object);
+  }
+}
+
+void WTObjectContext::indexItems() const {
+  if (itemsIndexed_) return;
+  qsizetype items = 0;
+  for (WTEntity entity : WTEntities::kAll) {
+    if (WTEntities::isItem(entity)) items += static_cast<qsizetype>(objects_[static_cast<int>(entity)].size());
+  }
+  byUuid_.reserve(byUuid_.size() + items);
+  for (WTEntity entity : WTEntities::kAll) {
+    if (!WTEntities::isItem(entity)) continue;
+    for (WTObject* object : objects_[static_cast<int>(entity)]) byUuid_.insert(object->uuid_, object);
+  }
+  itemsIndexed_ = true;
 }
 
 void WTObjectContext::unregisterObject(WTObject* object) {
@@ -156,6 +172,7 @@ WTObject* WTObjectContext::objectWithUUID(const QVariant& uuid, bool forceInsert
   const QString identity = uuid.toString();
   const QString entityName = identity.section(u'@', -1);
   if (!WTEntities::isEntityName(entityName)) return nullptr;
+  indexItems();
   WTObject* found = byUuid_.value(identity);
   if (found && !WTEntities::isKindOf(found->entity(), entityName)) found = nullptr;
   if (found || !forceInsert) return found;
@@ -168,6 +185,7 @@ WTObject* WTObjectContext::objectWithUUID(const QVariant& uuid, bool forceInsert
 
 void WTObjectContext::uuidChanged(WTObject* object, const QString& oldUuid) {
   if (!object->registered_) return;
+  indexItems();
   auto it = byUuid_.find(oldUuid);
   if (it != byUuid_.end() && it.value() == object) byUuid_.erase(it);
   byUuid_.insert(object->uuid_, object);
@@ -260,6 +278,7 @@ Result<void> WTObjectContext::save() {
   for (WTObject* object : rows) object->writeRecord(records[index++]);
 
   QStringList deletedUuids;
+  if (!deleted_.empty()) indexItems();
   for (WTObject* object : deleted_) {
     // A record deleted and then made again under its identity (by the sync) is written, not removed.
     if (!byUuid_.contains(object->uuid_)) deletedUuids.append(object->uuid_);
@@ -290,7 +309,10 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
     QString ownerUuid;
     int position;
   };
-  std::vector<Link> links;
+  std::vector<Link> links, taskLinks;
+  // Items are many and rarely looked up by identity: they join the identity map on first need, which
+  // keeps a large store quick to open. Their owners are few and needed at once.
+  itemsIndexed_ = false;
   undo_.disableRegistration();
   Result<void> loaded = store->loadAll([&](WTStoreRecord&& record) {
     const std::optional<WTEntity> entity = WTEntities::fromName(record.entity);
@@ -302,14 +324,17 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
     QString& ownerUuid = *entity == WTEntity::Project ? record.clientUuid
                          : *entity == WTEntity::Task  ? record.projectUuid
                                                       : record.taskUuid;
-    if (!ownerUuid.isEmpty()) links.push_back({object, std::move(ownerUuid), record.position});
+    if (ownerUuid.isEmpty()) return;
+    (*entity == WTEntity::Task ? taskLinks : links).push_back({object, std::move(ownerUuid), record.position});
   });
   if (loaded) {
     // Tasks join their projects in stored order.
-    std::stable_sort(links.begin(), links.end(), [](const Link& a, const Link& b) { return a.position < b.position; });
-    for (const Link& link : links) {
-      WTObject* owner = byUuid_.value(link.ownerUuid);
-      if (owner) link.object->relinkOwner(owner, -1);
+    std::stable_sort(taskLinks.begin(), taskLinks.end(),
+                     [](const Link& a, const Link& b) { return a.position < b.position; });
+    for (const auto* list : {&taskLinks, &links}) {
+      for (const Link& link : *list) {
+        if (WTObject* owner = byUuid_.value(link.ownerUuid)) link.object->relinkOwner(owner, -1);
+      }
     }
     for (WTEntity entity : WTEntities::kAll) {
       for (WTObject* object : objects_[static_cast<int>(entity)]) object->awakeFromFetch();

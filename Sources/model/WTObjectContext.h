@@ -133,6 +133,8 @@ class WTObjectContext : public QObject {
   void announceClosure(WTObject* object, const QString& key,
                        std::vector<std::pair<WTObject*, QString>>& seen);
   void uuidChanged(WTObject* object, const QString& oldUuid);
+  // Puts the items loaded from the store into the identity map, once.
+  void indexItems() const;
 
   UserDefaults* defaults_;
   std::unique_ptr<WTStore> store_;
@@ -143,7 +145,8 @@ class WTObjectContext : public QObject {
   // Live records per entity, and by identity. Records are owned through `owned_`; deleted ones stay
   // alive there so that undo can bring them back and nobody holding one is left dangling.
   std::vector<WTObject*> objects_[8];
-  QHash<QString, WTObject*> byUuid_;
+  mutable QHash<QString, WTObject*> byUuid_;
+  mutable bool itemsIndexed_ = true;
   std::vector<std::unique_ptr<WTObject>> owned_;
 
   // Since the last save.

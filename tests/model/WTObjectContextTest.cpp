@@ -271,3 +271,22 @@ TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   EXPECT_EQ(expense->task(), nullptr);
   EXPECT_TRUE(task->items().isEmpty());
 }
+
+TEST_F(WTObjectContextTest, ItemsOfAnOpenedStoreAreFoundAndDeletedByIdentity) {
+  WTTask* task = makeTask();
+  auto* note = makeItem<WTNote>(task, berlin(2026, 1, 1));
+  auto* kept = makeItem<WTNote>(task, berlin(2026, 1, 2));
+  const QString noteId = note->uuid(), keptId = kept->uuid();
+  saveAndReopen();
+
+  // Deleting first, before anything looked an item up, must still remove its row.
+  auto* reopenedTask = context->fetch<WTTask>().value(0);
+  ASSERT_NE(reopenedTask, nullptr);
+  WTItem* toDelete = reopenedTask->items()[0]->uuid() == noteId ? reopenedTask->items()[0] : reopenedTask->items()[1];
+  context->deleteObject(toDelete);
+  journal.calls.clear();
+  saveAndReopen();
+  EXPECT_EQ(context->objectWithUUID(noteId), nullptr);
+  EXPECT_NE(context->objectWithUUID(keptId), nullptr);
+  EXPECT_EQ(context->fetch<WTNote>().size(), 1);
+}
