@@ -22,6 +22,9 @@ WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget*
   list_->setHeaderLabels({tr("Name"), tr("Duration"), tr("Cost")});
   list_->header()->setSectionResizeMode(0, QHeaderView::Stretch);
   list_->header()->setStretchLastSection(false);
+  list_->headerItem()->setTextAlignment(1, Qt::AlignRight | Qt::AlignVCenter);
+  list_->headerItem()->setTextAlignment(2, Qt::AlignRight | Qt::AlignVCenter);
+  list_->setUniformRowHeights(true);
   list_->setAlternatingRowColors(true);
   list_->setRootIsDecorated(true);
   setCentralWidget(list_);
@@ -72,18 +75,26 @@ void WTMainWindowController::reloadData() {
   QList<WTProject*> projects = fetchProjects();
   std::sort(projects.begin(), projects.end(),
             [](const WTProject* a, const WTProject* b) { return a->name().localeAwareCompare(b->name()) < 0; });
+  auto addRow = [](QTreeWidgetItem* row) {
+    for (int column : {1, 2}) row->setTextAlignment(column, Qt::AlignRight | Qt::AlignVCenter);
+    return row;
+  };
   for (WTProject* project : projects) {
-    auto* projectRow = new QTreeWidgetItem(
-        list_, {project->name(), DurationText::stringWithMinutes(project->duration()), MoneyFormat::format(project->cost())});
+    QTreeWidgetItem* projectRow = addRow(new QTreeWidgetItem(
+        list_, {project->name(), DurationText::stringWithMinutes(project->duration()), MoneyFormat::format(project->cost())}));
+    QFont bold = projectRow->font(0);
+    bold.setBold(true);
+    projectRow->setFont(0, bold);
     for (WTTask* task : project->tasks()) {
-      new QTreeWidgetItem(projectRow,
-                          {task->name(), DurationText::stringWithMinutes(task->duration()), MoneyFormat::format(task->cost())});
+      addRow(new QTreeWidgetItem(projectRow, {task->name(), DurationText::stringWithMinutes(task->duration()),
+                                              MoneyFormat::format(task->cost())}));
     }
-    for (int column : {1, 2}) projectRow->setTextAlignment(column, Qt::AlignRight | Qt::AlignVCenter);
   }
   list_->expandAll();
-  list_->resizeColumnToContents(1);
-  list_->resizeColumnToContents(2);
+  for (int column : {1, 2}) {
+    list_->resizeColumnToContents(column);
+    list_->setColumnWidth(column, std::max(110, list_->columnWidth(column) + 24));
+  }
 }
 
 void WTMainWindowController::closeEvent(QCloseEvent* event) {
