@@ -6,12 +6,6 @@
 
 #include <array>
 
-namespace {
-
-QVariant dateVariant(const std::optional<Date>& date) { return date ? QVariant::fromValue(*date) : QVariant(); }
-
-}  // namespace
-
 std::optional<Date> dateFromVariant(const QVariant& value, bool* ok) {
   *ok = true;
   if (value.isNull()) return std::nullopt;

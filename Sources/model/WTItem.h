@@ -7,6 +7,10 @@ class WTTask;
 
 // Reads a date value (Date or QDateTime; null is none). `ok` is false for anything else.
 std::optional<Date> dateFromVariant(const QVariant& value, bool* ok);
+// A date as a variant; none gives a null variant.
+inline QVariant dateVariant(const std::optional<Date>& date) {
+  return date ? QVariant::fromValue(*date) : QVariant();
+}
 
 // Base of the five kinds of item a task holds. An item is dated by `startDate` (its `date`).
 class WTItem : public WTObject {

@@ -10,10 +10,6 @@
 
 WT_ENTITY_CLASS_IMPL(WTTime)
 
-namespace {
-QVariant dateVariant(const std::optional<Date>& date) { return date ? QVariant::fromValue(*date) : QVariant(); }
-}  // namespace
-
 void WTTime::awakeFromInsert() {
   WTItem::awakeFromInsert();
   setEndDate(startDate());
