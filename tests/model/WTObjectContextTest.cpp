@@ -290,3 +290,21 @@ TEST_F(WTObjectContextTest, ItemsOfAnOpenedStoreAreFoundAndDeletedByIdentity) {
   EXPECT_NE(context->objectWithUUID(keptId), nullptr);
   EXPECT_EQ(context->fetch<WTNote>().size(), 1);
 }
+
+TEST_F(WTObjectContextTest, ARecordDeletedAndMadeAgainUnderItsIdentityIsKept) {
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setName("first life");
+  const QString uuid = project->uuid();
+  ASSERT_TRUE(context->save().ok());
+
+  // The sync may take over an identity that was deleted here since the last save.
+  context->deleteObject(project);
+  WTObject* again = context->objectWithUUID(uuid, true);
+  ASSERT_NE(again, nullptr);
+  EXPECT_NE(again, project);
+  again->setName("second life");
+  saveAndReopen();
+  auto* reopened = WTProject::objectWithUUID(uuid, context.get());
+  ASSERT_NE(reopened, nullptr);
+  EXPECT_EQ(reopened->name(), "second life");
+}
