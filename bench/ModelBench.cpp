@@ -62,7 +62,8 @@ class LargeStore {
       item.name = QStringLiteral("Item number %1").arg(i);
       item.taskUuid = QStringLiteral("T%1@WTTask").arg(i % kTasks);
       item.startDate = Date::fromSeconds(start + i * 1800.0);
-      if (item.entity == QLatin1String("WTTime")) item.endDate = item.startDate->addingSeconds(60.0 * (i % 240));
+      if (item.entity == QLatin1String("WTTime"))
+        item.endDate = item.startDate->addingSeconds(60.0 * (i % 240));
       if (item.entity == QLatin1String("WTFlat")) item.minutes = 15 + i % 100;
       if (item.entity == QLatin1String("WTExpense")) item.expense = Decimal::fromString(u"12.30");
       records.push_back(item);
@@ -97,7 +98,10 @@ void BM_PlainSqliteRead(benchmark::State& state) {
     sqlite3* db = nullptr;
     sqlite3_open_v2(path.constData(), &db, SQLITE_OPEN_READONLY, nullptr);
     sqlite3_stmt* statement = nullptr;
-    sqlite3_prepare_v2(db, "SELECT * FROM " "records", -1, &statement, nullptr);
+    sqlite3_prepare_v2(db,
+                       "SELECT * FROM "
+                       "records",
+                       -1, &statement, nullptr);
     std::int64_t bytes = 0;
     while (sqlite3_step(statement) == SQLITE_ROW) {
       const int columns = sqlite3_column_count(statement);
@@ -166,7 +170,8 @@ void BM_GroupATaskOf5000Items(benchmark::State& state) {
   auto* task = WTTask::insertNewObject(&context);
   const char* kinds[] = {"WTTime", "WTNote", "WTToDo", "WTFlat", "WTExpense"};
   for (int i = 0; i < 5000; ++i) {
-    auto* item = static_cast<WTItem*>(context.insertNewObject(*WTEntities::fromName(QString::fromLatin1(kinds[i % 5]))));
+    auto* item = static_cast<WTItem*>(
+        context.insertNewObject(*WTEntities::fromName(QString::fromLatin1(kinds[i % 5]))));
     item->setTask(task);
     item->setStartDate(Date::fromSeconds(1700000000 + i * 2700.0));
   }

@@ -10,9 +10,9 @@ namespace MoneyFormat {
 QString format(const Decimal& amount) {
   static std::unique_ptr<icu::DecimalFormat> formatter = [] {
     UErrorCode status = U_ZERO_ERROR;
-    auto made = std::make_unique<icu::DecimalFormat>(icu::UnicodeString(u"#,##0.00"),
-                                                     icu::DecimalFormatSymbols(icu::Locale::getDefault(), status),
-                                                     status);
+    auto made = std::make_unique<icu::DecimalFormat>(
+        icu::UnicodeString(u"#,##0.00"), icu::DecimalFormatSymbols(icu::Locale::getDefault(), status),
+        status);
     made->setRoundingMode(icu::DecimalFormat::kRoundHalfUp);
     return U_SUCCESS(status) ? std::move(made) : nullptr;
   }();

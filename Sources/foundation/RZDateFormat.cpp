@@ -21,7 +21,8 @@ QString stringWithPattern(Date date, const QString& pattern) {
   Entry& entry = cache[pattern];
   if (!entry.format || !entry.zone || *entry.zone != *zone) {
     UErrorCode status = U_ZERO_ERROR;
-    const icu::UnicodeString icuPattern(reinterpret_cast<const UChar*>(pattern.utf16()), int32_t(pattern.size()));
+    const icu::UnicodeString icuPattern(reinterpret_cast<const UChar*>(pattern.utf16()),
+                                        int32_t(pattern.size()));
     entry.format = std::make_unique<icu::SimpleDateFormat>(icuPattern, status);
     if (U_FAILURE(status)) {
       entry.format.reset();

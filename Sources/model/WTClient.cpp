@@ -6,8 +6,12 @@
 
 WT_ENTITY_CLASS_IMPL(WTClient)
 
-void WTClient::setAddressBookUID(const QString& uid) { setStoredValue(QStringLiteral("addressBookUID"), uid); }
-void WTClient::setTotalsUID(const QString& uid) { setStoredValue(QStringLiteral("totalsUID"), uid); }
+void WTClient::setAddressBookUID(const QString& uid) {
+  setStoredValue(QStringLiteral("addressBookUID"), uid);
+}
+void WTClient::setTotalsUID(const QString& uid) {
+  setStoredValue(QStringLiteral("totalsUID"), uid);
+}
 
 Decimal WTClient::inheritedRate() const {
   if (storedRate()) return *storedRate();
@@ -36,7 +40,9 @@ void WTClient::durationDidChange() {
   costDidChange();
 }
 
-void WTClient::costDidChange() { announce(QStringLiteral("cost")); }
+void WTClient::costDidChange() {
+  announce(QStringLiteral("cost"));
+}
 
 QString WTClient::tableImage() const {
   return archived() ? QStringLiteral("admin_2_32_dis") : QStringLiteral("admin_2_32");
@@ -71,7 +77,8 @@ QStringList WTClient::storedKeys() const {
 }
 
 QVariant WTClient::primitiveValue(const QString& key) const {
-  if (key == QLatin1String("addressBookUID")) return addressBookUID_.isNull() ? QVariant() : QVariant(addressBookUID_);
+  if (key == QLatin1String("addressBookUID"))
+    return addressBookUID_.isNull() ? QVariant() : QVariant(addressBookUID_);
   if (key == QLatin1String("totalsUID")) return totalsUID_.isNull() ? QVariant() : QVariant(totalsUID_);
   return WTObject::primitiveValue(key);
 }

@@ -26,7 +26,8 @@ QList<QVariantList> arrayBySplittingByKeyPath(const QVariantList& values, const 
     }
     order = KeyPath::sorted(std::move(order), keySortDescriptors);
     QList<QVariantList> sortedGroups;
-    for (const QVariant& entry : order) sortedGroups.append(groups[entry.toMap().value(QStringLiteral("index")).toLongLong()]);
+    for (const QVariant& entry : order)
+      sortedGroups.append(groups[entry.toMap().value(QStringLiteral("index")).toLongLong()]);
     groups = std::move(sortedGroups);
   }
   if (!itemsSortDescriptors.isEmpty()) {

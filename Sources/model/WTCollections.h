@@ -16,9 +16,10 @@ namespace WTCollections {
 // ordered by their value (descriptor key paths are read on the value itself, "self" meaning the value);
 // without them they come in first-seen order. Elements keep their relative order in a group unless
 // item sort descriptors are given.
-QList<QVariantList> arrayBySplittingByKeyPath(const QVariantList& values, const QString& keyPath,
-                                              const QList<KeyPath::SortDescriptor>& keySortDescriptors = {},
-                                              const QList<KeyPath::SortDescriptor>& itemsSortDescriptors = {});
+QList<QVariantList> arrayBySplittingByKeyPath(
+    const QVariantList& values, const QString& keyPath,
+    const QList<KeyPath::SortDescriptor>& keySortDescriptors = {},
+    const QList<KeyPath::SortDescriptor>& itemsSortDescriptors = {});
 
 // Splits as above and returns a map per group: the group under `collectionKey`, and the group's value
 // (read from its last element) under `keyPath`.

@@ -4,14 +4,22 @@ namespace WTEntities {
 
 QString name(WTEntity entity) {
   switch (entity) {
-    case WTEntity::Client: return QStringLiteral("WTClient");
-    case WTEntity::Project: return QStringLiteral("WTProject");
-    case WTEntity::Task: return QStringLiteral("WTTask");
-    case WTEntity::Time: return QStringLiteral("WTTime");
-    case WTEntity::Flat: return QStringLiteral("WTFlat");
-    case WTEntity::Expense: return QStringLiteral("WTExpense");
-    case WTEntity::Note: return QStringLiteral("WTNote");
-    case WTEntity::ToDo: return QStringLiteral("WTToDo");
+    case WTEntity::Client:
+      return QStringLiteral("WTClient");
+    case WTEntity::Project:
+      return QStringLiteral("WTProject");
+    case WTEntity::Task:
+      return QStringLiteral("WTTask");
+    case WTEntity::Time:
+      return QStringLiteral("WTTime");
+    case WTEntity::Flat:
+      return QStringLiteral("WTFlat");
+    case WTEntity::Expense:
+      return QStringLiteral("WTExpense");
+    case WTEntity::Note:
+      return QStringLiteral("WTNote");
+    case WTEntity::ToDo:
+      return QStringLiteral("WTToDo");
   }
   return {};
 }

@@ -9,9 +9,8 @@ enum class WTEntity : unsigned char { Client, Project, Task, Time, Flat, Expense
 
 namespace WTEntities {
 
-inline constexpr WTEntity kAll[] = {WTEntity::Client, WTEntity::Project, WTEntity::Task,
-                                    WTEntity::Time,   WTEntity::Flat,    WTEntity::Expense,
-                                    WTEntity::Note,   WTEntity::ToDo};
+inline constexpr WTEntity kAll[] = {WTEntity::Client, WTEntity::Project, WTEntity::Task, WTEntity::Time,
+                                    WTEntity::Flat,   WTEntity::Expense, WTEntity::Note, WTEntity::ToDo};
 
 QString name(WTEntity entity);
 // The concrete entity of that name; none for abstract or unknown names.
@@ -20,6 +19,8 @@ std::optional<WTEntity> fromName(QStringView name);
 bool isKindOf(WTEntity entity, QStringView kindName);
 // True for the names of the model's entities, the abstract "WTObject" and "WTItem" included.
 bool isEntityName(QStringView name);
-inline bool isItem(WTEntity entity) { return entity >= WTEntity::Time; }
+inline bool isItem(WTEntity entity) {
+  return entity >= WTEntity::Time;
+}
 
 }  // namespace WTEntities

@@ -29,7 +29,9 @@ bool WTExpense::setValue(const QString& key, const QVariant& value) {
   return WTItem::setValue(key, value);
 }
 
-QStringList WTExpense::storedKeys() const { return WTItem::storedKeys() << QStringLiteral("expense"); }
+QStringList WTExpense::storedKeys() const {
+  return WTItem::storedKeys() << QStringLiteral("expense");
+}
 
 QVariant WTExpense::primitiveValue(const QString& key) const {
   if (key == QLatin1String("expense")) return expense_ ? QVariant::fromValue(*expense_) : QVariant();

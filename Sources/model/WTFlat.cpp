@@ -34,7 +34,9 @@ bool WTFlat::setValue(const QString& key, const QVariant& value) {
   return WTItem::setValue(key, value);
 }
 
-QStringList WTFlat::storedKeys() const { return WTItem::storedKeys() << QStringLiteral("minutes"); }
+QStringList WTFlat::storedKeys() const {
+  return WTItem::storedKeys() << QStringLiteral("minutes");
+}
 
 QVariant WTFlat::primitiveValue(const QString& key) const {
   if (key == QLatin1String("minutes")) return minutes_ ? QVariant(*minutes_) : QVariant();

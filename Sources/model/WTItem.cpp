@@ -20,13 +20,17 @@ void WTItem::awakeFromInsert() {
   setStartDate(Date::now());
 }
 
-void WTItem::setTask(WTTask* task) { changeOwner(task); }
+void WTItem::setTask(WTTask* task) {
+  changeOwner(task);
+}
 
 void WTItem::setStartDate(const std::optional<Date>& date) {
   setStoredValue(QStringLiteral("startDate"), dateVariant(date));
 }
 
-void WTItem::setDate(const std::optional<Date>& date) { setStartDate(date); }
+void WTItem::setDate(const std::optional<Date>& date) {
+  setStartDate(date);
+}
 
 std::optional<Decimal> WTItem::rate() const {
   if (!task_) return std::nullopt;
@@ -38,7 +42,9 @@ Decimal WTItem::cost() const {
   return itemRate ? costAtRate(*itemRate) : Decimal();
 }
 
-Decimal WTItem::costAtRate(const Decimal& rate) const { return timeCost(rate, duration()); }
+Decimal WTItem::costAtRate(const Decimal& rate) const {
+  return timeCost(rate, duration());
+}
 
 Decimal WTItem::timeCost(const Decimal& rate, int minutes) {
   // minutes / 60 is the same few values over and over: keep the exact quotients of the first day.
@@ -54,7 +60,9 @@ Decimal WTItem::timeCost(const Decimal& rate, int minutes) {
   return rate * fraction;
 }
 
-WTObject* WTItem::owner() const { return task_; }
+WTObject* WTItem::owner() const {
+  return task_;
+}
 
 void WTItem::relinkOwner(WTObject* owner, int) {
   if (task_) task_->items_.removeOne(this);
@@ -65,8 +73,8 @@ void WTItem::relinkOwner(WTObject* owner, int) {
 QVariant WTItem::valueForKey(const QString& key) const {
   // "startTime", "flatDateBegin" and "flatDateEnd" are what the time-entry export reads: an item is
   // dated by its start (and a time entry ends at its end), and no item is billed as a flat charge.
-  if (key == QLatin1String("startDate") || key == QLatin1String("date") || key == QLatin1String("startTime") ||
-      key == QLatin1String("flatDateBegin")) {
+  if (key == QLatin1String("startDate") || key == QLatin1String("date") ||
+      key == QLatin1String("startTime") || key == QLatin1String("flatDateBegin")) {
     return dateVariant(startDate_);
   }
   if (key == QLatin1String("flatDateEnd")) {

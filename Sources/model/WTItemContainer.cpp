@@ -29,10 +29,12 @@ WTItemContainer::WTItemContainer(QList<WTItem*> items, std::optional<Date> date,
   setItems(std::move(items));
 }
 
-WTItemContainer::~WTItemContainer() { stopObserving(); }
+WTItemContainer::~WTItemContainer() {
+  stopObserving();
+}
 
-std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(const QString& keyPath,
-                                                                                   const QList<WTItem*>& items) {
+std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(
+    const QString& keyPath, const QList<WTItem*>& items) {
   struct Keyed {
     QVariant value;
     WTItem* item;
@@ -54,22 +56,26 @@ std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPa
       group.append(keyed[end++].item);
     }
     WTItem* last = group.last();
-    containers.push_back(std::make_shared<WTItemContainer>(std::move(group), last->startDate(), last->task()));
+    containers.push_back(
+        std::make_shared<WTItemContainer>(std::move(group), last->startDate(), last->task()));
     begin = end;
   }
   return containers;
 }
 
-std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(const QString& keyPath,
-                                                                                   const QList<WTTask*>& tasks) {
+std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPath(
+    const QString& keyPath, const QList<WTTask*>& tasks) {
   QList<WTItem*> items;
   for (const WTTask* task : tasks) items += task->valuableItems();
   return containersByKeyPath(keyPath, items);
 }
 
-bool WTItemContainer::isValidUUID(const QVariant& uuid) { return uuid.metaType() == QMetaType::fromType<QVariantMap>(); }
+bool WTItemContainer::isValidUUID(const QVariant& uuid) {
+  return uuid.metaType() == QMetaType::fromType<QVariantMap>();
+}
 
-std::shared_ptr<WTItemContainer> WTItemContainer::objectWithUUID(const QVariant& uuid, WTObjectContext* context) {
+std::shared_ptr<WTItemContainer> WTItemContainer::objectWithUUID(const QVariant& uuid,
+                                                                 WTObjectContext* context) {
   if (!isValidUUID(uuid)) return nullptr;
   const QVariantMap identity = uuid.toMap();
   const QVariant taskUuid = identity.value(QStringLiteral("task"));

@@ -19,25 +19,15 @@ const std::vector<Declaration>& declarations(WTEntity entity) {
       {"tableImage", {"archived"}},
   };
   static const std::vector<Declaration> project = {
-      {"duration", {"tasks"}},
-      {"cost", {"duration", "rate"}},
-      {"tasksArray", {"tasks"}},
-      {"rate", {"inheritedRate", "client", "client.rate"}},
-      {"inheritedRate", {"rate"}},
-      {"tableImage", {"archived"}},
+      {"duration", {"tasks"}},     {"cost", {"duration", "rate"}},
+      {"tasksArray", {"tasks"}},   {"rate", {"inheritedRate", "client", "client.rate"}},
+      {"inheritedRate", {"rate"}}, {"tableImage", {"archived"}},
   };
   static const std::vector<Declaration> task = {
-      {"duration", {"items"}},
-      {"cost", {"rate", "items"}},
-      {"rate", {"project", "project.rate"}},
-      {"inheritedRate", {"rate"}},
-      {"times", {"items"}},
-      {"runningTimes", {"times"}},
-      {"runningDuration", {"duration"}},
-      {"buttonTitle", {"running"}},
-      {"timerButtonImage", {"running"}},
-      {"tableImage", {"running"}},
-      {"children", {"items"}},
+      {"duration", {"items"}},           {"cost", {"rate", "items"}},  {"rate", {"project", "project.rate"}},
+      {"inheritedRate", {"rate"}},       {"times", {"items"}},         {"runningTimes", {"times"}},
+      {"runningDuration", {"duration"}}, {"buttonTitle", {"running"}}, {"timerButtonImage", {"running"}},
+      {"tableImage", {"running"}},       {"children", {"items"}},
   };
   static const std::vector<Declaration> time = {
       {"cost", {"duration"}},
@@ -55,21 +45,29 @@ const std::vector<Declaration>& declarations(WTEntity entity) {
       {"cost", {"duration"}},
   };
   switch (entity) {
-    case WTEntity::Client: return client;
-    case WTEntity::Project: return project;
-    case WTEntity::Task: return task;
-    case WTEntity::Time: return time;
-    case WTEntity::Flat: return flat;
-    case WTEntity::Expense: return expense;
+    case WTEntity::Client:
+      return client;
+    case WTEntity::Project:
+      return project;
+    case WTEntity::Task:
+      return task;
+    case WTEntity::Time:
+      return time;
+    case WTEntity::Flat:
+      return flat;
+    case WTEntity::Expense:
+      return expense;
     case WTEntity::Note:
-    case WTEntity::ToDo: return item;
+    case WTEntity::ToDo:
+      return item;
   }
   return item;
 }
 
 // The to-many side of each to-one relationship a path may run through.
 QString inverseOf(WTEntity entity, const QString& relationship) {
-  if (entity == WTEntity::Project && relationship == QLatin1String("client")) return QStringLiteral("projects");
+  if (entity == WTEntity::Project && relationship == QLatin1String("client"))
+    return QStringLiteral("projects");
   if (entity == WTEntity::Task && relationship == QLatin1String("project")) return QStringLiteral("tasks");
   if (WTEntities::isItem(entity) && relationship == QLatin1String("task")) return QStringLiteral("items");
   return {};
@@ -77,9 +75,12 @@ QString inverseOf(WTEntity entity, const QString& relationship) {
 
 WTEntity ownerEntity(WTEntity entity) {
   switch (entity) {
-    case WTEntity::Project: return WTEntity::Client;
-    case WTEntity::Task: return WTEntity::Project;
-    default: return WTEntity::Task;
+    case WTEntity::Project:
+      return WTEntity::Client;
+    case WTEntity::Task:
+      return WTEntity::Project;
+    default:
+      return WTEntity::Task;
   }
 }
 

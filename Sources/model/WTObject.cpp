@@ -23,18 +23,26 @@ void WTObject::setUuid(const QString& uuid) {
   context_->uuidChanged(this, old);
 }
 
-void WTObject::setName(const QString& name) { setStoredValue(QStringLiteral("name"), name); }
-void WTObject::setNotes(const QString& notes) { setStoredValue(QStringLiteral("notes"), notes); }
+void WTObject::setName(const QString& name) {
+  setStoredValue(QStringLiteral("name"), name);
+}
+void WTObject::setNotes(const QString& notes) {
+  setStoredValue(QStringLiteral("notes"), notes);
+}
 void WTObject::setColor(const QColor& color) {
   setStoredValue(QStringLiteral("color"), color.isValid() ? QVariant(color) : QVariant());
 }
-void WTObject::setArchived(bool archived) { setStoredValue(QStringLiteral("archived"), archived); }
+void WTObject::setArchived(bool archived) {
+  setStoredValue(QStringLiteral("archived"), archived);
+}
 
 void WTObject::setRate(const std::optional<Decimal>& rate) {
   setStoredValue(QStringLiteral("rate"), rate ? QVariant::fromValue(*rate) : QVariant());
 }
 
-Decimal WTObject::inheritedRate() const { return Decimal(100); }
+Decimal WTObject::inheritedRate() const {
+  return Decimal(100);
+}
 
 QVariant WTObject::primitiveValue(const QString& key) const {
   if (key == QLatin1String("uuid")) return uuid_;
@@ -68,8 +76,8 @@ bool WTObject::writePrimitive(const QString& key, const QVariant& value) {
 void WTObject::storedValueDidChange(const QString&) {}
 
 QStringList WTObject::storedKeys() const {
-  return {QStringLiteral("uuid"), QStringLiteral("name"), QStringLiteral("notes"), QStringLiteral("rate"),
-          QStringLiteral("color"), QStringLiteral("archived")};
+  return {QStringLiteral("uuid"), QStringLiteral("name"),  QStringLiteral("notes"),
+          QStringLiteral("rate"), QStringLiteral("color"), QStringLiteral("archived")};
 }
 
 void WTObject::setStoredValue(const QString& key, const QVariant& value) {
@@ -81,11 +89,15 @@ void WTObject::setStoredValue(const QString& key, const QVariant& value) {
   announce(key);
 }
 
-void WTObject::announce(const QString& key) const { context_->announce(const_cast<WTObject*>(this), key); }
+void WTObject::announce(const QString& key) const {
+  context_->announce(const_cast<WTObject*>(this), key);
+}
 
 void WTObject::relinkOwner(WTObject*, int) {}
 
-QList<WTObject*> WTObject::relatedObjects(const QString&) const { return {}; }
+QList<WTObject*> WTObject::relatedObjects(const QString&) const {
+  return {};
+}
 
 void WTObject::changeOwner(WTObject* newOwner, int index) {
   WTObject* oldOwner = owner();
@@ -128,9 +140,15 @@ bool WTObject::setValue(const QString& key, const QVariant& value) {
   return true;
 }
 
-bool WTObject::isInserted() const { return context_->inserted_.count(const_cast<WTObject*>(this)) > 0; }
-bool WTObject::isUpdated() const { return context_->updated_.count(const_cast<WTObject*>(this)) > 0; }
-bool WTObject::isDeleted() const { return context_->deleted_.count(const_cast<WTObject*>(this)) > 0; }
+bool WTObject::isInserted() const {
+  return context_->inserted_.count(const_cast<WTObject*>(this)) > 0;
+}
+bool WTObject::isUpdated() const {
+  return context_->updated_.count(const_cast<WTObject*>(this)) > 0;
+}
+bool WTObject::isDeleted() const {
+  return context_->deleted_.count(const_cast<WTObject*>(this)) > 0;
+}
 
 QVariantMap WTObject::changedValues() const {
   QVariantMap values;
@@ -140,11 +158,13 @@ QVariantMap WTObject::changedValues() const {
       values.insert(key, related ? KeyPath::variantFromObject(related) : QVariant());
       return;
     }
-    for (const QString& relationship : {QStringLiteral("projects"), QStringLiteral("tasks"), QStringLiteral("items")}) {
+    for (const QString& relationship :
+         {QStringLiteral("projects"), QStringLiteral("tasks"), QStringLiteral("items")}) {
       if (key != relationship) continue;
       const QList<WTObject*> related = relatedObjects(relationship);
-      values.insert(key, isOrderedRelationship(relationship) ? QVariant::fromValue(WTOrderedRelationship{related})
-                                                             : QVariant::fromValue(WTUnorderedRelationship{related}));
+      values.insert(key, isOrderedRelationship(relationship)
+                             ? QVariant::fromValue(WTOrderedRelationship{related})
+                             : QVariant::fromValue(WTUnorderedRelationship{related}));
       return;
     }
     values.insert(key, primitiveValue(key));

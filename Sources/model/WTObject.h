@@ -154,25 +154,25 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
 };
 
 // Each entity class declares its entity and the class operations that act on the default context.
-#define WT_ENTITY_CLASS(Class, Entity)                                                        \
- public:                                                                                      \
-  static constexpr WTEntity kEntity = WTEntity::Entity;                                       \
-  /* Inserts a new record into `context` (the default context when none is given). */        \
-  static Class* insertNewObject(WTObjectContext* context = nullptr);                          \
-  /* Every record of this entity that the predicate accepts (all when it is empty). */       \
+#define WT_ENTITY_CLASS(Class, Entity)                                                           \
+ public:                                                                                         \
+  static constexpr WTEntity kEntity = WTEntity::Entity;                                          \
+  /* Inserts a new record into `context` (the default context when none is given). */            \
+  static Class* insertNewObject(WTObjectContext* context = nullptr);                             \
+  /* Every record of this entity that the predicate accepts (all when it is empty). */           \
   static QList<Class*> fetchByPredicate(const std::function<bool(const Class*)>& predicate = {}, \
-                                        WTObjectContext* context = nullptr);                  \
-  /* The record of that identity in the default context, or none; never creates one. */       \
+                                        WTObjectContext* context = nullptr);                     \
+  /* The record of that identity in the default context, or none; never creates one. */          \
   static Class* objectWithUUID(const QString& uuid, WTObjectContext* context = nullptr);
 
-#define WT_ENTITY_CLASS_IMPL(Class)                                                          \
-  Class* Class::insertNewObject(WTObjectContext* context) {                                  \
-    return WTObjectContext::resolve(context)->insertNewObject<Class>();                      \
-  }                                                                                          \
-  QList<Class*> Class::fetchByPredicate(const std::function<bool(const Class*)>& predicate,  \
-                                        WTObjectContext* context) {                          \
-    return WTObjectContext::resolve(context)->fetch<Class>(predicate);                       \
-  }                                                                                          \
-  Class* Class::objectWithUUID(const QString& uuid, WTObjectContext* context) {              \
+#define WT_ENTITY_CLASS_IMPL(Class)                                                              \
+  Class* Class::insertNewObject(WTObjectContext* context) {                                      \
+    return WTObjectContext::resolve(context)->insertNewObject<Class>();                          \
+  }                                                                                              \
+  QList<Class*> Class::fetchByPredicate(const std::function<bool(const Class*)>& predicate,      \
+                                        WTObjectContext* context) {                              \
+    return WTObjectContext::resolve(context)->fetch<Class>(predicate);                           \
+  }                                                                                              \
+  Class* Class::objectWithUUID(const QString& uuid, WTObjectContext* context) {                  \
     return dynamic_cast<Class*>(WTObjectContext::resolve(context)->objectWithUUID(uuid, false)); \
   }

@@ -22,16 +22,21 @@ WTObjectContext* gDefaultContext = nullptr;
 // The to-many key on the owner's side of each entity's to-one relationship.
 QString inverseKey(WTEntity entity) {
   switch (entity) {
-    case WTEntity::Client: return {};
-    case WTEntity::Project: return QStringLiteral("projects");
-    case WTEntity::Task: return QStringLiteral("tasks");
-    default: return QStringLiteral("items");
+    case WTEntity::Client:
+      return {};
+    case WTEntity::Project:
+      return QStringLiteral("projects");
+    case WTEntity::Task:
+      return QStringLiteral("tasks");
+    default:
+      return QStringLiteral("items");
   }
 }
 
 }  // namespace
 
-WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent) : QObject(parent), defaults_(defaults) {}
+WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent)
+    : QObject(parent), defaults_(defaults) {}
 
 WTObjectContext::~WTObjectContext() {
   if (gDefaultContext == this) gDefaultContext = nullptr;
@@ -44,8 +49,12 @@ WTObjectContext::~WTObjectContext() {
   observers_.clear();
 }
 
-WTObjectContext* WTObjectContext::defaultContext() { return gDefaultContext; }
-void WTObjectContext::setDefaultContext(WTObjectContext* context) { gDefaultContext = context; }
+WTObjectContext* WTObjectContext::defaultContext() {
+  return gDefaultContext;
+}
+void WTObjectContext::setDefaultContext(WTObjectContext* context) {
+  gDefaultContext = context;
+}
 
 WTObjectContext* WTObjectContext::resolve(WTObjectContext* context) {
   WTObjectContext* resolved = context ? context : gDefaultContext;
@@ -55,14 +64,22 @@ WTObjectContext* WTObjectContext::resolve(WTObjectContext* context) {
 
 WTObject* WTObjectContext::makeObject(WTEntity entity) {
   switch (entity) {
-    case WTEntity::Client: return new WTClient(this);
-    case WTEntity::Project: return new WTProject(this);
-    case WTEntity::Task: return new WTTask(this);
-    case WTEntity::Time: return new WTTime(this);
-    case WTEntity::Flat: return new WTFlat(this);
-    case WTEntity::Expense: return new WTExpense(this);
-    case WTEntity::Note: return new WTNote(this);
-    case WTEntity::ToDo: return new WTToDo(this);
+    case WTEntity::Client:
+      return new WTClient(this);
+    case WTEntity::Project:
+      return new WTProject(this);
+    case WTEntity::Task:
+      return new WTTask(this);
+    case WTEntity::Time:
+      return new WTTime(this);
+    case WTEntity::Flat:
+      return new WTFlat(this);
+    case WTEntity::Expense:
+      return new WTExpense(this);
+    case WTEntity::Note:
+      return new WTNote(this);
+    case WTEntity::ToDo:
+      return new WTToDo(this);
   }
   return nullptr;
 }
@@ -82,7 +99,8 @@ void WTObjectContext::indexItems() const {
   if (itemsIndexed_) return;
   qsizetype items = 0;
   for (WTEntity entity : WTEntities::kAll) {
-    if (WTEntities::isItem(entity)) items += static_cast<qsizetype>(objects_[static_cast<int>(entity)].size());
+    if (WTEntities::isItem(entity))
+      items += static_cast<qsizetype>(objects_[static_cast<int>(entity)].size());
   }
   byUuid_.reserve(byUuid_.size() + items);
   for (WTEntity entity : WTEntities::kAll) {
@@ -162,7 +180,9 @@ void WTObjectContext::deleteObject(WTObject* object) {
       object->changeOwner(nullptr);
       break;
     }
-    default: object->changeOwner(nullptr); break;
+    default:
+      object->changeOwner(nullptr);
+      break;
   }
   removeFromGraph(object);
 }
@@ -208,7 +228,8 @@ std::optional<QList<WTObject*>> WTObjectContext::fetchObjectsForEntityName(
   for (WTObject* object : result) values.append(KeyPath::variantFromObject(object));
   values = KeyPath::sorted(std::move(values), sortDescriptors);
   result.clear();
-  for (const QVariant& value : values) result.append(static_cast<WTObject*>(KeyPath::objectFromVariant(value)));
+  for (const QVariant& value : values)
+    result.append(static_cast<WTObject*>(KeyPath::objectFromVariant(value)));
   return result;
 }
 
@@ -218,7 +239,9 @@ qsizetype WTObjectContext::count() const {
   return total;
 }
 
-void WTObjectContext::setChangeJournal(WTChangeJournal* journal) { journal_ = journal ? journal : &nullJournal_; }
+void WTObjectContext::setChangeJournal(WTChangeJournal* journal) {
+  journal_ = journal ? journal : &nullJournal_;
+}
 
 void WTObjectContext::storedValueChanged(WTObject* object, const QString& key, const QVariant& oldValue) {
   markChanged(object, key);
@@ -255,7 +278,9 @@ void WTObjectContext::markChanged(WTObject* object, const QString& key) {
   scheduleProcessing();
 }
 
-bool WTObjectContext::hasChanges() const { return !inserted_.empty() || !updated_.empty() || !deleted_.empty(); }
+bool WTObjectContext::hasChanges() const {
+  return !inserted_.empty() || !updated_.empty() || !deleted_.empty();
+}
 
 Result<void> WTObjectContext::save() {
   processPendingChanges();
@@ -270,7 +295,8 @@ Result<void> WTObjectContext::save() {
   // A project whose task order changed rewrites the positions of all its tasks.
   std::unordered_set<WTObject*> rows(written.begin(), written.end());
   for (WTObject* object : written) {
-    if (object->entity() != WTEntity::Project || !object->changedKeys_.contains(QLatin1String("tasks"))) continue;
+    if (object->entity() != WTEntity::Project || !object->changedKeys_.contains(QLatin1String("tasks")))
+      continue;
     for (WTTask* task : static_cast<WTProject*>(object)->tasks()) rows.insert(task);
   }
   std::vector<WTStoreRecord> records(rows.size());
@@ -325,7 +351,8 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
                          : *entity == WTEntity::Task  ? record.projectUuid
                                                       : record.taskUuid;
     if (ownerUuid.isEmpty()) return;
-    (*entity == WTEntity::Task ? taskLinks : links).push_back({object, std::move(ownerUuid), record.position});
+    (*entity == WTEntity::Task ? taskLinks : links)
+        .push_back({object, std::move(ownerUuid), record.position});
   });
   if (loaded) {
     // Tasks join their projects in stored order.
@@ -353,7 +380,11 @@ void WTObjectContext::scheduleProcessing() {
   if (processingScheduled_) return;
   processingScheduled_ = true;
   QMetaObject::invokeMethod(
-      this, [this] { if (processingScheduled_) processPendingChanges(); }, Qt::QueuedConnection);
+      this,
+      [this] {
+        if (processingScheduled_) processPendingChanges();
+      },
+      Qt::QueuedConnection);
 }
 
 void WTObjectContext::processPendingChanges() {

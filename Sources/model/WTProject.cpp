@@ -7,9 +7,13 @@
 
 WT_ENTITY_CLASS_IMPL(WTProject)
 
-void WTProject::setClient(WTClient* client) { changeOwner(client); }
+void WTProject::setClient(WTClient* client) {
+  changeOwner(client);
+}
 
-WTObject* WTProject::owner() const { return client_; }
+WTObject* WTProject::owner() const {
+  return client_;
+}
 
 void WTProject::relinkOwner(WTObject* owner, int) {
   if (client_) client_->projects_.removeOne(this);
@@ -92,7 +96,9 @@ bool WTProject::setValue(const QString& key, const QVariant& value) {
   return WTObject::setValue(key, value);
 }
 
-QStringList WTProject::storedKeys() const { return WTObject::storedKeys() << QStringLiteral("client"); }
+QStringList WTProject::storedKeys() const {
+  return WTObject::storedKeys() << QStringLiteral("client");
+}
 
 QList<WTObject*> WTProject::relatedObjects(const QString& relationship) const {
   if (relationship != QLatin1String("tasks")) return {};
@@ -103,7 +109,9 @@ bool WTProject::isOrderedRelationship(const QString& relationship) const {
   return relationship == QLatin1String("tasks");
 }
 
-void WTProject::readRecord(const WTStoreRecord& record) { WTObject::readRecord(record); }
+void WTProject::readRecord(const WTStoreRecord& record) {
+  WTObject::readRecord(record);
+}
 
 void WTProject::writeRecord(WTStoreRecord& record) const {
   WTObject::writeRecord(record);

@@ -36,11 +36,11 @@ struct WTStoreRecord {
   // Items.
   QString taskUuid;
   std::optional<Date> startDate;
-  std::optional<Date> endDate;       // WTTime
-  bool running = false;              // WTTime
-  std::optional<qint64> minutes;     // WTFlat
-  std::optional<Decimal> expense;    // WTExpense
-  bool completed = false;            // WTToDo
+  std::optional<Date> endDate;     // WTTime
+  bool running = false;            // WTTime
+  std::optional<qint64> minutes;   // WTFlat
+  std::optional<Decimal> expense;  // WTExpense
+  bool completed = false;          // WTToDo
 
   friend bool operator==(const WTStoreRecord&, const WTStoreRecord&) = default;
 };

@@ -17,15 +17,21 @@ WT_ENTITY_CLASS_IMPL(WTTask)
 
 WTTask::~WTTask() = default;
 
-void WTTask::setProject(WTProject* project, int index) { changeOwner(project, index); }
+void WTTask::setProject(WTProject* project, int index) {
+  changeOwner(project, index);
+}
 
 void WTTask::setBudget(const std::optional<Decimal>& budget) {
   setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
 }
 
-WTObject* WTTask::owner() const { return project_; }
+WTObject* WTTask::owner() const {
+  return project_;
+}
 
-int WTTask::indexInOwner() const { return project_ ? static_cast<int>(project_->tasks_.indexOf(this)) : -1; }
+int WTTask::indexInOwner() const {
+  return project_ ? static_cast<int>(project_->tasks_.indexOf(this)) : -1;
+}
 
 void WTTask::relinkOwner(WTObject* owner, int index) {
   if (project_) project_->tasks_.removeOne(this);
@@ -72,7 +78,9 @@ void WTTask::costDidChange() {
   if (project_) project_->costDidChange();
 }
 
-void WTTask::itemsDidChange() { durationDidChange(); }
+void WTTask::itemsDidChange() {
+  durationDidChange();
+}
 
 QList<WTTime*> WTTask::times() const {
   QList<WTTime*> result;
@@ -196,7 +204,9 @@ std::optional<Date> WTTask::maxTimeEndDate() const {
   return latest;
 }
 
-void WTTask::runningDidChange() { announce(QStringLiteral("running")); }
+void WTTask::runningDidChange() {
+  announce(QStringLiteral("running"));
+}
 
 void WTTask::stopAllTimers() {
   for (WTTime* time : times()) {
@@ -223,10 +233,13 @@ QString WTTask::tableImage() const {
   return running() ? QStringLiteral("notepad_clock_32") : QStringLiteral("notepad_32");
 }
 
-QString WTTask::timerButtonImage() const { return running() ? QStringLiteral("stop_32") : QStringLiteral("play_32"); }
+QString WTTask::timerButtonImage() const {
+  return running() ? QStringLiteral("stop_32") : QStringLiteral("play_32");
+}
 
 QString WTTask::buttonTitle() const {
-  return running() ? QCoreApplication::translate("WTTask", "Stop") : QCoreApplication::translate("WTTask", "Start");
+  return running() ? QCoreApplication::translate("WTTask", "Stop")
+                   : QCoreApplication::translate("WTTask", "Start");
 }
 
 QVariant WTTask::valueForKey(const QString& key) const {

@@ -15,7 +15,9 @@ void WTTime::awakeFromInsert() {
   setEndDate(startDate());
 }
 
-void WTTime::setEndDate(const std::optional<Date>& date) { setStoredValue(QStringLiteral("endDate"), dateVariant(date)); }
+void WTTime::setEndDate(const std::optional<Date>& date) {
+  setStoredValue(QStringLiteral("endDate"), dateVariant(date));
+}
 
 void WTTime::setRunning(bool running) {
   setStoredValue(QStringLiteral("running"), running);

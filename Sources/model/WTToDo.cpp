@@ -5,7 +5,9 @@
 
 WT_ENTITY_CLASS_IMPL(WTToDo)
 
-void WTToDo::setCompleted(bool completed) { setStoredValue(QStringLiteral("completed"), completed); }
+void WTToDo::setCompleted(bool completed) {
+  setStoredValue(QStringLiteral("completed"), completed);
+}
 
 QVariant WTToDo::valueForKey(const QString& key) const {
   if (key == QLatin1String("completed")) return completed_;
@@ -20,7 +22,9 @@ bool WTToDo::setValue(const QString& key, const QVariant& value) {
   return WTItem::setValue(key, value);
 }
 
-QStringList WTToDo::storedKeys() const { return WTItem::storedKeys() << QStringLiteral("completed"); }
+QStringList WTToDo::storedKeys() const {
+  return WTItem::storedKeys() << QStringLiteral("completed");
+}
 
 QVariant WTToDo::primitiveValue(const QString& key) const {
   if (key == QLatin1String("completed")) return completed_;

@@ -18,8 +18,12 @@ void WTUndoManager::closeGroup() {
   open_.clear();
 }
 
-bool WTUndoManager::canUndo() const { return !open_.empty() || !undoStack_.empty(); }
-bool WTUndoManager::canRedo() const { return !redoStack_.empty(); }
+bool WTUndoManager::canUndo() const {
+  return !open_.empty() || !undoStack_.empty();
+}
+bool WTUndoManager::canRedo() const {
+  return !redoStack_.empty();
+}
 
 void WTUndoManager::undo() {
   closeGroup();

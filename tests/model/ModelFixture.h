@@ -32,8 +32,12 @@ class RecordingJournal final : public WTChangeJournal {
     QString uuid;
     QVariantMap values;
   };
-  void insertValues(const QVariantMap& values, const QString& uuid) override { calls.push_back({"insert", uuid, values}); }
-  void updateValues(const QVariantMap& values, const QString& uuid) override { calls.push_back({"update", uuid, values}); }
+  void insertValues(const QVariantMap& values, const QString& uuid) override {
+    calls.push_back({"insert", uuid, values});
+  }
+  void updateValues(const QVariantMap& values, const QString& uuid) override {
+    calls.push_back({"update", uuid, values});
+  }
   void deleteObjectWithId(const QString& uuid) override { calls.push_back({"delete", uuid, {}}); }
   std::vector<Call> callsFor(const QString& uuid) const {
     std::vector<Call> result;
@@ -122,7 +126,9 @@ class ModelTest : public ::testing::Test {
   Date clockNow;
 };
 
-inline Decimal dec(const char* text) { return *Decimal::fromString(QString::fromLatin1(text)); }
+inline Decimal dec(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
 
 // Counts announcements of one key of one record.
 class KeyCounter {

@@ -122,11 +122,12 @@ TEST(WTCollectionsTest, MovingAnElementReportsWhereItLanded) {
 
 TEST(WTCollectionsTest, SplittingByKeyPath) {
   QVariantList values;
-  for (auto [kind, n] : std::initializer_list<std::pair<const char*, int>>{{"b", 1}, {"a", 2}, {"b", 3}, {"c", 4}}) {
+  for (auto [kind, n] :
+       std::initializer_list<std::pair<const char*, int>>{{"b", 1}, {"a", 2}, {"b", 3}, {"c", 4}}) {
     values.append(QVariantMap{{"kind", kind}, {"n", n}});
   }
   const auto groups = WTCollections::arrayBySplittingByKeyPath(values, "kind", {{"self", false, false}},
-                                                                {{"n", false, false}});
+                                                               {{"n", false, false}});
   ASSERT_EQ(groups.size(), 3);
   EXPECT_EQ(groups[0].size(), 1);
   EXPECT_EQ(groups[1][0].toMap()["n"], 3);

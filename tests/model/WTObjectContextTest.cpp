@@ -50,8 +50,8 @@ TEST_F(WTObjectContextTest, FetchingByEntityName) {
   const auto sorted = context->fetchObjectsForEntityName("WTProject", {{"name", false, true}});
   ASSERT_EQ(sorted->size(), 2);
   EXPECT_EQ(sorted->at(0), b);
-  const auto filtered =
-      context->fetchObjectsForEntityName("WTProject", {}, [](const WTObject* o) { return o->name() == "alpha"; });
+  const auto filtered = context->fetchObjectsForEntityName(
+      "WTProject", {}, [](const WTObject* o) { return o->name() == "alpha"; });
   EXPECT_EQ(filtered->size(), 1);
   EXPECT_EQ(WTProject::fetchByPredicate({}, context.get()).size(), 2);
 }
@@ -125,8 +125,9 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   auto* todo = makeItem<WTToDo>(third, start);
   todo->setCompleted(true);
   auto* running = third->toggleTimer();
-  const QString timeId = time->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(), todoId = todo->uuid(),
-                runningId = running->uuid(), clientId = client->uuid(), projectId = project->uuid();
+  const QString timeId = time->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(),
+                todoId = todo->uuid(), runningId = running->uuid(), clientId = client->uuid(),
+                projectId = project->uuid();
 
   saveAndReopen();
   auto* c = WTClient::objectWithUUID(clientId, context.get());
@@ -282,7 +283,8 @@ TEST_F(WTObjectContextTest, ItemsOfAnOpenedStoreAreFoundAndDeletedByIdentity) {
   // Deleting first, before anything looked an item up, must still remove its row.
   auto* reopenedTask = context->fetch<WTTask>().value(0);
   ASSERT_NE(reopenedTask, nullptr);
-  WTItem* toDelete = reopenedTask->items()[0]->uuid() == noteId ? reopenedTask->items()[0] : reopenedTask->items()[1];
+  WTItem* toDelete =
+      reopenedTask->items()[0]->uuid() == noteId ? reopenedTask->items()[0] : reopenedTask->items()[1];
   context->deleteObject(toDelete);
   journal.calls.clear();
   saveAndReopen();

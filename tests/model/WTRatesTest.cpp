@@ -146,7 +146,9 @@ TEST_F(WTRatesTest, SumsRunUpFromItemsToClients) {
   EXPECT_EQ(projectB->duration(), 90);
   EXPECT_EQ(client->duration(), 120);
   EXPECT_EQ(client->cost(), dec("150.01"));
-  EXPECT_EQ(KeyPath::valueForKeyPath(KeyPath::variantFromObject(client), u"projects.@sum.duration").toLongLong(), 120);
+  EXPECT_EQ(
+      KeyPath::valueForKeyPath(KeyPath::variantFromObject(client), u"projects.@sum.duration").toLongLong(),
+      120);
 
   auto* empty = WTClient::insertNewObject(context.get());
   EXPECT_EQ(empty->duration(), 0);
