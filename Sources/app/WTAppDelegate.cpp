@@ -64,6 +64,17 @@ void WTAppDelegate::saveAction() {
   qInfo("Saved");
 }
 
+bool WTAppDelegate::saveChanges(Error* error) {
+  WTObjectContext* context = managedObjectContext();
+  if (!context->hasChanges()) return true;
+  if (commitEditing_) commitEditing_();
+  const Result<void> saved = context->save();
+  if (saved) return true;
+  qWarning("ERROR: %s", qUtf8Printable(saved.error().message));
+  if (error) *error = saved.error();
+  return false;
+}
+
 std::function<bool(const WTObject*)> WTAppDelegate::archivedPredicate() const {
   if (displayArchived_) return [](const WTObject*) { return true; };
   return [](const WTObject* object) { return !object->archived(); };

@@ -38,6 +38,10 @@ class WTAppDelegate : public QObject {
   // reported when opening) and the changes stay for the next attempt. Logs "Saved" either way.
   void saveAction();
 
+  // A save that first commits an edit in progress (through the commit-editing handler), for callers
+  // that save while the user may be typing. Logs "ERROR: ..." and fills `error` when it fails.
+  bool saveChanges(Error* error = nullptr);
+
   // Whether archived clients and projects are listed, and the filter that says so.
   bool displayArchived() const { return displayArchived_; }
   std::function<bool(const WTObject*)> archivedPredicate() const;

@@ -108,6 +108,9 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   WTClient::insertNewObject(context)->setName("typed anyway");
   delegate->saveAction();
   EXPECT_EQ(presenter.errors.size(), 1);
+  Error error;
+  EXPECT_FALSE(delegate->saveChanges(&error));
+  EXPECT_FALSE(error.message.isEmpty());
   presenter.quitAnyway = false;
   EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateCancel);
   EXPECT_EQ(presenter.questions, 1);
