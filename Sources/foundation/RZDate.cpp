@@ -2,16 +2,19 @@
 
 #include <QtGlobal>
 
+#include <unicode/basictz.h>
 #include <unicode/datefmt.h>
 #include <unicode/gregocal.h>
 #include <unicode/locid.h>
 #include <unicode/timezone.h>
+#include <unicode/tztrans.h>
 
 #include <algorithm>
 #include <cmath>
 #include <limits>
 #include <memory>
 #include <string>
+#include <vector>
 
 // How days and fields are found:
 // - One lenient GregorianCalendar in ICU's default zone is kept for the life of the process (or until
@@ -52,9 +55,16 @@ struct State {
   UDate nextDayStart = std::numeric_limits<double>::quiet_NaN();
   CachedFormat shortDate;
   CachedFormat shortDateTime;
+  // Stretches of time between two transitions of the zone, each with its one offset from GMT, sorted.
+  struct OffsetSpan {
+    UDate from, to;
+    int32_t offset;
+  };
+  std::vector<OffsetSpan> offsetSpans;
 
   void reset() {
     calendar.reset();
+    offsetSpans.clear();
     dayStart = nextDayStart = std::numeric_limits<double>::quiet_NaN();
     shortDate.format.reset();
     shortDateTime.format.reset();
@@ -237,17 +247,46 @@ Date beginOfLastYear(Date date) {
   return fromUDate(build(clampedSum(f.year, -1), 1, 1));
 }
 
+namespace {
+
+// The zone's offset from GMT at an instant, in milliseconds. Durations ask for it twice per time entry,
+// so the stretch between the surrounding transitions is remembered and later questions about it are
+// answered without ICU.
+int32_t offsetAt(UDate ms) {
+  auto& spans = state().offsetSpans;
+  auto after = std::upper_bound(spans.begin(), spans.end(), ms,
+                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; });
+  if (after != spans.begin() && ms < std::prev(after)->to) return std::prev(after)->offset;
+
+  const icu::TimeZone& zone = calendar().getTimeZone();
+  int32_t raw = 0, dst = 0;
+  UErrorCode status = U_ZERO_ERROR;
+  zone.getOffset(ms, false, raw, dst, status);
+  if (U_FAILURE(status)) return 0;
+  const auto* basic = dynamic_cast<const icu::BasicTimeZone*>(&zone);
+  if (!basic) return raw + dst;
+  icu::TimeZoneTransition previous, next;
+  const UDate from = basic->getPreviousTransition(ms, true, previous)
+                         ? previous.getTime()
+                         : -std::numeric_limits<double>::infinity();
+  const UDate to =
+      basic->getNextTransition(ms, false, next) ? next.getTime() : std::numeric_limits<double>::infinity();
+  if (spans.size() >= 512) spans.clear();
+  spans.insert(std::upper_bound(spans.begin(), spans.end(), from,
+                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; }),
+               {from, to, raw + dst});
+  return raw + dst;
+}
+
+}  // namespace
+
 Date beginOfMinute(Date date) {
   // Dropping the seconds of the local wall clock is subtracting them from the instant, so no calendar
   // fields are needed: one offset look-up. Rebuilding from fields would also move an instant in the
   // first pass of a repeated hour into the second pass, and a time entry across it would gain an hour.
   // Durations call this twice per entry, so it must stay cheap.
   const UDate ms = toUDate(date);
-  int32_t raw = 0, dst = 0;
-  UErrorCode status = U_ZERO_ERROR;
-  calendar().getTimeZone().getOffset(ms, false, raw, dst, status);
-  if (U_FAILURE(status)) raw = dst = 0;
-  const double local = ms + raw + dst;
+  const double local = ms + offsetAt(ms);
   return fromUDate(ms - (local - std::floor(local / 60000.0) * 60000.0));
 }
 
