@@ -9,6 +9,7 @@ packages=(
   g++ cmake ninja-build pkg-config
   qt6-base-dev libgl-dev libicu-dev libsqlite3-dev nlohmann-json3-dev
   libgtest-dev libgmock-dev libbenchmark-dev
+  libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk
   sqlite3 python3
   xvfb xauth xdotool imagemagick dbus-x11 fonts-dejavu-core
 )

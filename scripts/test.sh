@@ -9,6 +9,7 @@ build=${TESSAL_BUILD_DIR:-build-tests}
 cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE="${TESSAL_BUILD_TYPE:-RelWithDebInfo}" \
   -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=ON ${TESSAL_CMAKE_ARGS:-}
 cmake --build "$build"
-# No test may reach the developer's session bus or display.
+# No test may reach the developer's session bus or display. The sync server's tests run against SQLite
+# and against a throw-away PostgreSQL cluster that lives only as long as ctest.
 env -u DBUS_SESSION_BUS_ADDRESS -u DISPLAY -u WAYLAND_DISPLAY QT_QPA_PLATFORM=offscreen \
-  ctest --test-dir "$build" --output-on-failure --timeout 300 -j2
+  bash scripts/pg-test-cluster.sh run ctest --test-dir "$build" --output-on-failure --timeout 300 -j2

@@ -1,0 +1,92 @@
+#pragma once
+
+#include "SyncStore.h"
+
+#include <array>
+#include <chrono>
+#include <cstdint>
+#include <mutex>
+#include <optional>
+#include <semaphore>
+#include <string>
+#include <unordered_map>
+
+namespace tessal::server {
+
+// Checks e-mail and password of every request.
+//
+// Passwords are stored as Argon2id hashes (libsodium's crypto_pwhash_str). A verification costs tens of
+// milliseconds and megabytes on purpose, while a device polls every five seconds with its password, so
+// a success is remembered for a bounded time under a keyed hash of the credentials (the key is random
+// per process): a poll then costs a hash and a lookup, and a changed password stops working when the
+// entry expires. Failed attempts lock the account for a time that doubles with each consecutive
+// failure; while locked no verification runs at all, but credentials remembered as good still pass, so
+// somebody guessing cannot lock out the owner's devices.
+class PasswordAuthenticator {
+ public:
+  struct Options {
+    std::chrono::milliseconds successLifetime = std::chrono::minutes(10);
+    std::chrono::milliseconds firstLock = std::chrono::seconds(1);  // after the first failure
+    std::chrono::milliseconds longestLock = std::chrono::minutes(5);
+    int concurrentVerifications = 2;  // bounds the memory Argon2id takes under load
+  };
+
+  explicit PasswordAuthenticator(SyncStore& store) : PasswordAuthenticator(store, Options{}) {}
+  PasswordAuthenticator(SyncStore& store, Options options);
+
+  enum class Verdict {
+    Accepted,
+    Rejected,     // unknown address or wrong password
+    Locked,       // too many failures; `retryAfter` tells how long
+    Unavailable,  // the storage failed
+  };
+  struct Outcome {
+    Verdict verdict = Verdict::Rejected;
+    int64_t accountId = 0;
+    std::chrono::seconds retryAfter{0};
+  };
+
+  // `email` is normalised here (see normaliseEmail); `password` is taken trimmed of white space.
+  Outcome authenticate(const std::string& email, const std::string& password);
+
+  // Creates an account. Fails with a reason for an address that is not one, a password shorter than 8
+  // characters, or an address already taken.
+  enum class SignUp { Created, BadEmail, BadPassword, Exists, Unavailable };
+  SignUp createAccount(const std::string& email, const std::string& password);
+
+  // The Argon2id hash of a password in libsodium's string form; none when out of memory.
+  static std::optional<std::string> hashPassword(const std::string& password);
+  // Lower-cased and trimmed; none unless it looks like an address (one "@" with text on both sides, no
+  // white space or control characters, at most 254 bytes).
+  static std::optional<std::string> normaliseEmail(const std::string& email);
+  // Trimmed of white space and line breaks at both ends, as the client sends it.
+  static std::string trimmed(const std::string& text);
+
+ private:
+  using Digest = std::array<unsigned char, 32>;
+  struct DigestHash {
+    size_t operator()(const Digest& d) const;
+  };
+  struct Remembered {
+    int64_t accountId;
+    std::chrono::steady_clock::time_point expires;
+  };
+  struct Failures {
+    int count = 0;
+    std::chrono::steady_clock::time_point lockedUntil;
+  };
+
+  Digest credentialDigest(const std::string& email, const std::string& password) const;
+  void recordFailure(const std::string& email, std::chrono::steady_clock::time_point now);
+
+  SyncStore& store_;
+  Options options_;
+  std::array<unsigned char, 32> key_{};
+  std::counting_semaphore<64> verifications_;
+
+  std::mutex mutex_;
+  std::unordered_map<Digest, Remembered, DigestHash> remembered_;
+  std::unordered_map<std::string, Failures> failures_;
+};
+
+}  // namespace tessal::server

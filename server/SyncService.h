@@ -1,0 +1,62 @@
+#pragma once
+
+#include "PasswordAuthenticator.h"
+#include "SyncStore.h"
+
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+namespace tessal::server {
+
+// An HTTP answer, independent of the HTTP library.
+struct HttpReply {
+  int status = 200;
+  std::string body;
+  std::string contentType = "application/json";
+  std::vector<std::pair<std::string, std::string>> headers;
+};
+
+// The sync protocol: one JSON request in, one JSON reply out. Documented in server/README.md.
+class SyncService {
+ public:
+  // The "code" of an error reply.
+  enum ErrorCode {
+    kMalformedRequest = 1,  // not JSON, not an object, a member missing or of the wrong type
+    kWrongCredentials = 2,  // unknown e-mail address or wrong password
+    kUnknownAction = 3,     // "action" is neither "head" nor "save"
+    kFetchHeadFirst = 4,    // with "iteration" 0: the save was not applied; poll "head", then save again
+    kBadChangeSet = 5,      // the "data" of a save is not a valid change set; nothing was stored
+    kRequestTooLarge = 6,   // the body is over the server's limit
+  };
+
+  SyncService(SyncStore& store, PasswordAuthenticator& authenticator)
+      : store_(store), authenticator_(authenticator) {}
+
+  // Answers one POST to "/sync/tessal/sync.php". Failures the client should simply retry (storage
+  // unavailable, account locked after failed attempts) are plain-text 503 and 429 answers with
+  // "Retry-After"; every other outcome is a JSON object with status 200.
+  HttpReply handle(std::string_view body);
+
+  // The JSON error reply {"error": message, "code": code} (with "iteration": 0 for code 4).
+  static HttpReply errorReply(int code, const std::string& message, int status = 200);
+
+ private:
+  HttpReply head(int64_t accountId, int64_t base, const std::string& device);
+  HttpReply save(int64_t accountId, int64_t base, const std::string& device, const JsonValue* data);
+  void rememberHead(int64_t accountId, const std::string& device, int64_t iteration);
+  bool isBehindLastHead(int64_t accountId, const std::string& device, int64_t base);
+
+  SyncStore& store_;
+  PasswordAuthenticator& authenticator_;
+  // The last head iteration sent to each device: a save based on an older one is a request that was
+  // overtaken by a later one of the same device (see README, "Late requests").
+  std::mutex headsMutex_;
+  std::unordered_map<std::string, int64_t> lastHeads_;
+};
+
+}  // namespace tessal::server

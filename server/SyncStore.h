@@ -1,0 +1,72 @@
+#pragma once
+
+#include "ChangeSet.h"
+#include "SqlDatabase.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+namespace tessal::server {
+
+// The synchronised data of every account and the accounts themselves, over SQLite or PostgreSQL.
+//
+// Each account keeps the current state of its records, not a log: per record its creation and, once
+// deleted, its tombstone; per field its value, the iteration that wrote it and the device that did.
+// The account's head is the last iteration written. server/README.md explains why this converges.
+class SyncStore {
+ public:
+  // Opens (and on first use sets up) the storage at `location` (see SqlDatabase::open). None with
+  // `error` set when it cannot.
+  static std::unique_ptr<SyncStore> open(const std::string& location, std::string& error);
+
+  SqlDatabase::Kind kind() const { return database_->kind(); }
+
+  enum class Status {
+    Ok,
+    Exists,       // createAccount: the address is taken
+    NotFound,     // findAccount: no such account
+    Unavailable,  // the storage failed; nothing was changed
+  };
+
+  struct Account {
+    int64_t id = 0;
+    std::string passwordHash;  // Argon2id, in libsodium's string form
+  };
+
+  // Stores a new account under an already normalised address.
+  Status createAccount(const std::string& email, const std::string& passwordHash);
+  Status findAccount(const std::string& email, Account& account);
+
+  struct Head {
+    Status status = Status::Ok;
+    int64_t iteration = 0;
+    // The change set for the reply's "result", as JSON text: every live record with a field or a
+    // creation newer than the base written by another device, under both "i" and "u", and the
+    // identities deleted since under "x".
+    std::string result;
+  };
+  // What `device` has not seen since iteration `base`. An empty device is a client that names none: it
+  // gets every change. A base above the head (a client of another history) gets the whole state.
+  Head head(int64_t accountId, int64_t base, const std::string& device);
+
+  struct Save {
+    Status status = Status::Ok;
+    bool refused = false;   // not applied: the client must fetch a "head" first (code 4, iteration 0)
+    int64_t iteration = 0;  // for the reply: the client's new base
+  };
+  // Applies a change set that `device` made on top of iteration `base`, in one transaction.
+  Save save(int64_t accountId, int64_t base, const std::string& device, const ChangeSet& changes);
+
+  // The account's head; for the poll that has nothing new, without a transaction.
+  Status currentHead(int64_t accountId, int64_t& head);
+
+ private:
+  explicit SyncStore(std::unique_ptr<SqlDatabase> database) : database_(std::move(database)) {}
+  void createSchema();
+
+  std::unique_ptr<SqlDatabase> database_;
+};
+
+}  // namespace tessal::server

@@ -1,0 +1,160 @@
+// tessal-sync-server: the command line around SyncServer.
+#include "SyncServer.h"
+
+#include <csignal>
+#include <cstdlib>
+#include <iostream>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include <pthread.h>
+
+using tessal::server::PasswordAuthenticator;
+using tessal::server::SyncServer;
+using tessal::server::SyncStore;
+
+namespace {
+
+constexpr const char* kUsage =
+    "usage:\n"
+    "  tessal-sync-server serve --listen HOST:PORT --db LOCATION [--threads N] [--max-body BYTES] "
+    "[--no-signup]\n"
+    "  tessal-sync-server add-user EMAIL --db LOCATION      (reads the password from standard input)\n"
+    "LOCATION is a SQLite file (created when missing) or a postgresql:// connection URI.\n"
+    "PORT 0 picks a free port; the address served is printed on standard output.\n";
+
+int usage() {
+  std::cerr << kUsage;
+  return 2;
+}
+
+std::optional<long long> number(const std::string& text) {
+  try {
+    size_t used = 0;
+    const long long value = std::stoll(text, &used);
+    if (used != text.size() || value < 0) return std::nullopt;
+    return value;
+  } catch (const std::exception&) {
+    return std::nullopt;
+  }
+}
+
+// "127.0.0.1:8080" or "[::1]:8080".
+bool splitListen(const std::string& listen, std::string& host, int& port) {
+  const size_t colon = listen.rfind(':');
+  if (colon == std::string::npos || colon == 0) return false;
+  host = listen.substr(0, colon);
+  if (host.size() > 2 && host.front() == '[' && host.back() == ']') host = host.substr(1, host.size() - 2);
+  const std::optional<long long> value = number(listen.substr(colon + 1));
+  if (!value || *value > 65535) return false;
+  port = static_cast<int>(*value);
+  return true;
+}
+
+int serve(const std::vector<std::string>& args) {
+  std::string listen, location;
+  SyncServer::Options options;
+  for (size_t i = 0; i < args.size(); ++i) {
+    const std::string& arg = args[i];
+    const bool hasValue = i + 1 < args.size();
+    if (arg == "--listen" && hasValue) {
+      listen = args[++i];
+    } else if (arg == "--db" && hasValue) {
+      location = args[++i];
+    } else if (arg == "--threads" && hasValue) {
+      const auto value = number(args[++i]);
+      if (!value || *value < 2 || *value > 1024) return usage();
+      options.threads = static_cast<int>(*value);
+    } else if (arg == "--max-body" && hasValue) {
+      const auto value = number(args[++i]);
+      if (!value || *value < 1024) return usage();
+      options.maxBodyBytes = static_cast<size_t>(*value);
+    } else if (arg == "--no-signup") {
+      options.signUp = false;
+    } else {
+      return usage();
+    }
+  }
+  if (listen.empty() || location.empty() || !splitListen(listen, options.host, options.port)) return usage();
+
+  // Signals are taken by this thread alone, so block them before any worker exists.
+  sigset_t signals;
+  sigemptyset(&signals);
+  sigaddset(&signals, SIGINT);
+  sigaddset(&signals, SIGTERM);
+  pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+  std::signal(SIGPIPE, SIG_IGN);
+
+  std::string error;
+  std::unique_ptr<SyncServer> server = SyncServer::create(location, options, error);
+  if (!server) {
+    std::cerr << "tessal-sync-server: cannot open " << location << ": " << error << "\n";
+    return 1;
+  }
+  if (!server->start(error)) {
+    std::cerr << "tessal-sync-server: " << error << "\n";
+    return 1;
+  }
+  const bool v6 = options.host.find(':') != std::string::npos;
+  std::cout << "tessal-sync-server: listening on http://" << (v6 ? "[" : "") << options.host
+            << (v6 ? "]" : "") << ":" << server->port() << std::endl;
+  int received = 0;
+  sigwait(&signals, &received);
+  server->stop();
+  return 0;
+}
+
+int addUser(const std::vector<std::string>& args) {
+  std::string email, location;
+  for (size_t i = 0; i < args.size(); ++i) {
+    if (args[i] == "--db" && i + 1 < args.size()) {
+      location = args[++i];
+    } else if (email.empty() && args[i].rfind("--", 0) != 0) {
+      email = args[i];
+    } else {
+      return usage();
+    }
+  }
+  if (email.empty() || location.empty()) return usage();
+  std::string password;
+  std::getline(std::cin, password);
+
+  std::string error;
+  std::unique_ptr<SyncStore> store = SyncStore::open(location, error);
+  if (!store) {
+    std::cerr << "tessal-sync-server: cannot open " << location << ": " << error << "\n";
+    return 1;
+  }
+  PasswordAuthenticator authenticator(*store);
+  switch (authenticator.createAccount(email, password)) {
+    case PasswordAuthenticator::SignUp::Created:
+      std::cout << "tessal-sync-server: account "
+                << PasswordAuthenticator::normaliseEmail(email).value_or(email) << " created\n";
+      return 0;
+    case PasswordAuthenticator::SignUp::BadEmail:
+      std::cerr << "tessal-sync-server: not an e-mail address\n";
+      break;
+    case PasswordAuthenticator::SignUp::BadPassword:
+      std::cerr << "tessal-sync-server: the password needs at least 8 characters\n";
+      break;
+    case PasswordAuthenticator::SignUp::Exists:
+      std::cerr << "tessal-sync-server: there already is an account for this address\n";
+      break;
+    case PasswordAuthenticator::SignUp::Unavailable:
+      std::cerr << "tessal-sync-server: storage failed\n";
+      break;
+  }
+  return 1;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  if (argc < 2) return usage();
+  const std::string command = argv[1];
+  const std::vector<std::string> args(argv + 2, argv + argc);
+  if (command == "serve") return serve(args);
+  if (command == "add-user") return addUser(args);
+  return usage();
+}
