@@ -10,7 +10,7 @@ packages=(
   qt6-base-dev libgl-dev libicu-dev libsqlite3-dev nlohmann-json3-dev
   libgtest-dev libgmock-dev libbenchmark-dev
   libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk
-  sqlite3 python3
+  sqlite3 python3 python3-jinja2
   xvfb xauth xdotool imagemagick dbus-x11 fonts-dejavu-core
 )
 missing=()

@@ -1,0 +1,431 @@
+#include "Date.h"
+#include "Decimal.h"
+#include "GXTemplateEngine.h"
+#include "KeyPath.h"
+#include "RXRegex.h"
+#include "TemplateTestSupport.h"
+#include "WTReportFilters.h"
+
+#include <QFile>
+#include <QStringEncoder>
+#include <QTemporaryDir>
+
+namespace {
+
+// A marker handler that misbehaves on request, to drive the engine's error paths:
+// "both" reports a block both beginning and ending, "noend" starts a block without end markers,
+// "jump" asks to resume past the template's end. Each returns a value and sets a variable.
+class ProbeMarkers : public GXTemplateMarker {
+ public:
+  explicit ProbeMarkers(QStringList names) : names_(std::move(names)) {}
+
+  QStringList markers() const override { return names_; }
+  std::optional<QStringList> endMarkersForMarker(const QString&) const override { return std::nullopt; }
+  QVariant markerEncountered(const QString& marker, const QStringList&, GXRange, bool& blockStarted,
+                             bool& blockEnded, bool&, GXRange& nextRange, const GXBlockInfo*,
+                             std::optional<QVariantMap>& newVariables) override {
+    newVariables = QVariantMap{{marker + QStringLiteral("Var"), QStringLiteral("kept")}};
+    if (marker == QLatin1String("both")) blockStarted = blockEnded = true;
+    if (marker == QLatin1String("noend")) blockStarted = true;
+    if (marker == QLatin1String("jump")) nextRange.length += 1;
+    return marker.toUpper();
+  }
+  void engineFinishedProcessingTemplate() override { ++finishedCalls; }
+
+  int finishedCalls = 0;
+
+ private:
+  QStringList names_;
+};
+
+class Record : public KeyValueCoding {
+ public:
+  QVariant valueForKey(const QString& key) const override {
+    return key == QLatin1String("name") ? QVariant(QStringLiteral("Acme")) : QVariant();
+  }
+};
+
+using EngineRunTest = TemplateTest;
+using EngineErrorTest = TemplateTest;
+using EngineVariableTest = TemplateTest;
+using EngineLiteralTest = TemplateTest;
+
+TEST(GXTemplateEngineVersion, IsOneZeroZero) {
+  EXPECT_EQ(GXTemplateEngine::version(), QStringLiteral("1.0.0"));
+}
+
+TEST_F(EngineRunTest, EmptyTemplateGivesAnEmptyTextNotNone) {
+  const QString output = render(QString());
+  EXPECT_FALSE(output.isNull());
+  EXPECT_TRUE(output.isEmpty());
+  EXPECT_TRUE(delegate.errors.empty());
+  EXPECT_EQ(delegate.events, QStringList{"finished"});
+}
+
+TEST_F(EngineRunTest, TextWithoutMarkersIsWrittenAsItStands) {
+  // A line end inside a body breaks a marker; the text stays as it is.
+  const QString text = QStringLiteral("a { b } %} {{ c\n{% for x\nin y %} e }}");
+  EXPECT_EQ(render(text), text);
+  EXPECT_TRUE(delegate.errors.empty());
+}
+
+TEST_F(EngineRunTest, ValuesAreWrittenAsPlainText) {
+  const QVariantMap vars{{"i", 42},
+                         {"big", qlonglong(1) << 40},
+                         {"yes", true},
+                         {"money", QVariant::fromValue(*Decimal::fromString(QStringLiteral("12.30")))},
+                         {"ratio", 0.1},
+                         {"when", QVariant::fromValue(Date::fromSeconds(1704067200.0))},
+                         {"list", QVariantList{1, QStringLiteral("two words")}},
+                         {"map", QVariantMap{{"k", QStringLiteral("v")}}}};
+  EXPECT_EQ(render(QStringLiteral("{{ i }}|{{ big }}|{{ yes }}|{{ money }}|{{ ratio }}|{{ when }}"), vars),
+            QStringLiteral("42|1099511627776|1|12.30|0.1|2024-01-01 00:00:00 +0000"));
+  EXPECT_EQ(render(QStringLiteral("{{ list }}{{ map }}"), vars),
+            QStringLiteral("(\n    1,\n    \"two words\"\n){\n    k = v;\n}"));
+}
+
+TEST_F(EngineRunTest, BlockEventsCarryTheBlock) {
+  struct Blocks : RecordingDelegate {
+    void templateEngineBlockStarted(GXTemplateEngine* engine, const GXBlockInfo& block) override {
+      RecordingDelegate::templateEngineBlockStarted(engine, block);
+      started.push_back(block);
+    }
+    std::vector<GXBlockInfo> started;
+  } blocks;
+  engine.setDelegate(&blocks);
+  EXPECT_EQ(engine.processTemplate(QStringLiteral("ab{% for 1 to 2 %}x{% /for %}"), {}),
+            QStringLiteral("abxx"));
+  // One start and one end for the whole loop, not one per pass.
+  EXPECT_EQ(blocks.events, (QStringList{"start for", "end for", "finished"}));
+  ASSERT_EQ(blocks.started.size(), 1u);
+  EXPECT_EQ(blocks.started[0].args, (QStringList{"1", "to", "2"}));
+  EXPECT_EQ(blocks.started[0].endNames, QStringList{"/for"});
+  EXPECT_EQ(blocks.started[0].startMarkerRange, (GXRange{2, 16}));
+  EXPECT_TRUE(blocks.started[0].vars.isEmpty());  // filled after the event
+}
+
+TEST_F(EngineRunTest, EveryRegistrationHearsOfTheEndOfARun) {
+  auto probe = std::make_shared<ProbeMarkers>(QStringList{"both", "noend", "jump"});
+  engine.loadMarker(probe);
+  render(QStringLiteral("plain"));
+  EXPECT_EQ(probe->finishedCalls, 3);
+}
+
+TEST_F(EngineRunTest, TheFirstHandlerLoadedForANameKeepsIt) {
+  auto probe = std::make_shared<ProbeMarkers>(QStringList{"for", "both"});
+  engine.loadMarker(probe);
+  engine.loadMarker(nullptr);
+  EXPECT_EQ(render(QStringLiteral("{% for 1 to 3 %}{{ currentLoop.currentIndex }}{% /for %}")),
+            QStringLiteral("123"));
+  EXPECT_EQ(render(QStringLiteral("{% both %}")), QStringLiteral("BOTH"));
+}
+
+TEST_F(EngineRunTest, AnEngineIsReusableAfterAStoppedRun) {
+  EXPECT_EQ(render(QStringLiteral("{% for 1 to 2 %}a{% if x y %}{% /if %}b{% /for %}")), QStringLiteral("a"));
+  EXPECT_EQ(delegate.codes(), QList<int>{1});
+  EXPECT_EQ(render(QStringLiteral("{% for 1 to 2 %}{% cycle p q %}{% /for %}{% if true %}ok{% /if %}")),
+            QStringLiteral("pqok"));
+  EXPECT_TRUE(delegate.errors.empty());
+}
+
+TEST_F(EngineRunTest, PatternsAreNotCompiledAgainDuringOrBetweenRuns) {
+  QString text;
+  for (int i = 0; i < 200; ++i) {
+    text +=
+        QStringLiteral("<p>{{ name | uppercase }} {% if n > %1 %}big{% else %}small{% /if %}</p>\n").arg(i);
+  }
+  const QVariantMap vars{{"name", QStringLiteral("x")}, {"n", 100}};
+  const std::uint64_t before = RXRegex::compileCount();
+  render(text, vars);
+  // At most the three patterns of the matcher, once each, however many markers the template holds.
+  EXPECT_LE(RXRegex::compileCount() - before, 3u);
+  const std::uint64_t afterFirst = RXRegex::compileCount();
+  render(text + text, vars);
+  render(QStringLiteral("{% for x in xs %}{{ x | lowercase }}{% /for %}"), {{"xs", QStringList{"A", "B"}}});
+  EXPECT_EQ(RXRegex::compileCount(), afterFirst);
+}
+
+TEST_F(EngineRunTest, ProcessingAFileDetectsItsEncoding) {
+  QTemporaryDir dir;
+  auto write = [&](const QString& name, const QByteArray& bytes) {
+    QFile file(dir.filePath(name));
+    EXPECT_TRUE(file.open(QIODevice::WriteOnly));
+    file.write(bytes);
+    return file.fileName();
+  };
+  const QString text = QStringLiteral("Grüße {{ who }}");
+  const QVariantMap vars{{"who", QStringLiteral("Zoë")}};
+  EXPECT_EQ(engine.processTemplateInFileAtPath(write("utf8.txt", text.toUtf8()), vars),
+            QStringLiteral("Grüße Zoë"));
+  QStringEncoder utf16(QStringConverter::Utf16LE, QStringEncoder::Flag::WriteBom);
+  EXPECT_EQ(engine.processTemplateInFileAtPath(write("utf16.txt", utf16.encode(text)), vars),
+            QStringLiteral("Grüße Zoë"));
+  EXPECT_TRUE(engine.processTemplateInFileAtPath(write("latin1.txt", text.toLatin1()), vars).isNull());
+  EXPECT_TRUE(engine.processTemplateInFileAtPath(dir.filePath("missing.txt"), vars).isNull());
+  EXPECT_TRUE(engine.processTemplateInFileAtPath(write("empty.txt", QByteArray()), vars).isEmpty());
+  EXPECT_FALSE(engine.processTemplateInFileAtPath(dir.filePath("empty.txt"), vars).isNull());
+}
+
+TEST(EngineWithoutMatcher, ReportsFatalErrorSevenAndGivesNone) {
+  GXTemplateEngine engine;
+  EXPECT_TRUE(engine.processTemplate(QStringLiteral("x"), {}).isNull());  // no delegate: nothing to tell
+  RecordingDelegate delegate;
+  engine.setDelegate(&delegate);
+  EXPECT_TRUE(engine.processTemplate(QStringLiteral("x"), {}).isNull());
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 7);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Fatal Error: No matcher has been configured for the template engine"));
+  EXPECT_FALSE(delegate.errors[0].continuing);
+  EXPECT_TRUE(delegate.events.isEmpty());  // no run took place, so none finished
+}
+
+TEST_F(EngineErrorTest, UnknownVariablesAreReportedOnlyWhileWriting) {
+  EXPECT_EQ(render(QStringLiteral("a{{ missing }}b")), QStringLiteral("ab"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 3);
+  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"missing\" is not a valid variable"));
+  EXPECT_TRUE(delegate.errors[0].continuing);
+  EXPECT_EQ(render(QStringLiteral("{% if false %}{{ missing }}{% /if %}c")), QStringLiteral("c"));
+  EXPECT_TRUE(delegate.errors.empty());
+  EXPECT_EQ(render(QStringLiteral("{{}}")), QString());
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"(null)\" is not a valid variable"));
+}
+
+TEST_F(EngineErrorTest, UnknownMarkersAreReportedEvenWhenOutputIsOff) {
+  EXPECT_EQ(render(QStringLiteral("a{% bogus x y %}b")), QStringLiteral("ab"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 2);
+  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"bogus\" is not a valid marker"));
+  EXPECT_EQ(render(QStringLiteral("{% if false %}{% bogus %}{% /if %}c")), QStringLiteral("c"));
+  EXPECT_EQ(delegate.codes(), QList<int>{2});
+  render(QStringLiteral("{%%}"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"(null)\" is not a valid marker"));
+}
+
+TEST_F(EngineErrorTest, BlocksLeftOpenAreCountedAndNamed) {
+  EXPECT_EQ(render(QStringLiteral("{% for x in items %}abc"), {{"items", QVariantList{1}}}),
+            QStringLiteral("abc"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 6);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Finished processing template, but 1 block was left open (for)."));
+  EXPECT_TRUE(delegate.errors[0].continuing);
+  render(QStringLiteral("{% for 1 to 2 %}{% if true %}{% section s %}x"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Finished processing template, but 3 blocks were left open (for, if, section)."));
+}
+
+TEST_F(EngineErrorTest, ClosingABlockThatIsNotOpenStopsTheRun) {
+  EXPECT_EQ(render(QStringLiteral("a{% /for %}b{{ missing }}")), QStringLiteral("a"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 1);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Marker \"/for\" reported that a non-existent block ended"));
+  EXPECT_TRUE(delegate.errors[0].continuing);  // reported as continuing, and yet the run ends
+  EXPECT_EQ(delegate.events.last(), QStringLiteral("finished"));
+
+  EXPECT_EQ(render(QStringLiteral("{% section s %}x{% /if %}y{% /section %}z")), QStringLiteral("x"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(
+      delegate.errors[0].message,
+      QStringLiteral(
+          "Marker \"/if\" reported that a block ended, but current block was started by \"section\" marker"));
+}
+
+TEST_F(EngineErrorTest, AMarkerBothBeginningAndEndingABlockKeepsItsOutput) {
+  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"both"}));
+  EXPECT_EQ(render(QStringLiteral("{% both %}{{ bothVar }}")), QStringLiteral("BOTHkept"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 0);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Marker \"both\" reported that a block simultaneously began and ended"));
+  EXPECT_EQ(delegate.events, QStringList{"finished"});  // no block was opened or closed
+}
+
+TEST_F(EngineErrorTest, ABlockWithoutEndMarkersDropsItsOutputAndVariables) {
+  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"noend"}));
+  EXPECT_EQ(render(QStringLiteral("a{% noend %}b{{ noendVar }}")), QStringLiteral("ab"));
+  EXPECT_EQ(delegate.codes(), (QList<int>{4, 3}));
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Marker \"noend\" started a block but did not supply any suitable end-markers"));
+  EXPECT_TRUE(delegate.errors[0].continuing);
+}
+
+TEST_F(EngineErrorTest, AResumeRangePastTheEndIsFatal) {
+  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"jump"}));
+  EXPECT_EQ(render(QStringLiteral("before{% jump %}after")), QStringLiteral("before"));
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 5);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral(
+                "Fatal Error: Marker handler \"jump\" specified an invalid range to resume processing from"));
+  EXPECT_FALSE(delegate.errors[0].continuing);
+  EXPECT_EQ(delegate.events.last(), QStringLiteral("finished"));
+}
+
+TEST_F(EngineErrorTest, RunawayTemplatesStopAtTheLimits) {
+  engine.setMaximumSteps(50);
+  const QString loop = render(QStringLiteral("{% for 1 to 2000000000 %}x{% /for %}"));
+  EXPECT_LT(loop.size(), 50);
+  ASSERT_EQ(delegate.errors.size(), 1u);
+  EXPECT_EQ(delegate.errors[0].code, 8);
+  EXPECT_EQ(delegate.errors[0].message,
+            QStringLiteral("Fatal Error: Processing stopped: more than 50 markers and expressions"));
+  EXPECT_FALSE(delegate.errors[0].continuing);
+  // A run variable named "currentLoop" takes the loop's updates, so the loop's own counter never moves:
+  // without the limit this loop would not end.
+  render(QStringLiteral("{% set currentLoop 1 %}{% for 1 to 3 %}{% /for %}"));
+  EXPECT_EQ(delegate.codes(), QList<int>{8});
+
+  engine.setMaximumSteps(0);
+  engine.setMaximumOutputLength(100);
+  const QString wide = render(QStringLiteral("{% for 1 to 2000000000 %}0123456789{% /for %}"));
+  EXPECT_GT(wide.size(), 100);
+  EXPECT_LE(wide.size(), 110);
+  EXPECT_EQ(delegate.codes(), QList<int>{8});
+}
+
+TEST_F(EngineVariableTest, BooleanNamesAndDelimitersAreGlobals) {
+  EXPECT_EQ(render(QStringLiteral("{{ true }}{{ false }}{{ YES }}{{ NO }}{{ yes }}{{ no }}")),
+            QStringLiteral("101010"));
+  EXPECT_EQ(engine.objectForKey(QStringLiteral("YES")), QVariant(true));  // kept after the run
+  engine.setExpressionStartDelimiter(QStringLiteral("[["));
+  engine.setExpressionEndDelimiter(QStringLiteral("]]"));
+  engine.setFilterDelimiter(QStringLiteral("!"));
+  EXPECT_EQ(render(QStringLiteral("[[ engine.delimiters.expressionStart ]] [[ engine.delimiters.filter ]] "
+                                  "[[ engine.delimiters.markerEnd ! uppercase ]] {{ x }}")),
+            QStringLiteral("[[ ! %} {{ x }}"));
+}
+
+TEST_F(EngineVariableTest, RunVariablesShadowGlobalsWhichShadowBlockVariables) {
+  engine.setObject(QStringLiteral("global"), QStringLiteral("x"));
+  engine.addEntriesFromDictionary({{"item", QStringLiteral("global")}, {"only", QStringLiteral("g")}});
+  EXPECT_EQ(render(QStringLiteral("{{ x }}{{ only }}"), {{"x", QStringLiteral("run")}}),
+            QStringLiteral("rung"));
+  // The loop variable lives in the block's frame, so the global of that name wins; the loop's next
+  // value then goes where "item" was found: into the globals.
+  EXPECT_EQ(render(QStringLiteral("{% for item in items %}{{ item }};{% /for %}"),
+                   {{"items", QStringList{"a", "b", "c"}}}),
+            QStringLiteral("global;b;c;"));
+  EXPECT_EQ(engine.objectForKey(QStringLiteral("item")), QVariant(QStringLiteral("c")));
+}
+
+TEST_F(EngineVariableTest, KeyPathComponentsIndexLists) {
+  const QVariantMap vars{
+      {"letters", QStringList{"a", "b", "c"}},
+      {"rows", QVariantList{QVariantMap{{"name", "first"}}, QVariantMap{{"name", "second"}}}},
+      {"nested", QVariantList{QVariantList{1, 2}, QVariantList{3}}}};
+  EXPECT_EQ(render(QStringLiteral("{{ letters.0 }}{{ letters.2 }}{{ letters.1st }}"), vars),
+            QStringLiteral("acb"));
+  EXPECT_EQ(render(QStringLiteral("{{ rows.1.name }}/{{ nested.1.0 }}/{{ rows.@count }}"), vars),
+            QStringLiteral("second/3/2"));
+  for (const char* path :
+       {"letters.-1", "letters.x", "letters.3", "rows.2.name", "rows.0.missing", "rows.name.x"}) {
+    EXPECT_EQ(render(QStringLiteral("{{ %1 }}").arg(QLatin1String(path)), vars), QString()) << path;
+    EXPECT_EQ(delegate.codes(), QList<int>{3}) << path;
+  }
+  // A key every element answers reads across the list.
+  EXPECT_EQ(render(QStringLiteral("{{ rows.name }}"), vars), QStringLiteral("(\n    first,\n    second\n)"));
+}
+
+TEST_F(EngineVariableTest, RecordsAnswerThroughTheirKeys) {
+  const Record record;
+  const QVariantMap vars{{"client", KeyPath::variantFromObject(&record)}};
+  EXPECT_EQ(render(QStringLiteral("{{ client.name }}{{ client.nothing }}"), vars), QStringLiteral("Acme"));
+  EXPECT_EQ(delegate.codes(), QList<int>{3});
+  // Records take no values: setting through one changes nothing.
+  EXPECT_EQ(render(QStringLiteral("{% set client.name Other %}{{ client.name }}"), vars),
+            QStringLiteral("Acme"));
+}
+
+TEST_F(EngineVariableTest, SetReplacesAValueWhereItLives) {
+  const QVariantMap vars{{"client", QVariantMap{{"name", QStringLiteral("Bar")}}},
+                         {"letters", QStringList{"a", "b"}},
+                         {"rows", QVariantList{QVariantMap{{"n", 1}}, QVariantMap{{"n", 2}}}},
+                         {"title", QStringLiteral("A")}};
+  EXPECT_EQ(render(QStringLiteral("{% set client.name Foo %}{{ client.name }}"), vars),
+            QStringLiteral("Foo"));
+  EXPECT_EQ(engine.templateVariables().value("client").toMap().value("name"),
+            QVariant(QStringLiteral("Foo")));
+  EXPECT_EQ(vars.value("client").toMap().value("name"),
+            QVariant(QStringLiteral("Bar")));  // the caller's copy
+  EXPECT_EQ(render(QStringLiteral("{% set letters.1 z %}{{ letters.0 }}{{ letters.1 }}"), vars),
+            QStringLiteral("az"));
+  // "rows.n" is found on the list itself, so the list replaces its element at the key's integer value (0).
+  EXPECT_EQ(render(QStringLiteral("{% set rows.n x %}{{ rows.0 }}{{ rows.1.n }}"), vars),
+            QStringLiteral("x2"));
+  // Inside a block a run variable is still changed where it lives.
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set title B %}{% /section %}{{ title }}"), vars),
+            QStringLiteral("B"));
+}
+
+TEST_F(EngineVariableTest, NewVariablesGoToTheInnermostFrameUnderTheirWholeName) {
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}{{ t }}")),
+            QStringLiteral("A"));
+  EXPECT_EQ(delegate.codes(), QList<int>{3});
+  EXPECT_EQ(render(QStringLiteral("{% set a.b 5 %}{{ a.b }}")), QString());
+  EXPECT_EQ(delegate.codes(), QList<int>{3});
+  EXPECT_EQ(engine.templateVariables().value(QStringLiteral("a.b")), QVariant(QStringLiteral("5")));
+}
+
+TEST_F(EngineVariableTest, LookupAnswersWhereAValueLives) {
+  render(QString(),
+         {{"client", QVariantMap{{"name", QStringLiteral("Bar")}}}, {"letters", QStringList{"a", "b"}}});
+  QVariant parent;
+  QString key;
+  EXPECT_EQ(engine.valueForVariable(QStringLiteral("client.name"), &parent, &key),
+            QVariant(QStringLiteral("Bar")));
+  EXPECT_EQ(parent.toMap().value("name"), QVariant(QStringLiteral("Bar")));
+  EXPECT_EQ(key, QStringLiteral("name"));
+  EXPECT_EQ(engine.valueForVariable(QStringLiteral("letters.1"), &parent, &key),
+            QVariant(QStringLiteral("b")));
+  EXPECT_EQ(parent.toStringList(), (QStringList{"a", "b"}));
+  EXPECT_EQ(key, QStringLiteral("1"));
+  EXPECT_EQ(engine.valueForVariable(QStringLiteral("client"), &parent, &key).toMap().size(), 1);
+  EXPECT_TRUE(parent.toMap().contains("letters"));  // the run's variables themselves
+  EXPECT_EQ(key, QStringLiteral("client"));
+  engine.setValue(QStringLiteral("Baz"), QStringLiteral("client.name"), false);
+  EXPECT_EQ(engine.resolveVariable(QStringLiteral("client.name")), QVariant(QStringLiteral("Baz")));
+  engine.setValue(QStringLiteral("forced"), QStringLiteral("client.name"), true);
+  EXPECT_EQ(engine.templateVariables().value(QStringLiteral("client.name")),
+            QVariant(QStringLiteral("forced")));
+  EXPECT_EQ(engine.resolveVariable(QStringLiteral("client.name")), QVariant(QStringLiteral("Baz")));
+}
+
+TEST_F(EngineVariableTest, FiltersApplyToExpressionsAndMarkers) {
+  const QVariantMap vars{{"name", QStringLiteral("Ada")}};
+  EXPECT_EQ(render(QStringLiteral("{{ name | uppercase }}{{ name|lowercase }}{{ name | nosuch }}"), vars),
+            QStringLiteral("ADAadaAda"));
+  EXPECT_TRUE(delegate.errors.empty());
+  EXPECT_EQ(render(QStringLiteral("{% for 1 to 2 %}{% cycle odd even | uppercase %}{% /for %}")),
+            QStringLiteral("ODDEVEN"));
+  // A filter that gives no value writes nothing (and is no error).
+  engine.loadFilter(std::make_shared<WTReportFilters>());
+  EXPECT_EQ(render(QStringLiteral("[{{ name | decimal }}]"), vars), QStringLiteral("[]"));
+  EXPECT_TRUE(delegate.errors.empty());
+}
+
+TEST_F(EngineLiteralTest, LiteralSectionsWriteTheirMarkersAsText) {
+  struct Case {
+    const char* text;
+    const char* output;
+  };
+  const Case cases[] = {
+      {"{% literal %}{{ x }}{% if a %}{% /literal %}", "{{ x }}{% if a %}"},
+      {"{% literal %}a{% literal %}b{% /literal %}c", "a{% literal %}bc"},
+      {"a{% /literal %}b", "ab"},
+      {"{{ literal }}x{{ y | f }}{{ /literal }}", "x{{ y | f }}"},
+      // With output off the markers inside are handled: this /if turns output back on.
+      {"{% if false %}{% literal %}{% /if %}{{ x }}{% /literal %}z", "{{ x }}z"},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(render(QString::fromUtf8(c.text), {{"x", 1}}), QString::fromUtf8(c.output)) << c.text;
+    EXPECT_TRUE(delegate.errors.empty()) << c.text;
+  }
+}
+
+}  // namespace

@@ -1,0 +1,161 @@
+#include "Date.h"
+#include "Decimal.h"
+#include "GXTemplateStandardFilters.h"
+#include "RZDate.h"
+#include "TemplateTestSupport.h"
+#include "WTReportFilters.h"
+
+#include <QColor>
+#include <QDateTime>
+
+#include <unicode/locid.h>
+
+namespace {
+
+// Money text depends on the locale, and its formatter is made on first use: fix the locale before any test.
+const bool kLocaleFixed = [] {
+  UErrorCode status = U_ZERO_ERROR;
+  icu::Locale::setDefault(icu::Locale("en_US"), status);
+  return U_SUCCESS(status);
+}();
+
+class FilterTest : public TemplateTest {
+ protected:
+  FilterTest() { engine.loadFilter(std::make_shared<WTReportFilters>()); }
+
+  QString filtered(const QVariant& value, const QString& filter) {
+    return render(QStringLiteral("{{ v | %1 }}").arg(filter), {{"v", value}});
+  }
+};
+
+Decimal decimal(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
+
+TEST_F(FilterTest, CaseFiltersWorkOnTheValuesText) {
+  EXPECT_EQ(filtered(12, QStringLiteral("uppercase")), QStringLiteral("12"));
+  EXPECT_EQ(filtered(true, QStringLiteral("uppercase")), QStringLiteral("1"));
+  EXPECT_EQ(filtered(QStringLiteral("Straße"), QStringLiteral("uppercase")), QStringLiteral("STRASSE"));
+  EXPECT_EQ(filtered(QStringLiteral("ÀB c"), QStringLiteral("lowercase")), QStringLiteral("àb c"));
+  struct Case {
+    const char* text;
+    const char* capitalized;
+  };
+  const Case cases[] = {{"hello world", "Hello World"},           {"HELLO wORLD", "Hello World"},
+                        {"o'neil-smith", "O'neil-Smith"},         {"123abc 4U", "123Abc 4U"},
+                        {"élan\tvital\nend", "Élan\tVital\nEnd"}, {"", ""}};
+  for (const Case& c : cases) {
+    EXPECT_EQ(GXTemplateStandardFilters::capitalized(QString::fromUtf8(c.text)),
+              QString::fromUtf8(c.capitalized))
+        << c.text;
+  }
+  EXPECT_EQ(filtered(QStringLiteral("a b"), QStringLiteral("capitalized")), QStringLiteral("A B"));
+}
+
+TEST_F(FilterTest, DateFormatNeedsADateAndOnePattern) {
+  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
+  const QVariant date =
+      QVariant::fromValue(Date::fromQDateTime(QDateTime(QDate(2024, 3, 31), QTime(22, 30), Qt::UTC)));
+  const QVariantMap vars{{"d", date}, {"t", QStringLiteral("text")}};
+  // 22:30 UTC is already 1 April in Berlin (summer time).
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"dd.MM.yyyy HH:mm\" }}"), vars),
+            QStringLiteral("01.04.2024 00:30"));
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format:'EEE, d MMM' }}"), vars), QStringLiteral("Mon, 1 Apr"));
+  EXPECT_EQ(render(QStringLiteral("{{ t | date_format: yyyy }}"), vars), QStringLiteral("text"));
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: yyyy MM }}|{{ d | date_format }}"), vars),
+            QStringLiteral("2024-03-31 22:30:00 +0000|2024-03-31 22:30:00 +0000"));
+  const QDateTime qt(QDate(2024, 12, 24), QTime(8, 0), Qt::UTC);
+  EXPECT_EQ(render(QStringLiteral("{{ q | date_format: \"yyyy-MM-dd\" }}"), {{"q", qt}}),
+            QStringLiteral("2024-12-24"));
+  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
+}
+
+TEST_F(FilterTest, DateTextsOfOneDayComeFromTheRightDay) {
+  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("America/New_York")));
+  // Hourly items across a local midnight, and one pattern with times: every text must match its own date.
+  QVariantList items;
+  const double start =
+      Date::fromQDateTime(QDateTime(QDate(2024, 11, 2), QTime(20, 0), Qt::UTC)).secondsSince1970();
+  for (int i = 0; i < 60; ++i) items.append(QVariant::fromValue(Date::fromSeconds(start + 1800.0 * i)));
+  const QString output = render(QStringLiteral("{% for d in items %}{{ d | date_format: \"yyyy-MM-dd\" }} "
+                                               "{{ d | date_format: \"d HH:mm\" }};{% /for %}"),
+                                {{"items", items}});
+  QString expected;
+  for (const QVariant& item : items) {
+    const Date date = item.value<Date>();
+    expected += RZDate::stringWithPattern(date, QStringLiteral("yyyy-MM-dd")) + QLatin1Char(' ') +
+                RZDate::stringWithPattern(date, QStringLiteral("d HH:mm")) + QLatin1Char(';');
+  }
+  EXPECT_EQ(output, expected);
+  // After a change of zone the same instant may fall on another day.
+  const QVariantMap late{
+      {"d", QVariant::fromValue(Date::fromSeconds(start + 4 * 3600.0))}};  // 00:00 UTC, 3 Nov
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"d\" }}"), late), QStringLiteral("2"));
+  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"d\" }}"), late), QStringLiteral("3"));
+  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
+}
+
+TEST_F(FilterTest, OnlyPatternsOfDayFieldsShareADaysText) {
+  for (const char* pattern : {"yyyy-MM-dd", "EEEE d. MMMM y 'um' QQQ", "w/W D F g e c", "'HH:mm' yy"}) {
+    EXPECT_TRUE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
+  }
+  for (const char* pattern : {"HH:mm", "yyyy a", "d z", "dd 'x''' ss", "yyyy-MM-dd'T'HH"}) {
+    EXPECT_FALSE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
+  }
+}
+
+TEST_F(FilterTest, ColorFormatWritesHexForHex) {
+  const QVariant red = QColor(255, 0, 0);
+  EXPECT_EQ(filtered(red, QStringLiteral("color_format: hex")), QStringLiteral("ff0000"));
+  EXPECT_EQ(filtered(red, QStringLiteral("color_format: HEX")), QStringLiteral("ff0000"));
+  EXPECT_EQ(filtered(QColor(18, 52, 86, 128), QStringLiteral("color_format: hex")), QStringLiteral("123456"));
+  EXPECT_EQ(filtered(QColor::fromHsv(240, 255, 255), QStringLiteral("color_format: hex")),
+            QStringLiteral("0000ff"));
+  EXPECT_EQ(filtered(QColor(), QStringLiteral("color_format: hex")), QStringLiteral("000000"));
+  // Anything else leaves the value as it is.
+  GXTemplateStandardFilters filters;
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {QStringLiteral("rgb")}, red), red);
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {}, red), red);
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {QStringLiteral("hex")},
+                                  QStringLiteral("ff0000")),
+            QVariant(QStringLiteral("ff0000")));
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("nosuch"), {}, red), red);
+}
+
+TEST_F(FilterTest, DigiclockWritesMinutesAsDurationText) {
+  struct Case {
+    QVariant value;
+    const char* text;
+  };
+  const Case cases[] = {{90, "01:30"},
+                        {0, "00:00"},
+                        {6000, "100:00"},
+                        {-90, "0-1:0-30"},
+                        {2.9, "00:02"},
+                        {QVariant::fromValue(decimal("61.9")), "01:01"},
+                        {QStringLiteral("125 min"), "02:05"},
+                        {QStringLiteral("abc"), "00:00"},
+                        {true, "00:01"}};
+  for (const Case& c : cases) {
+    EXPECT_EQ(filtered(c.value, QStringLiteral("digiclock")), QString::fromUtf8(c.text)) << c.text;
+  }
+}
+
+TEST_F(FilterTest, DecimalWritesMoneyText) {
+  ASSERT_TRUE(kLocaleFixed);
+  EXPECT_EQ(filtered(QVariant::fromValue(decimal("1234.5")), QStringLiteral("decimal")),
+            QStringLiteral("1,234.50"));
+  EXPECT_EQ(filtered(QVariant::fromValue(decimal("-0.005")), QStringLiteral("decimal")),
+            QStringLiteral("-0.01"));
+  EXPECT_EQ(filtered(1234567, QStringLiteral("decimal")), QStringLiteral("1,234,567.00"));
+  EXPECT_EQ(filtered(0.1, QStringLiteral("decimal")), QStringLiteral("0.10"));
+  // Not a number: no text at all.
+  EXPECT_EQ(filtered(QStringLiteral("12"), QStringLiteral("decimal")), QString());
+  EXPECT_TRUE(delegate.errors.empty());
+  WTReportFilters report;
+  EXPECT_FALSE(report.filterInvoked(QStringLiteral("uppercase"), {}, QStringLiteral("x")).isValid());
+  EXPECT_EQ(report.filters(), (QStringList{"digiclock", "decimal"}));
+}
+
+}  // namespace

@@ -1,0 +1,197 @@
+#include "GXTemplateEngine.h"
+#include "ICUTemplateMatcher.h"
+#include "RXRegex.h"
+
+#include <gtest/gtest.h>
+
+namespace {
+
+// A matcher over an engine whose template is `text` (the engine's run sets it; here a run over the text
+// with no matcher does, and reports nothing without a delegate).
+class MatcherTest : public ::testing::Test {
+ protected:
+  MatcherTest() : matcher(&engine) {}
+
+  void use(const QString& text) {
+    engine.processTemplate(text, {});  // no matcher set: only takes the template
+    matcher.engineSettingsChanged();
+  }
+
+  std::shared_ptr<const GXTemplateMatch> first(const QString& text) {
+    use(text);
+    return matcher.firstMarkerWithinRange({0, std::uint64_t(text.size())});
+  }
+
+  GXTemplateEngine engine;
+  ICUTemplateMatcher matcher;
+};
+
+TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
+  struct Case {
+    const char* text;
+    const char* type;
+    const char* name;  // null: absent
+    QStringList args;
+    const char* filter;  // null: absent
+    QStringList filterArgs;
+  };
+  const Case cases[] = {
+      {"{{ client.name }}", "expression", "client.name", {}, nullptr, {}},
+      {"{% for item in items %}", "marker", "for", {"item", "in", "items"}, nullptr, {}},
+      {"{{ d | date_format: \"%d.%m.%Y\" }}", "expression", "d", {}, "date_format", {"%d.%m.%Y"}},
+      {"{{d|date_format:'yyyy MM'}}", "expression", "d", {}, "date_format", {"yyyy MM"}},
+      {"{% if a == 'x y' %}", "marker", "if", {"a", "==", "x y"}, nullptr, {}},
+      {"{% set x '' 5 %}", "marker", "set", {"x"}, nullptr, {}},
+      {"{% cycle \"a \\\" b\" 'c' %}", "marker", "cycle", {"a \\\" b", "c"}, nullptr, {}},
+      {"{{ a | b | c }}", "expression", "a", {}, "b", {"|", "c"}},
+      {"{{ a | f: x: y }}", "expression", "a", {}, "f", {"x:", "y"}},
+      {"{{ a | '' x }}", "expression", "a", {}, nullptr, {}},
+      {"{%  %}", "marker", nullptr, {}, nullptr, {}},
+      {"{{}}", "expression", nullptr, {}, nullptr, {}},
+      {"{% '' | upper %}", "marker", nullptr, {}, "upper", {}},
+      {"{%\tnow\n%}", "marker", "now", {}, nullptr, {}},  // blanks around the body may include a line end
+  };
+  for (const Case& c : cases) {
+    const QString text = QString::fromUtf8(c.text);
+    const std::shared_ptr<const GXTemplateMatch> match = first(text);
+    ASSERT_TRUE(match) << c.text;
+    EXPECT_EQ(match->range, (GXRange{0, std::uint64_t(text.size())})) << c.text;
+    EXPECT_EQ(match->type, QString::fromUtf8(c.type)) << c.text;
+    EXPECT_EQ(match->name, c.name ? QString::fromUtf8(c.name) : QString()) << c.text;
+    EXPECT_EQ(match->name.isNull(), c.name == nullptr) << c.text;
+    EXPECT_EQ(match->args, c.args) << c.text;
+    EXPECT_EQ(match->filter.isNull(), c.filter == nullptr) << c.text;
+    EXPECT_EQ(match->filter, c.filter ? QString::fromUtf8(c.filter) : QString()) << c.text;
+    EXPECT_EQ(match->filterArgs, c.filterArgs) << c.text;
+  }
+}
+
+TEST_F(MatcherTest, ArgumentsSplitAtBlanksOutsideQuotes) {
+  struct Case {
+    const char* text;
+    QStringList arguments;
+  };
+  const Case cases[] = {
+      {"a  b\tc", {"a", "b", "c"}},
+      {"\"x y\" 'z w' v", {"x y", "z w", "v"}},
+      {"'it\\'s' \"say \\\"hi\\\"\"", {"it\\'s", "say \\\"hi\\\""}},  // escapes are kept as written
+      {"a \"\" b", {"a"}},  // an empty quoted argument ends the split
+      {"'' a", {}},
+      {"\"unclosed x", {"\"unclosed", "x"}},
+      {"mixed\"quote\"s", {"mixed\"quote\"s"}},
+      {"", {}},
+      {"   ", {}},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(matcher.argumentsFromString(QString::fromUtf8(c.text)), c.arguments) << c.text;
+  }
+}
+
+TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
+  const QString text = QStringLiteral("ab {{ x }} cd {% y %} ef");
+  use(text);
+  auto at = [&](std::uint64_t location, std::uint64_t length) {
+    return matcher.firstMarkerWithinRange({location, length});
+  };
+  ASSERT_TRUE(at(0, text.size()));
+  EXPECT_EQ(at(0, text.size())->range, (GXRange{3, 7}));
+  EXPECT_EQ(at(4, text.size() - 4)->range, (GXRange{14, 7}));
+  // A match reaching past the range is none, whatever was found from the same place before.
+  EXPECT_FALSE(at(0, 9));
+  EXPECT_TRUE(at(0, 10));
+  EXPECT_FALSE(at(10, 10));
+  EXPECT_FALSE(at(21, 3));
+  EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
+}
+
+TEST_F(MatcherTest, AMarkerBrokenOverTwoLinesIsNotFound) {
+  EXPECT_FALSE(first(QStringLiteral("{% for x\nin items %}")));
+  EXPECT_FALSE(first(QStringLiteral("{{ a\nb }}")));
+  EXPECT_FALSE(first(QStringLiteral("{{ a | b\nc }}")));
+  EXPECT_FALSE(first(QStringLiteral("no markers at all")));
+}
+
+TEST_F(MatcherTest, DelimitersAreTakenLiterally) {
+  engine.setMarkerStartDelimiter(QStringLiteral("$("));
+  engine.setMarkerEndDelimiter(QStringLiteral(")*"));
+  engine.setExpressionStartDelimiter(QStringLiteral("[["));
+  engine.setExpressionEndDelimiter(QStringLiteral("]]"));
+  engine.setFilterDelimiter(QStringLiteral("."));
+  const std::shared_ptr<const GXTemplateMatch> marker = first(QStringLiteral("x $( if a . upper )* y"));
+  ASSERT_TRUE(marker);
+  EXPECT_EQ(marker->type, QStringLiteral("marker"));
+  EXPECT_EQ(marker->name, QStringLiteral("if"));
+  EXPECT_EQ(marker->args, QStringList{"a"});
+  EXPECT_EQ(marker->filter, QStringLiteral("upper"));
+  const std::shared_ptr<const GXTemplateMatch> expression = first(QStringLiteral("{{ a }} [[b]]"));
+  ASSERT_TRUE(expression);
+  EXPECT_EQ(expression->range, (GXRange{8, 5}));
+  EXPECT_EQ(expression->name, QStringLiteral("b"));
+  EXPECT_EQ(matcher.markerStart(), QStringLiteral("$("));
+  EXPECT_EQ(matcher.filterDelimiter(), QStringLiteral("."));
+}
+
+TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {
+  // The matcher starts its search where a match can begin; over random texts made of the pattern's own
+  // pieces, every position must give exactly what the plain search from that position gives.
+  const QStringList pieces{"{{",
+                           "}}",
+                           "{%",
+                           "%}",
+                           "|",
+                           " ",
+                           "\t",
+                           "\n",
+                           "\r\n",
+                           "x",
+                           "ab",
+                           ":",
+                           "\"",
+                           "'",
+                           "\\",
+                           QString(QChar(0x2028)),
+                           QString(QChar(0x0085)),
+                           QString(QChar(0x00a0)),
+                           "{",
+                           "%"};
+  std::uint32_t seed = 12345;
+  auto next = [&seed] { return (seed = seed * 1664525u + 1013904223u) >> 8; };
+  for (int round = 0; round < 300; ++round) {
+    QString text;
+    const int count = 1 + int(next() % 40);
+    for (int i = 0; i < count; ++i) text += pieces[next() % pieces.size()];
+    use(text);
+    for (std::uint64_t location = 0; location <= std::uint64_t(text.size()); ++location) {
+      const GXRange rest{location, text.size() - location};
+      const GXRange expected =
+          RXRegex::rangeOfRegex(QString(text.constData(), text.size()), matcher.regex(), rest);
+      const std::shared_ptr<const GXTemplateMatch> found = matcher.firstMarkerWithinRange(rest);
+      const GXRange got = found ? found->range : GXRange{kGXNotFound, 0};
+      ASSERT_EQ(got, expected) << "text " << text.toStdString() << " from " << location;
+    }
+  }
+}
+
+TEST(MatcherCharacterClasses, AreThoseOfTheRegularExpressions) {
+  // The classes decide where the matcher starts its searches: they must be ICU's own.
+  int differences = 0;
+  for (char32_t c = 0; c < 0x10000; ++c) {
+    if (c >= 0xd800 && c <= 0xdfff) continue;
+    const QString one{QChar(char16_t(c))};
+    const bool space = RXRegex::isMatchedByRegex(one, QStringLiteral("^\\s$"));
+    const bool dot = RXRegex::isMatchedByRegex(one, QStringLiteral("^.$"));
+    if (space != ICUTemplateMatcher::isPatternSpace(char16_t(c))) ++differences;
+    if (dot == ICUTemplateMatcher::isPatternLineEnd(char16_t(c))) ++differences;
+  }
+  EXPECT_EQ(differences, 0);
+}
+
+TEST_F(MatcherTest, ThePatternFollowsTheDelimiters) {
+  use(QString());
+  EXPECT_EQ(matcher.regex(),
+            QStringLiteral(R"((?m)(?:(\Q{%\E)(?:\s+)?(.*?)(?:(?:\s+)?\Q|\E(?:\s+)?(.*?))?(?:\s+)?\Q%}\E|)"
+                           R"((\Q{{\E)(?:\s+)?(.*?)(?:(?:\s+)?\Q|\E(?:\s+)?(.*?))?(?:\s+)?\Q}}\E))"));
+  EXPECT_EQ(RXRegex::captureCountForRegex(matcher.regex()), 6);
+}
+
+}  // namespace

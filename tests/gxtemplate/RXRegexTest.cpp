@@ -1,0 +1,269 @@
+#include "RXRegex.h"
+
+#include <gtest/gtest.h>
+
+#include <QStringList>
+
+#include <atomic>
+#include <thread>
+#include <vector>
+
+namespace {
+
+constexpr GXRange kNone{kGXNotFound, 0};
+
+GXRange range(std::uint64_t location, std::uint64_t length) {
+  return {location, length};
+}
+
+// Every match of `regex` in `text`, asking each time from where the last one ended (the way the template
+// matcher walks a template), so the cache continues its search instead of starting again.
+QList<GXRange> walk(const QString& text, const QString& regex) {
+  QList<GXRange> found;
+  std::uint64_t from = 0;
+  while (from <= std::uint64_t(text.size())) {
+    const GXRange match = RXRegex::rangeOfRegex(text, regex, range(from, text.size() - from));
+    if (match.location == kGXNotFound) break;
+    found.append(match);
+    from = match.location + match.length + (match.length == 0 ? 1 : 0);
+  }
+  return found;
+}
+
+// The same matches, each found by a search of its own (no continuation possible: a fresh copy of the
+// text every time).
+QList<GXRange> walkFresh(const QString& text, const QString& regex) {
+  QList<GXRange> found;
+  std::uint64_t from = 0;
+  while (from <= std::uint64_t(text.size())) {
+    const QString copy(text.constData(), text.size());
+    const GXRange match = RXRegex::rangeOfRegex(copy, regex, range(from, text.size() - from));
+    if (match.location == kGXNotFound) break;
+    found.append(match);
+    from = match.location + match.length + (match.length == 0 ? 1 : 0);
+  }
+  return found;
+}
+
+template <typename Exception, typename Call>
+std::string messageOf(Call&& call) {
+  try {
+    call();
+  } catch (const Exception& exception) {
+    return exception.what();
+  }
+  return "(nothing raised)";
+}
+
+TEST(RXRegexRanges, WholeStringIsTheLargestUnsignedLength) {
+  const QString text = QStringLiteral("0123456789");
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("9")), range(9, 1));
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("[0-9]+"), RXRegex::kWholeString), range(0, 10));
+  // From a later location the same length reaches past the end.
+  EXPECT_EQ(messageOf<RXRegex::RangeException>(
+                [&] { RXRegex::rangeOfRegex(text, QStringLiteral("9"), range(5, kGXMaxLength)); }),
+            "The search range exceeds the strings bounds.");
+}
+
+TEST(RXRegexRanges, RangesBeyondTheStringRaise) {
+  const QString text = QStringLiteral("0123456789");
+  for (const GXRange bad :
+       {range(11, 0), range(0, 11), range(10, 1), range(kGXNotFound, 0), range(3, kGXMaxLength - 1)}) {
+    EXPECT_THROW(RXRegex::rangeOfRegex(text, QStringLiteral("1"), bad), RXRegex::RangeException)
+        << bad.location << "," << bad.length;
+  }
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("$"), range(10, 0)), range(10, 0));
+}
+
+TEST(RXRegexRanges, AMatchRunningPastTheRangeCountsAsNone) {
+  const QString text = QStringLiteral("abcdef");
+  // Greedy "c\w*" is "cdef"; "cd" would fit in (0, 4) but is not what the search finds.
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("c\\w*"), range(0, 4)), kNone);
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("c\\w*"), range(0, 6)), range(2, 4));
+  // A match starting after the range is none as well; one before its location is never seen.
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("e"), range(0, 3)), kNone);
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("a"), range(1, 5)), kNone);
+  EXPECT_FALSE(RXRegex::isMatchedByRegex(text, QStringLiteral("f"), 0, range(0, 5), nullptr));
+  EXPECT_TRUE(RXRegex::isMatchedByRegex(text, QStringLiteral("f")));
+}
+
+TEST(RXRegexRanges, ContinuedSearchesFindWhatFreshSearchesFind) {
+  struct Case {
+    const char* text;
+    const char* regex;
+  };
+  const Case cases[] = {
+      {"a1b22c333d", "\\d+"},
+      {"abc", "x*"},                 // empty matches everywhere, ends included
+      {"aaa", "a|"},                 // alternating non-empty and empty matches
+      {"xx yy  zz", "\\b"},          // zero-width assertions
+      {"ab\ncd\nef", "(?m)^\\w"},    // anchors depend on what precedes the start
+      {"caterpillar", "(?<=a)\\w"},  // look-behind sees text before the range
+  };
+  for (const Case& c : cases) {
+    const QString text = QString::fromUtf8(c.text);
+    const QString regex = QString::fromUtf8(c.regex);
+    EXPECT_EQ(walk(text, regex), walkFresh(text, regex)) << c.text << " / " << c.regex;
+  }
+  EXPECT_EQ(walk(QStringLiteral("a1b22c333d"), QStringLiteral("\\d+")),
+            (QList<GXRange>{range(1, 1), range(3, 2), range(6, 3)}));
+}
+
+TEST(RXRegexCaptures, CapturesAndTheirBounds) {
+  const QString text = QStringLiteral("key = value");
+  const QString regex = QStringLiteral("(\\w+)\\s*=\\s*(\\w+)(;)?");
+  EXPECT_EQ(RXRegex::captureCountForRegex(regex), 3);
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, regex, 1), range(0, 3));
+  EXPECT_EQ(RXRegex::stringByMatching(text, regex, 2), QStringLiteral("value"));
+  EXPECT_EQ(RXRegex::stringByMatching(text, regex), text);
+  // A group that took no part in the match: no range, no text.
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, regex, 3), kNone);
+  EXPECT_TRUE(RXRegex::stringByMatching(text, regex, 3).isNull());
+  for (int bad : {-1, 4}) {
+    EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>([&] { RXRegex::rangeOfRegex(text, regex, bad); }),
+              "The capture argument is not valid.");
+  }
+  EXPECT_TRUE(RXRegex::stringByMatching(text, QStringLiteral("nope")).isNull());
+  // An empty match is text found, not nothing.
+  const QString empty = RXRegex::stringByMatching(text, QStringLiteral("x*"));
+  EXPECT_FALSE(empty.isNull());
+  EXPECT_TRUE(empty.isEmpty());
+}
+
+TEST(RXRegexCaptures, NullPatternRaises) {
+  const char* expected = "The regular expression argument is NULL.";
+  EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>(
+                [] { RXRegex::rangeOfRegex(QStringLiteral("a"), QString()); }),
+            expected);
+  EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>([] { RXRegex::captureCountForRegex(QString()); }),
+            expected);
+  // The empty pattern is a pattern: it matches the empty string.
+  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("")), range(0, 0));
+  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("")), 0);
+}
+
+TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
+  RXRegex::Error error;
+  error.domain = QStringLiteral("stale");
+  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("ab("), 0, RXRegex::kWholeString, 0,
+                                  &error),
+            kNone);
+  EXPECT_EQ(error.domain, QStringLiteral("RXICURegexErrorDomain"));
+  EXPECT_EQ(error.code, 66310);  // U_REGEX_MISMATCHED_PAREN
+  QStringList keys;
+  for (const auto& entry : error.userInfo) keys.append(entry.first);
+  EXPECT_EQ(keys, (QStringList{"NSLocalizedDescription", "NSLocalizedFailureReason", "RXICURegexRegex",
+                               "RXICURegexRegexOptions", "RXICURegexLine", "RXICURegexOffset",
+                               "RXICURegexPreContext", "RXICURegexPostContext", "RXICURegexErrorName"}));
+  EXPECT_EQ(error.value("NSLocalizedDescription").toString(),
+            QStringLiteral("There was an error compiling the regular expression."));
+  EXPECT_EQ(error.value("NSLocalizedFailureReason").toString(),
+            QStringLiteral("The error U_REGEX_MISMATCHED_PAREN occured at line 1, column 3: ab(<<HERE>>"));
+  EXPECT_EQ(error.value("RXICURegexRegex").toString(), QStringLiteral("ab("));
+  EXPECT_EQ(error.value("RXICURegexLine").toInt(), 1);
+  EXPECT_EQ(error.value("RXICURegexOffset").toInt(), 3);
+  EXPECT_EQ(error.value("RXICURegexErrorName").toString(), QStringLiteral("U_REGEX_MISMATCHED_PAREN"));
+  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("ab(")), -1);
+
+  // Without an out-parameter the search just finds nothing; a later good search clears the error.
+  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("ab(")), kNone);
+  EXPECT_EQ(
+      RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("b"), 0, RXRegex::kWholeString, 0, &error),
+      range(1, 1));
+  EXPECT_TRUE(error.isNull());
+}
+
+TEST(RXRegexErrors, ErrorWithoutALineEndsAfterTheOptions) {
+  RXRegex::Error error;
+  const std::uint32_t invalidFlag = 0x80000000u;
+  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("flagged"), invalidFlag, &error), -1);
+  EXPECT_EQ(error.code, 66315);  // U_REGEX_INVALID_FLAG
+  EXPECT_EQ(error.value("NSLocalizedFailureReason").toString(),
+            QStringLiteral("The error U_REGEX_INVALID_FLAG occured."));
+  ASSERT_EQ(error.userInfo.size(), 4);
+  EXPECT_EQ(error.userInfo.last().first, QStringLiteral("RXICURegexRegexOptions"));
+  EXPECT_EQ(error.userInfo.last().second.toUInt(), invalidFlag);
+}
+
+TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgain) {
+  const QString regex = QStringLiteral("re(us)ed");
+  RXRegex::rangeOfRegex(QStringLiteral("reused"), regex);
+  const std::uint64_t before = RXRegex::compileCount();
+  for (int i = 0; i < 100; ++i) {
+    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("a reused text %1").arg(i), regex, 1), range(4, 2));
+  }
+  EXPECT_EQ(RXRegex::compileCount(), before);
+}
+
+TEST(RXRegexCache, CollidingPatternsEvictEachOtherAndStillWork) {
+  const QString first = QStringLiteral("first[0-9]");
+  RXRegex::rangeOfRegex(QStringLiteral("first1"), first);
+  // Find a pattern whose slot is first's: using first again after it costs a compilation.
+  QString colliding;
+  for (int i = 0; i < 500 && colliding.isNull(); ++i) {
+    const QString candidate = QStringLiteral("other%1").arg(i);
+    RXRegex::rangeOfRegex(QStringLiteral("x"), candidate);
+    const std::uint64_t before = RXRegex::compileCount();
+    RXRegex::rangeOfRegex(QStringLiteral("first2"), first);
+    if (RXRegex::compileCount() != before) colliding = candidate;
+  }
+  ASSERT_FALSE(colliding.isNull()) << "23 slots: some pattern among 500 must share a slot";
+  for (int round = 0; round < 3; ++round) {
+    const std::uint64_t before = RXRegex::compileCount();
+    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("an ") + colliding, colliding),
+              range(3, colliding.size()));
+    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("xx first7"), first), range(3, 6));
+    EXPECT_EQ(RXRegex::compileCount(), before + 2);
+  }
+}
+
+TEST(RXRegexCache, TextsThatDoNotOwnTheirCharactersAreCopied) {
+  // Short texts go to the fixed buffer, long ones to the heap buffer; texts of two slots alternate in the
+  // same buffer, so each search must see its own characters.
+  for (const qsizetype length : {qsizetype(40), qsizetype(5000)}) {
+    std::vector<QChar> one(size_t(length), u'a');
+    std::vector<QChar> two(size_t(length), u'b');
+    one[size_t(length - 3)] = u'X';
+    two[size_t(length - 7)] = u'Y';
+    const QString rawOne = QString::fromRawData(one.data(), length);
+    const QString rawTwo = QString::fromRawData(two.data(), length);
+    for (int round = 0; round < 3; ++round) {
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("X")), range(length - 3, 1)) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, QStringLiteral("Y")), range(length - 7, 1)) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, QStringLiteral("X")), kNone) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("Y")), kNone) << length;
+    }
+    // The same characters changed in place under the same pointer and length: forgotten by clearing.
+    one[size_t(length - 3)] = u'a';
+    one[0] = u'X';
+    RXRegex::clearStringCache();
+    EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("X")), range(0, 1)) << length;
+  }
+}
+
+TEST(RXRegexCache, ATextChangedAfterASearchIsSearchedAnew) {
+  QString text = QStringLiteral("one two three");
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(4, 3));
+  text.replace(4, 3, QStringLiteral("TWO"));
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(8, 5));
+  RXRegex::clearStringCache();
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(8, 5));
+}
+
+TEST(RXRegexConcurrency, ThreadsSearchingAtOnceGetTheirOwnResults) {
+  std::atomic<int> wrong{0};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([t, &wrong] {
+      const QString regex = QStringLiteral("t%1-(\\d+)").arg(t);
+      for (int i = 0; i < 1500; ++i) {
+        const QString text = QStringLiteral("%1 t%2-%3 tail").arg(QString(i % 7, u'.')).arg(t).arg(i);
+        if (RXRegex::stringByMatching(text, regex, 1) != QString::number(i)) ++wrong;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(wrong.load(), 0);
+}
+
+}  // namespace
