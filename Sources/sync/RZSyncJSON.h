@@ -1,0 +1,39 @@
+#pragma once
+
+#include <QByteArray>
+#include <QByteArrayView>
+#include <QString>
+#include <QVariant>
+
+#include <optional>
+
+// JSON for the change journal and the sync protocol, exact for money: a number with a fraction or an
+// exponent is read from its own text into a Decimal and written back from Decimal::toString(), so
+// 12.30 stays 12.30 and no value ever passes through binary floating point.
+//
+// In memory a JSON value is a QVariant: an object a QVariantMap, an array a QVariantList, a string a
+// QString, an integer a qint64 (one beyond that range a Decimal), any other number a Decimal, true and
+// false a bool, and null a null (invalid) QVariant.
+namespace RZSyncJSON {
+
+// Parses one JSON text; a bare string or number at the top level is accepted (the caller decides
+// whether it wants a container). None for malformed text, with a description in `error` when given.
+std::optional<QVariant> parse(QByteArrayView text, QString* error = nullptr);
+
+enum class Style {
+  Compact,
+  Pretty,  // one member per line, two spaces of indentation per level
+};
+
+// Writes a value in the form above. Also takes QStringList, QVariantHash, the other integer types, and
+// double (through its shortest decimal text; NaN and infinities become null). Any other type is
+// written as its text when it converts to one, else as null.
+QByteArray write(const QVariant& value, Style style = Style::Pretty);
+
+// Whether two values are the same JSON text (so 12.30 and 12.3 differ, as a server would see them).
+bool sameValue(const QVariant& a, const QVariant& b);
+
+// True for a QVariantMap or a QVariantList: what the sync accepts as a reply.
+bool isContainer(const QVariant& value);
+
+}  // namespace RZSyncJSON

@@ -1,0 +1,435 @@
+#include "RZSyncManager.h"
+
+#include "Decimal.h"
+#include "KeyPath.h"
+#include "RZSyncErrorPresenter.h"
+#include "RZSyncJSON.h"
+#include "UserDefaults.h"
+#include "WTClient.h"
+#include "WTItem.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <QColor>
+#include <QUuid>
+#include <QtDebug>
+
+namespace {
+
+const QString kInserted = QStringLiteral("i");
+const QString kUpdated = QStringLiteral("u");
+const QString kDeleted = QStringLiteral("x");
+const QString kHead = QStringLiteral("head");
+const QString kSave = QStringLiteral("save");
+
+// The integer value of a JSON value (numbers, numeric text); none for anything else.
+std::optional<qint64> integerValue(const QVariant& value) {
+  if (value.typeId() == QMetaType::LongLong) return value.toLongLong();
+  if (value.typeId() == QMetaType::Bool) return value.toBool() ? 1 : 0;
+  if (const std::optional<Decimal> decimal = Decimal::fromVariant(value)) return decimal->toInt64();
+  return std::nullopt;
+}
+
+// How a key of an entity travels.
+enum class KeyKind { Plain, Date, Decimal, Color, ToOne, Ordered, Unordered };
+
+KeyKind keyKind(WTEntity entity, const QString& key) {
+  static const QSet<QString> dates{QStringLiteral("startDate"), QStringLiteral("endDate"),
+                                   QStringLiteral("startTime"), QStringLiteral("flatDateBegin"),
+                                   QStringLiteral("flatDateEnd")};
+  static const QSet<QString> decimals{QStringLiteral("rate"), QStringLiteral("budget"),
+                                      QStringLiteral("expense")};
+  if (key == QLatin1String("color")) return KeyKind::Color;
+  if (decimals.contains(key)) return KeyKind::Decimal;
+  switch (entity) {
+    case WTEntity::Client:
+      if (key == QLatin1String("projects")) return KeyKind::Unordered;
+      break;
+    case WTEntity::Project:
+      if (key == QLatin1String("client")) return KeyKind::ToOne;
+      if (key == QLatin1String("tasks")) return KeyKind::Ordered;
+      break;
+    case WTEntity::Task:
+      if (key == QLatin1String("project")) return KeyKind::ToOne;
+      if (key == QLatin1String("items")) return KeyKind::Unordered;
+      break;
+    default:
+      if (key == QLatin1String("task")) return KeyKind::ToOne;
+      if (dates.contains(key)) return KeyKind::Date;
+      break;
+  }
+  return KeyKind::Plain;
+}
+
+std::optional<WTEntity> entityOfUuid(const QString& uuid) {
+  return WTEntities::fromName(uuid.section(u'@', -1));
+}
+
+bool isEmptyChangeSet(const QVariantMap& changes) {
+  return changes.value(kInserted).toMap().isEmpty() && changes.value(kUpdated).toMap().isEmpty() &&
+         changes.value(kDeleted).toList().isEmpty();
+}
+
+}  // namespace
+
+RZSyncManager::RZSyncManager(WTObjectContext* context, const QString& trackFile, QObject* parent)
+    : QObject(parent),
+      context_(context),
+      trackFilePath_(trackFile),
+      track_(std::make_unique<RZSyncTrack>(trackFile)),
+      network_(new RZSyncNetwork(QUrl(), this, this)),
+      logPresenter_(std::make_unique<RZSyncLogErrorPresenter>()) {
+  Q_ASSERT_X(context, "RZSyncManager", "line 252: a sync manager needs an object context");
+  presenter_ = logPresenter_.get();
+  timer_.setSingleShot(true);
+  connect(&timer_, &QTimer::timeout, this, &RZSyncManager::sync);
+  network_->setUrl(configuredEndpoint());
+
+  // One identity per installation, kept with the user's settings.
+  QString device;
+  if (UserDefaults* defaults = userDefaults()) {
+    device = defaults->stringForKey(QStringLiteral("WTSyncDevice"));
+    if (device.isEmpty()) {
+      device = QUuid::createUuid().toString(QUuid::WithoutBraces);
+      defaults->setValue(QStringLiteral("WTSyncDevice"), device);
+    }
+  } else {
+    device = QUuid::createUuid().toString(QUuid::WithoutBraces);
+  }
+  network_->setDevice(device);
+
+  if (context_) {
+    context_->setChangeJournal(track_.get());
+    attached_ = true;
+  }
+  fileNotifications();
+}
+
+RZSyncManager::~RZSyncManager() {
+  removeNotifications();
+  // As disableSync, without telling anyone about a manager that is going away.
+  timer_.stop();
+  syncEnabled_ = false;
+  if (context_ && context_->changeJournal() == track_.get()) context_->setChangeJournal(nullptr);
+}
+
+void RZSyncManager::setErrorPresenter(RZSyncErrorPresenter* presenter) {
+  presenter_ = presenter ? presenter : logPresenter_.get();
+}
+
+UserDefaults* RZSyncManager::userDefaults() const {
+  return context_ ? context_->userDefaults() : nullptr;
+}
+
+QUrl RZSyncManager::endpointURL(const QString& server) {
+  QString text = server.trimmed();
+  if (text.isEmpty()) return {};
+  if (!text.contains(QLatin1String("://"))) text.prepend(QLatin1String("https://"));
+  QUrl url(text, QUrl::StrictMode);
+  const QString scheme = url.scheme().toLower();
+  if (!url.isValid() || url.host().isEmpty() ||
+      (scheme != QLatin1String("https") && scheme != QLatin1String("http")) || url.hasQuery() ||
+      url.hasFragment()) {
+    return {};
+  }
+  QString path = url.path();
+  while (path.endsWith(u'/')) path.chop(1);
+  url.setPath(path + QLatin1String(kEndpointPath));
+  return url;
+}
+
+QUrl RZSyncManager::configuredEndpoint() const {
+  const UserDefaults* defaults = userDefaults();
+  return defaults ? endpointURL(defaults->stringForKey(QStringLiteral("WTSyncServer"))) : QUrl();
+}
+
+void RZSyncManager::fileNotifications() {
+  Q_ASSERT_X(context_, "RZSyncManager", "line 252: no object context to observe");
+  if (!context_) return;
+  saveConnection_ =
+      connect(context_, &WTObjectContext::didSave, this, &RZSyncManager::managedObjectContextDidSave);
+}
+
+void RZSyncManager::removeNotifications() {
+  disconnect(saveConnection_);
+}
+
+void RZSyncManager::managedObjectContextDidSave() {
+  qDebug("--- did save ---");
+  if (attached_) writeTrack(true);
+  if (syncEnabled_) rescheduleTimer(intervals_.afterSaveMs);
+}
+
+void RZSyncManager::writeTrack(bool logFailure) {
+  const Result<void> written = track_->writeToFile(trackFilePath_);
+  if (!written && logFailure)
+    qWarning().noquote() << QStringLiteral("Error writing JSON Data - %1").arg(written.error().message);
+}
+
+void RZSyncManager::sync() {
+  timer_.stop();
+  if (network_->networkAction() == RZSyncNetwork::Idle) {
+    // The address may have changed in the preferences since the last poll.
+    network_->setUrl(configuredEndpoint());
+    post({}, kHead, track_->iteration());
+  }
+  if (syncEnabled_ && !networkError_) rescheduleTimer(intervals_.pollMs);
+}
+
+void RZSyncManager::rescheduleTimer(int milliseconds) {
+  timer_.stop();
+  timer_.start(milliseconds);
+}
+
+void RZSyncManager::enableSync() {
+  syncEnabled_ = true;
+  sync();
+  emit syncStatusDidChange();
+}
+
+void RZSyncManager::disableSync() {
+  timer_.stop();
+  syncEnabled_ = false;
+  emit syncStatusDidChange();
+}
+
+void RZSyncManager::post(const QVariantMap& data, const QString& action, qint64 iteration) {
+  network_->postJSONObject(action == kSave ? QVariant(data) : QVariant(), action, iteration);
+  // Remember what is on its way only when it left: without credentials or address nothing is sent.
+  if (network_->networkAction() != RZSyncNetwork::Idle)
+    inFlight_ = {action, action == kSave ? data : QVariantMap()};
+}
+
+void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork*, const QVariant& object) {
+  const Request answered = std::exchange(inFlight_, {});
+  RZSyncExchange exchange{answered.action, RZSyncExchange::Outcome::Answered, false, {}};
+  if (object.typeId() != QMetaType::QVariantMap) {
+    qWarning("Iteration not received");
+    endFailureRun();
+    return finish(exchange);
+  }
+  const QVariantMap reply = object.toMap();
+  const QVariant error = reply.value(QStringLiteral("error"));
+  const QString action = reply.value(QStringLiteral("action")).toString();
+  const QVariant iterationValue = reply.value(QStringLiteral("iteration"));
+
+  if (error.isValid()) {
+    const qint64 code = integerValue(reply.value(QStringLiteral("code"))).value_or(0);
+    if (code != 4) {
+      const QString message = QStringLiteral("%1 - (Code: %2)").arg(error.toString()).arg(code);
+      presenter_->presentSyncError(message);
+      disableSync();
+      exchange.outcome = RZSyncExchange::Outcome::Refused;
+      exchange.message = message;
+      return finish(exchange);
+    }
+    // Code 4: the save was not taken as it stood. With an iteration, send the journal again claiming
+    // it; without one (below 1), keep the journal for the next poll, which fetches what was missing.
+    const qint64 base = integerValue(iterationValue).value_or(0);
+    if (base < 1) {
+      qInfo("Head iteration problem");
+    } else {
+      post(track_->dictionary(), kSave, base);
+    }
+    endFailureRun();
+    return finish(exchange);
+  }
+
+  const std::optional<qint64> iteration = integerValue(iterationValue);
+  if (!iteration) {
+    qWarning("Iteration not received");
+    endFailureRun();
+    return finish(exchange);
+  }
+
+  if (action == kHead) {
+    const QVariantMap result = reply.value(QStringLiteral("result")).toMap();
+    exchange.receivedChanges = !isEmptyChangeSet(result);
+    mergeHead(result, *iteration);
+  } else if (action == kSave) {
+    // Only what this request carried is confirmed; the user may have gone on editing meanwhile.
+    if (answered.action == kSave) track_->removeSentChanges(answered.data);
+    track_->setIteration(*iteration);
+    writeTrack(false);
+  }
+  endFailureRun();
+  finish(exchange);
+}
+
+void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
+  // Local edits are journaled before the server's changes arrive.
+  const Result<void> saved = saveHandler_ ? saveHandler_() : context_->save();
+  if (!saved) {
+    qWarning().noquote() << saved.error().message;
+    return;
+  }
+
+  // The merge is not the user's to undo.
+  context_->processPendingChanges();
+  context_->undoManager().disableRegistration();
+  mergeWithDictionary(result);
+  context_->processPendingChanges();
+  context_->undoManager().enableRegistration();
+
+  // Saved with the journal detached: the server's changes are not local ones.
+  context_->setChangeJournal(nullptr);
+  attached_ = false;
+  const Result<void> mergedSave = context_->save();
+  context_->setChangeJournal(track_.get());
+  attached_ = true;
+  if (!mergedSave) {
+    qWarning().noquote() << mergedSave.error().message;
+    return;
+  }
+  // Caught up with this head now, whatever becomes of the save below: a refused or lost save must not
+  // make the next poll deliver the same changes again over edits made since.
+  track_->setIteration(iteration);
+  writeTrack(true);
+  if (track_->hasChanges()) post(track_->dictionary(), kSave, iteration);
+}
+
+void RZSyncManager::endFailureRun() {
+  if (!std::exchange(networkError_, false)) return;
+  // Polling stopped with the failure; a good reply resumes it.
+  if (syncEnabled_ && !timer_.isActive()) rescheduleTimer(intervals_.pollMs);
+}
+
+void RZSyncManager::finish(RZSyncExchange exchange) {
+  emit exchangeDidFinish(exchange);
+}
+
+void RZSyncManager::syncNetworkDidFailWithError(RZSyncNetwork*, const QString& error) {
+  const Request answered = std::exchange(inFlight_, {});
+  if (!networkError_) presenter_->presentNetworkError(error);
+  networkError_ = true;
+  if (syncEnabled_) rescheduleTimer(intervals_.retryMs);
+  finish({answered.action, RZSyncExchange::Outcome::Failed, false, error});
+}
+
+void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
+  // Deletions waiting to be sent win: the merge neither brings those records back nor changes them, and
+  // files nothing under them (the server takes what is filed there with them once the deletion arrives).
+  const QStringList pendingList = track_->deletedIds();
+  const QSet<QString> pending(pendingList.begin(), pendingList.end());
+  QSet<QString> deletedThere;
+  for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
+  mergeWithDictionary(changes, kInserted, pending);
+  mergeWithDictionary(changes, kUpdated, pending);
+  for (const QVariant& uuid : changes.value(kDeleted).toList()) {
+    if (uuid.typeId() != QMetaType::QString) continue;
+    // What is still pending for a record the server deleted has nothing left to change there.
+    track_->forget(uuid.toString());
+    if (WTObject* object = context_->objectWithUUID(uuid, false)) deleteMerged(object, deletedThere);
+  }
+}
+
+void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere) {
+  QList<WTObject*> gone{object};
+  for (qsizetype i = 0; i < gone.size(); ++i) {
+    if (auto* project = dynamic_cast<WTProject*>(gone[i])) {
+      for (WTTask* task : project->tasks()) gone.append(task);
+    } else if (auto* task = dynamic_cast<WTTask*>(gone[i])) {
+      for (WTItem* item : task->items()) gone.append(item);
+    }
+  }
+  QStringList uuids;
+  for (WTObject* record : gone) uuids.append(record->uuid());
+  context_->deleteObject(object);
+  // The deletion here takes the record's tasks and items with it. One of them may be filed under it here
+  // only (moved there, not sent yet): the server still has it elsewhere, so its deletion is journaled
+  // and goes out with the next save. Until then no merge brings it back.
+  for (const QString& uuid : uuids) {
+    if (!deletedThere.contains(uuid)) track_->deleteObjectWithId(uuid);
+  }
+}
+
+void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QString& key,
+                                        const QSet<QString>& pending) {
+  const RZSyncTrack::Section section =
+      key == kInserted ? RZSyncTrack::Section::Inserted : RZSyncTrack::Section::Updated;
+  const QVariantMap entries = changes.value(key).toMap();
+  for (auto it = entries.begin(); it != entries.end(); ++it) {
+    const QString& uuid = it.key();
+    if (pending.contains(uuid)) continue;
+    WTObject* object = context_->objectWithUUID(uuid, true);
+    if (!object) continue;  // not the identity of a record
+    QVariantMap local = track_->entry(section, uuid);
+    const QVariantMap values = it.value().toMap();
+    for (auto value = values.begin(); value != values.end(); ++value) {
+      // The server's value wins over a pending local one.
+      local.remove(value.key());
+      if (value.key() == QLatin1String("uuid")) continue;
+      bool skip = false;
+      const QVariant merged = mergedValue(object, value.key(), value.value(), pending, &skip);
+      if (skip) continue;
+      if (!object->setValue(value.key(), merged)) {
+        qDebug().noquote() << QStringLiteral("Sync: %1 takes no value %2 for %3")
+                                  .arg(uuid,
+                                       QString::fromUtf8(
+                                           RZSyncJSON::write(value.value(), RZSyncJSON::Style::Compact)),
+                                       value.key());
+      }
+    }
+    if (!local.isEmpty() || track_->entries(section).contains(uuid)) track_->setEntry(section, uuid, local);
+  }
+}
+
+QVariant RZSyncManager::mergedValue(WTObject* object, const QString& key, const QVariant& value,
+                                    const QSet<QString>& pending, bool* skip) {
+  if (!value.isValid()) return {};
+  // The record a uuid names, made if missing; `ok` is false for a record that is being deleted here, or
+  // one of another entity than the relationship holds (which is not made).
+  auto record = [&](const QVariant& uuid, WTEntity expected, bool* ok) -> WTObject* {
+    *ok = false;
+    if (uuid.typeId() != QMetaType::QString || pending.contains(uuid.toString())) return nullptr;
+    if (entityOfUuid(uuid.toString()) != expected) return nullptr;
+    *ok = true;
+    return context_->objectWithUUID(uuid, true);
+  };
+  switch (keyKind(object->entity(), key)) {
+    case KeyKind::Date:
+      if (const std::optional<qint64> seconds =
+              value.typeId() == QMetaType::QString ? std::nullopt : integerValue(value)) {
+        return QVariant::fromValue(Date::fromSeconds(double(*seconds)));
+      }
+      return value;
+    case KeyKind::Decimal:
+      return value;
+    case KeyKind::Color: {
+      const QColor color = QColor::fromString(value.toString());
+      return color.isValid() ? QVariant(color) : QVariant();
+    }
+    case KeyKind::ToOne: {
+      const WTEntity owner = object->entity() == WTEntity::Project ? WTEntity::Client
+                             : object->entity() == WTEntity::Task  ? WTEntity::Project
+                                                                   : WTEntity::Task;
+      bool ok = false;
+      WTObject* related = record(value, owner, &ok);
+      if (!ok) {
+        // Not under an owner that is being deleted here: the server follows the owner's delete rule
+        // for it once the deletion arrives, and tells every device.
+        *skip = true;
+        return {};
+      }
+      return related ? KeyPath::variantFromObject(related) : QVariant();
+    }
+    case KeyKind::Ordered: {
+      QVariantList members;
+      for (const QVariant& uuid : value.toList()) {
+        bool ok = false;
+        if (WTObject* member = record(uuid, WTEntity::Task, &ok))
+          members.append(KeyPath::variantFromObject(member));
+      }
+      return members;
+    }
+    case KeyKind::Unordered:
+      *skip = true;
+      return {};
+    case KeyKind::Plain:
+      // Integers and flags arrive as JSON integers; a number written with a fraction still counts.
+      if (value.metaType() == QMetaType::fromType<Decimal>()) return qint64(value.value<Decimal>().toInt64());
+      return value;
+  }
+  return value;
+}

@@ -1,0 +1,112 @@
+#include "RZSyncNetwork.h"
+
+#include "RZSyncJSON.h"
+
+#include <QNetworkAccessManager>
+#include <QNetworkReply>
+#include <QNetworkRequest>
+#include <QtDebug>
+
+RZSyncNetwork::RZSyncNetwork(const QUrl& url, RZSyncNetworkDelegate* delegate, QObject* parent)
+    : QObject(parent), url_(url), delegate_(delegate), manager_(new QNetworkAccessManager(this)) {}
+
+RZSyncNetwork::~RZSyncNetwork() {
+  if (reply_) {
+    reply_->disconnect(this);
+    reply_->abort();
+  }
+}
+
+QString RZSyncNetwork::user() {
+  if (!user_.isEmpty()) return user_;
+  return credentialDelegate_ ? credentialDelegate_->syncNetworkRequestsUser(this) : QString();
+}
+
+QString RZSyncNetwork::password() {
+  if (!password_.isEmpty()) return password_;
+  return credentialDelegate_ ? credentialDelegate_->syncNetworkRequestsPassword(this) : QString();
+}
+
+bool RZSyncNetwork::hasCredentials() {
+  return !user().trimmed().isEmpty() && !password().trimmed().isEmpty();
+}
+
+void RZSyncNetwork::postJSONObject(const QVariant& data, const QString& action, qint64 iteration) {
+  Q_ASSERT_X(networkAction_ == Idle, "RZSyncNetwork", "line 41: a request is already in flight");
+  if (networkAction_ != Idle) {
+    qWarning("RZSyncNetwork: a request is already in flight; the new one is refused");
+    return;
+  }
+  // QString::trimmed drops white space and line breaks alike.
+  const QString user = this->user().trimmed();
+  const QString password = this->password().trimmed();
+  if (user.isEmpty() || password.isEmpty() || !url_.isValid()) return;
+
+  QVariantMap body{{QStringLiteral("user"), user},
+                   {QStringLiteral("password"), password},
+                   {QStringLiteral("action"), action},
+                   {QStringLiteral("iteration"), iteration}};
+  if (!device_.isEmpty()) body.insert(QStringLiteral("device"), device_);
+  if (data.isValid()) body.insert(QStringLiteral("data"), data);
+  const QByteArray bytes = RZSyncJSON::write(body, RZSyncJSON::Style::Pretty);
+
+  QNetworkRequest request(url_);
+  request.setTransferTimeout(timeoutMs_);
+  request.setRawHeader("Accept", "application/json");
+  request.setRawHeader("Content-Type", "application/json");
+  request.setRawHeader("Content-Length", QByteArray::number(bytes.size()));
+  QNetworkReply* reply = manager_->post(request, bytes);
+  if (!reply) return;
+  reply_ = reply;
+  responseData_.clear();
+  networkAction_ = Busy;
+  connect(reply, &QNetworkReply::metaDataChanged, this, &RZSyncNetwork::replyMetaDataChanged);
+  connect(reply, &QNetworkReply::redirected, this, &RZSyncNetwork::replyMetaDataChanged);
+  connect(reply, &QNetworkReply::readyRead, this, &RZSyncNetwork::replyReadyRead);
+  connect(reply, &QNetworkReply::finished, this, &RZSyncNetwork::replyFinished);
+}
+
+void RZSyncNetwork::replyMetaDataChanged() {
+  // A new response (after a redirect, say) starts the body over.
+  responseData_.clear();
+}
+
+void RZSyncNetwork::replyReadyRead() {
+  if (reply_) responseData_.append(reply_->readAll());
+}
+
+void RZSyncNetwork::replyFinished() {
+  QNetworkReply* reply = reply_;
+  if (!reply) return;
+  if (reply->isOpen()) responseData_.append(reply->readAll());
+  reply_ = nullptr;
+  reply->deleteLater();
+  networkAction_ = Idle;
+
+  // Any HTTP answer counts as a reply whatever its status: an error page fails at parsing below, and a
+  // JSON body is the server's word. Only a failure to get an answer at all is a transport failure.
+  const bool answered = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).isValid();
+  if (reply->error() != QNetworkReply::NoError && !answered) {
+    const QString error = reply->errorString();
+    qWarning().noquote() << QStringLiteral("Connection failed: %1").arg(error);
+    responseData_.clear();
+    if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
+    return;
+  }
+
+  const QByteArray body = std::exchange(responseData_, {});
+  QString error;
+  const std::optional<QVariant> object = RZSyncJSON::parse(body, &error);
+  if (object && RZSyncJSON::isContainer(*object)) {
+    if (delegate_) delegate_->syncNetworkReceivedJSONObject(this, *object);
+    return;
+  }
+  if (object) error = QStringLiteral("The reply is not a JSON object or array.");
+  const int status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
+  if (status != 200) {
+    // A plain-text answer (a proxy's or the server's "try again later") says more than the parser.
+    const QString text = QString::fromUtf8(body).simplified().left(200);
+    error = QStringLiteral("The server answered HTTP %1: %2").arg(status).arg(text.isEmpty() ? error : text);
+  }
+  if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
+}

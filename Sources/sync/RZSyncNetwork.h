@@ -1,0 +1,92 @@
+#pragma once
+
+#include <QByteArray>
+#include <QObject>
+#include <QPointer>
+#include <QString>
+#include <QUrl>
+#include <QVariant>
+
+class QNetworkAccessManager;
+class QNetworkReply;
+class RZSyncNetwork;
+
+// Receives the outcome of each request, on the main thread, after the client is idle again (so it may
+// send the next request from inside the call).
+class RZSyncNetworkDelegate {
+ public:
+  virtual ~RZSyncNetworkDelegate() = default;
+  // The reply parsed as JSON: always a QVariantMap or a QVariantList (see RZSyncJSON.h).
+  virtual void syncNetworkReceivedJSONObject(RZSyncNetwork* network, const QVariant& object) = 0;
+  // The transport failed, or the reply was not a JSON object or array. `error` describes it.
+  virtual void syncNetworkDidFailWithError(RZSyncNetwork* network, const QString& error) = 0;
+};
+
+// Supplies the account when the client's own fields are empty (the application delegate reads the
+// user defaults "WTSyncUser" and "WTSyncPassword"). An empty answer means none.
+class RZSyncNetworkCredentialDelegate {
+ public:
+  virtual ~RZSyncNetworkCredentialDelegate() = default;
+  virtual QString syncNetworkRequestsUser(RZSyncNetwork* network) = 0;
+  virtual QString syncNetworkRequestsPassword(RZSyncNetwork* network) = 0;
+};
+
+// Sends one JSON request at a time to the sync endpoint and hands the parsed reply, or the failure, to
+// its delegate. Main thread only; neither delegate is owned.
+class RZSyncNetwork : public QObject {
+  Q_OBJECT
+ public:
+  enum NetworkAction { Idle = 0, Busy = 1 };
+
+  RZSyncNetwork(const QUrl& url, RZSyncNetworkDelegate* delegate, QObject* parent = nullptr);
+  ~RZSyncNetwork() override;
+
+  QUrl url() const { return url_; }
+  void setUrl(const QUrl& url) { url_ = url; }
+  void setDelegate(RZSyncNetworkDelegate* delegate) { delegate_ = delegate; }
+  void setCredentialDelegate(RZSyncNetworkCredentialDelegate* delegate) { credentialDelegate_ = delegate; }
+
+  // The explicit account fields when set (not empty), else the credential delegate's answer, else empty.
+  QString user();
+  QString password();
+  void setUser(const QString& user) { user_ = user; }
+  void setPassword(const QString& password) { password_ = password; }
+  // Both user and password are non-empty once trimmed of white space and line breaks.
+  bool hasCredentials();
+
+  // The installation's identity, sent as "device" with every request when not empty, so the server
+  // does not send this installation its own changes back.
+  QString device() const { return device_; }
+  void setDevice(const QString& device) { device_ = device; }
+
+  // How long a request may wait for the next byte before it fails; 60 seconds unless changed.
+  int timeoutMilliseconds() const { return timeoutMs_; }
+  void setTimeoutMilliseconds(int milliseconds) { timeoutMs_ = milliseconds; }
+
+  // Sends {"user", "password", "action", "iteration", "device", "data"} (no "data" when `data` is null).
+  // Sending while a request is in flight is a programming error: check networkAction() first. Without
+  // credentials, or without a valid url, nothing is sent and the delegate hears nothing.
+  void postJSONObject(const QVariant& data, const QString& action, qint64 iteration);
+  // Idle (0), or Busy (1) while a request is in flight.
+  int networkAction() const { return networkAction_; }
+
+  // The body received so far (for inspection in tests).
+  QByteArray responseData() const { return responseData_; }
+
+ private:
+  void replyMetaDataChanged();
+  void replyReadyRead();
+  void replyFinished();
+
+  QUrl url_;
+  RZSyncNetworkDelegate* delegate_;
+  RZSyncNetworkCredentialDelegate* credentialDelegate_ = nullptr;
+  QString user_;
+  QString password_;
+  QString device_;
+  int timeoutMs_ = 60000;
+  int networkAction_ = Idle;
+  QNetworkAccessManager* manager_;
+  QPointer<QNetworkReply> reply_;
+  QByteArray responseData_;
+};

@@ -1,0 +1,508 @@
+#include "RZSyncManager.h"
+
+#include "Decimal.h"
+#include "RZSyncJSON.h"
+#include "SyncTestSupport.h"
+#include "WTClient.h"
+#include "WTExpense.h"
+#include "WTNote.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <gtest/gtest.h>
+
+#include <QSignalSpy>
+
+using synctest::HttpRequest;
+using synctest::LogCapture;
+using synctest::LoopbackHttpServer;
+using synctest::SyncClient;
+using synctest::waitUntil;
+using Section = RZSyncTrack::Section;
+
+namespace {
+
+Decimal dec(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
+QVariant money(const char* text) {
+  return QVariant::fromValue(dec(text));
+}
+QString compact(const QVariant& value) {
+  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
+}
+
+QVariantMap changeSet(const QVariantMap& inserted = {}, const QVariantMap& updated = {},
+                      const QStringList& deleted = {}) {
+  return {{"i", inserted}, {"u", updated}, {"x", deleted}};
+}
+
+QByteArray headReply(qint64 iteration, const QVariantMap& result = changeSet()) {
+  return LoopbackHttpServer::json(
+      QVariantMap{{"action", "head"}, {"iteration", iteration}, {"result", result}});
+}
+QByteArray saveReply(qint64 iteration) {
+  return LoopbackHttpServer::json(QVariantMap{{"action", "save"}, {"iteration", iteration}});
+}
+QByteArray errorReply(const QString& message, qint64 code, const QVariant& iteration = {}) {
+  QVariantMap reply{{"error", message}, {"code", code}};
+  if (iteration.isValid()) reply.insert("iteration", iteration);
+  return LoopbackHttpServer::json(reply);
+}
+
+class RZSyncManagerTest : public ::testing::Test {
+ protected:
+  // Answers heads with nothing new at `head` and saves with `head` + 1 unless a test says otherwise.
+  void SetUp() override {
+    server.handler = [this](const HttpRequest& request) {
+      return request.json().value("action") == "save" ? saveReply(++head) : headReply(head);
+    };
+  }
+
+  // The bodies of the requests with this action since the fixture's set-up was done.
+  QList<QVariantMap> sent(const QString& action) const {
+    QList<QVariantMap> bodies;
+    for (qsizetype i = setUpRequests; i < server.requests.size(); ++i) {
+      if (server.requests[i].json().value("action") == action) bodies.append(server.requests[i].json());
+    }
+    return bodies;
+  }
+
+  // A task in a project, saved and confirmed, so the journal starts empty.
+  WTTask* syncedTask() {
+    auto* project = client.context->insertNewObject<WTProject>();
+    project->setName("Site");
+    auto* task = client.context->insertNewObject<WTTask>();
+    task->setName("Design");
+    task->setProject(project);
+    client.save();
+    EXPECT_TRUE(client.syncOnce());
+    EXPECT_FALSE(client.track().hasChanges());
+    setUpRequests = server.requests.size();
+    return task;
+  }
+
+  qint64 head = 1;
+  qsizetype setUpRequests = 0;
+  LoopbackHttpServer server;
+  SyncClient client{server.address()};
+};
+
+}  // namespace
+
+TEST(RZSyncManagerEndpoint, ServerAddressBecomesTheEndpoint) {
+  const std::pair<const char*, const char*> cases[] = {
+      {"sync.example.org", "https://sync.example.org/sync/tessal/sync.php"},
+      {"  sync.example.org:8443 ", "https://sync.example.org:8443/sync/tessal/sync.php"},
+      {"http://127.0.0.1:8080/", "http://127.0.0.1:8080/sync/tessal/sync.php"},
+      {"https://example.org/tessal/", "https://example.org/tessal/sync/tessal/sync.php"},
+      {"", ""},
+      {"ftp://example.org", ""},
+      {"https://", ""},
+      {"https://example.org/?a=b", ""},
+  };
+  for (const auto& [server, endpoint] : cases) {
+    SCOPED_TRACE(server);
+    EXPECT_EQ(RZSyncManager::endpointURL(QString::fromLatin1(server)).toString(),
+              QString::fromLatin1(endpoint));
+  }
+}
+
+TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney) {
+  head = 9;
+  const QVariantMap result = changeSet(
+      {{"C@WTClient", QVariantMap{{"name", "Acme"}, {"uuid", "C@WTClient"}}},
+       {"P@WTProject", QVariantMap{{"name", "Site"}, {"client", "C@WTClient"}, {"rate", money("80.50")}}},
+       {"T1@WTTask", QVariantMap{{"name", "One"}, {"project", "P@WTProject"}, {"budget", money("1200.00")}}},
+       {"T2@WTTask", QVariantMap{{"name", "Two"}, {"project", "P@WTProject"}}},
+       {"E@WTTime", QVariantMap{{"task", "T1@WTTask"}, {"startDate", 1700000000}, {"endDate", 1700003600}}},
+       {"X@WTExpense",
+        QVariantMap{{"task", "T1@WTTask"}, {"expense", money("12.30")}, {"startDate", 1700000000}}},
+       {"N@WTNote",
+        QVariantMap{{"task", "T3@WTTask"}, {"name", "Filed under a task not sent"}, {"color", "#80ff0000"}}}},
+      {{"P@WTProject", QVariantMap{{"tasks", QStringList{"T2@WTTask", "T1@WTTask"}}}}});
+  server.handler = [&](const HttpRequest&) { return headReply(9, result); };
+  ASSERT_TRUE(client.syncOnce());
+
+  auto* project = client.find<WTProject>("P@WTProject");
+  auto* one = client.find<WTTask>("T1@WTTask");
+  auto* two = client.find<WTTask>("T2@WTTask");
+  ASSERT_TRUE(project && one && two);
+  EXPECT_EQ(project->client(), client.find<WTClient>("C@WTClient"));
+  EXPECT_EQ(project->tasks(), (QList<WTTask*>{two, one}));
+  EXPECT_TRUE(project->storedRate()->isIdenticalTo(dec("80.50")));
+  EXPECT_TRUE(one->budget()->isIdenticalTo(dec("1200.00")));
+  auto* time = client.find<WTTime>("E@WTTime");
+  ASSERT_TRUE(time);
+  EXPECT_EQ(time->task(), one);
+  EXPECT_EQ(time->startDate(), Date::fromSeconds(1700000000));
+  EXPECT_EQ(time->duration(), 60);
+  EXPECT_TRUE(client.find<WTExpense>("X@WTExpense")->expense()->isIdenticalTo(dec("12.30")));
+  EXPECT_EQ(one->cost(), dec("80.50") + dec("12.30"));
+  // A record named only as an owner is made, empty, under its identity.
+  auto* note = client.find<WTNote>("N@WTNote");
+  ASSERT_TRUE(note && note->task());
+  EXPECT_EQ(note->task()->uuid(), "T3@WTTask");
+  EXPECT_EQ(note->color(), QColor(255, 0, 0, 128));
+
+  // What came from the server is saved but not journaled, and the user cannot undo it.
+  EXPECT_FALSE(client.context->hasChanges());
+  EXPECT_FALSE(client.track().hasChanges());
+  EXPECT_FALSE(client.context->undoManager().canUndo());
+  EXPECT_EQ(client.track().iteration(), 9);
+  EXPECT_TRUE(sent("save").isEmpty());
+  client.reopen();
+  EXPECT_EQ(client.track().iteration(), 9);
+  EXPECT_EQ(client.find<WTProject>("P@WTProject")->tasks().size(), 2);
+}
+
+// Local edits are saved (and journaled) before the server's changes arrive; the server's value of a key
+// replaces a pending local one, which then is not sent; the rest is sent with the head's iteration.
+TEST_F(RZSyncManagerTest, ServerValueWinsOverAPendingLocalKey) {
+  WTTask* task = syncedTask();
+  const QString id = task->uuid();
+  task->setName("Local name");
+  task->setNotes("Local notes");  // not saved yet: the poll saves it first
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return saveReply(6);
+    return headReply(5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}}}}));
+  };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_EQ(task->name(), "Server name");
+  EXPECT_EQ(task->notes(), "Local notes");
+  ASSERT_EQ(sent("save").size(), 1);
+  const QVariantMap save = sent("save")[0];
+  EXPECT_EQ(save.value("iteration").toLongLong(), 5);
+  EXPECT_EQ(compact(save.value("data")),
+            QString(R"({"i":{},"u":{"%1":{"notes":"Local notes"}},"x":[]})").arg(id));
+  EXPECT_FALSE(client.track().hasChanges());
+  EXPECT_EQ(client.track().iteration(), 6);
+}
+
+// The key is dropped only from the section the server sent it under.
+TEST_F(RZSyncManagerTest, ServerValueDropsThePendingKeyOfItsOwnSectionOnly) {
+  RZSyncManager& manager = *client.manager;
+  RZSyncTrack& track = client.track();
+  track.insertValues({{"name", "mine"}, {"notes", "n"}}, "A@WTTask");
+  track.updateValues({{"name", "mine"}}, "B@WTTask", Section::Updated);
+  manager.mergeWithDictionary(changeSet(
+      {{"A@WTTask", QVariantMap{{"name", "theirs"}}}},
+      {{"A@WTTask", QVariantMap{{"notes", "theirs"}}}, {"B@WTTask", QVariantMap{{"name", "theirs"}}}}));
+  EXPECT_EQ(compact(track.entry(Section::Inserted, "A@WTTask")), R"({"notes":"n"})");
+  EXPECT_FALSE(track.entries(Section::Updated).contains("B@WTTask"));
+  EXPECT_EQ(client.find<WTTask>("A@WTTask")->notes(), "theirs");
+}
+
+// The server's deletion takes the record's items here too. What was pending for the record itself is
+// dropped; an item filed under it here only is deleted on the server with the next save (it may have
+// been moved there only here, and then the server still has it elsewhere).
+TEST_F(RZSyncManagerTest, ServerDeletionTakesOwnedRecordsHere) {
+  WTTask* task = syncedTask();
+  const QString taskId = task->uuid();
+  task->setName("Renamed here");
+  auto* note = client.context->insertNewObject<WTNote>();
+  note->setTask(task);
+  const QString noteId = note->uuid();
+  client.save();
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return saveReply(20);
+    return headReply(10, changeSet({}, {}, {taskId, "Gone@WTNote"}));
+  };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_EQ(client.find<WTTask>(taskId), nullptr);
+  EXPECT_EQ(client.find<WTNote>(noteId), nullptr);
+  ASSERT_EQ(sent("save").size(), 1);
+  const QVariantMap data = sent("save")[0].value("data").toMap();
+  EXPECT_FALSE(data.value("u").toMap().contains(taskId));
+  EXPECT_EQ(data.value("x").toStringList(), QStringList{noteId});
+  EXPECT_FALSE(client.track().hasChanges());
+  EXPECT_EQ(client.track().iteration(), 20);
+}
+
+// A deletion still waiting to be sent wins: the merge neither brings the record back nor files
+// anything under it, and the deletion goes out with the next save.
+TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
+  WTTask* task = syncedTask();
+  WTProject* project = task->project();
+  const QString taskId = task->uuid();
+  const QString projectId = project->uuid();
+  auto* kept = client.context->insertNewObject<WTTask>();
+  kept->setProject(project);
+  auto* movedItem = client.context->insertNewObject<WTNote>();
+  movedItem->setTask(kept);
+  auto* acme = client.context->insertNewObject<WTClient>();
+  client.save();
+  ASSERT_TRUE(client.syncOnce());
+  setUpRequests = server.requests.size();
+  const QString keptId = kept->uuid();
+  const QString movedId = movedItem->uuid();
+  const QString acmeId = acme->uuid();
+  client.context->deleteObject(task);
+  client.context->deleteObject(acme);
+  client.save();
+
+  const QVariantMap result =
+      changeSet({{"New@WTTime", QVariantMap{{"task", taskId}, {"startDate", 1700000000}}},
+                 {"Deeper@WTNote", QVariantMap{{"task", "NewTask@WTTask"}}},
+                 {"NewTask@WTTask", QVariantMap{{"project", projectId}, {"name", "fine"}}},
+                 {"P2@WTProject", QVariantMap{{"client", acmeId}, {"name", "Outlives its client"}}}},
+                {{taskId, QVariantMap{{"name", "Renamed elsewhere"}}},
+                 {movedId, QVariantMap{{"task", taskId}}},
+                 {projectId, QVariantMap{{"tasks", QStringList{taskId, keptId}}}}});
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return saveReply(31);
+    return headReply(30, result);
+  };
+  ASSERT_TRUE(client.syncOnce());
+
+  // Nothing is filed under the deleted task or client; the server takes care of what it has there once
+  // the deletions arrive (it deletes or clears them and tells every device).
+  EXPECT_EQ(client.context->objectWithUUID(taskId, false), nullptr);
+  auto* newTime = client.find<WTTime>("New@WTTime");
+  ASSERT_NE(newTime, nullptr);
+  EXPECT_EQ(newTime->task(), nullptr);
+  EXPECT_EQ(newTime->startDate(), Date::fromSeconds(1700000000));
+  EXPECT_EQ(client.find<WTNote>(movedId)->task(), client.find<WTTask>(keptId));
+  EXPECT_EQ(project->tasks().size(), 2);  // kept, and the new task filed by someone else
+  EXPECT_TRUE(project->tasks().contains(client.find<WTTask>(keptId)));
+  ASSERT_NE(client.find<WTTask>("NewTask@WTTask"), nullptr);
+  EXPECT_EQ(client.find<WTNote>("Deeper@WTNote")->task(), client.find<WTTask>("NewTask@WTTask"));
+  auto* outliving = client.find<WTProject>("P2@WTProject");
+  ASSERT_NE(outliving, nullptr);
+  EXPECT_EQ(outliving->client(), nullptr);
+  EXPECT_EQ(client.context->objectWithUUID(acmeId, false), nullptr);
+
+  ASSERT_EQ(sent("save").size(), 1);
+  const QStringList deleted = sent("save")[0].value("data").toMap().value("x").toStringList();
+  EXPECT_TRUE(deleted.contains(taskId));
+  EXPECT_TRUE(deleted.contains(acmeId));
+  EXPECT_FALSE(client.track().hasChanges());
+}
+
+// Once a head is merged and saved the journal is at that head, even when the save that follows is
+// refused: the next poll must not bring the same changes again.
+TEST_F(RZSyncManagerTest, IterationMovesToTheMergedHeadBeforeTheSave) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return errorReply("Poll head first", 4, 0);
+    return headReply(9, changeSet({{"Other@WTTask", QVariantMap{{"name", "from elsewhere"}}}}));
+  };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_EQ(client.track().iteration(), 9);
+  EXPECT_TRUE(client.track().hasChanges());
+  EXPECT_EQ(RZSyncTrack(client.journalPath()).iteration(), 9);
+  ASSERT_TRUE(client.syncOnce());
+  const QList<QVariantMap> heads = sent("head");
+  ASSERT_EQ(heads.size(), 2);
+  EXPECT_EQ(heads[1].value("iteration").toLongLong(), 9);
+}
+
+// What the user does while a save is on its way stays in the journal after the server confirms it.
+TEST_F(RZSyncManagerTest, ConfirmedSaveKeepsEditsMadeWhileItWasInFlight) {
+  WTTask* task = syncedTask();
+  task->setName("First");
+  task->setNotes("Notes");
+  server.handler = [&](const HttpRequest& request) {
+    return request.json().value("action") == "save" ? QByteArray() : headReply(head);
+  };
+  client.manager->sync();
+  ASSERT_TRUE(waitUntil([&] { return server.hasHeld(); }));
+  task->setName("Second");
+  auto* note = client.context->insertNewObject<WTNote>();
+  note->setTask(task);
+  client.save();
+  ASSERT_TRUE(server.answerHeld(saveReply(4)));
+  ASSERT_TRUE(waitUntil([&] { return client.idle(); }));
+
+  const RZSyncTrack& track = client.track();
+  EXPECT_EQ(track.iteration(), 4);
+  EXPECT_EQ(compact(track.entry(Section::Updated, task->uuid())), R"({"name":"Second"})");
+  EXPECT_TRUE(track.entries(Section::Inserted).contains(note->uuid()));
+  EXPECT_EQ(RZSyncTrack(client.journalPath()).iteration(), 4);
+}
+
+TEST_F(RZSyncManagerTest, FailedSaveKeepsTheWholeJournal) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  server.handler = [&](const HttpRequest& request) {
+    return request.json().value("action") == "save" ? QByteArray() : headReply(head);
+  };
+  client.manager->sync();
+  // The connection closes before any answer, however often the request is tried.
+  ASSERT_TRUE(waitUntil([&] {
+    server.dropHeld();
+    return client.idle();
+  }));
+  EXPECT_EQ(compact(client.track().entry(Section::Updated, task->uuid())), R"({"name":"Pending"})");
+  EXPECT_EQ(client.presenter.networkErrors.size(), 1);
+}
+
+TEST_F(RZSyncManagerTest, CodeFourWithoutIterationKeepsTheJournalForTheNextPoll) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  client.save();
+  server.handler = [&](const HttpRequest&) { return errorReply("Poll head first", 4, 0); };
+  const qsizetype before = server.requests.size();
+  LogCapture log;
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_TRUE(log.contains("Head iteration problem"));
+  EXPECT_EQ(server.requests.size(), before + 1);  // the poll itself; nothing is resent
+  EXPECT_TRUE(client.track().hasChanges());
+  EXPECT_TRUE(client.presenter.syncErrors.isEmpty());
+}
+
+TEST_F(RZSyncManagerTest, CodeFourWithIterationResendsTheJournalClaimingIt) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  client.save();
+  int answers = 0;
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return saveReply(13);
+    return ++answers == 1 ? errorReply("Try iteration 12", 4, 12) : headReply(13);
+  };
+  ASSERT_TRUE(client.syncOnce());
+  ASSERT_EQ(sent("save").size(), 1);
+  EXPECT_EQ(sent("save")[0].value("iteration").toLongLong(), 12);
+  EXPECT_TRUE(sent("save")[0].value("data").toMap().value("u").toMap().contains(task->uuid()));
+  EXPECT_FALSE(client.track().hasChanges());
+  EXPECT_EQ(client.track().iteration(), 13);
+}
+
+TEST_F(RZSyncManagerTest, OtherErrorsAreShownOnceAndSwitchSyncingOff) {
+  syncedTask();
+  QSignalSpy status(client.manager.get(), &RZSyncManager::syncStatusDidChange);
+  server.handler = [](const HttpRequest&) { return errorReply("Wrong e-mail address or password.", 2); };
+  client.manager->enableSync();
+  EXPECT_TRUE(client.manager->syncEnabled());
+  ASSERT_TRUE(waitUntil([&] { return client.idle(); }));
+  EXPECT_EQ(client.presenter.syncErrors, QStringList{"Wrong e-mail address or password. - (Code: 2)"});
+  EXPECT_FALSE(client.manager->syncEnabled());
+  EXPECT_EQ(client.manager->scheduledInterval(), -1);
+  EXPECT_EQ(status.count(), 2);  // on, then off
+}
+
+TEST_F(RZSyncManagerTest, ReplyWithoutIterationChangesNothing) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  client.save();
+  server.handler = [](const HttpRequest&) {
+    return LoopbackHttpServer::json(QVariantMap{{"action", "save"}});
+  };
+  const qint64 iteration = client.track().iteration();
+  LogCapture log;
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_TRUE(log.contains("Iteration not received"));
+  EXPECT_TRUE(client.track().hasChanges());
+  EXPECT_EQ(client.track().iteration(), iteration);
+}
+
+TEST_F(RZSyncManagerTest, PollIntervals) {
+  RZSyncManager& manager = *client.manager;
+  EXPECT_EQ(manager.intervals().pollMs, 5000);
+  EXPECT_EQ(manager.intervals().retryMs, 15000);
+  EXPECT_EQ(manager.intervals().afterSaveMs, 5000);
+  EXPECT_EQ(manager.scheduledInterval(), -1);  // off until enabled
+  manager.enableSync();
+  EXPECT_EQ(manager.scheduledInterval(), 5000);
+  ASSERT_TRUE(waitUntil([&] { return client.idle(); }));
+  server.handler = [](const HttpRequest&) { return LoopbackHttpServer::raw("not json"); };
+  manager.sync();
+  ASSERT_TRUE(waitUntil([&] { return client.idle(); }));
+  EXPECT_EQ(manager.scheduledInterval(), 15000);
+  auto* task = client.context->insertNewObject<WTTask>();
+  task->setName("Saved");
+  client.save();
+  EXPECT_EQ(manager.scheduledInterval(), 5000);
+  manager.disableSync();
+  EXPECT_EQ(manager.scheduledInterval(), -1);
+  // Disabled, a save still writes the journal, so the change goes out once syncing is on again.
+  task->setName("While off");
+  client.save();
+  EXPECT_EQ(manager.scheduledInterval(), -1);
+  EXPECT_TRUE(RZSyncTrack(client.journalPath()).entries(Section::Inserted).contains(task->uuid()));
+}
+
+// Failures in a row are shown once; a good reply ends the run and polling goes on by itself.
+TEST_F(RZSyncManagerTest, PollingResumesAfterAGoodReplyFollowingFailures) {
+  RZSyncManager& manager = *client.manager;
+  manager.setIntervals({40, 80, 40});
+  bool failing = true;
+  server.handler = [&](const HttpRequest&) {
+    return failing ? LoopbackHttpServer::raw("oops", 500) : headReply(1);
+  };
+  manager.enableSync();
+  ASSERT_TRUE(waitUntil([&] { return server.requests.size() >= 3; }));
+  EXPECT_EQ(client.presenter.networkErrors.size(), 1);
+  EXPECT_TRUE(manager.hasNetworkError());
+  failing = false;
+  const qsizetype before = server.requests.size();
+  ASSERT_TRUE(waitUntil([&] { return server.requests.size() >= before + 4; }, 3000));
+  EXPECT_FALSE(manager.hasNetworkError());
+  failing = true;
+  ASSERT_TRUE(waitUntil([&] { return client.presenter.networkErrors.size() == 2; }, 3000));
+}
+
+// Every request names the installation, which keeps its identity across launches.
+TEST_F(RZSyncManagerTest, EveryRequestCarriesThisInstallationsDevice) {
+  WTTask* task = syncedTask();
+  task->setName("Pending");
+  client.save();
+  ASSERT_TRUE(client.syncOnce());
+  const QString device = client.defaults->stringForKey("WTSyncDevice");
+  EXPECT_FALSE(device.isEmpty());
+  client.reopen();
+  ASSERT_TRUE(client.syncOnce());
+  ASSERT_GE(server.requests.size(), 4);
+  for (const HttpRequest& request : server.requests) EXPECT_EQ(request.json().value("device"), device);
+  SyncClient other(server.address());
+  EXPECT_NE(other.network().device(), device);
+}
+
+TEST_F(RZSyncManagerTest, JournalSurvivesARestart) {
+  WTTask* task = syncedTask();
+  task->setName("Before quitting");
+  client.save();
+  const QString id = task->uuid();
+  client.reopen();
+  EXPECT_EQ(client.track().entry(Section::Updated, id).value("name"), "Before quitting");
+  ASSERT_TRUE(client.syncOnce());
+  ASSERT_EQ(sent("save").size(), 1);
+  EXPECT_EQ(sent("save")[0].value("data").toMap().value("u").toMap().value(id).toMap().value("name"),
+            "Before quitting");
+}
+
+TEST_F(RZSyncManagerTest, NothingIsSentWithoutAServerAddress) {
+  client.defaults->setValue("WTSyncServer", QVariant());
+  client.manager->sync();
+  QTest::qWait(100);
+  EXPECT_TRUE(server.requests.isEmpty());
+  EXPECT_TRUE(client.idle());
+}
+
+// The merge waits until local edits are saved (and so journaled): when that save fails, the reply is
+// left alone and the next poll asks again from the same iteration.
+TEST_F(RZSyncManagerTest, NoMergeWhenLocalEditsCannotBeSaved) {
+  WTTask* task = syncedTask();
+  task->setName("Unsaved");
+  int saves = 0;
+  client.manager->setSaveHandler([&]() -> Result<void> {
+    ++saves;
+    return Error{1, QStringLiteral("disk full")};
+  });
+  const qint64 iteration = client.track().iteration();
+  server.handler = [&](const HttpRequest& request) {
+    if (request.json().value("action") == "save") return saveReply(51);
+    return headReply(50, changeSet({{"New@WTTask", QVariantMap{{"name", "from elsewhere"}}}}));
+  };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_EQ(saves, 1);
+  EXPECT_EQ(client.find<WTTask>("New@WTTask"), nullptr);
+  EXPECT_EQ(client.track().iteration(), iteration);
+  EXPECT_TRUE(sent("save").isEmpty());
+  client.manager->setSaveHandler({});
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_NE(client.find<WTTask>("New@WTTask"), nullptr);
+  EXPECT_EQ(sent("head").last().value("iteration").toLongLong(), iteration);
+}

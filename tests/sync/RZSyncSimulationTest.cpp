@@ -1,0 +1,530 @@
+// Several installations on one account make random edits, sync at random moments through a proxy that
+// loses requests and replies, while the real server restarts once; run to quiescence, every store must
+// hold the same records with the same values, and every change the server applied must be there unless
+// a later change replaced it or a deletion took it.
+//
+// Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
+#include "Decimal.h"
+#include "SyncTestSupport.h"
+#include "WTClient.h"
+#include "WTExpense.h"
+#include "WTFlat.h"
+#include "WTNote.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTToDo.h"
+
+#include <gtest/gtest.h>
+
+#include <QTcpSocket>
+
+#include <iostream>
+#include <random>
+
+using synctest::HttpRequest;
+using synctest::LoopbackHttpServer;
+using synctest::snapshot;
+using synctest::snapshotDifference;
+using synctest::SyncClient;
+using synctest::SyncServerProcess;
+
+namespace {
+
+// Sits between the clients and the server and holds every request until the simulation releases it:
+// then it forwards the request and its answer, unless it loses the request (the server never sees it)
+// or the reply (the server acts on it, the client hears a gateway error). Keeps, in order, every save
+// the server accepted: that is what must survive. Holding makes a run depend on its seed only, not on
+// how fast the machine is.
+class LossyProxy {
+ public:
+  LossyProxy() {
+    front.handler = [](const HttpRequest&) { return QByteArray(); };  // hold
+  }
+
+  QString address() const { return front.address(); }
+  void setBackendPort(int port) { backendPort_ = port; }
+
+  enum class Fate { Deliver, LoseRequest, LoseReply };
+  // Answers the oldest held request.
+  void release(Fate fate) {
+    static const QByteArray kGatewayError = LoopbackHttpServer::raw("Bad gateway", 502, "text/plain");
+    const HttpRequest request = front.requests.value(released_++);
+    if (fate == Fate::LoseRequest) {
+      ++lostRequests;
+      front.answerHeld(kGatewayError);
+      return;
+    }
+    const QByteArray answer = forward(request);
+    const qsizetype bodyStart = answer.indexOf("\r\n\r\n");
+    const QVariantMap reply = RZSyncJSON::parse(answer.mid(bodyStart + 4)).value_or(QVariant()).toMap();
+    if (qEnvironmentVariableIsSet("TESSAL_SYNC_TRACE")) {
+      QVariantMap shown = request.json();
+      shown.remove("password");
+      shown.insert("device", shown.value("device").toString().left(8));
+      std::cerr << "REQUEST " << RZSyncJSON::write(shown, RZSyncJSON::Style::Compact).toStdString()
+                << "\nREPLY " << (fate == Fate::LoseReply ? "(lost) " : "")
+                << answer.mid(bodyStart + 4).toStdString() << "\n";
+    }
+    if (reply.value("action") == "save" && !reply.contains("error")) {
+      appliedSaves.append(request.json().value("data").toMap());
+    }
+    if (answer.isEmpty() || fate == Fate::LoseReply) {
+      if (fate == Fate::LoseReply) ++lostReplies;
+      front.answerHeld(kGatewayError);  // a lost reply, or the server is down
+      return;
+    }
+    front.answerHeld(answer);
+  }
+  // Requests that arrived and wait for release.
+  qsizetype held() const { return front.requests.size() - released_; }
+
+  QList<QVariantMap> appliedSaves;  // the "data" of each save the server confirmed, in order
+  int lostRequests = 0;
+  int lostReplies = 0;
+  LoopbackHttpServer front;
+
+ private:
+  // One blocking exchange with the server; empty when it cannot be reached.
+  QByteArray forward(const HttpRequest& request) const {
+    QTcpSocket socket;
+    socket.connectToHost(QHostAddress::LocalHost, quint16(backendPort_));
+    if (!socket.waitForConnected(2000)) return {};
+    socket.write(
+        request.method + ' ' + request.path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n" +
+        "Content-Type: application/json\r\nContent-Length: " + QByteArray::number(request.body.size()) +
+        "\r\n\r\n" + request.body);
+    QByteArray answer;
+    while (socket.state() == QAbstractSocket::ConnectedState || socket.bytesAvailable() > 0) {
+      if (socket.bytesAvailable() == 0 && !socket.waitForReadyRead(10000)) break;
+      answer += socket.readAll();
+    }
+    answer += socket.readAll();
+    return answer.startsWith("HTTP/1.1 ") ? answer : QByteArray();
+  }
+
+  int backendPort_ = 0;
+  qsizetype released_ = 0;
+};
+
+// What the accepted saves add up to: per record, deleted or its last value of each key. After each
+// save the server's own consequences follow, as it applies them: what is filed under a deleted task or
+// project goes too (for good), a project under a deleted client loses it.
+struct Expected {
+  QSet<QString> deleted;
+  QMap<QString, QVariantMap> values;
+
+  void apply(const QVariantMap& save) {
+    for (const char* section : {"i", "u"}) {
+      const QVariantMap entries = save.value(section).toMap();
+      for (auto it = entries.begin(); it != entries.end(); ++it) {
+        if (deleted.contains(it.key())) continue;  // a deleted record stays deleted
+        QVariantMap& record = values[it.key()];
+        const QVariantMap fields = it.value().toMap();
+        for (auto field = fields.begin(); field != fields.end(); ++field)
+          record.insert(field.key(), field.value());
+      }
+    }
+    for (const QVariant& uuid : save.value("x").toList()) remove(uuid.toString());
+    for (bool changed = true; changed;) {
+      changed = false;
+      for (auto it = values.begin(); it != values.end();) {
+        const QString entity = it.key().section(u'@', -1);
+        const QString ownerKey = entity == "WTTask"      ? "project"
+                                 : entity == "WTProject" ? "client"
+                                 : entity == "WTClient"  ? ""
+                                                         : "task";
+        const QVariant owner = ownerKey.isEmpty() ? QVariant() : it.value().value(ownerKey);
+        if (owner.typeId() != QMetaType::QString || !deleted.contains(owner.toString())) {
+          ++it;
+        } else if (entity == "WTProject") {
+          it.value().insert(ownerKey, QVariant());
+          ++it;
+        } else {
+          deleted.insert(it.key());
+          it = values.erase(it);
+          changed = true;
+        }
+      }
+    }
+  }
+
+  void remove(const QString& uuid) {
+    deleted.insert(uuid);
+    values.remove(uuid);
+  }
+
+  bool isLive(const QString& uuid) const { return values.contains(uuid); }
+};
+
+class Simulation {
+ public:
+  Simulation(unsigned seed, SyncServerProcess& server) : seed_(seed), random_(seed), server_(server) {
+    proxy_.setBackendPort(QUrl(server.address()).port());
+    std::uniform_int_distribution<int> clients(3, 5);
+    const int count = clients(random_);
+    // Syncing stays "off": no timer polls on its own, every exchange is one the run starts.
+    for (int i = 0; i < count; ++i) {
+      clients_.push_back(std::make_unique<SyncClient>(proxy_.address(), kUser, kPassword));
+      if (qEnvironmentVariableIsSet("TESSAL_SYNC_TRACE")) {
+        std::cerr << "CLIENT " << i << " " << clients_.back()->network().device().left(8).toStdString()
+                  << "\n";
+      }
+    }
+  }
+
+  static inline const QString kUser = QStringLiteral("sim@example.org");
+  static inline const QString kPassword = QStringLiteral("simulation password");
+
+  void run(int steps) {
+    for (int step = 0; step < steps; ++step) {
+      if (step == steps / 2) restartServer();
+      const int action = roll(100);
+      if (action < 50) {
+        edit(pick());
+      } else if (action < 62) {
+        pick().save();
+      } else if (action < 80) {
+        startSync(pick());
+      } else if (proxy_.held() > 0) {
+        // Whatever the clients do next happens while the other requests are still on their way.
+        const int fate = roll(100);
+        release(fate < 12   ? LossyProxy::Fate::LoseRequest
+                : fate < 24 ? LossyProxy::Fate::LoseReply
+                            : LossyProxy::Fate::Deliver);
+      }
+    }
+  }
+
+  // No more losses; everybody syncs until nobody has anything to send or to receive.
+  bool settle() {
+    drain();
+    for (int round = 0; round < 40; ++round) {
+      bool quiet = true;
+      for (auto& client : clients_) {
+        bool received = false;
+        auto connection = QObject::connect(
+            client->manager.get(), &RZSyncManager::exchangeDidFinish, [&](const RZSyncExchange& e) {
+              received |= e.receivedChanges || e.outcome != RZSyncExchange::Outcome::Answered;
+            });
+        startSync(*client);
+        drain();
+        QObject::disconnect(connection);
+        if (received || client->track().hasChanges() || client->context->hasChanges()) quiet = false;
+      }
+      if (quiet) return true;
+    }
+    return false;
+  }
+  void check() {
+    for (auto& client : clients_) {
+      EXPECT_TRUE(client->presenter.syncErrors.isEmpty())
+          << client->presenter.syncErrors.join('\n').toStdString();
+    }
+    const auto first = snapshot(*clients_[0]->context);
+    for (size_t i = 1; i < clients_.size(); ++i) {
+      const auto other = snapshot(*clients_[i]->context);
+      EXPECT_TRUE(first == other) << "client 0 and " << i << " differ:\n" << snapshotDifference(first, other);
+    }
+    // Every accepted change is there, unless replaced by a later one or taken by a deletion.
+    Expected expected;
+    for (const QVariantMap& save : proxy_.appliedSaves) expected.apply(save);
+    WTObjectContext& context = *clients_[0]->context;
+    QSet<QString> live;
+    for (auto it = expected.values.begin(); it != expected.values.end(); ++it) {
+      if (expected.isLive(it.key())) live.insert(it.key());
+    }
+    for (const QString& uuid : first.keys()) {
+      EXPECT_TRUE(live.contains(uuid))
+          << uuid.toStdString() << " is in the stores but was deleted or never sent";
+    }
+    for (const QString& uuid : live) {
+      WTObject* object = context.objectWithUUID(uuid, false);
+      ASSERT_NE(object, nullptr) << uuid.toStdString() << " was saved and not deleted, but is missing";
+      const QVariantMap values = expected.values.value(uuid);
+      for (auto value = values.begin(); value != values.end(); ++value) {
+        // The server keeps the task order itself.
+        if (value.key() == "tasks" || value.key() == "uuid") continue;
+        const QVariant actual =
+            RZSyncTrack::transformedValue(synctest::storedValue(object, value.key())).value_or(QVariant());
+        EXPECT_TRUE(RZSyncJSON::sameValue(actual, value.value()))
+            << uuid.toStdString() << " " << value.key().toStdString() << ": "
+            << RZSyncJSON::write(actual).toStdString() << " instead of "
+            << RZSyncJSON::write(value.value()).toStdString();
+      }
+    }
+    // A project lists exactly the tasks filed under it.
+    for (WTProject* project : context.fetch<WTProject>()) {
+      for (WTTask* task : project->tasks()) EXPECT_EQ(task->project(), project);
+    }
+  }
+
+  int saves() const { return int(proxy_.appliedSaves.size()); }
+  int lost() const { return proxy_.lostRequests + proxy_.lostReplies; }
+  size_t clientCount() const { return clients_.size(); }
+  qsizetype records() const { return clients_[0]->context->count(); }
+
+ private:
+  int roll(int n) { return std::uniform_int_distribution<int>(0, n - 1)(random_); }
+  SyncClient& pick() { return *clients_[size_t(roll(int(clients_.size())))]; }
+
+  // A new record under an identity that depends on the seed only, so a run replays exactly.
+  template <class T>
+  T* insert(SyncClient& client) {
+    T* object = client.context->insertNewObject<T>();
+    object->setUuid(
+        QStringLiteral("%1-%2@%3").arg(seed_).arg(++inserted_, 6, 10, QChar('0')).arg(object->entityName()));
+    return object;
+  }
+  // A random record of a kind, chosen in identity order.
+  WTObject* anyOf(SyncClient& client, const QString& kind) {
+    QList<WTObject*> all = client.context->fetchObjectsForEntityName(kind).value_or(QList<WTObject*>());
+    std::sort(all.begin(), all.end(), [](WTObject* a, WTObject* b) { return a->uuid() < b->uuid(); });
+    return all.isEmpty() ? nullptr : all[roll(int(all.size()))];
+  }
+  template <class T>
+  T* any(SyncClient& client) {
+    return static_cast<T*>(anyOf(client, WTEntities::name(T::kEntity)));
+  }
+  WTItem* anyItem(SyncClient& client) {
+    return static_cast<WTItem*>(anyOf(client, QStringLiteral("WTItem")));
+  }
+  Decimal money() {
+    return *Decimal::fromString(QStringLiteral("%1.%2").arg(roll(500)).arg(roll(100), 2, 10, QChar('0')));
+  }
+  Date day() { return Date::fromSeconds(1700000000.0 + 60.0 * roll(60 * 24 * 30)); }
+  QString text() { return QStringLiteral("t%1").arg(roll(1000)); }
+
+  // One random change; some clear a value.
+  void edit(SyncClient& client) {
+    WTObjectContext& context = *client.context;
+    switch (roll(12)) {
+      case 0:
+        insert<WTClient>(client)->setName(text());
+        break;
+      case 1: {
+        auto* project = insert<WTProject>(client);
+        project->setName(text());
+        if (WTClient* owner = any<WTClient>(client)) project->setClient(owner);
+        break;
+      }
+      case 2: {
+        WTProject* project = any<WTProject>(client);
+        if (!project) break;
+        auto* task = insert<WTTask>(client);
+        task->setName(text());
+        task->setProject(project, roll(int(project->tasks().size()) + 1));
+        break;
+      }
+      case 3:
+      case 4: {
+        WTTask* task = any<WTTask>(client);
+        if (!task) break;
+        WTItem* item = nullptr;
+        switch (roll(5)) {
+          case 0: {
+            auto* time = insert<WTTime>(client);
+            const Date start = day();
+            time->setStartDate(start);
+            time->setEndDate(start.addingSeconds(60.0 * roll(300)));
+            item = time;
+            break;
+          }
+          case 1: {
+            auto* flat = insert<WTFlat>(client);
+            flat->setMinutes(roll(600));
+            item = flat;
+            break;
+          }
+          case 2: {
+            auto* expense = insert<WTExpense>(client);
+            expense->setExpense(money());
+            item = expense;
+            break;
+          }
+          case 3:
+            item = insert<WTNote>(client);
+            break;
+          default:
+            item = insert<WTToDo>(client);
+            break;
+        }
+        item->setStartDate(day());
+        item->setName(text());
+        item->setTask(task);
+        break;
+      }
+      case 5: {  // rename or re-rate anything
+        WTObject* object = anyOf(client, QStringLiteral("WTObject"));
+        if (!object) break;
+        switch (roll(6)) {
+          case 0:
+            object->setName(text());
+            break;
+          case 1:
+            object->setNotes(text());
+            break;
+          case 2:
+            object->setRate(money());
+            break;
+          case 3:
+            if (roll(2)) {
+              object->setRate(std::nullopt);
+            } else {
+              object->setNotes(QString());
+            }
+            break;
+          case 4:
+            if (auto* task = dynamic_cast<WTTask*>(object))
+              task->setBudget(roll(2) ? std::optional(money()) : std::nullopt);
+            if (auto* expense = dynamic_cast<WTExpense*>(object)) expense->setExpense(std::nullopt);
+            if (auto* flat = dynamic_cast<WTFlat*>(object)) flat->setMinutes(std::nullopt);
+            if (auto* time = dynamic_cast<WTTime*>(object)) time->setEndDate(std::nullopt);
+            break;
+          default:
+            object->setArchived(roll(2) == 1);
+            break;
+        }
+        break;
+      }
+      case 6: {  // item values
+        WTItem* item = anyItem(client);
+        if (!item) break;
+        if (auto* time = dynamic_cast<WTTime*>(item)) {
+          time->setEndDate(time->startDate().value_or(day()).addingSeconds(60.0 * roll(300)));
+        } else if (auto* expense = dynamic_cast<WTExpense*>(item)) {
+          expense->setExpense(money());
+        } else if (auto* flat = dynamic_cast<WTFlat*>(item)) {
+          flat->setMinutes(roll(600));
+        } else if (auto* todo = dynamic_cast<WTToDo*>(item)) {
+          todo->setCompleted(!todo->completed());
+        } else {
+          item->setStartDate(day());
+        }
+        break;
+      }
+      case 7: {  // reorder or move a task
+        WTTask* task = any<WTTask>(client);
+        WTProject* project = any<WTProject>(client);
+        if (!task || !project) break;
+        if (task->project() == project) {
+          project->moveTask(task, roll(int(project->tasks().size())));
+        } else {
+          task->setProject(project, roll(int(project->tasks().size()) + 1));
+        }
+        if (roll(2)) task->setBudget(money());
+        break;
+      }
+      case 8: {  // move an item, or file a project under another client
+        if (roll(2)) {
+          WTItem* item = anyItem(client);
+          WTTask* task = any<WTTask>(client);
+          if (item && task) item->setTask(task);
+        } else {
+          WTProject* project = any<WTProject>(client);
+          WTClient* owner = roll(4) ? any<WTClient>(client) : nullptr;  // sometimes none
+          if (project) project->setClient(owner);
+        }
+        break;
+      }
+      case 9:
+      case 10: {  // delete an item
+        if (WTItem* item = anyItem(client)) context.deleteObject(item);
+        break;
+      }
+      default: {  // delete an owner
+        switch (roll(3)) {
+          case 0:
+            if (WTTask* task = any<WTTask>(client)) context.deleteObject(task);
+            break;
+          case 1:
+            if (roll(3) == 0) {
+              if (WTProject* project = any<WTProject>(client)) context.deleteObject(project);
+            }
+            break;
+          default:
+            if (WTClient* owner = any<WTClient>(client)) context.deleteObject(owner);
+            break;
+        }
+        break;
+      }
+    }
+  }
+
+  // Saves and polls, when the client has nothing on its way; waits until the request is held.
+  void startSync(SyncClient& client) {
+    client.save();
+    if (!client.idle()) return;
+    client.manager->sync();
+    settleArrivals();
+  }
+
+  // Answers the oldest held request and waits until its client has dealt with the answer (and any
+  // request it sent in turn is held).
+  void release(LossyProxy::Fate fate) {
+    proxy_.release(fate);
+    settleArrivals();
+  }
+
+  void settleArrivals() {
+    const bool settled = synctest::waitUntil(
+        [this] {
+          qsizetype busy = 0;
+          for (auto& client : clients_) busy += client->idle() ? 0 : 1;
+          return busy == proxy_.held();
+        },
+        20000);
+    ASSERT_TRUE(settled) << "a request did not arrive or a reply was not handled";
+  }
+
+  void drain() {
+    while (proxy_.held() > 0) release(LossyProxy::Fate::Deliver);
+  }
+
+  void restartServer() {
+    server_.stop();
+    // Requests fail while it is down.
+    for (int i = 0; i < 10; ++i) {
+      edit(pick());
+      startSync(pick());
+      if (proxy_.held() > 0) release(LossyProxy::Fate::Deliver);
+    }
+    ASSERT_TRUE(server_.start());
+  }
+
+  unsigned seed_;
+  int inserted_ = 0;
+  std::mt19937 random_;
+  LossyProxy proxy_;
+  SyncServerProcess& server_;
+  std::vector<std::unique_ptr<SyncClient>> clients_;
+};
+
+std::vector<unsigned> seeds() {
+  if (const QByteArray seed = qgetenv("TESSAL_SYNC_SEED"); !seed.isEmpty()) return {seed.toUInt()};
+  const int runs =
+      qEnvironmentVariableIsSet("TESSAL_SYNC_RUNS") ? qEnvironmentVariableIntValue("TESSAL_SYNC_RUNS") : 2;
+  std::vector<unsigned> list;
+  for (int i = 0; i < runs; ++i) list.push_back(20240601u + unsigned(i) * 7919u);
+  return list;
+}
+
+}  // namespace
+
+TEST(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
+  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  for (const unsigned seed : seeds()) {
+    SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
+    SyncServerProcess server;
+    ASSERT_TRUE(server.addUser(Simulation::kUser, Simulation::kPassword));
+    ASSERT_TRUE(server.start());
+    Simulation simulation(seed, server);
+    simulation.run(600);
+    ASSERT_TRUE(simulation.settle()) << "no quiescence";
+    simulation.check();
+    std::cout << "seed " << seed << ": " << simulation.clientCount() << " clients, " << simulation.saves()
+              << " saves applied, " << simulation.lost() << " requests or replies lost, "
+              << simulation.records() << " records in every store\n";
+    if (HasFailure()) break;
+  }
+}

@@ -1,0 +1,344 @@
+#include "RZSyncTrack.h"
+
+#include "Date.h"
+#include "Decimal.h"
+#include "KeyPath.h"
+#include "RZSyncJSON.h"
+#include "SyncTestSupport.h"
+#include "WTClient.h"
+#include "WTExpense.h"
+#include "WTNote.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTStore.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <gtest/gtest.h>
+
+#include <QColor>
+#include <QDir>
+#include <QFile>
+#include <QTemporaryDir>
+
+#include <nlohmann/json.hpp>
+
+#include <sys/resource.h>
+#include <csignal>
+
+using synctest::LogCapture;
+using Section = RZSyncTrack::Section;
+
+namespace {
+
+Decimal dec(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
+
+QByteArray readFile(const QString& path) {
+  QFile file(path);
+  return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
+}
+
+void writeFile(const QString& path, const QByteArray& bytes) {
+  QFile file(path);
+  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
+  file.write(bytes);
+}
+
+QString compact(const QVariant& value) {
+  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
+}
+
+class RZSyncTrackTest : public ::testing::Test {
+ protected:
+  QString path() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
+  QTemporaryDir dir;
+};
+
+}  // namespace
+
+TEST_F(RZSyncTrackTest, FreshJournalIsEmptyAtIterationZero) {
+  RZSyncTrack track(path());
+  EXPECT_FALSE(track.hasChanges());
+  EXPECT_EQ(track.iteration(), 0);
+  EXPECT_EQ(compact(track.dictionary()), QStringLiteral(R"({"i":{},"u":{},"x":[]})"));
+  EXPECT_FALSE(QFile::exists(path() + QStringLiteral(".corrupt")));
+}
+
+TEST_F(RZSyncTrackTest, FileHoldsIterationAndTrackAndReadsBack) {
+  RZSyncTrack track;
+  track.setIteration(12);
+  track.insertValues({{"name", "Design"}, {"budget", QVariant::fromValue(dec("12.30"))}}, "T@WTTask");
+  track.updateValues({{"endDate", QVariant::fromValue(Date::fromSeconds(1700000000.75))}}, "E@WTTime");
+  track.deleteObjectWithId("N@WTNote");
+  ASSERT_TRUE(track.writeToFile(path()).ok());
+
+  const QByteArray text = readFile(path());
+  EXPECT_TRUE(text.contains("\n  \"track\": {")) << text.toStdString();   // pretty-printed
+  EXPECT_TRUE(text.contains("\"budget\": 12.30")) << text.toStdString();  // the money token as written
+  const nlohmann::json json = nlohmann::json::parse(text.toStdString());
+  EXPECT_EQ(json["iteration"], 12);
+  EXPECT_EQ(json["track"]["i"]["T@WTTask"]["name"], "Design");
+  EXPECT_EQ(json["track"]["u"]["E@WTTime"]["endDate"], 1700000000);
+  EXPECT_EQ(json["track"]["x"], nlohmann::json::array({"N@WTNote"}));
+
+  RZSyncTrack loaded(path());
+  EXPECT_EQ(loaded.iteration(), 12);
+  EXPECT_EQ(compact(loaded.dictionary()), compact(track.dictionary()));
+  EXPECT_TRUE(loaded.entry(Section::Inserted, "T@WTTask")
+                  .value("budget")
+                  .value<Decimal>()
+                  .isIdenticalTo(dec("12.30")));
+  // Nothing but the journal is left in the folder.
+  EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
+}
+
+TEST_F(RZSyncTrackTest, MissingSectionsLoadEmpty) {
+  writeFile(path(), R"({"iteration": 3, "track": {"u": {"A@WTTask": {"name": "a"}}}})");
+  RZSyncTrack track(path());
+  EXPECT_EQ(track.iteration(), 3);
+  EXPECT_TRUE(track.deletedIds().isEmpty());
+  EXPECT_TRUE(track.entries(Section::Inserted).isEmpty());
+  EXPECT_EQ(track.entry(Section::Updated, "A@WTTask").value("name"), "a");
+  EXPECT_EQ(compact(track.dictionary().value("x")), "[]");
+}
+
+// Whatever cannot be read as a journal is kept aside, byte for byte, and the journal starts over.
+TEST_F(RZSyncTrackTest, MalformedFilesAreKeptAsideAndTheJournalStartsEmpty) {
+  const QByteArray bad[] = {
+      "",
+      "{\"iteration\": 3, \"track\": {\"i\": {",  // cut short
+      "[1, 2]",
+      R"({"iteration": "7", "track": {}})",
+      R"({"iteration": 7, "track": []})",
+      R"({"iteration": 7, "track": {"i": {"A@WTTask": 5}}})",
+      R"({"iteration": 7, "track": {"x": ["A@WTTask", 5]}})",
+  };
+  for (const QByteArray& text : bad) {
+    SCOPED_TRACE(text.toStdString());
+    QTemporaryDir folder;
+    const QString file = folder.filePath(QStringLiteral("Tessal.sync"));
+    writeFile(file, text);
+    LogCapture log;
+    RZSyncTrack track(file);
+    EXPECT_FALSE(track.hasChanges());
+    EXPECT_EQ(track.iteration(), 0);
+    EXPECT_TRUE(log.contains(QStringLiteral("Can not parse json - ")));
+    EXPECT_FALSE(QFile::exists(file));
+    EXPECT_EQ(readFile(file + QStringLiteral(".corrupt")), text);
+  }
+}
+
+TEST_F(RZSyncTrackTest, AnEarlierCorruptCopyIsNotOverwritten) {
+  writeFile(path(), "first");
+  RZSyncTrack first(path());
+  writeFile(path(), "second");
+  RZSyncTrack second(path());
+  EXPECT_EQ(readFile(path() + QStringLiteral(".corrupt")), "first");
+  EXPECT_EQ(readFile(path() + QStringLiteral(".corrupt.2")), "second");
+}
+
+// A write that fails half-way leaves the previous journal in place and no stray file.
+TEST_F(RZSyncTrackTest, FailedWriteKeepsThePreviousFile) {
+  RZSyncTrack track;
+  track.insertValues({{"name", "small"}}, "A@WTTask");
+  ASSERT_TRUE(track.writeToFile(path()).ok());
+  const QByteArray before = readFile(path());
+
+  track.insertValues({{"notes", QString(64 * 1024, u'x')}}, "B@WTTask");
+  // The kernel refuses to grow any file beyond 4 KiB while the limit holds.
+  struct rlimit old {};
+  ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
+  const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
+  struct rlimit small = old;
+  small.rlim_cur = 4096;
+  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
+  const Result<void> written = track.writeToFile(path());
+  setrlimit(RLIMIT_FSIZE, &old);
+  std::signal(SIGXFSZ, oldHandler);
+
+  EXPECT_FALSE(written.ok());
+  EXPECT_EQ(readFile(path()), before);
+  EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
+  EXPECT_TRUE(track.entries(Section::Inserted).contains("B@WTTask"));  // memory unchanged
+  EXPECT_TRUE(track.writeToFile(path()).ok());
+}
+
+TEST_F(RZSyncTrackTest, WriteIntoAMissingFolderFails) {
+  RZSyncTrack track;
+  EXPECT_FALSE(track.writeToFile(dir.filePath(QStringLiteral("missing/Tessal.sync"))).ok());
+}
+
+TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
+  WTObjectContext context;
+  auto* project = context.insertNewObject<WTProject>();
+  auto* first = context.insertNewObject<WTTask>();
+  auto* second = context.insertNewObject<WTTask>();
+  struct Case {
+    const char* what;
+    QVariant value;
+    QString json;  // empty: not journaled
+  };
+  const Case cases[] = {
+      {"date, fraction dropped", QVariant::fromValue(Date::fromSeconds(1700000000.999)), "1700000000"},
+      {"date before 1970, toward zero", QVariant::fromValue(Date::fromSeconds(-1.5)), "-1"},
+      {"record", KeyPath::variantFromObject(project), QString("\"%1\"").arg(project->uuid())},
+      {"ordered relationship", QVariant::fromValue(WTOrderedRelationship{{second, first}}),
+       QString("[\"%1\",\"%2\"]").arg(second->uuid(), first->uuid())},
+      {"unordered relationship", QVariant::fromValue(WTUnorderedRelationship{{first}}), ""},
+      {"decimal", QVariant::fromValue(dec("-0.50")), "-0.50"},
+      {"colour", QVariant(QColor(255, 0, 0, 128)), "\"#80ff0000\""},
+      {"string", QVariant(QStringLiteral("a\"b")), "\"a\\\"b\""},
+      {"boolean", QVariant(true), "true"},
+      {"integer", QVariant(90), "90"},
+      {"cleared value", QVariant(), "null"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    const std::optional<QVariant> transformed = RZSyncTrack::transformedValue(c.value);
+    EXPECT_EQ(transformed ? compact(*transformed) : QString(), c.json);
+  }
+}
+
+TEST(RZSyncTrackSections, InsertionThenUpdateStaysOneInsertion) {
+  RZSyncTrack track;
+  track.insertValues({{"name", "a"}, {"notes", "n"}}, "A@WTTask");
+  track.updateValues({{"name", "b"}, {"rate", 50}}, "A@WTTask");
+  EXPECT_EQ(compact(track.dictionary()),
+            R"({"i":{"A@WTTask":{"name":"b","notes":"n","rate":50}},"u":{},"x":[]})");
+}
+
+TEST(RZSyncTrackSections, DeletionKeepsPendingValuesAndRewritingUndeletes) {
+  RZSyncTrack track;
+  track.updateValues({{"name", "a"}}, "A@WTTask");
+  track.deleteObjectWithId("A@WTTask");
+  track.deleteObjectWithId("A@WTTask");
+  track.deleteObjectWithId({});
+  EXPECT_EQ(compact(track.dictionary()), R"({"i":{},"u":{"A@WTTask":{"name":"a"}},"x":["A@WTTask"]})");
+  EXPECT_TRUE(track.isPendingDeletion("A@WTTask"));
+  track.updateValues({{"name", "b"}}, "A@WTTask");
+  EXPECT_FALSE(track.isPendingDeletion("A@WTTask"));
+  // A value that is not journaled still leaves an entry behind; a cleared one is journaled as null.
+  track.updateValues({{"items", QVariant::fromValue(WTUnorderedRelationship{})}}, "B@WTTask");
+  EXPECT_TRUE(track.entries(Section::Updated).contains("B@WTTask"));
+  EXPECT_TRUE(track.entry(Section::Updated, "B@WTTask").isEmpty());
+  track.updateValues({{"rate", QVariant::fromValue(*Decimal::fromString(u"5"))}}, "C@WTTask");
+  track.updateValues({{"rate", QVariant()}}, "C@WTTask");
+  EXPECT_EQ(compact(track.entry(Section::Updated, "C@WTTask")), R"({"rate":null})");
+  EXPECT_TRUE(track.hasChanges());
+  track.resetChanges();
+  EXPECT_FALSE(track.hasChanges());
+}
+
+TEST(RZSyncTrackSections, LogLines) {
+  LogCapture log;
+  RZSyncTrack track;
+  track.insertValues({{"name", "Design"}}, "A@WTTask");
+  track.deleteObjectWithId("A@WTTask");
+  EXPECT_TRUE(log.contains(QStringLiteral("INSERT(A@WTTask) {\"name\":\"Design\"}")))
+      << log.lines.join('\n').toStdString();
+  EXPECT_TRUE(log.contains(QStringLiteral("DELETE(A@WTTask)")));
+}
+
+// A confirmed save forgets what it carried and nothing the user did while it was on its way.
+TEST(RZSyncTrackSections, ConfirmedSaveForgetsOnlyWhatItSentUnchanged) {
+  RZSyncTrack track;
+  track.insertValues({{"name", "new"}, {"rate", QVariant::fromValue(dec("12.3"))}}, "N@WTTask");
+  track.updateValues({{"name", "kept"}, {"notes", "old"}}, "U@WTTask");
+  track.updateValues({{"name", "sent"}}, "E@WTTask");
+  track.deleteObjectWithId("D@WTNote");
+  const QVariantMap sent = track.dictionary();
+
+  // Edits while the request is in flight.
+  track.updateValues({{"rate", QVariant::fromValue(dec("12.30"))}}, "N@WTTask");  // same value, other text
+  track.updateValues({{"notes", "newer"}, {"archived", true}}, "U@WTTask");
+  track.deleteObjectWithId("L@WTNote");
+  track.removeSentChanges(sent);
+
+  EXPECT_EQ(
+      compact(track.dictionary()),
+      R"({"i":{},"u":{"N@WTTask":{"rate":12.30},"U@WTTask":{"archived":true,"notes":"newer"}},"x":["L@WTNote"]})");
+}
+
+TEST(RZSyncTrackSections, ConfirmedSaveWithoutEditsEmptiesTheJournal) {
+  RZSyncTrack track;
+  track.insertValues({{"name", "new"}}, "N@WTTask");
+  track.updateValues({{"items", QVariant::fromValue(WTUnorderedRelationship{})}}, "E@WTTask");
+  track.deleteObjectWithId("D@WTNote");
+  track.removeSentChanges(track.dictionary());
+  EXPECT_FALSE(track.hasChanges());
+}
+
+// The journal as saves of a real context fill it.
+class RZSyncTrackContextTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    auto store = WTStore::open(dir.filePath(QStringLiteral("Tessal.sqlite")));
+    ASSERT_TRUE(store.ok());
+    ASSERT_TRUE(context.attachStore(std::move(store.value())).ok());
+    context.setChangeJournal(&track);
+  }
+  void save() { ASSERT_TRUE(context.save().ok()); }
+
+  QTemporaryDir dir;
+  WTObjectContext context;
+  RZSyncTrack track;
+};
+
+TEST_F(RZSyncTrackContextTest, SavesReportInsertionsUpdatesAndDeletions) {
+  auto* project = context.insertNewObject<WTProject>();
+  project->setName(QStringLiteral("Site"));
+  project->setClient(context.insertNewObject<WTClient>());
+  auto* task = context.insertNewObject<WTTask>();
+  task->setProject(project);
+  task->setName(QStringLiteral("Draft"));
+  task->setName(QStringLiteral("Design"));  // changed before the save: still one insertion
+  task->setBudget(dec("120.50"));
+  auto* expense = context.insertNewObject<WTExpense>();
+  expense->setTask(task);
+  expense->setStartDate(Date::fromSeconds(1700000000.5));
+  expense->setExpense(dec("12.30"));
+  save();
+
+  const QVariantMap taskEntry = track.entry(Section::Inserted, task->uuid());
+  EXPECT_EQ(taskEntry.value("name"), "Design");
+  EXPECT_EQ(taskEntry.value("project"), project->uuid());
+  EXPECT_EQ(taskEntry.value("uuid"), task->uuid());
+  EXPECT_EQ(compact(taskEntry.value("budget")), "120.50");
+  EXPECT_FALSE(taskEntry.contains("items"));  // the unordered side is not journaled
+  const QVariantMap expenseEntry = track.entry(Section::Inserted, expense->uuid());
+  EXPECT_EQ(compact(expenseEntry.value("startDate")), "1700000000");
+  EXPECT_EQ(compact(expenseEntry.value("expense")), "12.30");
+  EXPECT_EQ(compact(track.entry(Section::Inserted, project->uuid()).value("tasks")),
+            QString("[\"%1\"]").arg(task->uuid()));
+  EXPECT_TRUE(track.entries(Section::Updated).isEmpty());
+
+  track.resetChanges();
+  auto* second = context.insertNewObject<WTTask>();
+  second->setProject(project);
+  project->moveTask(second, 0);
+  expense->setExpense(dec("7.05"));
+  save();
+  EXPECT_EQ(compact(track.entry(Section::Updated, project->uuid()).value("tasks")),
+            QString("[\"%1\",\"%2\"]").arg(second->uuid(), task->uuid()));
+  EXPECT_EQ(compact(track.entry(Section::Updated, expense->uuid())), R"({"expense":7.05})");
+
+  // Cleared values go out as null, so the other devices clear them too.
+  track.resetChanges();
+  task->setBudget(std::nullopt);
+  project->setClient(nullptr);
+  expense->setNotes(QStringLiteral("n"));
+  save();
+  EXPECT_EQ(compact(track.entry(Section::Updated, task->uuid())), R"({"budget":null})");
+  EXPECT_EQ(compact(track.entry(Section::Updated, project->uuid())), R"({"client":null})");
+
+  track.resetChanges();
+  const QString expenseId = expense->uuid();
+  context.deleteObject(expense);
+  save();
+  EXPECT_EQ(track.deletedIds(), QStringList{expenseId});
+  // The task saw its items change: an entry, but no key for the unordered side.
+  EXPECT_TRUE(track.entries(Section::Updated).contains(task->uuid()));
+  EXPECT_FALSE(track.entry(Section::Updated, task->uuid()).contains("items"));
+}

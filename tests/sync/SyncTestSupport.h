@@ -1,0 +1,396 @@
+#pragma once
+
+// Real parts for the sync tests: an HTTP server on 127.0.0.1 inside the test (answers are scripted per
+// test), a client made of a real store file, context and sync manager in a temp folder, and the real
+// tessal-sync-server process.
+#include "RZSyncErrorPresenter.h"
+#include "RZSyncJSON.h"
+#include "RZSyncManager.h"
+#include "UserDefaults.h"
+#include "WTObjectContext.h"
+#include "WTStore.h"
+
+#include <gtest/gtest.h>
+
+#include <QCoreApplication>
+#include <QDeadlineTimer>
+#include <QFileInfo>
+#include <QPointer>
+#include <QProcess>
+#include <QTcpServer>
+#include <QTcpSocket>
+#include <QTemporaryDir>
+#include <QTest>
+#include <QTimer>
+
+#include <sys/prctl.h>
+#include <algorithm>
+#include <csignal>
+#include <functional>
+#include <memory>
+
+namespace synctest {
+
+// Runs the event loop until `done` holds or `ms` pass; returns `done()`. Looks again after every batch
+// of events (QTest::qWaitFor sleeps between looks, which adds up over a long simulation).
+inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
+  const QDeadlineTimer deadline(ms);
+  QTimer wake;  // no batch of events ever waits longer than this
+  wake.start(20);
+  while (!done()) {
+    if (deadline.hasExpired()) return false;
+    QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents);
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+  }
+  return true;
+}
+
+// Collects the log lines written while it lives (and still lets them through to the previous handler).
+class LogCapture {
+ public:
+  LogCapture() {
+    current() = this;
+    previous_ =
+        qInstallMessageHandler([](QtMsgType type, const QMessageLogContext& context, const QString& text) {
+          current()->lines.append(text);
+          if (current()->previous_ && type != QtDebugMsg) current()->previous_(type, context, text);
+        });
+  }
+  ~LogCapture() {
+    qInstallMessageHandler(previous_);
+    current() = nullptr;
+  }
+  bool contains(const QString& text) const {
+    return std::any_of(lines.begin(), lines.end(), [&](const QString& line) { return line.contains(text); });
+  }
+  qsizetype count(const QString& text) const {
+    return std::count_if(lines.begin(), lines.end(),
+                         [&](const QString& line) { return line.contains(text); });
+  }
+  QStringList lines;
+
+ private:
+  static LogCapture*& current() {
+    static LogCapture* capture = nullptr;
+    return capture;
+  }
+  QtMessageHandler previous_ = nullptr;
+};
+
+// One HTTP request as the test server received it.
+struct HttpRequest {
+  QByteArray method;
+  QByteArray path;
+  QMap<QByteArray, QByteArray> headers;  // names in lower case
+  QByteArray body;
+  QVariantMap json() const { return RZSyncJSON::parse(body).value_or(QVariant()).toMap(); }
+};
+
+// An HTTP/1.1 server on the main thread's event loop. Every request is recorded and answered with the
+// raw bytes the handler returns; an empty answer holds the request (the client keeps waiting) until
+// answerHeld() answers it.
+class LoopbackHttpServer {
+ public:
+  using Handler = std::function<QByteArray(const HttpRequest&)>;
+
+  LoopbackHttpServer() {
+    EXPECT_TRUE(server_.listen(QHostAddress::LocalHost, 0));
+    QObject::connect(&server_, &QTcpServer::newConnection, [this] {
+      while (QTcpSocket* socket = server_.nextPendingConnection()) {
+        QObject::connect(socket, &QTcpSocket::readyRead, socket, [this, socket] { read(socket); });
+        QObject::connect(socket, &QTcpSocket::disconnected, socket, &QObject::deleteLater);
+      }
+    });
+  }
+
+  QUrl url(const QString& path = QString::fromLatin1(RZSyncManager::kEndpointPath)) const {
+    return QUrl(QStringLiteral("http://127.0.0.1:%1%2").arg(server_.serverPort()).arg(path));
+  }
+  QString address() const { return QStringLiteral("http://127.0.0.1:%1").arg(server_.serverPort()); }
+
+  Handler handler = [](const HttpRequest&) { return json(QVariantMap{}); };
+  QList<HttpRequest> requests;
+
+  bool hasHeld() const { return !held_.isEmpty(); }
+  // Answers the oldest held request; false when none is held (or its client gave up).
+  bool answerHeld(const QByteArray& answer) {
+    if (held_.isEmpty()) return false;
+    QPointer<QTcpSocket> socket = held_.takeFirst();
+    if (!socket) return false;
+    reply(socket, answer);
+    return true;
+  }
+  // Closes the oldest held request's connection without an answer.
+  void dropHeld() {
+    if (held_.isEmpty()) return;
+    if (QPointer<QTcpSocket> socket = held_.takeFirst()) socket->abort();
+  }
+
+  // A complete response with a JSON body.
+  static QByteArray json(const QVariant& value, int status = 200) {
+    return raw(RZSyncJSON::write(value, RZSyncJSON::Style::Compact), status);
+  }
+  static QByteArray raw(const QByteArray& body, int status = 200, const QByteArray& type = "application/json",
+                        const QByteArray& extraHeaders = {}) {
+    return "HTTP/1.1 " + QByteArray::number(status) + " X\r\nContent-Type: " + type +
+           "\r\nContent-Length: " + QByteArray::number(body.size()) + "\r\nConnection: close\r\n" +
+           extraHeaders + "\r\n" + body;
+  }
+
+ private:
+  void read(QTcpSocket* socket) {
+    QByteArray& buffer = buffers_[socket];
+    buffer += socket->readAll();
+    const qsizetype end = buffer.indexOf("\r\n\r\n");
+    if (end < 0) return;
+    HttpRequest request;
+    const QList<QByteArray> lines = buffer.left(end).split('\n');
+    const QList<QByteArray> first = lines.value(0).trimmed().split(' ');
+    request.method = first.value(0);
+    request.path = first.value(1);
+    for (qsizetype i = 1; i < lines.size(); ++i) {
+      const qsizetype colon = lines[i].indexOf(':');
+      if (colon > 0)
+        request.headers.insert(lines[i].left(colon).trimmed().toLower(), lines[i].mid(colon + 1).trimmed());
+    }
+    const qsizetype length = request.headers.value("content-length").toLongLong();
+    if (buffer.size() < end + 4 + length) return;
+    request.body = buffer.mid(end + 4, length);
+    buffer.remove(0, end + 4 + length);
+    requests.append(request);
+    const QByteArray answer = handler(request);
+    if (answer.isEmpty()) {
+      held_.append(socket);
+      return;
+    }
+    reply(socket, answer);
+  }
+
+  static void reply(QTcpSocket* socket, const QByteArray& answer) {
+    socket->write(answer);
+    socket->flush();
+    socket->disconnectFromHost();
+  }
+
+  QTcpServer server_;
+  QHash<QTcpSocket*, QByteArray> buffers_;
+  QList<QPointer<QTcpSocket>> held_;
+};
+
+// Remembers what the manager presented to the user.
+class RecordingPresenter final : public RZSyncErrorPresenter {
+ public:
+  void presentSyncError(const QString& message) override { syncErrors.append(message); }
+  void presentNetworkError(const QString& message) override { networkErrors.append(message); }
+  QStringList syncErrors;
+  QStringList networkErrors;
+};
+
+// Answers the credentials the way the application delegate does, from the user defaults.
+class DefaultsCredentials final : public RZSyncNetworkCredentialDelegate {
+ public:
+  explicit DefaultsCredentials(UserDefaults& defaults) : defaults_(defaults) {}
+  QString syncNetworkRequestsUser(RZSyncNetwork*) override {
+    return defaults_.stringForKey(QStringLiteral("WTSyncUser"));
+  }
+  QString syncNetworkRequestsPassword(RZSyncNetwork*) override {
+    return defaults_.stringForKey(QStringLiteral("WTSyncPassword"));
+  }
+
+ private:
+  UserDefaults& defaults_;
+};
+
+// One installation: its own folder with settings, store file and journal, and a sync manager over them.
+// The manager is made with syncing off; tests drive it with sync() or enableSync().
+class SyncClient {
+ public:
+  SyncClient(const QString& server, const QString& user = QStringLiteral("ann@example.org"),
+             const QString& password = QStringLiteral("secret-password")) {
+    EXPECT_TRUE(dir.isValid());
+    defaults = std::make_unique<UserDefaults>(dir.filePath(QStringLiteral("settings.conf")));
+    defaults->setValue(QStringLiteral("WTSyncServer"), server);
+    defaults->setValue(QStringLiteral("WTSyncUser"), user);
+    defaults->setValue(QStringLiteral("WTSyncPassword"), password);
+    credentials = std::make_unique<DefaultsCredentials>(*defaults);
+    open();
+  }
+  ~SyncClient() { close(); }
+
+  void open() {
+    context = std::make_unique<WTObjectContext>(defaults.get());
+    auto store = WTStore::open(dir.filePath(QStringLiteral("Tessal.sqlite")));
+    EXPECT_TRUE(store.ok()) << store.error().message.toStdString();
+    if (store.ok()) {
+      EXPECT_TRUE(context->attachStore(std::move(store.value())).ok());
+    }
+    manager = std::make_unique<RZSyncManager>(context.get(), journalPath());
+    manager->syncNetwork()->setCredentialDelegate(credentials.get());
+    manager->setErrorPresenter(&presenter);
+  }
+  // Drops manager and context as quitting does (nothing unsaved is saved).
+  void close() {
+    manager.reset();
+    context.reset();
+  }
+  void reopen() {
+    close();
+    open();
+  }
+
+  QString journalPath() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
+  RZSyncTrack& track() const { return *manager->syncTrack(); }
+  RZSyncNetwork& network() const { return *manager->syncNetwork(); }
+  bool idle() const { return network().networkAction() == RZSyncNetwork::Idle; }
+
+  void save() {
+    const Result<void> saved = context->save();
+    EXPECT_TRUE(saved.ok()) << saved.error().message.toStdString();
+  }
+
+  // One poll, waiting for it and for any save it sends; false when it did not finish in time.
+  bool syncOnce(int ms = 10000) {
+    manager->sync();
+    return waitUntil([this] { return idle(); }, ms);
+  }
+
+  template <class T>
+  T* find(const QString& uuid) const {
+    return dynamic_cast<T*>(context->objectWithUUID(uuid, false));
+  }
+
+  QTemporaryDir dir;
+  std::unique_ptr<UserDefaults> defaults;
+  std::unique_ptr<DefaultsCredentials> credentials;
+  std::unique_ptr<WTObjectContext> context;
+  std::unique_ptr<RZSyncManager> manager;
+  RecordingPresenter presenter;
+};
+
+// A stored value by key; an item answers "rate" with its task's rate, so the stored one is read directly.
+inline QVariant storedValue(const WTObject* object, const QString& key) {
+  if (key == QLatin1String("rate")) {
+    const std::optional<Decimal> rate = object->storedRate();
+    return rate ? QVariant::fromValue(*rate) : QVariant();
+  }
+  return object->valueForKey(key);
+}
+
+// Every record of a store as text: uuid -> its stored values in journal form (so dates in whole seconds
+// and money as written), a project's task order included. Two stores in step give equal snapshots.
+inline QMap<QString, QString> snapshot(WTObjectContext& context) {
+  QMap<QString, QString> records;
+  for (WTObject* object :
+       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>())) {
+    QVariantMap values;
+    QStringList keys = object->storedKeys();
+    if (object->entity() == WTEntity::Project) keys << QStringLiteral("tasks");
+    for (const QString& key : keys) {
+      QVariant value = storedValue(object, key);
+      if (key == QLatin1String("tasks")) {
+        QVariantList uuids;
+        for (const QVariant& task : value.toList())
+          uuids.append(RZSyncTrack::transformedValue(task).value_or(QVariant()));
+        value = uuids;
+      }
+      values.insert(key, RZSyncTrack::transformedValue(value).value_or(QVariant()));
+    }
+    records.insert(object->uuid(), QString::fromUtf8(RZSyncJSON::write(values, RZSyncJSON::Style::Compact)));
+  }
+  return records;
+}
+
+// Where two snapshots differ, for failure messages.
+inline std::string snapshotDifference(const QMap<QString, QString>& a, const QMap<QString, QString>& b) {
+  std::string out;
+  int shown = 0;
+  QSet<QString> keys;
+  for (const QString& key : a.keys()) keys.insert(key);
+  for (const QString& key : b.keys()) keys.insert(key);
+  QStringList sorted(keys.begin(), keys.end());
+  sorted.sort();
+  for (const QString& key : sorted) {
+    if (a.value(key) == b.value(key)) continue;
+    if (++shown > 8) break;
+    out += key.toStdString() + "\n  " + a.value(key, "(none)").toStdString() + "\n  " +
+           b.value(key, "(none)").toStdString() + "\n";
+  }
+  return out;
+}
+
+// The real tessal-sync-server, run as its own process on 127.0.0.1 with a SQLite file in a temp folder.
+class SyncServerProcess {
+ public:
+  static QString executable() {
+#ifdef TESSAL_SYNC_SERVER_EXE
+    return QString::fromUtf8(TESSAL_SYNC_SERVER_EXE);
+#else
+    return {};
+#endif
+  }
+  static bool available() {
+    return !executable().isEmpty() && QFileInfo::exists(executable());
+  }
+
+  SyncServerProcess() {
+    EXPECT_TRUE(dir.isValid());
+  }
+  ~SyncServerProcess() {
+    stop();
+  }
+
+  QString database() const {
+    return dir.filePath(QStringLiteral("sync.sqlite"));
+  }
+
+  bool addUser(const QString& email, const QString& password) {
+    QProcess process;
+    process.start(executable(), {QStringLiteral("add-user"), email, QStringLiteral("--db"), database()});
+    if (!process.waitForStarted()) return false;
+    process.write(password.toUtf8() + '\n');
+    process.closeWriteChannel();
+    return process.waitForFinished(30000) && process.exitCode() == 0;
+  }
+
+  // Starts serving; the first start picks a free port, later ones take the same port again.
+  bool start() {
+    process_ = std::make_unique<QProcess>();
+    process_->setProcessChannelMode(QProcess::ForwardedErrorChannel);
+    // The server goes when the test process goes, even when it dies.
+    process_->setChildProcessModifier([] { ::prctl(PR_SET_PDEATHSIG, SIGTERM); });
+    const QString listen = QStringLiteral("127.0.0.1:%1").arg(port_);
+    process_->start(executable(), {QStringLiteral("serve"), QStringLiteral("--listen"), listen,
+                                   QStringLiteral("--db"), database()});
+    if (!process_->waitForStarted()) return false;
+    QByteArray out;
+    QDeadlineTimer deadline(20000);
+    while (!out.contains('\n') && !deadline.hasExpired()) {
+      if (!process_->waitForReadyRead(int(deadline.remainingTime()))) break;
+      out += process_->readAllStandardOutput();
+    }
+    const qsizetype colon = out.lastIndexOf(':');
+    if (!out.contains("listening on") || colon < 0) return false;
+    port_ = out.mid(colon + 1).trimmed().toInt();
+    return port_ > 0;
+  }
+
+  void stop() {
+    if (!process_) return;
+    process_->terminate();
+    if (!process_->waitForFinished(10000)) process_->kill();
+    process_->waitForFinished(5000);
+    process_.reset();
+  }
+
+  QString address() const {
+    return QStringLiteral("http://127.0.0.1:%1").arg(port_);
+  }
+
+  QTemporaryDir dir;
+
+ private:
+  std::unique_ptr<QProcess> process_;
+  int port_ = 0;
+};
+
+}  // namespace synctest
