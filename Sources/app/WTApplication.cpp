@@ -3,6 +3,7 @@
 #include "UserDefaults.h"
 #include "WTAppDelegate.h"
 #include "WTDialogAlertPresenter.h"
+#include "WTImages.h"
 #include "WTMainWindowController.h"
 
 WTApplication::WTApplication(int& argc, char** argv)
@@ -12,6 +13,7 @@ WTApplication::WTApplication(int& argc, char** argv)
   setApplicationName(QStringLiteral("Tessal"));
   setOrganizationName(QStringLiteral("Tessal"));
   setDesktopFileName(QStringLiteral("tessal"));
+  setWindowIcon(WTImages::icon(QStringLiteral("tessal")));
   registerDefaults(*defaults_);
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);
@@ -23,8 +25,8 @@ WTApplication::~WTApplication() {
 }
 
 void WTApplication::registerDefaults(UserDefaults& defaults) {
-  defaults.registerDefaults({{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")},
-                             {QStringLiteral("WTIdleTime"), 5}});
+  defaults.registerDefaults(
+      {{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")}, {QStringLiteral("WTIdleTime"), 5}});
 }
 
 WTMainWindowController* WTApplication::mainWindowController() {
@@ -35,11 +37,15 @@ WTMainWindowController* WTApplication::mainWindowController() {
   return mainWindowController_.get();
 }
 
-QMainWindow* WTApplication::mainWindow() { return mainWindowController(); }
+QMainWindow* WTApplication::mainWindow() {
+  return mainWindowController();
+}
 
 void WTApplication::applicationDidFinishLaunching() {
-  QMainWindow* window = mainWindow();
-  window->show();
-  window->raise();
-  window->activateWindow();
+  mainWindowController()->bringToFront();
+}
+
+bool WTApplication::applicationShouldHandleReopen(bool) {
+  mainWindowController()->bringToFront();
+  return true;
 }

@@ -29,6 +29,8 @@ class WTApplication : public QApplication {
 
   // Launch: brings the main window forward, which opens the store through the delegate.
   void applicationDidFinishLaunching();
+  // Re-open (another launch while running): brings the main window forward; always handled.
+  bool applicationShouldHandleReopen(bool hasVisibleWindows);
 
  private:
   std::unique_ptr<UserDefaults> defaults_;

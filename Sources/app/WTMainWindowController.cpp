@@ -1,58 +1,207 @@
 #include "WTMainWindowController.h"
 
-#include "DurationText.h"
-#include "MoneyFormat.h"
+#include "RZDate.h"
+#include "UserDefaults.h"
 #include "WTAppDelegate.h"
+#include "WTClientsViewController.h"
+#include "WTImages.h"
+#include "WTItemsViewController.h"
+#include "WTNavigationController.h"
+#include "WTObject.h"
 #include "WTObjectContext.h"
+#include "WTObjectListModel.h"
 #include "WTProject.h"
+#include "WTProjectsViewController.h"
 #include "WTTask.h"
 
+#include <QAction>
+#include <QActionGroup>
 #include <QApplication>
 #include <QCloseEvent>
-#include <QHeaderView>
 #include <QMenuBar>
-#include <QTreeWidget>
-
-#include <algorithm>
+#include <QToolBar>
+#include <QVBoxLayout>
 
 WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget* parent)
-    : QMainWindow(parent), delegate_(delegate), list_(new QTreeWidget(this)) {
+    : QMainWindow(parent), delegate_(delegate) {
   setWindowTitle(QStringLiteral("Tessal"));
-  list_->setColumnCount(3);
-  list_->setHeaderLabels({tr("Name"), tr("Duration"), tr("Cost")});
-  list_->header()->setSectionResizeMode(0, QHeaderView::Stretch);
-  list_->header()->setStretchLastSection(false);
-  list_->headerItem()->setTextAlignment(1, Qt::AlignRight | Qt::AlignVCenter);
-  list_->headerItem()->setTextAlignment(2, Qt::AlignRight | Qt::AlignVCenter);
-  list_->setUniformRowHeights(true);
-  list_->setAlternatingRowColors(true);
-  list_->setRootIsDecorated(true);
-  setCentralWidget(list_);
-  resize(720, 480);
+  setWindowIcon(WTImages::icon(QStringLiteral("tessal")));
+  setObjectName(QStringLiteral("MainWindow"));
+  resize(960, 640);
+  setMinimumSize(640, 360);
+
+  WTObjectContext* context = delegate_.managedObjectContext();
+  if (UserDefaults* defaults = context->userDefaults()) registerDefaults(*defaults);
+  // Commits an edit in progress before a save on quitting.
+  delegate_.setCommitEditingHandler([] {
+    if (QWidget* focus = QApplication::focusWidget()) focus->clearFocus();
+    return true;
+  });
+
+  projectsNavigationController_ = new WTNavigationController(this);
+  clientsNavigationController_ = new WTNavigationController(this);
+  projectsViewController_ = new WTProjectsViewController(context, this);
+  clientsViewController_ = new WTClientsViewController(context, this);
+  projectsViewController_->setArchivedPredicate(delegate_.archivedPredicate());
+  clientsViewController_->setArchivedPredicate(delegate_.archivedPredicate());
+  connect(&delegate_, &WTAppDelegate::archivedPredicateChanged, this, [this] {
+    projectsViewController_->setArchivedPredicate(delegate_.archivedPredicate());
+    clientsViewController_->setArchivedPredicate(delegate_.archivedPredicate());
+  });
+
+  contentView_ = new QWidget(this);
+  contentView_->setObjectName(QStringLiteral("contentView"));
+  auto* layout = new QVBoxLayout(contentView_);
+  layout->setContentsMargins(0, 0, 0, 0);
+  setCentralWidget(contentView_);
+
+  validation_.setSingleShot(true);
+  validation_.setInterval(0);
+  connect(&validation_, &QTimer::timeout, this, &WTMainWindowController::validateToolbarItems);
+  buildActions();
+
+  // As the window loads: first-run data, both roots pushed, the projects shown.
+  populate();
+  // The lists show what the first run made from the first paint on, not a turn later.
+  projectsViewController_->arrayController()->rearrangeObjects();
+  setSelectedToolbarItemIdentifier(QStringLiteral("projects"));
+  projectsNavigationController_->pushViewController(projectsViewController_);
+  clientsNavigationController_->pushViewController(clientsViewController_);
+  showProjects();
+
+  watch(projectsViewController_);
+  watch(clientsViewController_);
+  for (WTNavigationController* stack : {projectsNavigationController_, clientsNavigationController_}) {
+    connect(stack, &WTNavigationController::topViewControllerChanged, this, [this, stack] {
+      if (WTViewController* top = stack->topViewController()) watch(top);
+      scheduleValidation();
+    });
+  }
+  connect(context, &WTObjectContext::objectsDidChange, this, &WTMainWindowController::scheduleValidation);
+  validateToolbarItems();
+}
+
+WTMainWindowController::~WTMainWindowController() {
+  // The stacks go first: their views hold the controllers' views.
+  delete projectsNavigationController_;
+  delete clientsNavigationController_;
+}
+
+void WTMainWindowController::registerDefaults(UserDefaults& defaults) {
+  const Date now = Date::now();
+  defaults.registerDefaults(
+      {{QStringLiteral("WTCustomRangeBegin"), QVariant::fromValue(RZDate::addMonth(now, -1))},
+       {QStringLiteral("WTCustomRangeEnd"), QVariant::fromValue(now)}});
+}
+
+void WTMainWindowController::watch(WTViewController* controller) {
+  // Connected once per controller, however often it is pushed.
+  connect(controller, &WTViewController::validationChanged, this, &WTMainWindowController::scheduleValidation,
+          Qt::UniqueConnection);
+  if (auto* items = qobject_cast<WTItemsViewController*>(controller)) {
+    connect(items, &WTItemsViewController::backRequested, this, &WTMainWindowController::goBack,
+            Qt::UniqueConnection);
+  }
+}
+
+void WTMainWindowController::buildActions() {
+  auto make = [this](const QString& identifier, const QString& title, const QString& image,
+                     const QKeySequence& shortcut, void (WTMainWindowController::*slot)()) {
+    auto* action = new QAction(title, this);
+    action->setObjectName(identifier);
+    if (!image.isEmpty()) action->setIcon(WTImages::icon(image));
+    if (!shortcut.isEmpty()) action->setShortcut(shortcut);
+    if (slot) connect(action, &QAction::triggered, this, slot);
+    actions_.append(action);
+    return action;
+  };
+  QAction* projects = make(QStringLiteral("projects"), tr("Projects"), QStringLiteral("tb_projects"),
+                           QKeySequence(Qt::CTRL | Qt::Key_1), &WTMainWindowController::showProjects);
+  QAction* clients = make(QStringLiteral("clients"), tr("Clients"), QStringLiteral("tb_clients"),
+                          QKeySequence(Qt::CTRL | Qt::Key_2), &WTMainWindowController::showClients);
+  for (QAction* action : {projects, clients}) action->setCheckable(true);
+  stackGroup_ = new QActionGroup(this);
+  stackGroup_->addAction(projects);
+  stackGroup_->addAction(clients);
+  QAction* add = make(QStringLiteral("add"), tr("Add"), QStringLiteral("tb_add"), QKeySequence::New,
+                      &WTMainWindowController::addObject);
+  QAction* remove = make(QStringLiteral("remove"), tr("Remove"), QStringLiteral("tb_remove"),
+                         QKeySequence::Delete, &WTMainWindowController::removeSelectedObjects);
+  QAction* archive = make(QStringLiteral("archive"), tr("Archive"), QStringLiteral("tb_archive"),
+                          QKeySequence(Qt::CTRL | Qt::Key_E), &WTMainWindowController::toggleArchive);
+  QAction* report = make(QStringLiteral("report"), tr("Report"), QStringLiteral("tb_report"),
+                         QKeySequence(Qt::CTRL | Qt::Key_R), &WTMainWindowController::report);
+  QAction* timer = make(QStringLiteral("toggleTimer"), tr("Start/Stop Timer"), QStringLiteral("StopWatch"),
+                        QKeySequence(Qt::CTRL | Qt::Key_T), &WTMainWindowController::toggleTimer);
+  QAction* back = make(QStringLiteral("back"), tr("Back"), QStringLiteral("back"), QKeySequence::Back,
+                       &WTMainWindowController::goBack);
+  QAction* showArchived = make(QStringLiteral("showArchived"), tr("Show Archived"), QString(),
+                               QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_A), nullptr);
+  showArchived->setCheckable(true);
+  showArchived->setChecked(delegate_.displayArchived());
+  connect(showArchived, &QAction::triggered, this, [this] { delegate_.toggleArchived(); });
+  connect(&delegate_, &WTAppDelegate::archivedPredicateChanged, showArchived,
+          [this, showArchived] { showArchived->setChecked(delegate_.displayArchived()); });
+
+  toolbar_ = addToolBar(tr("Toolbar"));
+  toolbar_->setObjectName(QStringLiteral("toolbar"));
+  toolbar_->setMovable(false);
+  toolbar_->setFloatable(false);
+  toolbar_->setIconSize(QSize(28, 28));
+  toolbar_->setToolButtonStyle(Qt::ToolButtonTextUnderIcon);
+  toolbar_->setContextMenuPolicy(Qt::PreventContextMenu);
+  toolbar_->addAction(projects);
+  toolbar_->addAction(clients);
+  toolbar_->addSeparator();
+  toolbar_->addAction(add);
+  toolbar_->addAction(remove);
+  auto* spacer = new QWidget(toolbar_);
+  spacer->setSizePolicy(QSizePolicy::Expanding, QSizePolicy::Preferred);
+  toolbar_->addWidget(spacer);
+  toolbar_->addAction(archive);
+  toolbar_->addAction(report);
 
   QMenu* file = menuBar()->addMenu(tr("&File"));
+  file->addAction(add);
+  file->addSeparator();
   file->addAction(tr("&Save"), QKeySequence::Save, [this] { delegate_.saveAction(); });
   file->addSeparator();
   file->addAction(tr("&Quit"), QKeySequence::Quit, this, &QWidget::close);
 
   QMenu* edit = menuBar()->addMenu(tr("&Edit"));
-  edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
+  QAction* undo = edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
+    if (QWidget* focus = QApplication::focusWidget()) focus->clearFocus();
     delegate_.managedObjectContext()->undoManager().undo();
   });
-  edit->addAction(tr("&Redo"), QKeySequence::Redo, [this] {
-    delegate_.managedObjectContext()->undoManager().redo();
+  undo->setObjectName(QStringLiteral("undo"));
+  QAction* redo = edit->addAction(tr("&Redo"), QKeySequence::Redo,
+                                  [this] { delegate_.managedObjectContext()->undoManager().redo(); });
+  redo->setObjectName(QStringLiteral("redo"));
+  connect(edit, &QMenu::aboutToShow, this, [this, undo, redo] {
+    WTUndoManager& manager = delegate_.managedObjectContext()->undoManager();
+    undo->setEnabled(manager.canUndo());
+    redo->setEnabled(manager.canRedo());
   });
+  connect(edit, &QMenu::aboutToHide, this, [undo, redo] {
+    // Shortcuts stay live; an empty stack simply does nothing.
+    undo->setEnabled(true);
+    redo->setEnabled(true);
+  });
+  edit->addSeparator();
+  edit->addAction(remove);
 
-  // Many changes in one turn refill the list once.
-  reload_.setSingleShot(true);
-  reload_.setInterval(0);
-  connect(&reload_, &QTimer::timeout, this, &WTMainWindowController::reloadData);
+  QMenu* view = menuBar()->addMenu(tr("&View"));
+  view->addAction(projects);
+  view->addAction(clients);
+  view->addAction(back);
+  view->addSeparator();
+  view->addAction(showArchived);
 
-  WTObjectContext* context = delegate_.managedObjectContext();
-  populate();
-  connect(context, &WTObjectContext::objectValueDidChange, &reload_, qOverload<>(&QTimer::start));
-  connect(context, &WTObjectContext::objectsDidChange, &reload_, qOverload<>(&QTimer::start));
-  reloadData();
+  QMenu* record = menuBar()->addMenu(tr("&Record"));
+  record->addAction(archive);
+  record->addAction(report);
+  record->addSeparator();
+  record->addAction(timer);
 }
 
 QList<WTProject*> WTMainWindowController::fetchProjects() const {
@@ -70,31 +219,135 @@ void WTMainWindowController::populate() {
   task->setProject(project);
 }
 
-void WTMainWindowController::reloadData() {
-  list_->clear();
-  QList<WTProject*> projects = fetchProjects();
-  std::sort(projects.begin(), projects.end(),
-            [](const WTProject* a, const WTProject* b) { return a->name().localeAwareCompare(b->name()) < 0; });
-  auto addRow = [](QTreeWidgetItem* row) {
-    for (int column : {1, 2}) row->setTextAlignment(column, Qt::AlignRight | Qt::AlignVCenter);
-    return row;
-  };
-  for (WTProject* project : projects) {
-    QTreeWidgetItem* projectRow = addRow(new QTreeWidgetItem(
-        list_, {project->name(), DurationText::stringWithMinutes(project->duration()), MoneyFormat::format(project->cost())}));
-    QFont bold = projectRow->font(0);
-    bold.setBold(true);
-    projectRow->setFont(0, bold);
-    for (WTTask* task : project->tasks()) {
-      addRow(new QTreeWidgetItem(projectRow, {task->name(), DurationText::stringWithMinutes(task->duration()),
-                                              MoneyFormat::format(task->cost())}));
+WTNavigationController* WTMainWindowController::currentNavigationController() const {
+  return projectsNavigationController_->view()->parentWidget() ? projectsNavigationController_
+                                                               : clientsNavigationController_;
+}
+
+void WTMainWindowController::showStack(WTNavigationController* stack, const QString& identifier) {
+  if (currentNavigationController() == stack && stack->view()->parentWidget()) return;
+  auto* layout = static_cast<QVBoxLayout*>(contentView_->layout());
+  // The content holds exactly one stack at a time; the other keeps its depth off screen.
+  while (QLayoutItem* item = layout->takeAt(0)) {
+    if (QWidget* widget = item->widget()) {
+      widget->hide();
+      widget->setParent(nullptr);
     }
+    delete item;
   }
-  list_->expandAll();
-  for (int column : {1, 2}) {
-    list_->resizeColumnToContents(column);
-    list_->setColumnWidth(column, std::max(110, list_->columnWidth(column) + 24));
+  QWidget* view = stack->view();
+  view->setParent(contentView_);
+  view->setGeometry(contentView_->rect());
+  layout->addWidget(view);
+  view->show();
+  setSelectedToolbarItemIdentifier(identifier);
+  if (WTViewController* top = stack->topViewController()) {
+    if (top->isViewLoaded()) top->view()->setFocus();
   }
+  scheduleValidation();
+}
+
+void WTMainWindowController::showProjects() {
+  showStack(projectsNavigationController_, QStringLiteral("projects"));
+}
+
+void WTMainWindowController::showClients() {
+  showStack(clientsNavigationController_, QStringLiteral("clients"));
+}
+
+void WTMainWindowController::setSelectedToolbarItemIdentifier(const QString& identifier) {
+  if (QAction* item = toolbarItem(identifier)) item->setChecked(true);
+}
+
+QString WTMainWindowController::selectedToolbarItemIdentifier() const {
+  QAction* checked = stackGroup_->checkedAction();
+  return checked ? checked->objectName() : QString();
+}
+
+QAction* WTMainWindowController::toolbarItem(const QString& identifier) const {
+  for (QAction* action : actions_) {
+    if (action->objectName() == identifier) return action;
+  }
+  return nullptr;
+}
+
+WTViewController* WTMainWindowController::topViewController() const {
+  const QList<WTViewController*>& controllers = currentNavigationController()->viewControllers();
+  return controllers.isEmpty() ? nullptr : controllers.first();
+}
+
+WTViewController* WTMainWindowController::lastViewController() const {
+  return currentNavigationController()->topViewController();
+}
+
+void WTMainWindowController::addObject() {
+  WTViewController* top = lastViewController();
+  if (top && top->respondsTo(WTViewController::Command::AddObject)) top->addObject();
+}
+
+void WTMainWindowController::removeSelectedObjects() {
+  WTViewController* top = lastViewController();
+  if (top && top->respondsTo(WTViewController::Command::RemoveSelectedObjects)) top->removeSelectedObjects();
+}
+
+void WTMainWindowController::toggleArchive() {
+  WTViewController* top = lastViewController();
+  if (top && top->respondsTo(WTViewController::Command::ToggleArchive)) top->toggleArchive();
+  scheduleValidation();
+}
+
+void WTMainWindowController::report() {
+  WTViewController* top = lastViewController();
+  if (top && top->respondsTo(WTViewController::Command::Report)) top->report();
+}
+
+void WTMainWindowController::toggleTimer() {
+  WTViewController* top = lastViewController();
+  if (top && top->respondsTo(WTViewController::Command::ToggleTimer)) top->toggleTimer();
+}
+
+void WTMainWindowController::goBack() {
+  WTNavigationController* stack = currentNavigationController();
+  if (stack->viewControllers().size() > 1) stack->popViewController();
+}
+
+bool WTMainWindowController::validateToolbarItem(QAction* item) {
+  using Command = WTViewController::Command;
+  WTViewController* top = lastViewController();
+  const QString identifier = item->objectName();
+  if (identifier == QLatin1String("archive")) {
+    if (!top || !top->respondsTo(Command::ToggleArchive)) return false;
+    if (!top->respondsTo(Command::SelectedObject)) return true;
+    const WTObject* selected = top->selectedObject();
+    item->setText(selected && selected->archived() ? tr("Unarchive") : tr("Archive"));
+    return true;
+  }
+  if (identifier == QLatin1String("report")) return top && top->respondsTo(Command::Report);
+  if (identifier == QLatin1String("toggleTimer")) return top && top->respondsTo(Command::ToggleTimer);
+  if (identifier == QLatin1String("back")) return currentNavigationController()->viewControllers().size() > 1;
+  return true;
+}
+
+void WTMainWindowController::validateToolbarItems() {
+  validation_.stop();
+  for (QAction* action : actions_) action->setEnabled(validateToolbarItem(action));
+}
+
+void WTMainWindowController::scheduleValidation() {
+  validation_.start();
+}
+
+void WTMainWindowController::saveLastSelectedProject(int index) {
+  if (UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults()) {
+    defaults->setValue(QStringLiteral("WTLastSelectedProject"), index);
+  }
+}
+
+void WTMainWindowController::bringToFront() {
+  if (isMinimized()) showNormal();
+  show();
+  raise();
+  activateWindow();
 }
 
 void WTMainWindowController::closeEvent(QCloseEvent* event) {

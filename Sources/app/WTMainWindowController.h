@@ -1,33 +1,100 @@
 #pragma once
 
+#include "WTViewController.h"
+
 #include <QList>
 #include <QMainWindow>
+#include <QPointer>
 #include <QTimer>
 
-class QTreeWidget;
+class QAction;
+class QActionGroup;
+class QToolBar;
+class UserDefaults;
 class WTAppDelegate;
+class WTClientsViewController;
+class WTNavigationController;
 class WTProject;
+class WTProjectsViewController;
 
-// The main window: for now a plain list of the projects with their tasks, durations and costs.
-class WTMainWindowController : public QMainWindow {
+// The main window: a toolbar and two navigation stacks, the projects (the projects list, then a
+// project's items outline on top of it) and the clients. It switches between the stacks, forwards
+// the toolbar's and menus' commands to the controller on top of the visible stack, enables and titles
+// the toolbar items after it, fills an empty store with a first project, and routes Undo and Redo to
+// the store.
+//
+// Toolbar items carry their identifier as object name: "projects", "clients", "add", "remove",
+// "archive", "report" (and "toggleTimer", "back", "showArchived" for menu-only commands).
+class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   Q_OBJECT
  public:
+  // Opens the store through the delegate (which must outlive the window), fills it on the first run,
+  // and shows the projects stack.
   explicit WTMainWindowController(WTAppDelegate& delegate, QWidget* parent = nullptr);
+  ~WTMainWindowController() override;
+
+  // Registers "WTCustomRangeBegin" (a month ago) and "WTCustomRangeEnd" (now); stored values win.
+  static void registerDefaults(UserDefaults& defaults);
 
   // The projects of the store (none when it could not be opened).
   QList<WTProject*> fetchProjects() const;
   // On the first run, with an empty store, makes "Default Project" with "Default Task". Saves nothing.
   void populate();
-  // Refills the list from the records.
-  void reloadData();
 
-  QTreeWidget* projectsList() const { return list_; }
+  // WTNavigationHost: the stack on screen, and switching stacks (nothing when already shown).
+  WTNavigationController* currentNavigationController() const override;
+  void showProjects() override;
+  void showClients() override;
+
+  // The root of the visible stack (deliberately not its top).
+  WTViewController* topViewController() const;
+  // Forwarded to the top controller of the visible stack when it implements them; dropped otherwise.
+  void addObject();
+  void removeSelectedObjects();
+  void toggleArchive();
+  void report();
+  void toggleTimer();
+  // Pops the visible stack, unless only its root is left.
+  void goBack();
+
+  // Enables (and for "archive" titles) one toolbar item after the top controller.
+  bool validateToolbarItem(QAction* item);
+  void validateToolbarItems();
+  QString selectedToolbarItemIdentifier() const;
+  QAction* toolbarItem(const QString& identifier) const;
+  QToolBar* toolbar() const { return toolbar_; }
+
+  // Stores the chosen index of a project pop-up as "WTLastSelectedProject".
+  void saveLastSelectedProject(int index);
+
+  // Brings the window forward and makes it active (launch and re-open).
+  void bringToFront();
+
+  WTProjectsViewController* projectsViewController() const { return projectsViewController_; }
+  WTClientsViewController* clientsViewController() const { return clientsViewController_; }
+  WTNavigationController* projectsNavigationController() const { return projectsNavigationController_; }
+  WTNavigationController* clientsNavigationController() const { return clientsNavigationController_; }
+  QWidget* contentView() const { return contentView_; }
 
  protected:
   void closeEvent(QCloseEvent* event) override;
 
  private:
+  void buildActions();
+  void showStack(WTNavigationController* stack, const QString& identifier);
+  void setSelectedToolbarItemIdentifier(const QString& identifier);
+  WTViewController* lastViewController() const;
+  void scheduleValidation();
+  void watch(WTViewController* controller);
+
   WTAppDelegate& delegate_;
-  QTreeWidget* list_;
-  QTimer reload_;
+  QWidget* contentView_ = nullptr;
+  WTProjectsViewController* projectsViewController_ = nullptr;
+  WTClientsViewController* clientsViewController_ = nullptr;
+  WTNavigationController* projectsNavigationController_ = nullptr;
+  WTNavigationController* clientsNavigationController_ = nullptr;
+  QToolBar* toolbar_ = nullptr;
+  QActionGroup* stackGroup_ = nullptr;
+  QList<QAction*> actions_;
+  QTimer validation_;
 };

@@ -3,9 +3,14 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
+#include "WTItemsModel.h"
+#include "WTItemsViewController.h"
 #include "WTMainWindowController.h"
+#include "WTNavigationController.h"
 #include "WTObjectContext.h"
+#include "WTObjectListModel.h"
 #include "WTProject.h"
+#include "WTProjectsViewController.h"
 #include "WTTask.h"
 
 #include <gtest/gtest.h>
@@ -14,7 +19,6 @@
 #include <QFile>
 #include <QTemporaryDir>
 #include <QTest>
-#include <QTreeWidget>
 
 namespace {
 
@@ -71,12 +75,17 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     ASSERT_EQ(projects[0]->tasks().size(), 1);
     EXPECT_EQ(projects[0]->tasks()[0]->name(), "Default Task");
 
-    QTreeWidgetItem* row = window.projectsList()->topLevelItem(0);
-    ASSERT_NE(row, nullptr);
-    EXPECT_EQ(row->text(0), "Default Project");
-    EXPECT_EQ(row->text(1), "00:00");
-    ASSERT_EQ(row->childCount(), 1);
-    EXPECT_EQ(row->child(0)->text(0), "Default Task");
+    // The projects list shows it; opening it shows its task.
+    WTObjectListModel* list = window.projectsViewController()->arrayController();
+    ASSERT_EQ(list->rowCount(), 1);
+    EXPECT_EQ(list->index(0, 0).data(WTObjectListModel::NameRole).toString(), "Default Project");
+    EXPECT_EQ(list->index(0, 0).data(WTObjectListModel::DurationTextRole).toString(), "00:00");
+    window.projectsViewController()->openProject(projects[0]);
+    ASSERT_TRUE(QTest::qWaitFor(
+        [&] { return window.projectsNavigationController()->viewControllers().size() == 2; }));
+    WTItemsModel* outline = window.projectsViewController()->itemsViewController()->treeController();
+    ASSERT_EQ(outline->rowCount(), 1);
+    EXPECT_EQ(outline->index(0, 0).data(WTItemsModel::NameRole).toString(), "Default Task");
 
     EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
     EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());

@@ -1,0 +1,71 @@
+#pragma once
+
+#include "WTTableCellView.h"
+
+#include <QPersistentModelIndex>
+#include <QPointer>
+#include <QStyledItemDelegate>
+
+class WTItemsViewController;
+class WTNotesTextView;
+class WTOutlineView;
+
+// Paints every row of the items outline (tasks, groups, the five kinds of item) in the flat grey look
+// with its hover bar, edits a row's name, duration, amount or notes in place, and reports clicks on a
+// row's buttons to the controller.
+class WTItemCellDelegate : public QStyledItemDelegate {
+  Q_OBJECT
+ public:
+  enum class Field { Name, Duration, Amount, Notes };
+
+  WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view);
+
+  // Which field the next edit opens (the name unless told otherwise).
+  void setEditField(Field field) { field_ = field; }
+  Field editField() const { return field_; }
+
+  // The row whose notes are being edited, and what they say now (not yet stored).
+  QModelIndex notesEditingIndex() const { return notesIndex_; }
+  bool isEditingNotes(const QModelIndex& index) const;
+  QString notesEditingText() const;
+  WTNotesTextView* notesEditor() const;
+
+  void paint(QPainter* painter, const QStyleOptionViewItem& option, const QModelIndex& index) const override;
+  QSize sizeHint(const QStyleOptionViewItem& option, const QModelIndex& index) const override;
+  QWidget* createEditor(QWidget* parent, const QStyleOptionViewItem& option,
+                        const QModelIndex& index) const override;
+  void destroyEditor(QWidget* editor, const QModelIndex& index) const override;
+  void setEditorData(QWidget* editor, const QModelIndex& index) const override;
+  void setModelData(QWidget* editor, QAbstractItemModel* model, const QModelIndex& index) const override;
+  void updateEditorGeometry(QWidget* editor, const QStyleOptionViewItem& option,
+                            const QModelIndex& index) const override;
+
+ signals:
+  // A button of a row was clicked; `rect` is where it is in the viewport.
+  void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
+  // The row's height changed (its notes are being typed); the view relayouts it.
+  void rowHeightChanged(const QModelIndex& index);
+
+ protected:
+  bool editorEvent(QEvent* event, QAbstractItemModel* model, const QStyleOptionViewItem& option,
+                   const QModelIndex& index) override;
+
+ private:
+  void paintTask(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,
+                 const WTTableCellView& cell) const;
+  void paintContainer(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,
+                      const WTTableCellView& cell) const;
+  void paintItem(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,
+                 const WTTableCellView& cell) const;
+  void paintNotes(QPainter& painter, const QRectF& row, const QModelIndex& index,
+                  const WTTableCellView& cell) const;
+  void paintHoverBar(QPainter& painter, const QRectF& row, const WTTableCellView& cell,
+                     const QModelIndex& index) const;
+
+  WTItemsViewController* controller_;
+  WTOutlineView* view_;
+  Field field_ = Field::Name;
+  mutable Field openField_ = Field::Name;
+  mutable QPersistentModelIndex notesIndex_;
+  mutable QPointer<WTNotesTextView> notesEditor_;
+};

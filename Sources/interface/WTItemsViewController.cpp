@@ -1,0 +1,474 @@
+#include "WTItemsViewController.h"
+
+#include "Decimal.h"
+#include "DurationText.h"
+#include "MoneyFormat.h"
+#include "RZBackgroundView.h"
+#include "RZDate.h"
+#include "UserDefaults.h"
+#include "WTClient.h"
+#include "WTDatePopover.h"
+#include "WTImages.h"
+#include "WTItem.h"
+#include "WTItemCellDelegate.h"
+#include "WTItemContainer.h"
+#include "WTItemsModel.h"
+#include "WTObjectContext.h"
+#include "WTOutlineView.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTToDo.h"
+
+#include <QHBoxLayout>
+#include <QItemSelectionModel>
+#include <QLabel>
+#include <QLineEdit>
+#include <QLocale>
+#include <QScrollBar>
+#include <QTimer>
+#include <QToolButton>
+#include <QVBoxLayout>
+
+namespace {
+
+const QString kExpandedItemsKey = QStringLiteral("NSOutlineView Items ");
+
+}  // namespace
+
+WTItemsViewController::WTItemsViewController(WTObjectContext* context, QObject* parent)
+    : WTViewController(parent), context_(context), treeController_(new WTItemsModel(context, this)) {
+  setObjectName(QStringLiteral("Items"));
+  connect(treeController_, &WTItemsModel::projectChanged, this, &WTItemsViewController::refreshHeader);
+  connect(treeController_, &WTItemsModel::projectChanged, this, &WTViewController::validationChanged);
+  // Dropped items are shown where they landed.
+  connect(treeController_, &WTItemsModel::itemsDropped, this, [this](const QList<WTItem*>& items) {
+    QTimer::singleShot(0, this, [this, items] {
+      treeController_->processChanges();
+      for (WTItem* item : items) expandContainerOfItem(item);
+    });
+  });
+  connect(treeController_, &WTItemsModel::projectDeleted, this, [this] {
+    project_ = nullptr;
+    emit backRequested();
+  });
+}
+
+WTItemsViewController::~WTItemsViewController() {
+  qDeleteAll(cellViewPrototypes_);
+  delete popover_.data();
+}
+
+void WTItemsViewController::setProject(WTProject* project) {
+  project_ = project;
+}
+
+WTOutlineView* WTItemsViewController::outlineView() {
+  view();
+  return outlineView_;
+}
+
+WTItemCellDelegate* WTItemsViewController::cellDelegate() {
+  view();
+  return delegate_;
+}
+
+QWidget* WTItemsViewController::loadView() {
+  auto* container = new QWidget;
+  container->setObjectName(QStringLiteral("ItemsView"));
+  auto* layout = new QVBoxLayout(container);
+  layout->setContentsMargins(0, 0, 0, 0);
+  layout->setSpacing(0);
+
+  header_ = new RZBackgroundView(container);
+  header_->setObjectName(QStringLiteral("projectHeader"));
+  header_->setIBGradientBeginHexColor(QStringLiteral("F5F7FA"));
+  header_->setIBGradientEndHexColor(QStringLiteral("DCE2EA"));
+  auto* bar = new QHBoxLayout(header_);
+  bar->setContentsMargins(8, 6, 12, 6);
+  bar->setSpacing(10);
+  auto* back = new QToolButton(header_);
+  back->setObjectName(QStringLiteral("backButton"));
+  back->setIcon(WTImages::icon(QStringLiteral("back")));
+  back->setText(tr("Projects"));
+  back->setToolTip(tr("Back to the projects (Alt+Left)"));
+  back->setToolButtonStyle(Qt::ToolButtonTextBesideIcon);
+  back->setAutoRaise(true);
+  connect(back, &QToolButton::clicked, this, &WTItemsViewController::backRequested);
+  bar->addWidget(back);
+
+  auto* titles = new QVBoxLayout;
+  titles->setSpacing(0);
+  titleLabel_ = new QLabel(header_);
+  titleLabel_->setObjectName(QStringLiteral("projectTitle"));
+  QFont titleFont = titleLabel_->font();
+  titleFont.setBold(true);
+  titleFont.setPointSizeF(titleFont.pointSizeF() + 3);
+  titleLabel_->setFont(titleFont);
+  clientLabel_ = new QLabel(header_);
+  clientLabel_->setStyleSheet(QStringLiteral("color: #666;"));
+  titles->addWidget(titleLabel_);
+  titles->addWidget(clientLabel_);
+  bar->addLayout(titles, 1);
+
+  auto* rateLabel = new QLabel(tr("Rate"), header_);
+  rateField_ = new QLineEdit(header_);
+  rateField_->setObjectName(QStringLiteral("rateField"));
+  rateField_->setPlaceholderText(tr("Inherited"));
+  rateField_->setAlignment(Qt::AlignRight);
+  rateField_->setFixedWidth(96);
+  rateLabel->setBuddy(rateField_);
+  connect(rateField_, &QLineEdit::editingFinished, this, &WTItemsViewController::projectRateAction);
+  bar->addWidget(rateLabel);
+  bar->addWidget(rateField_);
+  totalsLabel_ = new QLabel(header_);
+  totalsLabel_->setObjectName(QStringLiteral("projectTotals"));
+  totalsLabel_->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
+  totalsLabel_->setMinimumWidth(170);
+  QFont totalsFont = totalsLabel_->font();
+  totalsFont.setBold(true);
+  totalsLabel_->setFont(totalsFont);
+  bar->addWidget(totalsLabel_);
+  layout->addWidget(header_);
+
+  auto* line = new QFrame(container);
+  line->setFrameShape(QFrame::HLine);
+  line->setStyleSheet(QStringLiteral("color: #b8bec6;"));
+  layout->addWidget(line);
+
+  outlineView_ = new WTOutlineView(container);
+  outlineView_->setObjectName(QStringLiteral("itemsOutline"));
+  delegate_ = new WTItemCellDelegate(this, outlineView_);
+  outlineView_->setItemDelegate(delegate_);
+  outlineView_->setModel(treeController_);
+  layout->addWidget(outlineView_, 1);
+
+  connect(delegate_, &WTItemCellDelegate::partActivated, this, &WTItemsViewController::partActivated);
+  connect(delegate_, &WTItemCellDelegate::rowHeightChanged, outlineView_,
+          &WTOutlineView::noteHeightOfRowChanged);
+  connect(outlineView_, &WTOutlineView::editRequested, this, [this](const QModelIndex& index) {
+    if (!treeController_->objectAt(index)) return;
+    delegate_->setEditField(WTItemCellDelegate::Field::Name);
+    outlineView_->edit(index);
+  });
+  connect(outlineView_, &QTreeView::expanded, this, &WTItemsViewController::saveExpandedItems);
+  connect(outlineView_, &QTreeView::collapsed, this, &WTItemsViewController::saveExpandedItems);
+  connect(outlineView_->selectionModel(), &QItemSelectionModel::selectionChanged, this,
+          &WTViewController::validationChanged);
+  refreshHeader();
+  return container;
+}
+
+void WTItemsViewController::refreshHeader() {
+  if (!titleLabel_) return;
+  if (!project_) {
+    titleLabel_->clear();
+    clientLabel_->clear();
+    totalsLabel_->clear();
+    rateField_->clear();
+    return;
+  }
+  titleLabel_->setText(project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
+  QString client = project_->client() ? project_->client()->name() : tr("No Client");
+  if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
+  clientLabel_->setText(client);
+  totalsLabel_->setText(DurationText::stringWithMinutes(project_->duration()) + QStringLiteral("    ") +
+                        MoneyFormat::format(project_->cost()));
+  if (!rateField_->hasFocus()) {
+    rateField_->setText(project_->storedRate() ? MoneyFormat::format(*project_->storedRate()) : QString());
+  }
+}
+
+void WTItemsViewController::projectRateAction() {
+  if (!project_) return;
+  QString text = rateField_->text().trimmed();
+  if (text.isEmpty()) {
+    rateField_->setPlaceholderText(tr("Inherited"));
+    if (project_->storedRate()) project_->setRate(std::nullopt);
+    return;
+  }
+  const QLocale locale;
+  text.remove(locale.groupSeparator());
+  text.replace(locale.decimalPoint(), QStringLiteral("."));
+  const std::optional<Decimal> rate = Decimal::fromString(text);
+  if (rate && project_->storedRate() != rate) project_->setRate(rate);
+  refreshHeader();
+}
+
+void WTItemsViewController::willDisplayView() {
+  view();
+  autosaveExpandedItems_ = false;
+  delegate_->setEditField(WTItemCellDelegate::Field::Name);
+  treeController_->setProject(project_);
+  restoreExpandedItems();
+  autosaveExpandedItems_ = true;
+  outlineView_->scrollToTop();
+  if (treeController_->rowCount() > 0) outlineView_->setCurrentIndex(treeController_->index(0, 0));
+  refreshHeader();
+}
+
+QString WTItemsViewController::autosaveName() const {
+  return project_ ? project_->uuid() : QString();
+}
+
+QStringList WTItemsViewController::expandedIdentities() const {
+  QStringList identities;
+  if (!outlineView_) return identities;
+  for (int taskRow = 0; taskRow < treeController_->rowCount(); ++taskRow) {
+    const QModelIndex task = treeController_->index(taskRow, 0);
+    if (outlineView_->isExpanded(task)) identities.append(treeController_->persistentIdentity(task));
+    for (int row = 0; row < treeController_->rowCount(task); ++row) {
+      const QModelIndex group = treeController_->index(row, 0, task);
+      if (outlineView_->isExpanded(group)) identities.append(treeController_->persistentIdentity(group));
+    }
+  }
+  return identities;
+}
+
+void WTItemsViewController::saveExpandedItems() {
+  if (!autosaveExpandedItems_ || !project_) return;
+  if (UserDefaults* defaults = context_->userDefaults()) {
+    defaults->setValue(kExpandedItemsKey + autosaveName(), expandedIdentities());
+  }
+}
+
+void WTItemsViewController::restoreExpandedItems() {
+  if (!project_) return;
+  UserDefaults* defaults = context_->userDefaults();
+  if (!defaults) return;
+  const QStringList identities = defaults->value(kExpandedItemsKey + autosaveName()).toStringList();
+  for (const QString& identity : identities) {
+    const QModelIndex index = treeController_->indexForPersistentIdentity(identity);
+    if (index.isValid()) outlineView_->expand(index);
+  }
+}
+
+bool WTItemsViewController::respondsTo(Command command) const {
+  switch (command) {
+    case Command::AddObject:
+    case Command::RemoveSelectedObjects:
+    case Command::ToggleArchive:
+    case Command::SelectedObject:
+    case Command::ToggleTimer:
+      return true;
+    default:
+      return false;
+  }
+}
+
+void WTItemsViewController::addObject() {
+  if (!project_) return;
+  auto* task = WTTask::insertNewObject(context_);
+  task->setProject(project_);
+  context_->processPendingChanges();
+  treeController_->processChanges();
+  const QModelIndex index = treeController_->indexOfObject(task);
+  if (!index.isValid()) return;
+  outlineView()->setCurrentIndex(index);
+  delegate_->setEditField(WTItemCellDelegate::Field::Name);
+  outlineView_->edit(index);
+  outlineView_->scrollTo(index);
+}
+
+void WTItemsViewController::removeSelectedObjects() {
+  if (!outlineView_) return;
+  outlineView_->endEditing();
+  QList<WTObject*> objects;
+  for (const QModelIndex& index : outlineView_->selectionModel()->selectedRows()) {
+    if (WTObject* object = treeController_->objectAt(index)) objects.append(object);
+  }
+  for (WTObject* object : objects) context_->deleteObject(object);
+  treeController_->processChanges();
+}
+
+void WTItemsViewController::toggleArchive() {
+  if (!project_) return;
+  project_->setArchived(!project_->archived());
+  emit validationChanged();
+}
+
+WTObject* WTItemsViewController::selectedObject() const {
+  return project_;
+}
+
+WTTask* WTItemsViewController::taskOfIndex(const QModelIndex& index) const {
+  WTObject* object = treeController_->objectAt(index);
+  if (!object) {
+    const auto container = treeController_->containerAt(index);
+    return container ? container->task() : nullptr;
+  }
+  if (object->entity() == WTEntity::Task) return static_cast<WTTask*>(object);
+  return static_cast<WTItem*>(object)->task();
+}
+
+void WTItemsViewController::toggleTimer() {
+  if (!outlineView_) return;
+  toggleTimerOfTask(taskOfIndex(outlineView_->currentIndex()));
+}
+
+WTItem* WTItemsViewController::addItem(WTEntity kind, WTTask* task) {
+  if (!task || !WTEntities::isItem(kind)) return nullptr;
+  auto* item = static_cast<WTItem*>(context_->insertNewObject(kind));
+  item->setTask(task);
+  selectItem(item);
+  return item;
+}
+
+WTTime* WTItemsViewController::addTimeItem(WTTask* task) {
+  auto* time = static_cast<WTTime*>(addItem(WTEntity::Time, task));
+  if (time) time->setRunning(true);
+  return time;
+}
+
+void WTItemsViewController::toggleTimerOfTask(WTTask* task) {
+  if (!task) return;
+  if (WTTime* time = task->toggleTimer()) selectItem(time);
+}
+
+void WTItemsViewController::stopTimer(WTTime* time) {
+  if (time) time->setRunning(false);
+}
+
+void WTItemsViewController::showNotes(WTObject* object) {
+  context_->processPendingChanges();
+  treeController_->processChanges();
+  const QModelIndex index = treeController_->indexOfObject(object);
+  if (!index.isValid()) return;
+  outlineView()->setCurrentIndex(index);
+  outlineView_->scrollTo(index);
+  delegate_->setEditField(WTItemCellDelegate::Field::Notes);
+  outlineView_->edit(index);
+  outlineView_->noteHeightOfRowChanged(index);
+}
+
+void WTItemsViewController::toggleCompleted(WTToDo* todo) {
+  if (!todo) return;
+  if (todo->completed()) todo->setStartDate(Date::now());
+  refreshChildren(todo);
+}
+
+void WTItemsViewController::refreshChildren(WTItem* item) {
+  if (!item) return;
+  context_->processPendingChanges();
+  treeController_->processChanges();
+  expandContainerOfItem(item);
+}
+
+WTDatePopover* WTItemsViewController::popover() {
+  if (!popover_) {
+    popover_ = new WTDatePopover(outlineView());
+    connect(popover_, &WTDatePopover::popoverWillClose, this, &WTItemsViewController::popoverWillClose);
+  }
+  return popover_;
+}
+
+void WTItemsViewController::openDatePicker(WTItem* item, const QRect& anchor) {
+  if (!item || (popover_ && popover_->isVisible()) || currentItem_) return;
+  currentItem_ = item;
+  const QDateTime date = (item->date() ? *item->date() : Date::now()).toQDateTime();
+  popover()->setDate(date.date());
+  popover_->showRelativeToRect(anchor);
+}
+
+void WTItemsViewController::popoverWillClose() {
+  WTItem* item = std::exchange(currentItem_, nullptr);
+  if (!item || !popover_) return;
+  const QDateTime old = (item->date() ? *item->date() : Date::now()).toQDateTime();
+  const QDate picked = popover_->date();
+  // Only a new day moves the item: closing without a choice leaves it (and its seconds) alone.
+  if (picked.isValid() && picked != old.date()) {
+    item->setDate(Date::fromQDateTime(QDateTime(picked, old.time())));
+    refreshChildren(item);
+  }
+}
+
+void WTItemsViewController::selectItem(WTItem* item) {
+  if (!item) return;
+  context_->processPendingChanges();
+  treeController_->processChanges();
+  expandContainerOfItem(item);
+  const QModelIndex index = treeController_->indexOfObject(item);
+  if (!index.isValid()) return;
+  outlineView()->setCurrentIndex(index);
+  outlineView_->selectionModel()->select(index,
+                                         QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  delegate_->setEditField(WTItemCellDelegate::Field::Name);
+  outlineView_->edit(index);
+  outlineView_->scrollTo(index);
+}
+
+void WTItemsViewController::expandContainerOfItem(WTItem* item) {
+  if (!item || !item->task()) return;
+  const QModelIndex task = treeController_->indexOfObject(item->task());
+  if (task.isValid()) outlineView()->expand(task);
+  const QModelIndex group = treeController_->indexOfContainerOfItem(item);
+  if (group.isValid()) outlineView()->expand(group);
+}
+
+bool WTItemsViewController::isRowBeingEdited(const QModelIndex& index) const {
+  return delegate_ && delegate_->isEditingNotes(index);
+}
+
+WTTableCellView& WTItemsViewController::cellViewPrototypeForIndex(const QModelIndex& index) {
+  const QString kind = treeController_->kindAt(index);
+  WTTableCellView*& prototype = cellViewPrototypes_[kind];
+  if (!prototype) prototype = new WTTableCellView(kind);
+  const qreal width = outlineView_ ? outlineView_->viewport()->width() : 600;
+  prototype->setFrame(QRectF(prototype->frame().topLeft(), QSizeF(width, prototype->frame().height())));
+  prototype->setNotes(isRowBeingEdited(index) ? delegate_->notesEditingText()
+                                              : index.data(WTItemsModel::NotesRole).toString());
+  return *prototype;
+}
+
+qreal WTItemsViewController::heightOfRow(const QModelIndex& index) {
+  const bool editing = isRowBeingEdited(index);
+  const qreal height = cellViewPrototypeForIndex(index).requestedHeight(editing);
+  return treeController_->isItemIndex(index) ? std::max(height, 30.0) : height;
+}
+
+void WTItemsViewController::partActivated(const QModelIndex& index, WTTableCellView::Part part,
+                                          const QRect& rect) {
+  using Part = WTTableCellView::Part;
+  WTObject* object = treeController_->objectAt(index);
+  auto* task = object && object->entity() == WTEntity::Task ? static_cast<WTTask*>(object) : nullptr;
+  auto* item = object && WTEntities::isItem(object->entity()) ? static_cast<WTItem*>(object) : nullptr;
+  switch (part) {
+    case Part::Disclosure:
+      outlineView_->setExpanded(index, !outlineView_->isExpanded(index));
+      break;
+    case Part::AddTime:
+      addTimeItem(task);
+      break;
+    case Part::AddFlat:
+      addItem(WTEntity::Flat, task);
+      break;
+    case Part::AddNote:
+      addItem(WTEntity::Note, task);
+      break;
+    case Part::AddExpense:
+      addItem(WTEntity::Expense, task);
+      break;
+    case Part::AddToDo:
+      addItem(WTEntity::ToDo, task);
+      break;
+    case Part::TimerButton:
+      if (task) toggleTimerOfTask(task);
+      if (item && item->entity() == WTEntity::Time) stopTimer(static_cast<WTTime*>(item));
+      break;
+    case Part::Checkbox:
+      if (item && item->entity() == WTEntity::ToDo) {
+        treeController_->setData(index, !static_cast<WTToDo*>(item)->completed(),
+                                 WTItemsModel::CompletedRole);
+        toggleCompleted(static_cast<WTToDo*>(item));
+      }
+      break;
+    case Part::DateButton:
+      openDatePicker(item, QRect(outlineView_->viewport()->mapToGlobal(rect.topLeft()), rect.size()));
+      break;
+    case Part::NotesButton:
+      showNotes(object);
+      break;
+    default:
+      break;
+  }
+}

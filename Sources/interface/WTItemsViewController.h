@@ -1,0 +1,130 @@
+#pragma once
+
+#include "WTEntity.h"
+#include "WTTableCellView.h"
+#include "WTViewController.h"
+
+#include <QHash>
+#include <QPointer>
+
+class QLabel;
+class QLineEdit;
+class QToolButton;
+class RZBackgroundView;
+class WTDatePopover;
+class WTItem;
+class WTItemCellDelegate;
+class WTItemsModel;
+class WTObjectContext;
+class WTOutlineView;
+class WTProject;
+class WTTask;
+class WTTime;
+class WTToDo;
+
+// One project as an outline of its tasks, their day groups and items, pushed onto the projects stack
+// when a project is opened. It adds items of every kind to a task, runs and stops timers, completes
+// to-dos, moves items to another day (by dragging or with the date pop-over), reorders tasks, and
+// remembers for each project which rows were expanded.
+class WTItemsViewController : public WTViewController {
+  Q_OBJECT
+ public:
+  // `context` is not owned; its user defaults (when it has any) keep the expanded rows.
+  explicit WTItemsViewController(WTObjectContext* context, QObject* parent = nullptr);
+  ~WTItemsViewController() override;
+
+  WTProject* project() const { return project_; }
+  // Takes effect when the view is next displayed (willDisplayView).
+  void setProject(WTProject* project);
+
+  WTItemsModel* treeController() const { return treeController_; }
+  WTOutlineView* outlineView();
+  WTItemCellDelegate* cellDelegate();
+
+  // Re-targets the expansion autosave to the project, reloads the outline and expands what was
+  // expanded when the project was last shown.
+  void willDisplayView() override;
+
+  // Commands from the window.
+  bool respondsTo(Command command) const override;
+  // A new task in the project, its name edited at once.
+  void addObject() override;
+  // Deletes the selected tasks and items, without asking (undo brings them back).
+  void removeSelectedObjects() override;
+  // Archives or unarchives the project.
+  void toggleArchive() override;
+  // The project (the toolbar's archive label follows it).
+  WTObject* selectedObject() const override;
+  // Starts or stops the timer of the selected task, or of the selected item's task.
+  void toggleTimer() override;
+
+  // Row actions.
+  // Inserts an item of `kind` into `task`, selects it and edits its text; none without a task.
+  WTItem* addItem(WTEntity kind, WTTask* task);
+  // The same for a time entry, which then runs at once.
+  WTTime* addTimeItem(WTTask* task);
+  // Starts (selecting and editing the new entry) or stops the task's timer.
+  void toggleTimerOfTask(WTTask* task);
+  void stopTimer(WTTime* time);
+  // Starts editing the notes field of the row of `object`.
+  void showNotes(WTObject* object);
+  // After a to-do's box was clicked: a completed to-do is dated now; the item is regrouped.
+  void toggleCompleted(WTToDo* todo);
+  // Regroups the item's task now and opens the item's new group.
+  void refreshChildren(WTItem* item);
+
+  // Opens the date pop-over for `item` under `anchor` (global coordinates); ignored while it is open.
+  void openDatePicker(WTItem* item, const QRect& anchor);
+  // Books the item on the picked day (when it changed) and opens its new group.
+  void popoverWillClose();
+  WTItem* currentItem() const { return currentItem_; }
+  WTDatePopover* popover();
+
+  // Brings the tree up to date, opens the item's task and group, selects the item and edits its text.
+  void selectItem(WTItem* item);
+  void expandContainerOfItem(WTItem* item);
+
+  // Row heights: a task or group row takes its cell's height, an item row at least 30 points.
+  qreal heightOfRow(const QModelIndex& index);
+  // The prototype cell of the row's kind, set to the outline's width and to the row's notes.
+  WTTableCellView& cellViewPrototypeForIndex(const QModelIndex& index);
+  // Whether the row's notes are being edited.
+  bool isRowBeingEdited(const QModelIndex& index) const;
+
+  // The key the expanded rows are kept under: the project's uuid.
+  QString autosaveName() const;
+  QStringList expandedIdentities() const;
+
+  // The project's rate as typed in the header; an empty field inherits.
+  void projectRateAction();
+  QLineEdit* rateField() const { return rateField_; }
+
+ signals:
+  // The back button or its shortcut asked to go back to the projects.
+  void backRequested();
+
+ protected:
+  QWidget* loadView() override;
+
+ private:
+  void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
+  void saveExpandedItems();
+  void restoreExpandedItems();
+  void refreshHeader();
+  WTTask* taskOfIndex(const QModelIndex& index) const;
+
+  WTObjectContext* context_;
+  WTProject* project_ = nullptr;
+  WTItemsModel* treeController_;
+  QPointer<WTOutlineView> outlineView_;
+  WTItemCellDelegate* delegate_ = nullptr;
+  QPointer<WTDatePopover> popover_;
+  WTItem* currentItem_ = nullptr;
+  QHash<QString, WTTableCellView*> cellViewPrototypes_;
+  bool autosaveExpandedItems_ = false;
+  RZBackgroundView* header_ = nullptr;
+  QLabel* titleLabel_ = nullptr;
+  QLabel* clientLabel_ = nullptr;
+  QLabel* totalsLabel_ = nullptr;
+  QLineEdit* rateField_ = nullptr;
+};

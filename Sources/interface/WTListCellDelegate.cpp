@@ -1,0 +1,137 @@
+#include "WTListCellDelegate.h"
+
+#include "RZColor.h"
+#include "WTImages.h"
+#include "WTListView.h"
+#include "WTObjectListModel.h"
+#include "WTPopUpButtonCell.h"
+#include "WTTableRowView.h"
+
+#include <QAbstractItemView>
+#include <QApplication>
+#include <QLineEdit>
+#include <QMouseEvent>
+#include <QPainter>
+
+WTListCellDelegate::WTListCellDelegate(const QString& identifier, QObject* parent)
+    : QStyledItemDelegate(parent), cell_(identifier) {}
+
+void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& option,
+                               const QModelIndex& index) const {
+  const QRectF row = option.rect;
+  const bool selected = option.state & QStyle::State_Selected;
+  const bool archived = index.data(WTObjectListModel::ArchivedRole).toBool();
+  painter->save();
+  WTTableRowView().draw(*painter, row, selected);
+
+  const qreal ratio = painter->device() ? painter->device()->devicePixelRatioF() : 1.0;
+  const QRectF icon = cell_.partRect(WTTableCellView::Part::Icon, row);
+  const QString image = index.data(WTObjectListModel::ImageRole).toString();
+  if (!image.isEmpty())
+    painter->drawPixmap(icon.topLeft(), WTImages::pixmap(image, icon.size().toSize(), ratio));
+
+  const QColor text = archived ? RZColor::calibratedWhite(0.55) : RZColor::calibratedWhite(0.1);
+  QFont nameFont = option.font;
+  nameFont.setBold(true);
+  painter->setFont(nameFont);
+  painter->setPen(text);
+  const QRectF name = cell_.partRect(WTTableCellView::Part::Name, row);
+  QString title = index.data(WTObjectListModel::NameRole).toString();
+  if (title.isEmpty()) {
+    painter->setPen(RZColor::calibratedWhite(0.55));
+    title = tr("Untitled");
+  }
+  painter->drawText(name, Qt::AlignLeft | Qt::AlignVCenter,
+                    painter->fontMetrics().elidedText(title, Qt::ElideRight, static_cast<int>(name.width())));
+
+  QFont small = option.font;
+  small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
+  const QRectF subtitle = cell_.partRect(WTTableCellView::Part::Subtitle, row);
+  const QString subtitleText = index.data(WTObjectListModel::SubtitleRole).toString();
+  if (cell_.identifier() == QLatin1String("Project")) {
+    // The client chooser: a pop-up drawn flat, dark on the light row, arrow first.
+    WTPopUpButtonCell::drawWithFrame(*painter, subtitle, subtitleText, small, 1);
+  } else {
+    painter->setFont(small);
+    painter->setPen(RZColor::calibratedWhite(0.4));
+    painter->drawText(subtitle.adjusted(4, 0, 0, 0), Qt::AlignLeft | Qt::AlignVCenter, subtitleText);
+  }
+
+  painter->setFont(option.font);
+  painter->setPen(text);
+  painter->drawText(cell_.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
+                    index.data(WTObjectListModel::DurationTextRole).toString());
+  painter->drawText(cell_.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
+                    index.data(WTObjectListModel::CostTextRole).toString());
+
+  // The right-clicked row is ringed while its menu is open.
+  const auto* list = qobject_cast<const WTListView*>(parent());
+  if (list && list->clickedRow() == index.row()) {
+    painter->setRenderHint(QPainter::Antialiasing);
+    painter->setPen(QPen(option.palette.color(QPalette::Highlight), 2.0));
+    painter->setBrush(Qt::NoBrush);
+    painter->drawRoundedRect(row.adjusted(2, 2, -2, -3), 5, 5);
+  }
+
+  const QRectF open = cell_.partRect(WTTableCellView::Part::OpenButton, row);
+  if (!open.isEmpty())
+    painter->drawPixmap(open.topLeft(), WTImages::pixmap("chevron", open.size().toSize(), ratio));
+  painter->restore();
+}
+
+QSize WTListCellDelegate::sizeHint(const QStyleOptionViewItem&, const QModelIndex&) const {
+  // Rows span the list's width; the list lays them out again when it is resized.
+  const auto* view = qobject_cast<const QAbstractItemView*>(parent());
+  const int width = view ? view->viewport()->width() : 400;
+  return QSize(width, static_cast<int>(cell_.requestedHeight(false)));
+}
+
+QWidget* WTListCellDelegate::createEditor(QWidget* parent, const QStyleOptionViewItem&,
+                                          const QModelIndex&) const {
+  auto* editor = new QLineEdit(parent);
+  editor->setObjectName(QStringLiteral("nameEditor"));
+  QFont font = editor->font();
+  font.setBold(true);
+  editor->setFont(font);
+  return editor;
+}
+
+void WTListCellDelegate::setEditorData(QWidget* editor, const QModelIndex& index) const {
+  auto* line = static_cast<QLineEdit*>(editor);
+  line->setText(index.data(WTObjectListModel::NameRole).toString());
+  line->selectAll();
+}
+
+void WTListCellDelegate::setModelData(QWidget* editor, QAbstractItemModel* model,
+                                      const QModelIndex& index) const {
+  model->setData(index, static_cast<QLineEdit*>(editor)->text(), WTObjectListModel::NameRole);
+}
+
+void WTListCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptionViewItem& option,
+                                              const QModelIndex&) const {
+  editor->setGeometry(
+      cell_.partRect(WTTableCellView::Part::Name, option.rect).toRect().adjusted(-3, -1, 3, 1));
+}
+
+bool WTListCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
+                                     const QStyleOptionViewItem& option, const QModelIndex& index) {
+  const auto type = event->type();
+  if (type != QEvent::MouseButtonRelease && type != QEvent::MouseButtonDblClick &&
+      type != QEvent::MouseButtonPress) {
+    return QStyledItemDelegate::editorEvent(event, model, option, index);
+  }
+  auto* mouse = static_cast<QMouseEvent*>(event);
+  if (mouse->button() != Qt::LeftButton) return false;
+  const auto part = cell_.partAt(mouse->position(), option.rect, false);
+  const bool button = part == WTTableCellView::Part::OpenButton || part == WTTableCellView::Part::Subtitle;
+  if (type == QEvent::MouseButtonRelease && button) {
+    emit partActivated(index, *part, cell_.partRect(*part, option.rect).toRect());
+    return true;
+  }
+  if (type == QEvent::MouseButtonDblClick && part != WTTableCellView::Part::Name) {
+    // A double click anywhere but on the name opens the row.
+    if (!button) emit partActivated(index, WTTableCellView::Part::OpenButton, option.rect);
+    return true;
+  }
+  return false;
+}

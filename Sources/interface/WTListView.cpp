@@ -1,0 +1,61 @@
+#include "WTListView.h"
+
+#include "RZColor.h"
+
+#include <QContextMenuEvent>
+#include <QKeyEvent>
+#include <QMouseEvent>
+
+WTListView::WTListView(QWidget* parent) : QListView(parent) {
+  setSelectionMode(QAbstractItemView::ExtendedSelection);
+  setSelectionBehavior(QAbstractItemView::SelectRows);
+  setEditTriggers(QAbstractItemView::EditKeyPressed | QAbstractItemView::DoubleClicked);
+  setUniformItemSizes(true);
+  setResizeMode(QListView::Adjust);
+  setHorizontalScrollBarPolicy(Qt::ScrollBarAlwaysOff);
+  setMouseTracking(true);
+  setFrameShape(QFrame::NoFrame);
+  setVerticalScrollMode(QAbstractItemView::ScrollPerPixel);
+  // The rows paint their own grey; below the last one the list stays that grey too.
+  QPalette grey = palette();
+  grey.setColor(QPalette::Base, RZColor::calibratedWhite(0.9));
+  setPalette(grey);
+}
+
+void WTListView::editRow(int row, bool scroll) {
+  const QModelIndex index = model() ? model()->index(row, 0) : QModelIndex();
+  if (!index.isValid()) return;
+  setCurrentIndex(index);
+  selectionModel()->select(index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  if (scroll) scrollTo(index);
+  edit(index);
+}
+
+void WTListView::keyPressEvent(QKeyEvent* event) {
+  const bool editing = state() == QAbstractItemView::EditingState;
+  if (!editing && (event->key() == Qt::Key_Return || event->key() == Qt::Key_Enter) &&
+      currentIndex().isValid()) {
+    edit(currentIndex());
+    return;
+  }
+  if (!editing && event->key() == Qt::Key_Right && event->modifiers() == Qt::NoModifier &&
+      currentIndex().isValid()) {
+    emit openRequested(currentIndex());
+    return;
+  }
+  QListView::keyPressEvent(event);
+}
+
+void WTListView::mousePressEvent(QMouseEvent* event) {
+  // A right click marks its row for the menu and leaves the selection alone.
+  if (event->button() == Qt::RightButton) {
+    event->accept();
+    return;
+  }
+  QListView::mousePressEvent(event);
+}
+
+void WTListView::contextMenuEvent(QContextMenuEvent* event) {
+  const QModelIndex index = indexAt(event->pos());
+  emit contextMenuRequestedForRow(index.isValid() ? index.row() : -1, event->globalPos());
+}

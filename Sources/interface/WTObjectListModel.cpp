@@ -1,0 +1,259 @@
+#include "WTObjectListModel.h"
+
+#include "DurationText.h"
+#include "MoneyFormat.h"
+#include "WTClient.h"
+#include "WTObjectContext.h"
+#include "WTOrderedDiff.h"
+#include "WTProject.h"
+
+#include <algorithm>
+
+namespace {
+
+int durationOf(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Client:
+      return static_cast<const WTClient*>(object)->duration();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->duration();
+    default:
+      return 0;
+  }
+}
+
+Decimal costOf(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Client:
+      return static_cast<const WTClient*>(object)->cost();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->cost();
+    default:
+      return Decimal();
+  }
+}
+
+QString imageOf(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Client:
+      return static_cast<const WTClient*>(object)->tableImage();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->tableImage();
+    default:
+      return {};
+  }
+}
+
+bool isSortKey(const QString& key) {
+  return key == QLatin1String("name") || key == QLatin1String("archived");
+}
+
+bool isShownKey(const QString& key) {
+  static const QSet<QString> keys = {QStringLiteral("duration"),   QStringLiteral("cost"),
+                                     QStringLiteral("tableImage"), QStringLiteral("client"),
+                                     QStringLiteral("projects"),   QStringLiteral("notes")};
+  return keys.contains(key);
+}
+
+}  // namespace
+
+WTObjectListModel::WTObjectListModel(WTObjectContext* context, WTEntity entity, QObject* parent)
+    : QAbstractListModel(parent), context_(context), entity_(entity) {
+  changeTimer_.setSingleShot(true);
+  changeTimer_.setInterval(0);
+  connect(&changeTimer_, &QTimer::timeout, this, &WTObjectListModel::flushChangedRows);
+  rearrangeTimer_.setSingleShot(true);
+  rearrangeTimer_.setInterval(0);
+  connect(&rearrangeTimer_, &QTimer::timeout, this, &WTObjectListModel::rearrangeObjects);
+  connect(context_, &WTObjectContext::objectValueDidChange, this, &WTObjectListModel::objectValueDidChange);
+  connect(context_, &WTObjectContext::objectsDidChange, this, &WTObjectListModel::objectsDidChange);
+  arranged_ = computeArrangement();
+  reindex();
+}
+
+WTObjectListModel::~WTObjectListModel() = default;
+
+void WTObjectListModel::setFilterPredicate(std::function<bool(const WTObject*)> predicate) {
+  predicate_ = std::move(predicate);
+  rearrangeObjects();
+}
+
+WTObject* WTObjectListModel::objectAt(int row) const {
+  return row >= 0 && row < arranged_.size() ? arranged_[row] : nullptr;
+}
+
+int WTObjectListModel::rowOfObject(const WTObject* object) const {
+  return rows_.value(object, -1);
+}
+
+QModelIndex WTObjectListModel::indexOfObject(const WTObject* object) const {
+  const int row = rowOfObject(object);
+  return row < 0 ? QModelIndex() : index(row, 0);
+}
+
+QList<WTObject*> WTObjectListModel::computeArrangement() const {
+  QList<WTObject*> result;
+  const auto fetched = context_->fetchObjectsForEntityName(WTEntities::name(entity_), {}, predicate_);
+  if (fetched) result = *fetched;
+  // By name, ignoring case; the identity breaks ties so the order never flickers between equal names.
+  std::sort(result.begin(), result.end(), [](const WTObject* a, const WTObject* b) {
+    const int order = QString::compare(a->name(), b->name(), Qt::CaseInsensitive);
+    if (order != 0) return order < 0;
+    return a->uuid() < b->uuid();
+  });
+  return result;
+}
+
+void WTObjectListModel::reindex() {
+  rows_.clear();
+  rows_.reserve(arranged_.size());
+  for (int row = 0; row < arranged_.size(); ++row) rows_.insert(arranged_[row], row);
+}
+
+void WTObjectListModel::rearrangeObjects() {
+  rearrangeTimer_.stop();
+  const QList<WTObject*> target = computeArrangement();
+  if (target == arranged_) return;
+  struct Ops {
+    WTObjectListModel* model;
+    void remove(int first, int last) {
+      model->beginRemoveRows(QModelIndex(), first, last);
+      model->arranged_.remove(first, last - first + 1);
+      model->endRemoveRows();
+    }
+    void move(int from, int to) {
+      model->beginMoveRows(QModelIndex(), from, from, QModelIndex(), to);
+      model->arranged_.move(from, to);
+      model->endMoveRows();
+    }
+    void insert(int at, WTObject* object) {
+      model->beginInsertRows(QModelIndex(), at, at);
+      model->arranged_.insert(at, object);
+      model->endInsertRows();
+    }
+  };
+  applyOrderedDiff(arranged_, target, Ops{this});
+  reindex();
+}
+
+void WTObjectListModel::objectValueDidChange(WTObject* object, const QString& key) {
+  if (object->entity() == entity_) {
+    if (isSortKey(key)) rearrangeTimer_.start();
+    if ((isSortKey(key) || isShownKey(key)) && rows_.contains(object)) {
+      changed_.insert(object);
+      changeTimer_.start();
+    }
+    return;
+  }
+  // A project row shows its client's name.
+  if (entity_ == WTEntity::Project && object->entity() == WTEntity::Client && key == QLatin1String("name")) {
+    for (WTProject* project : static_cast<WTClient*>(object)->projects()) {
+      if (rows_.contains(project)) changed_.insert(project);
+    }
+    changeTimer_.start();
+  }
+}
+
+void WTObjectListModel::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>&,
+                                         const QList<WTObject*>& deleted) {
+  auto concerns = [this](const QList<WTObject*>& objects) {
+    return std::any_of(objects.begin(), objects.end(),
+                       [this](const WTObject* object) { return object->entity() == entity_; });
+  };
+  if (concerns(inserted) || concerns(deleted)) rearrangeTimer_.start();
+}
+
+void WTObjectListModel::flushChangedRows() {
+  const QSet<const WTObject*> changed = std::exchange(changed_, {});
+  for (const WTObject* object : changed) {
+    const int row = rowOfObject(object);
+    if (row >= 0) emit dataChanged(index(row, 0), index(row, 0));
+  }
+}
+
+int WTObjectListModel::rowCount(const QModelIndex& parent) const {
+  return parent.isValid() ? 0 : static_cast<int>(arranged_.size());
+}
+
+QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
+  if (!checkIndex(index, CheckIndexOption::IndexIsValid | CheckIndexOption::ParentIsInvalid)) return {};
+  const WTObject* object = arranged_[index.row()];
+  switch (role) {
+    case Qt::DisplayRole:
+    case Qt::EditRole:
+    case NameRole:
+      return object->name();
+    case Qt::ToolTipRole:
+      return object->notes().isEmpty() ? QVariant() : QVariant(object->notes());
+    case ObjectRole:
+      return variantFromObject(object);
+    case SubtitleRole:
+      if (object->entity() == WTEntity::Project) {
+        const WTClient* client = static_cast<const WTProject*>(object)->client();
+        return client ? client->name() : tr("No Client");
+      }
+      if (object->entity() == WTEntity::Client) {
+        const auto count = static_cast<const WTClient*>(object)->projects().size();
+        return count == 1 ? tr("1 project") : tr("%1 projects").arg(count);
+      }
+      return {};
+    case DurationTextRole:
+      return DurationText::stringWithMinutes(durationOf(object));
+    case CostTextRole:
+      return MoneyFormat::format(costOf(object));
+    case ImageRole:
+      return imageOf(object);
+    case ArchivedRole:
+      return object->archived();
+    case ClientRole:
+      if (object->entity() != WTEntity::Project) return {};
+      return variantFromObject(static_cast<const WTProject*>(object)->client());
+    default:
+      return {};
+  }
+}
+
+bool WTObjectListModel::setData(const QModelIndex& index, const QVariant& value, int role) {
+  if (!checkIndex(index, CheckIndexOption::IndexIsValid | CheckIndexOption::ParentIsInvalid)) return false;
+  WTObject* object = arranged_[index.row()];
+  switch (role) {
+    case Qt::EditRole:
+    case NameRole:
+      if (value.toString() == object->name()) return false;
+      object->setName(value.toString());
+      return true;
+    case ClientRole: {
+      if (object->entity() != WTEntity::Project) return false;
+      WTObject* client = objectFromVariant(value);
+      if (client && client->entity() != WTEntity::Client) return false;
+      static_cast<WTProject*>(object)->setClient(static_cast<WTClient*>(client));
+      return true;
+    }
+    default:
+      return false;
+  }
+}
+
+Qt::ItemFlags WTObjectListModel::flags(const QModelIndex& index) const {
+  if (!index.isValid()) return Qt::NoItemFlags;
+  return Qt::ItemIsEnabled | Qt::ItemIsSelectable | Qt::ItemIsEditable | Qt::ItemNeverHasChildren;
+}
+
+QHash<int, QByteArray> WTObjectListModel::roleNames() const {
+  QHash<int, QByteArray> names = QAbstractListModel::roleNames();
+  names.insert(NameRole, "name");
+  names.insert(SubtitleRole, "subtitle");
+  names.insert(DurationTextRole, "durationText");
+  names.insert(CostTextRole, "costText");
+  names.insert(ImageRole, "image");
+  names.insert(ArchivedRole, "archived");
+  return names;
+}
+
+WTObject* WTObjectListModel::objectFromVariant(const QVariant& value) {
+  return reinterpret_cast<WTObject*>(value.value<quintptr>());
+}
+
+QVariant WTObjectListModel::variantFromObject(const WTObject* object) {
+  return object ? QVariant::fromValue(reinterpret_cast<quintptr>(object)) : QVariant();
+}

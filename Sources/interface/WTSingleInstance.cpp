@@ -1,0 +1,80 @@
+#include "WTSingleInstance.h"
+
+#include <QDir>
+#include <QLocalServer>
+#include <QLocalSocket>
+#include <QStandardPaths>
+
+namespace {
+
+const QByteArray kReopen = "reopen\n";
+const QByteArray kPing = "ping\n";
+const QByteArray kAcknowledged = "ok\n";
+
+QString defaultPath() {
+  QString folder = QStandardPaths::writableLocation(QStandardPaths::RuntimeLocation);
+  if (folder.isEmpty()) {
+    // No private runtime folder: a shared one, so the user's name keeps users apart.
+    return QDir::tempPath() + QStringLiteral("/tessal-") +
+           qEnvironmentVariable("USER", QStringLiteral("user")) + QStringLiteral(".socket");
+  }
+  return folder + QStringLiteral("/tessal.socket");
+}
+
+}  // namespace
+
+WTSingleInstance::WTSingleInstance(const QString& serverPath, QObject* parent)
+    : QObject(parent), path_(serverPath.isEmpty() ? defaultPath() : serverPath) {}
+
+WTSingleInstance::~WTSingleInstance() {
+  if (server_) server_->close();
+}
+
+bool WTSingleInstance::isListening() const {
+  return server_ && server_->isListening();
+}
+
+bool WTSingleInstance::start(bool bringRunningCopyForward) {
+  if (isListening()) return true;
+  if (notifyRunningInstance(2000, bringRunningCopyForward)) return false;
+  // Nobody answers: whatever socket file is there was left by a copy that is gone.
+  QLocalServer::removeServer(path_);
+  server_ = new QLocalServer(this);
+  server_->setSocketOptions(QLocalServer::UserAccessOption);
+  if (!server_->listen(path_)) {
+    // Another copy may have won the race to listen a moment ago.
+    if (notifyRunningInstance(2000, bringRunningCopyForward)) return false;
+    qWarning("Could not listen on %s: %s", qPrintable(path_), qPrintable(server_->errorString()));
+    return true;  // run unguarded rather than not at all
+  }
+  connect(server_, &QLocalServer::newConnection, this, &WTSingleInstance::acceptConnections);
+  return true;
+}
+
+bool WTSingleInstance::notifyRunningInstance(int timeoutMs, bool reopen) const {
+  QLocalSocket socket;
+  socket.connectToServer(path_);
+  if (!socket.waitForConnected(timeoutMs)) return false;
+  socket.write(reopen ? kReopen : kPing);
+  if (!socket.waitForBytesWritten(timeoutMs)) return false;
+  while (socket.bytesAvailable() < kAcknowledged.size()) {
+    if (!socket.waitForReadyRead(timeoutMs)) return false;
+  }
+  return socket.readAll().startsWith(kAcknowledged);
+}
+
+void WTSingleInstance::acceptConnections() {
+  while (QLocalSocket* socket = server_->nextPendingConnection()) {
+    connect(socket, &QLocalSocket::disconnected, socket, &QObject::deleteLater);
+    connect(socket, &QLocalSocket::readyRead, this, [this, socket] {
+      if (!socket->canReadLine()) return;
+      const QByteArray line = socket->readLine();
+      if (line == kReopen || line == kPing) {
+        socket->write(kAcknowledged);
+        socket->flush();
+        if (line == kReopen) emit reopenRequested();
+      }
+      socket->disconnectFromServer();
+    });
+  }
+}

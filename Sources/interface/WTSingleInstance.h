@@ -1,0 +1,40 @@
+#pragma once
+
+#include <QObject>
+#include <QString>
+
+class QLocalServer;
+
+// Keeps the application to one running copy per user. The first copy listens on a local socket in the
+// user's runtime folder; a later copy finds it there, asks it to come forward and then leaves without
+// touching the store.
+class WTSingleInstance : public QObject {
+  Q_OBJECT
+ public:
+  // `serverPath` empty: "$XDG_RUNTIME_DIR/tessal.socket" (the temporary folder without a runtime
+  // folder), with the user's name in it there.
+  explicit WTSingleInstance(const QString& serverPath = {}, QObject* parent = nullptr);
+  ~WTSingleInstance() override;
+
+  QString serverPath() const { return path_; }
+
+  // Tries to become the running copy. Returns false when another copy answers; that copy has then
+  // been asked to bring its window forward, unless `bringRunningCopyForward` is false (a command-line
+  // run that only needs to know). A socket left behind by a copy that died is taken over.
+  bool start(bool bringRunningCopyForward = true);
+  bool isListening() const;
+
+  // Asks the running copy to come forward (or, with `reopen` false, only whether it is there); true
+  // when it acknowledged within `timeoutMs`.
+  bool notifyRunningInstance(int timeoutMs = 2000, bool reopen = true) const;
+
+ signals:
+  // Another copy was started: the window should come forward.
+  void reopenRequested();
+
+ private:
+  void acceptConnections();
+
+  QString path_;
+  QLocalServer* server_ = nullptr;
+};

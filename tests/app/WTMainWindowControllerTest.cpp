@@ -1,0 +1,185 @@
+#include "UserDefaults.h"
+#include "WTAlertPresenter.h"
+#include "WTAppDelegate.h"
+#include "WTApplication.h"
+#include "WTClient.h"
+#include "WTClientsViewController.h"
+#include "WTItemsViewController.h"
+#include "WTListView.h"
+#include "WTMainWindowController.h"
+#include "WTNavigationController.h"
+#include "WTObjectContext.h"
+#include "WTObjectListModel.h"
+#include "WTProject.h"
+#include "WTProjectsViewController.h"
+#include "WTTask.h"
+
+#include <gtest/gtest.h>
+
+#include <QAction>
+#include <QTemporaryDir>
+#include <QTest>
+
+namespace {
+
+class SilentPresenter final : public WTAlertPresenter {
+ public:
+  bool presentError(const QString&) override { return false; }
+  bool confirmQuitAnyway() override { return true; }
+};
+
+class WTMainWindowControllerTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_TRUE(home.isValid());
+    previousData = qgetenv("XDG_DATA_HOME");
+    qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
+    defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
+    WTApplication::registerDefaults(*defaults);
+    delegate = std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
+  }
+  void TearDown() override {
+    window.reset();
+    delegate.reset();
+    qputenv("XDG_DATA_HOME", previousData);
+  }
+  void open() {
+    window = std::make_unique<WTMainWindowController>(*delegate);
+    window->show();
+    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+  }
+  QAction* item(const char* identifier) { return window->toolbarItem(identifier); }
+  bool validate(const char* identifier) { return window->validateToolbarItem(item(identifier)); }
+  void select(WTProject* project) { window->projectsViewController()->selectObject(project); }
+
+  QTemporaryDir home;
+  QByteArray previousData;
+  std::unique_ptr<UserDefaults> defaults;
+  SilentPresenter presenter;
+  std::unique_ptr<WTAppDelegate> delegate;
+  std::unique_ptr<WTMainWindowController> window;
+};
+
+TEST_F(WTMainWindowControllerTest, AStoreWithAnyProjectEvenArchivedIsNotFilled) {
+  {
+    WTObjectContext* context = delegate->managedObjectContext();
+    auto* project = WTProject::insertNewObject(context);
+    project->setName("Old");
+    project->setArchived(true);
+    ASSERT_TRUE(context->save());
+  }
+  open();
+  const QList<WTProject*> projects = window->fetchProjects();
+  ASSERT_EQ(projects.size(), 1);
+  EXPECT_EQ(projects[0]->name(), "Old");
+  // Hidden as archived until shown.
+  EXPECT_EQ(window->projectsViewController()->arrayController()->rowCount(), 0);
+  item("showArchived")->trigger();
+  EXPECT_EQ(window->projectsViewController()->arrayController()->rowCount(), 1);
+}
+
+TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
+  open();
+  EXPECT_EQ(window->selectedToolbarItemIdentifier(), "projects");
+  EXPECT_EQ(window->currentNavigationController(), window->projectsNavigationController());
+  EXPECT_EQ(window->topViewController(), window->projectsViewController());
+  // Showing the shown stack changes nothing, not even the toolbar's selection.
+  item("clients")->setChecked(true);
+  window->showProjects();
+  EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
+  EXPECT_EQ(window->currentNavigationController(), window->projectsNavigationController());
+
+  window->projectsViewController()->openProject(window->fetchProjects()[0]);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  window->showClients();
+  EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
+  EXPECT_EQ(window->topViewController(), window->clientsViewController());
+  EXPECT_EQ(window->contentView()->findChildren<QWidget*>(Qt::FindDirectChildrenOnly).size(), 1);
+  window->showProjects();
+  EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 2);
+  // The root, deliberately, even with the outline on top.
+  EXPECT_EQ(window->topViewController(), window->projectsViewController());
+  window->goBack();
+  EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 1);
+}
+
+TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndReportWaitsForAReportWindow) {
+  open();
+  WTObjectContext* context = delegate->managedObjectContext();
+  auto* archived = WTProject::insertNewObject(context);
+  archived->setName("Archived");
+  archived->setArchived(true);
+  item("showArchived")->trigger();
+  WTProject* active =
+      window->fetchProjects().value(0) == archived ? window->fetchProjects()[1] : window->fetchProjects()[0];
+  context->processPendingChanges();
+  window->projectsViewController()->arrayController()->rearrangeObjects();
+
+  EXPECT_TRUE(validate("archive"));
+  EXPECT_EQ(item("archive")->text(), "Archive");  // nothing selected
+  select(archived);
+  EXPECT_TRUE(validate("archive"));
+  EXPECT_EQ(item("archive")->text(), "Unarchive");
+  select(active);
+  validate("archive");
+  EXPECT_EQ(item("archive")->text(), "Archive");
+  // The command goes to the list, on the selection; the label follows once validated.
+  select(archived);
+  window->toggleArchive();
+  EXPECT_FALSE(archived->archived());
+  QCoreApplication::processEvents();
+  EXPECT_EQ(item("archive")->text(), "Archive");
+  EXPECT_TRUE(item("archive")->isEnabled());
+
+  EXPECT_FALSE(validate("report"));
+  for (const char* identifier : {"projects", "clients", "add", "remove"})
+    EXPECT_TRUE(validate(identifier)) << identifier;
+  EXPECT_FALSE(validate("toggleTimer"));  // no task to time in the lists
+
+  // With the outline on top the label follows the project itself.
+  window->projectsViewController()->openProject(active);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  active->setArchived(true);
+  EXPECT_TRUE(validate("archive"));
+  EXPECT_EQ(item("archive")->text(), "Unarchive");
+  EXPECT_TRUE(validate("toggleTimer"));
+  EXPECT_TRUE(validate("back"));
+}
+
+TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnTheStore) {
+  open();
+  WTObjectContext* context = delegate->managedObjectContext();
+  context->processPendingChanges();
+  const qsizetype before = window->fetchProjects().size();
+  item("add")->trigger();
+  EXPECT_EQ(window->fetchProjects().size(), before + 1);
+  EXPECT_TRUE(window->projectsViewController()->tableView()->isEditing());
+  window->projectsViewController()->tableView()->endEditing();
+  context->processPendingChanges();
+
+  window->findChild<QAction*>("undo")->trigger();
+  context->processPendingChanges();
+  EXPECT_EQ(window->fetchProjects().size(), before);
+  window->findChild<QAction*>("redo")->trigger();
+  EXPECT_EQ(window->fetchProjects().size(), before + 1);
+
+  window->showClients();
+  item("add")->trigger();
+  EXPECT_EQ(context->fetch<WTClient>().size(), 1);
+  item("report")->trigger();  // nobody offers it: dropped silently
+}
+
+TEST_F(WTMainWindowControllerTest, CustomRangeDefaultsAreRegisteredAndStoredValuesWin) {
+  const Date stored = Date::fromSeconds(1'000'000);
+  defaults->setValue("WTCustomRangeEnd", QVariant::fromValue(stored));
+  open();
+  ASSERT_TRUE(defaults->dateForKey("WTCustomRangeBegin"));
+  EXPECT_LT(*defaults->dateForKey("WTCustomRangeBegin"), Date::now());
+  EXPECT_EQ(defaults->dateForKey("WTCustomRangeEnd"), stored);
+  window->saveLastSelectedProject(3);
+  EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 3);
+}
+
+}  // namespace

@@ -1,0 +1,336 @@
+#include "UiFixture.h"
+#include "WTItemContainer.h"
+#include "WTItemsModel.h"
+
+#include <QMimeData>
+#include <QSignalSpy>
+
+namespace {
+
+class WTItemsModelTest : public UiTest {
+ protected:
+  void SetUp() override {
+    UiTest::SetUp();
+    project = makeProject("Website");
+    design = makeTask(project, "Design");
+    build = makeTask(project, "Build");
+    model = std::make_unique<WTItemsModel>(context.get());
+    tester = std::make_unique<QAbstractItemModelTester>(
+        model.get(), QAbstractItemModelTester::FailureReportingMode::Fatal);
+  }
+  void TearDown() override {
+    tester.reset();
+    model.reset();
+    UiTest::TearDown();
+  }
+
+  // The tree as text: "Task[Group[item,item],Group[...]]" per task, tasks joined by " ".
+  QString shape() {
+    QStringList tasks;
+    for (int t = 0; t < model->rowCount(); ++t) {
+      const QModelIndex task = model->index(t, 0);
+      QStringList groups;
+      for (int g = 0; g < model->rowCount(task); ++g) {
+        const QModelIndex group = model->index(g, 0, task);
+        QStringList items;
+        for (int i = 0; i < model->rowCount(group); ++i) {
+          items << model->index(i, 0, group).data(WTItemsModel::NameRole).toString();
+        }
+        const auto container = model->containerAt(group);
+        const QString title =
+            container->date() ? RZDate::stringWithPattern(*container->date(), "MM-dd") : "Pending";
+        groups << title + "[" + items.join(',') + "]";
+      }
+      tasks << task.data(WTItemsModel::NameRole).toString() + "[" + groups.join(',') + "]";
+    }
+    return tasks.join(' ');
+  }
+
+  // Drag of the rows of these records, as the view would start it.
+  std::unique_ptr<QMimeData> dragOf(std::initializer_list<const WTObject*> objects) {
+    QModelIndexList indexes;
+    for (const WTObject* object : objects) indexes << model->indexOfObject(object);
+    return std::unique_ptr<QMimeData>(model->mimeData(indexes));
+  }
+
+  WTProject* project = nullptr;
+  WTTask* design = nullptr;
+  WTTask* build = nullptr;
+  std::unique_ptr<WTItemsModel> model;
+  std::unique_ptr<QAbstractItemModelTester> tester;
+};
+
+TEST_F(WTItemsModelTest, TasksInStoredOrderThenPendingThenDaysNewestFirst) {
+  makeItem<WTToDo>(design, "older todo", at(2024, 3, 10));
+  makeItem<WTToDo>(design, "newer todo", at(2024, 3, 12));
+  auto* done = makeItem<WTToDo>(design, "done", at(2024, 3, 11, 9));
+  done->setCompleted(true);
+  makeItem<WTTime>(design, "morning", at(2024, 3, 11, 8));
+  makeItem<WTNote>(design, "note", at(2024, 3, 11, 15));
+  makeItem<WTExpense>(design, "ticket", at(2024, 3, 13));
+  model->setProject(project);
+  EXPECT_EQ(shape(), "Design[Pending[newer todo,older todo],03-13[ticket],03-11[note,done,morning]] Build[]");
+  // Groups are headers: never selected, but a drop target; tasks and items are both.
+  const QModelIndex task = model->index(0, 0);
+  const QModelIndex pending = model->index(0, 0, task);
+  EXPECT_FALSE(model->flags(pending) & Qt::ItemIsSelectable);
+  EXPECT_TRUE(model->flags(pending) & Qt::ItemIsDropEnabled);
+  EXPECT_TRUE(model->flags(task) & Qt::ItemIsSelectable);
+  EXPECT_TRUE(model->flags(model->index(0, 0, pending)) & Qt::ItemIsSelectable);
+  EXPECT_EQ(pending.data(WTItemsModel::NameRole).toString(), "Pending");
+}
+
+TEST_F(WTItemsModelTest, ChangesArriveAsRowMovesNotResets) {
+  auto* a = makeItem<WTTime>(design, "a", at(2024, 3, 11, 8));
+  auto* b = makeItem<WTTime>(design, "b", at(2024, 3, 11, 9));
+  model->setProject(project);
+  QSignalSpy resets(model.get(), &QAbstractItemModel::modelReset);
+  QSignalSpy layouts(model.get(), &QAbstractItemModel::layoutChanged);
+  QSignalSpy inserted(model.get(), &QAbstractItemModel::rowsInserted);
+  QSignalSpy removed(model.get(), &QAbstractItemModel::rowsRemoved);
+  QSignalSpy moved(model.get(), &QAbstractItemModel::rowsMoved);
+
+  // A new day group above, with its item inside.
+  makeItem<WTFlat>(design, "fee", at(2024, 3, 12));
+  endTurn();
+  EXPECT_EQ(shape(), "Design[03-12[fee],03-11[b,a]] Build[]");
+  EXPECT_EQ(inserted.count(), 1);
+
+  // Moving an item to another day takes it out of one group and into the other; the emptied group goes.
+  a->setDate(at(2024, 3, 12));
+  b->setDate(at(2024, 3, 12));
+  endTurn();
+  EXPECT_EQ(shape(), "Design[03-12[fee,b,a]] Build[]");
+  // Reordering the tasks moves their rows.
+  project->moveTask(build, 0);
+  endTurn();
+  EXPECT_EQ(shape(), "Build[] Design[03-12[fee,b,a]]");
+  EXPECT_EQ(moved.count(), 1);
+  // An item that changes task moves between task rows.
+  a->setTask(build);
+  endTurn();
+  EXPECT_EQ(shape(), "Build[03-12[a]] Design[03-12[fee,b]]");
+  // Deleting a task takes its row away.
+  context->deleteObject(design);
+  endTurn();
+  EXPECT_EQ(shape(), "Build[03-12[a]]");
+  EXPECT_GE(removed.count(), 2);
+  EXPECT_EQ(resets.count(), 0);
+  EXPECT_EQ(layouts.count(), 0);
+}
+
+TEST_F(WTItemsModelTest, ARunningTimersTickRepaintsOnlyItsRowItsGroupAndItsTask) {
+  makeItem<WTNote>(design, "quiet", at(2024, 3, 14, 8));
+  makeItem<WTTime>(build, "other task", at(2024, 3, 14, 8));
+  auto* running = makeItem<WTTime>(design, "running", at(2024, 3, 14, 9));
+  running->setRunning(true);
+  model->setProject(project);
+  endTurn();
+  running->peek();  // the minutes seen so far
+  QSignalSpy changed(model.get(), &QAbstractItemModel::dataChanged);
+  QSignalSpy resets(model.get(), &QAbstractItemModel::modelReset);
+  QSignalSpy layouts(model.get(), &QAbstractItemModel::layoutChanged);
+  QSignalSpy inserted(model.get(), &QAbstractItemModel::rowsInserted);
+  QSignalSpy removed(model.get(), &QAbstractItemModel::rowsRemoved);
+  int projectChanges = 0;
+  QObject::connect(model.get(), &WTItemsModel::projectChanged, [&] { ++projectChanges; });
+
+  now = now.addingSeconds(61);
+  ASSERT_TRUE(running->peek());
+  QCoreApplication::processEvents();
+
+  QSet<QString> rows;
+  for (const QList<QVariant>& signal : changed) {
+    const auto top = signal[0].value<QModelIndex>();
+    EXPECT_EQ(top, signal[1].value<QModelIndex>()) << "one row per signal";
+    rows << (model->isContainerIndex(top) ? QString("group") : top.data(WTItemsModel::NameRole).toString());
+  }
+  EXPECT_EQ(rows, (QSet<QString>{"running", "group", "Design"}));
+  EXPECT_EQ(changed.count(), 3);
+  EXPECT_GE(projectChanges, 1);
+  EXPECT_EQ(resets.count() + layouts.count() + inserted.count() + removed.count(), 0);
+  EXPECT_EQ(model->index(0, 0).data(WTItemsModel::DurationTextRole).toString(), QString("01:01"));
+
+  // A peek within the same minute disturbs nobody.
+  changed.clear();
+  now = now.addingSeconds(5);
+  EXPECT_FALSE(running->peek());
+  QCoreApplication::processEvents();
+  EXPECT_EQ(changed.count(), 0);
+}
+
+TEST_F(WTItemsModelTest, ThePasteboardCarriesUuidsInOutlineOrderAndTheTaskFlag) {
+  auto* older = makeItem<WTNote>(design, "older", at(2024, 3, 10));
+  auto* newer = makeItem<WTNote>(design, "newer", at(2024, 3, 12));
+  model->setProject(project);
+  // Handed over in selection order, written in outline order.
+  auto items = dragOf({older, newer});
+  ASSERT_TRUE(items);
+  EXPECT_EQ(WTItemsModel::objectUUIDs(items.get()), (QStringList{newer->uuid(), older->uuid()}));
+  EXPECT_FALSE(WTItemsModel::containsTasks(items.get()));
+  EXPECT_TRUE(items->hasFormat("WTObjectUUIDs"));
+  EXPECT_TRUE(items->hasFormat("WTContainsTasks"));
+
+  auto mixed = dragOf({older, build});
+  EXPECT_EQ(WTItemsModel::objectUUIDs(mixed.get()), (QStringList{older->uuid(), build->uuid()}));
+  EXPECT_TRUE(WTItemsModel::containsTasks(mixed.get()));
+
+  // Only group rows: nothing to drag.
+  const QModelIndex group = model->index(0, 0, model->index(0, 0));
+  EXPECT_EQ(model->mimeData({group}), nullptr);
+}
+
+TEST_F(WTItemsModelTest, DropValidation) {
+  auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
+  auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11));
+  model->setProject(project);
+  const QModelIndex designRow = model->indexOfObject(design);
+  const QModelIndex pendingRow = model->indexOfContainer(design, std::nullopt);
+  const QModelIndex dayRow = model->indexOfContainer(design, at(2024, 3, 11, 0));
+  const QModelIndex itemRow = model->indexOfObject(time);
+  ASSERT_TRUE(pendingRow.isValid() && dayRow.isValid());
+
+  auto items = dragOf({todo, time});
+  auto tasks = dragOf({build, time});
+  QMimeData foreign;
+  foreign.setText("not ours");
+  QMimeData onlyFlag;
+  onlyFlag.setData("WTContainsTasks", [] {
+    QByteArray bytes;
+    QDataStream(&bytes, QIODevice::WriteOnly) << false;
+    return bytes;
+  }());
+
+  struct Case {
+    const char* what;
+    const QMimeData* data;
+    int row;
+    QModelIndex parent;
+    bool accepted;
+  };
+  const Case cases[] = {
+      {"tasks between top-level rows", tasks.get(), 1, {}, true},
+      {"tasks at the end of the outline", tasks.get(), -1, {}, true},
+      {"tasks onto a task", tasks.get(), -1, designRow, false},
+      {"tasks into a group", tasks.get(), 0, pendingRow, false},
+      {"items onto a task", items.get(), -1, designRow, true},
+      {"items onto a day group", items.get(), -1, dayRow, true},
+      {"items onto the pending group", items.get(), -1, pendingRow, true},
+      {"items between rows of a group", items.get(), 0, dayRow, false},
+      {"items between tasks", items.get(), 1, {}, false},
+      {"items onto an item", items.get(), -1, itemRow, false},
+      {"a drag without uuids", &onlyFlag, -1, designRow, false},
+      {"something else altogether", &foreign, -1, designRow, false},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(model->canDropMimeData(c.data, Qt::MoveAction, c.row, 0, c.parent), c.accepted) << c.what;
+  }
+}
+
+TEST_F(WTItemsModelTest, DroppingOnAGroupMovesTheItemsThere) {
+  auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
+  todo->setCompleted(true);
+  auto* time = makeItem<WTTime>(build, "time", at(2024, 3, 11, 9, 15));
+  auto* note = makeItem<WTNote>(build, "note", at(2024, 3, 12, 9));
+  makeItem<WTToDo>(design, "open", at(2024, 3, 9));
+  model->setProject(project);
+
+  // A time entry dropped on a day of another task: that task, that day, same time of day.
+  auto drag = dragOf({time});
+  const QModelIndex day = model->indexOfContainer(design, at(2024, 3, 10, 0));
+  ASSERT_TRUE(model->dropMimeData(drag.get(), Qt::MoveAction, -1, 0, day));
+  EXPECT_EQ(time->task(), design);
+  EXPECT_EQ(RZDate::stringWithPattern(*time->startDate(), "yyyy-MM-dd HH:mm"), "2024-03-10 09:15");
+
+  // Onto "Pending": a to-do opens again, anything else stays as it was (and the drop still succeeds).
+  const QModelIndex pending = model->indexOfContainer(design, std::nullopt);
+  auto todos = dragOf({todo, note});
+  ASSERT_TRUE(model->dropMimeData(todos.get(), Qt::MoveAction, -1, 0, pending));
+  EXPECT_FALSE(todo->completed());
+  EXPECT_EQ(note->task(), build);
+  EXPECT_EQ(RZDate::stringWithPattern(*note->startDate(), "MM-dd"), "03-12");
+
+  // Onto a task: the item changes task and keeps its date.
+  auto again = dragOf({note});
+  ASSERT_TRUE(model->dropMimeData(again.get(), Qt::MoveAction, -1, 0, model->indexOfObject(design)));
+  EXPECT_EQ(note->task(), design);
+  EXPECT_EQ(RZDate::stringWithPattern(*note->startDate(), "MM-dd"), "03-12");
+  endTurn();
+  EXPECT_EQ(shape(), "Design[Pending[todo,open],03-12[note],03-10[time]] Build[]");
+}
+
+TEST_F(WTItemsModelTest, DroppingTasksReordersThemAndIgnoresTheItems) {
+  auto* write = makeTask(project, "Write");
+  auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11));
+  model->setProject(project);
+  // Write (last) dragged with an item to the top.
+  auto drag = dragOf({write, time});
+  ASSERT_TRUE(model->dropMimeData(drag.get(), Qt::MoveAction, 0, 0, {}));
+  EXPECT_EQ(project->tasks(), (QList<WTTask*>{write, design, build}));
+  EXPECT_EQ(time->task(), design);
+  // Design (first) dropped below Build: a place past the task counts without it.
+  auto down = dragOf({write});
+  ASSERT_TRUE(model->dropMimeData(down.get(), Qt::MoveAction, 2, 0, {}));
+  EXPECT_EQ(project->tasks(), (QList<WTTask*>{design, write, build}));
+  endTurn();
+  EXPECT_EQ(shape(), "Design[03-11[time]] Write[] Build[]");
+}
+
+TEST_F(WTItemsModelTest, RowsAreFoundAgainByTheirPersistentIdentity) {
+  auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
+  auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11, 9));
+  model->setProject(project);
+  const QModelIndex rows[] = {model->indexOfObject(design), model->indexOfObject(time),
+                              model->indexOfContainerOfItem(todo), model->indexOfContainerOfItem(time)};
+  QStringList identities;
+  for (const QModelIndex& row : rows) {
+    ASSERT_TRUE(row.isValid());
+    identities << model->persistentIdentity(row);
+  }
+  // A fresh model over the same records (as after a relaunch) finds the same rows.
+  WTItemsModel other(context.get());
+  other.setProject(project);
+  for (int i = 0; i < identities.size(); ++i) {
+    const QModelIndex found = other.indexForPersistentIdentity(identities[i]);
+    ASSERT_TRUE(found.isValid()) << identities[i].toStdString();
+    EXPECT_EQ(other.persistentIdentity(found), identities[i]);
+    EXPECT_EQ(found.data(WTItemsModel::NameRole), rows[i].data(WTItemsModel::NameRole));
+  }
+  EXPECT_FALSE(other.indexForPersistentIdentity(design->uuid() + "|12345").isValid());
+  EXPECT_FALSE(other.indexForPersistentIdentity("nobody@WTTask").isValid());
+}
+
+TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
+  auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11, 9));
+  auto* flat = makeItem<WTFlat>(design, "flat", at(2024, 3, 11, 10));
+  auto* expense = makeItem<WTExpense>(design, "expense", at(2024, 3, 11, 11));
+  model->setProject(project);
+  EXPECT_TRUE(model->setData(model->indexOfObject(time), "1:30", WTItemsModel::DurationEditRole));
+  EXPECT_EQ(time->duration(), 90);
+  EXPECT_TRUE(model->setData(model->indexOfObject(flat), "45", WTItemsModel::DurationEditRole));
+  EXPECT_EQ(flat->duration(), 45);
+  EXPECT_TRUE(model->setData(model->indexOfObject(expense), "12.50", WTItemsModel::AmountEditRole));
+  EXPECT_EQ(expense->expense(), Decimal::fromString(u"12.5"));
+  EXPECT_FALSE(model->setData(model->indexOfObject(expense), "twelve", WTItemsModel::AmountEditRole));
+  EXPECT_FALSE(model->setData(model->indexOfObject(expense), "1:00", WTItemsModel::DurationEditRole));
+  // A running entry's length belongs to the clock.
+  time->setRunning(true);
+  EXPECT_FALSE(model->setData(model->indexOfObject(time), "2:00", WTItemsModel::DurationEditRole));
+  EXPECT_TRUE(model->setData(model->indexOfObject(design), "Design & UX", WTItemsModel::NameRole));
+  EXPECT_EQ(design->name(), "Design & UX");
+  EXPECT_TRUE(model->setData(model->indexOfObject(flat), "line one\nline two", WTItemsModel::NotesRole));
+  EXPECT_EQ(flat->notes(), "line one\nline two");
+}
+
+TEST_F(WTItemsModelTest, DeletingTheShownProjectEmptiesTheModel) {
+  makeItem<WTNote>(design, "note", at(2024, 3, 11));
+  model->setProject(project);
+  QSignalSpy deleted(model.get(), &WTItemsModel::projectDeleted);
+  context->deleteObject(project);
+  endTurn();
+  EXPECT_EQ(deleted.count(), 1);
+  EXPECT_EQ(model->project(), nullptr);
+  EXPECT_EQ(model->rowCount(), 0);
+}
+
+}  // namespace

@@ -1,0 +1,274 @@
+#include "UiFixture.h"
+#include "WTDatePopover.h"
+#include "WTItemCellDelegate.h"
+#include "WTItemContainer.h"
+#include "WTItemsModel.h"
+#include "WTItemsViewController.h"
+#include "WTNavigationController.h"
+#include "WTNotesTextView.h"
+#include "WTOutlineView.h"
+
+#include <QCalendarWidget>
+#include <QLineEdit>
+
+namespace {
+
+class WTItemsViewControllerTest : public UiTest {
+ protected:
+  void SetUp() override {
+    UiTest::SetUp();
+    project = makeProject("Website");
+    design = makeTask(project, "Design");
+    build = makeTask(project, "Build");
+    controller = std::make_unique<WTItemsViewController>(context.get());
+    controller->setProject(project);
+    window = std::make_unique<TestHostWindow>();
+    window->setCentralWidget(controller->view());
+    window->resize(900, 600);
+    window->show();
+    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+    controller->willDisplayView();
+    tester = std::make_unique<QAbstractItemModelTester>(
+        controller->treeController(), QAbstractItemModelTester::FailureReportingMode::Fatal);
+  }
+  void TearDown() override {
+    tester.reset();
+    window->takeCentralWidget();
+    controller.reset();
+    window.reset();
+    UiTest::TearDown();
+  }
+
+  WTOutlineView* outline() { return controller->outlineView(); }
+  WTItemsModel* model() { return controller->treeController(); }
+  bool isEditing() { return outline()->isEditing(); }
+  QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
+
+  WTProject* project = nullptr;
+  WTTask* design = nullptr;
+  WTTask* build = nullptr;
+  std::unique_ptr<WTItemsViewController> controller;
+  std::unique_ptr<TestHostWindow> window;
+  std::unique_ptr<QAbstractItemModelTester> tester;
+};
+
+TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpenRows) {
+  makeItem<WTNote>(build, "yesterday", at(2024, 3, 13));
+  ASSERT_FALSE(outline()->isExpanded(rowOf(build)));
+  WTTime* time = controller->addTimeItem(build);
+  ASSERT_NE(time, nullptr);
+  EXPECT_TRUE(time->running());
+  EXPECT_EQ(time->task(), build);
+  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  EXPECT_TRUE(outline()->selectionModel()->isSelected(rowOf(time)));
+  EXPECT_TRUE(isEditing());
+  EXPECT_TRUE(outline()->isExpanded(rowOf(build)));
+  EXPECT_TRUE(outline()->isExpanded(model()->indexOfContainerOfItem(time)));
+  // The day of yesterday's note stays as it was.
+  EXPECT_FALSE(outline()->isExpanded(model()->indexOfContainer(build, at(2024, 3, 13, 0))));
+  // Each kind lands in the task it was asked for; nothing without a task.
+  for (WTEntity kind : {WTEntity::Flat, WTEntity::Note, WTEntity::Expense, WTEntity::ToDo}) {
+    WTItem* item = controller->addItem(kind, design);
+    ASSERT_NE(item, nullptr);
+    EXPECT_EQ(item->entity(), kind);
+    EXPECT_EQ(item->task(), design);
+    EXPECT_EQ(outline()->currentIndex(), rowOf(item));
+  }
+  EXPECT_EQ(controller->addItem(WTEntity::Flat, nullptr), nullptr);
+}
+
+TEST_F(WTItemsViewControllerTest, TheTimerButtonStartsAndSelectsThenStops) {
+  controller->toggleTimerOfTask(design);
+  ASSERT_TRUE(design->running());
+  const QList<WTTime*> times = design->runningTimes();
+  ASSERT_EQ(times.size(), 1);
+  EXPECT_EQ(outline()->currentIndex(), rowOf(times[0]));
+  controller->toggleTimerOfTask(design);
+  EXPECT_FALSE(design->running());
+  // The keyboard command acts on the task of the selected row.
+  outline()->setCurrentIndex(rowOf(times[0]));
+  controller->toggleTimer();
+  EXPECT_TRUE(design->running());
+  controller->stopTimer(design->runningTimes().value(0));
+  EXPECT_FALSE(design->running());
+}
+
+TEST_F(WTItemsViewControllerTest, CompletingAToDoStampsItsDateAndRegroupsIt) {
+  auto* todo = makeItem<WTToDo>(design, "call back", at(2024, 3, 1));
+  endTurn();
+  ASSERT_EQ(model()->indexOfContainerOfItem(todo), model()->indexOfContainer(design, std::nullopt));
+  todo->setCompleted(true);
+  controller->toggleCompleted(todo);
+  EXPECT_EQ(todo->startDate(), now);
+  const QModelIndex today = model()->indexOfContainer(design, RZDate::midnight(now));
+  ASSERT_TRUE(today.isValid());
+  EXPECT_EQ(model()->indexOfContainerOfItem(todo), today);
+  EXPECT_TRUE(outline()->isExpanded(today));
+  EXPECT_FALSE(model()->indexOfContainer(design, std::nullopt).isValid());  // "Pending" is empty now
+  // Opening it again keeps the completion date.
+  now = now.addingSeconds(3600);
+  todo->setCompleted(false);
+  controller->toggleCompleted(todo);
+  EXPECT_EQ(todo->startDate(), now.addingSeconds(-3600));
+  EXPECT_EQ(model()->indexOfContainerOfItem(todo), model()->indexOfContainer(design, std::nullopt));
+}
+
+TEST_F(WTItemsViewControllerTest, TheDatePopoverMovesTheItemToThePickedDay) {
+  auto* time = makeItem<WTTime>(design, "meeting", at(2024, 3, 14, 9, 15));
+  endTurn();
+  controller->openDatePicker(time, QRect(100, 100, 20, 20));
+  ASSERT_EQ(controller->currentItem(), time);
+  WTDatePopover* popover = controller->popover();
+  ASSERT_TRUE(popover->isVisible());
+  EXPECT_EQ(popover->date(), QDate(2024, 3, 14));
+  // A second open while it shows is ignored.
+  auto* other = makeItem<WTNote>(design, "other", at(2024, 3, 2));
+  controller->openDatePicker(other, QRect(0, 0, 20, 20));
+  EXPECT_EQ(controller->currentItem(), time);
+
+  popover->setDate(QDate(2024, 3, 9));
+  popover->hide();
+  EXPECT_EQ(controller->currentItem(), nullptr);
+  EXPECT_EQ(RZDate::stringWithPattern(*time->startDate(), "yyyy-MM-dd HH:mm"), "2024-03-09 09:15");
+  EXPECT_EQ(time->duration(), 30);
+  const QModelIndex day = model()->indexOfContainer(design, at(2024, 3, 9, 0));
+  ASSERT_TRUE(day.isValid());
+  EXPECT_TRUE(outline()->isExpanded(day));
+
+  // Closed without another day chosen: the item is left alone.
+  controller->openDatePicker(other, QRect(0, 0, 20, 20));
+  const Date before = *other->startDate();
+  popover->hide();
+  EXPECT_EQ(*other->startDate(), before);
+}
+
+TEST_F(WTItemsViewControllerTest, RowHeightsFollowTheKindAndTheNotes) {
+  auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 14));
+  controller->expandContainerOfItem(note);
+  endTurn();
+  const QModelIndex task = rowOf(design);
+  const QModelIndex group = model()->indexOfContainerOfItem(note);
+  const QModelIndex item = rowOf(note);
+  // Tasks and groups take their cell's height exactly; items never less than 30 points.
+  EXPECT_EQ(controller->heightOfRow(task),
+            controller->cellViewPrototypeForIndex(task).requestedHeight(false));
+  EXPECT_LT(controller->heightOfRow(group), 30);
+  EXPECT_EQ(controller->heightOfRow(item), 30);
+
+  // Notes put their field under the main line: at least 20 points, at most 300.
+  note->setNotes("one line");
+  const qreal oneLine = controller->heightOfRow(item);
+  EXPECT_GE(oneLine, 30 + WTTableCellView::kMinimumNotesHeight);
+  note->setNotes(QString("a line of notes\n").repeated(200));
+  EXPECT_EQ(controller->heightOfRow(item),
+            30 + WTTableCellView::kMaximumNotesHeight + WTTableCellView::kNotesBottomMargin);
+  note->setNotes(QString());
+  EXPECT_EQ(controller->heightOfRow(item), 30);
+}
+
+TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksItWhenLeft) {
+  auto* flat = makeItem<WTFlat>(design, "fee", at(2024, 3, 14));
+  endTurn();
+  controller->expandContainerOfItem(flat);
+  QTest::qWait(10);  // the outline lays out its rows
+  const QModelIndex row = rowOf(flat);
+  const qreal plain = outline()->visualRect(row).height();
+  EXPECT_EQ(plain, 30);
+
+  controller->showNotes(flat);
+  WTNotesTextView* editor = controller->cellDelegate()->notesEditor();
+  ASSERT_NE(editor, nullptr);
+  QCoreApplication::processEvents();
+  const qreal open = outline()->visualRect(row).height();
+  EXPECT_GE(open, plain + WTTableCellView::kMinimumNotesHeight);  // shown while edited, though empty
+
+  editor->setPlainText("first\nsecond\nthird\nfourth");
+  QTest::qWait(10);
+  const qreal grown = outline()->visualRect(row).height();
+  EXPECT_GT(grown, open);
+  EXPECT_EQ(flat->notes(), QString());  // stored only when editing ends
+
+  // Cleared while still edited: the field stays until it is left.
+  editor->clear();
+  QTest::qWait(10);
+  EXPECT_GE(outline()->visualRect(row).height(), plain + WTTableCellView::kMinimumNotesHeight);
+  outline()->setFocus();
+  QTest::qWait(10);
+  EXPECT_EQ(controller->cellDelegate()->notesEditor(), nullptr);
+  EXPECT_EQ(outline()->visualRect(row).height(), plain);
+
+  controller->showNotes(flat);
+  controller->cellDelegate()->notesEditor()->setPlainText("kept");
+  outline()->setFocus();
+  QTest::qWait(10);
+  EXPECT_EQ(flat->notes(), "kept");
+  EXPECT_GT(outline()->visualRect(row).height(), plain);
+}
+
+TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
+  auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 10));
+  makeItem<WTToDo>(build, "todo", at(2024, 3, 11));
+  endTurn();
+  outline()->expand(rowOf(design));
+  outline()->expand(model()->indexOfContainerOfItem(note));
+  EXPECT_EQ(controller->autosaveName(), project->uuid());
+
+  // Another project shown meanwhile keeps its own.
+  WTProject* other = makeProject("Other");
+  makeTask(other, "Alone");
+  controller->setProject(other);
+  controller->willDisplayView();
+  EXPECT_FALSE(outline()->isExpanded(model()->index(0, 0)));
+
+  // A new controller (as after a relaunch) over the same settings.
+  WTItemsViewController again(context.get());
+  again.setProject(project);
+  again.view()->resize(800, 400);
+  again.willDisplayView();
+  WTItemsModel* tree = again.treeController();
+  EXPECT_TRUE(again.outlineView()->isExpanded(tree->indexOfObject(design)));
+  EXPECT_TRUE(again.outlineView()->isExpanded(tree->indexOfContainerOfItem(note)));
+  EXPECT_FALSE(again.outlineView()->isExpanded(tree->indexOfObject(build)));
+}
+
+TEST_F(WTItemsViewControllerTest, WindowCommandsActOnTheProjectAndTheSelection) {
+  using Command = WTViewController::Command;
+  EXPECT_TRUE(controller->respondsTo(Command::ToggleArchive));
+  EXPECT_FALSE(controller->respondsTo(Command::Report));  // no report window yet
+  EXPECT_EQ(controller->selectedObject(), project);
+  controller->toggleArchive();
+  EXPECT_TRUE(project->archived());
+
+  controller->addObject();
+  ASSERT_EQ(project->tasks().size(), 3);
+  WTTask* fresh = project->tasks().last();
+  EXPECT_EQ(outline()->currentIndex(), rowOf(fresh));
+  EXPECT_TRUE(isEditing());
+  auto* editor = outline()->findChild<QLineEdit*>("nameEditor");
+  ASSERT_NE(editor, nullptr);
+  editor->setText("Deploy");
+  outline()->setFocus();
+  QCoreApplication::processEvents();
+  EXPECT_EQ(fresh->name(), "Deploy");
+
+  auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 10));
+  controller->selectItem(note);
+  outline()->selectionModel()->select(rowOf(build), QItemSelectionModel::Select | QItemSelectionModel::Rows);
+  controller->removeSelectedObjects();
+  EXPECT_TRUE(note->isDeleted() || !context->fetch<WTNote>().contains(note));
+  EXPECT_EQ(project->tasks(), (QList<WTTask*>{design, fresh}));
+  EXPECT_EQ(model()->rowCount(), 2);
+}
+
+TEST_F(WTItemsViewControllerTest, AnEmptyRateFieldInherits) {
+  QLineEdit* rate = controller->rateField();
+  rate->setText("120");
+  controller->projectRateAction();
+  EXPECT_EQ(project->storedRate(), Decimal(120));
+  rate->clear();
+  controller->projectRateAction();
+  EXPECT_EQ(project->storedRate(), std::nullopt);
+  EXPECT_EQ(rate->placeholderText(), "Inherited");
+}
+
+}  // namespace

@@ -1,0 +1,268 @@
+#include "UiFixture.h"
+#include "WTClient.h"
+#include "WTClientsViewController.h"
+#include "WTItemsModel.h"
+#include "WTItemsViewController.h"
+#include "WTListView.h"
+#include "WTNavigationController.h"
+#include "WTObjectListModel.h"
+#include "WTProjectsViewController.h"
+
+#include <QAction>
+#include <QLineEdit>
+#include <QMenu>
+#include <QSignalSpy>
+
+namespace {
+
+auto notArchived = [](const WTObject* object) { return !object->archived(); };
+
+class WTObjectListModelTest : public UiTest {};
+
+QStringList names(const WTObjectListModel& model) {
+  QStringList result;
+  for (int row = 0; row < model.rowCount(); ++row)
+    result << model.index(row, 0).data(WTObjectListModel::NameRole).toString();
+  return result;
+}
+
+TEST_F(WTObjectListModelTest, KeepsFilterAndOrderWithExactRowChanges) {
+  makeProject("beta");
+  auto* alpha = makeProject("Alpha");
+  auto* gamma = makeProject("gamma");
+  gamma->setArchived(true);
+  WTObjectListModel model(context.get(), WTEntity::Project);
+  QAbstractItemModelTester tester(&model, QAbstractItemModelTester::FailureReportingMode::Fatal);
+  model.setFilterPredicate(notArchived);
+  EXPECT_EQ(names(model), (QStringList{"Alpha", "beta"}));  // case does not decide the order
+
+  QSignalSpy resets(&model, &QAbstractItemModel::modelReset);
+  QSignalSpy moved(&model, &QAbstractItemModel::rowsMoved);
+  QSignalSpy inserted(&model, &QAbstractItemModel::rowsInserted);
+  QSignalSpy removed(&model, &QAbstractItemModel::rowsRemoved);
+  alpha->setName("zulu");
+  endTurn();
+  EXPECT_EQ(names(model), (QStringList{"beta", "zulu"}));
+  EXPECT_EQ(moved.count(), 1);
+  gamma->setArchived(false);
+  endTurn();
+  EXPECT_EQ(names(model), (QStringList{"beta", "gamma", "zulu"}));
+  EXPECT_EQ(inserted.count(), 1);
+  context->deleteObject(gamma);
+  endTurn();
+  EXPECT_EQ(names(model), (QStringList{"beta", "zulu"}));
+  EXPECT_EQ(removed.count(), 1);
+  // Undo brings it back in its place.
+  context->undoManager().undo();
+  endTurn();
+  EXPECT_EQ(names(model), (QStringList{"beta", "gamma", "zulu"}));
+  EXPECT_EQ(resets.count(), 0);
+}
+
+TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setName("ACME");
+  auto* project = makeProject("Site");
+  auto* task = makeTask(project, "Work");
+  makeItem<WTTime>(task, "time", at(2024, 3, 14, 9));  // 30 minutes at the default rate 50
+  WTObjectListModel projects(context.get(), WTEntity::Project);
+  WTObjectListModel clients(context.get(), WTEntity::Client);
+  const QModelIndex row = projects.index(0, 0);
+  EXPECT_EQ(row.data(WTObjectListModel::SubtitleRole).toString(), "No Client");
+  EXPECT_EQ(row.data(WTObjectListModel::DurationTextRole).toString(), "00:30");
+  EXPECT_EQ(row.data(WTObjectListModel::ImageRole).toString(), "folder_32");
+  QSignalSpy changed(&projects, &QAbstractItemModel::dataChanged);
+  ASSERT_TRUE(
+      projects.setData(row, WTObjectListModel::variantFromObject(client), WTObjectListModel::ClientRole));
+  EXPECT_EQ(project->client(), client);
+  project->setArchived(true);
+  client->setName("ACME Ltd");
+  endTurn();
+  EXPECT_GE(changed.count(), 1);
+  EXPECT_EQ(row.data(WTObjectListModel::SubtitleRole).toString(), "ACME Ltd");
+  EXPECT_EQ(row.data(WTObjectListModel::ImageRole).toString(), "folder_32_dis");
+  EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
+  EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::SubtitleRole).toString(), QString("1 project"));
+  // 30 minutes at the client's inherited rate of 100.
+  EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::CostTextRole).toString(), QString("50.00"));
+  // Only a project takes a client, and only a client is one.
+  EXPECT_FALSE(
+      projects.setData(row, WTObjectListModel::variantFromObject(task), WTObjectListModel::ClientRole));
+  EXPECT_FALSE(clients.setData(clients.index(0, 0), WTObjectListModel::variantFromObject(client),
+                               WTObjectListModel::ClientRole));
+}
+
+class WTListControllerTest : public UiTest {
+ protected:
+  void SetUp() override {
+    UiTest::SetUp();
+    window = std::make_unique<TestHostWindow>();
+    stack = std::make_unique<WTNavigationController>();
+    window->stack = stack.get();
+    projects = std::make_unique<WTProjectsViewController>(context.get());
+    projects->setArchivedPredicate(notArchived);
+    window->setCentralWidget(stack->view());
+    window->resize(800, 500);
+    stack->pushViewController(projects.get());
+    window->show();
+    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+  }
+  void TearDown() override {
+    window->takeCentralWidget();
+    stack.reset();
+    projects.reset();
+    window.reset();
+    UiTest::TearDown();
+  }
+  QAction* taggedAction(QMenu* menu) {
+    for (QAction* action : menu->actions()) {
+      if (action->data().toInt() == 1) return action;
+    }
+    return nullptr;
+  }
+
+  std::unique_ptr<TestHostWindow> window;
+  std::unique_ptr<WTNavigationController> stack;
+  std::unique_ptr<WTProjectsViewController> projects;
+};
+
+TEST_F(WTListControllerTest, ANewProjectHasATaskGeneralAndItsNameIsEditedAtOnce) {
+  makeProject("Existing");
+  endTurn();
+  projects->addObject();
+  const QList<WTProject*> all = context->fetch<WTProject>();
+  ASSERT_EQ(all.size(), 2);
+  WTProject* fresh = all[0]->name().isEmpty() ? all[0] : all[1];
+  ASSERT_EQ(fresh->tasks().size(), 1);
+  EXPECT_EQ(fresh->tasks()[0]->name(), "General");
+  EXPECT_TRUE(projects->tableView()->isEditing());
+  EXPECT_EQ(projects->tableView()->currentIndex(), projects->arrayController()->indexOfObject(fresh));
+  auto* editor = projects->tableView()->findChild<QLineEdit*>("nameEditor");
+  ASSERT_NE(editor, nullptr);
+  editor->setText("Brand new");
+  projects->tableView()->setFocus();
+  QTest::qWait(10);
+  EXPECT_EQ(fresh->name(), "Brand new");
+}
+
+TEST_F(WTListControllerTest, ANewRecordTheListHidesIsMadeButNotEdited) {
+  // Every listed project: a filter that hides new, unnamed ones.
+  projects->setArchivedPredicate([](const WTObject* object) { return !object->name().isEmpty(); });
+  projects->addObject();
+  EXPECT_EQ(context->fetch<WTProject>().size(), 1);
+  EXPECT_FALSE(projects->tableView()->isEditing());
+}
+
+TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowNotTheSelection) {
+  auto* archived = makeProject("Archived");
+  auto* selected = makeProject("Selected");
+  archived->setArchived(true);
+  projects->setArchivedPredicate({});  // archived ones shown
+  endTurn();
+  projects->selectObject(selected);
+  WTListView* table = projects->tableView();
+  QMenu* menu = projects->rowMenu();
+
+  table->setClickedRow(projects->arrayController()->rowOfObject(archived));
+  projects->menuNeedsUpdate(menu);
+  QAction* tagged = taggedAction(menu);
+  ASSERT_NE(tagged, nullptr);
+  EXPECT_EQ(tagged->text(), "Unarchive");
+  tagged->trigger();
+  EXPECT_FALSE(archived->archived());
+  EXPECT_FALSE(selected->archived());
+
+  table->setClickedRow(projects->arrayController()->rowOfObject(selected));
+  projects->menuNeedsUpdate(menu);
+  EXPECT_EQ(tagged->text(), "Archive");
+  // With no clicked row the menu is left as it was, and the toolbar's command takes the selection.
+  table->setClickedRow(-1);
+  tagged->setText("untouched");
+  projects->menuNeedsUpdate(menu);
+  EXPECT_EQ(tagged->text(), "untouched");
+  projects->toggleArchive();
+  EXPECT_TRUE(selected->archived());
+  EXPECT_FALSE(archived->archived());
+}
+
+TEST_F(WTListControllerTest, TheToolbarArchiveTakesTheLastSelectedAndRemoveDeletesAtOnce) {
+  auto* a = makeProject("A");
+  auto* b = makeProject("B");
+  auto* c = makeProject("C");
+  endTurn();
+  QSignalSpy validation(projects.get(), &WTViewController::validationChanged);
+  auto* selection = projects->tableView()->selectionModel();
+  selection->select(projects->arrayController()->indexOfObject(c), QItemSelectionModel::Select);
+  selection->select(projects->arrayController()->indexOfObject(a), QItemSelectionModel::Select);
+  EXPECT_GE(validation.count(), 1);
+  EXPECT_EQ(projects->selectedObject(), c);  // last in list order
+  projects->toggleArchive();
+  EXPECT_TRUE(c->archived());
+  EXPECT_FALSE(a->archived());
+  endTurn();  // the archived one leaves the list
+
+  projects->tableView()->selectionModel()->select(projects->arrayController()->indexOfObject(a),
+                                                  QItemSelectionModel::ClearAndSelect);
+  projects->removeSelectedObjects();
+  const QList<WTProject*> left = context->fetch<WTProject>();
+  EXPECT_EQ(QSet<WTProject*>(left.begin(), left.end()), (QSet<WTProject*>{b, c}));
+  EXPECT_EQ(names(*projects->arrayController()), QStringList{"B"});
+  EXPECT_EQ(projects->selectedObject(), nullptr);
+  projects->toggleArchive();  // nothing selected: nothing happens
+  EXPECT_FALSE(b->archived());
+}
+
+TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {
+  auto* first = makeProject("First");
+  makeTask(first, "Only task");
+  auto* second = makeProject("Second");
+  endTurn();
+  projects->openProject(first);
+  EXPECT_EQ(stack->viewControllers().size(), 1);  // on the next turn, after the click
+  ASSERT_TRUE(QTest::qWaitFor([&] { return stack->viewControllers().size() == 2; }));
+  WTItemsViewController* items = projects->itemsViewController();
+  EXPECT_EQ(stack->topViewController(), items);
+  EXPECT_EQ(items->treeController()->index(0, 0).data(WTItemsModel::NameRole).toString(), "Only task");
+  stack->popViewController();
+  projects->openProject(second);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return stack->viewControllers().size() == 2; }));
+  EXPECT_EQ(projects->itemsViewController(), items);
+  EXPECT_EQ(items->project(), second);
+  EXPECT_EQ(items->treeController()->rowCount(), 0);
+  projects->openClients();
+  EXPECT_EQ(window->clientsShown, 1);
+}
+
+TEST_F(WTListControllerTest, TheClientChooserSetsTheProjectsClient) {
+  auto* project = makeProject("Site");
+  auto* acme = WTClient::insertNewObject(context.get());
+  acme->setName("ACME");
+  auto* gone = WTClient::insertNewObject(context.get());
+  gone->setName("Gone");
+  gone->setArchived(true);
+  endTurn();
+  QMenu* menu = projects->clientMenu(project);
+  QStringList titles;
+  for (QAction* action : menu->actions()) {
+    if (!action->isSeparator()) titles << action->text();
+  }
+  EXPECT_EQ(titles, (QStringList{"No Client", "ACME", "Edit Clients…"}));
+  menu->actions()[2]->trigger();
+  EXPECT_EQ(project->client(), acme);
+  delete menu;
+}
+
+TEST_F(WTListControllerTest, ClientsAreAddedAndEdited) {
+  WTClientsViewController clients(context.get());
+  clients.view()->resize(600, 400);
+  clients.view()->show();
+  clients.addObject();
+  ASSERT_EQ(context->fetch<WTClient>().size(), 1);
+  EXPECT_TRUE(clients.tableView()->isEditing());
+  using Command = WTViewController::Command;
+  EXPECT_TRUE(clients.respondsTo(Command::AddObject));
+  EXPECT_FALSE(clients.respondsTo(Command::Report));
+  EXPECT_FALSE(clients.respondsTo(Command::ToggleTimer));
+}
+
+}  // namespace

@@ -1,0 +1,57 @@
+#include "WTSingleInstance.h"
+
+#include <gtest/gtest.h>
+
+#include <QFile>
+#include <QSignalSpy>
+#include <QTemporaryDir>
+#include <QTest>
+
+#include <atomic>
+#include <thread>
+
+namespace {
+
+TEST(WTSingleInstanceTest, ASecondCopyBringsTheFirstForwardAndLeaves) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  WTSingleInstance first(path);
+  ASSERT_TRUE(first.start());
+  EXPECT_TRUE(first.isListening());
+  QSignalSpy reopened(&first, &WTSingleInstance::reopenRequested);
+
+  // The second copy runs elsewhere (its own thread here) while the first keeps serving events.
+  auto startSecondCopy = [&](bool bringForward) {
+    std::atomic<int> started{-1};
+    std::thread second([&] {
+      WTSingleInstance copy(path);
+      started = copy.start(bringForward) ? 1 : 0;
+    });
+    const bool finished = QTest::qWaitFor([&] { return started != -1; }, 5000);
+    second.join();
+    EXPECT_TRUE(finished);
+    return started.load();
+  };
+  EXPECT_EQ(startSecondCopy(true), 0);
+  EXPECT_EQ(reopened.count(), 1);
+  // A command-line run only learns that a copy is running; the window stays where it is.
+  EXPECT_EQ(startSecondCopy(false), 0);
+  EXPECT_EQ(reopened.count(), 1);
+}
+
+TEST(WTSingleInstanceTest, ASocketLeftByACopyThatDiedIsTakenOver) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  {
+    QFile stale(path);
+    ASSERT_TRUE(stale.open(QIODevice::WriteOnly));
+  }
+  WTSingleInstance instance(path);
+  EXPECT_TRUE(instance.start());
+  EXPECT_TRUE(instance.isListening());
+  // Nobody else listens: asking a copy to come forward reaches nobody.
+  WTSingleInstance other(dir.filePath("other.socket"));
+  EXPECT_FALSE(other.notifyRunningInstance(200));
+}
+
+}  // namespace
