@@ -24,8 +24,8 @@ class WTSingleInstance : public QObject {
   bool start(bool bringRunningCopyForward = true);
   bool isListening() const;
 
-  // Asks the running copy to come forward (or, with `reopen` false, only whether it is there); true
-  // when it acknowledged within `timeoutMs`.
+  // Asks the running copy to come forward (or, with `reopen` false, only whether it is there). True
+  // when a copy is there: it accepted the connection, whether or not it acknowledged within `timeoutMs`.
   bool notifyRunningInstance(int timeoutMs = 2000, bool reopen = true) const;
 
  signals:

@@ -39,6 +39,20 @@ TEST(WTSingleInstanceTest, ASecondCopyBringsTheFirstForwardAndLeaves) {
   EXPECT_EQ(reopened.count(), 1);
 }
 
+// A copy too busy to answer (its event loop held up by a long save) keeps its store: a second copy
+// that took over its socket would open the same store twice.
+TEST(WTSingleInstanceTest, ACopyThatIsTooBusyToAnswerStillCounts) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  WTSingleInstance busy(path);
+  ASSERT_TRUE(busy.start());
+  WTSingleInstance second(path);  // asks from this thread, so the first cannot answer meanwhile
+  EXPECT_FALSE(second.start(false));
+  EXPECT_FALSE(second.isListening());
+  EXPECT_TRUE(busy.isListening());
+  EXPECT_TRUE(QFile::exists(path));
+}
+
 TEST(WTSingleInstanceTest, ASocketLeftByACopyThatDiedIsTakenOver) {
   QTemporaryDir dir;
   const QString path = dir.filePath("tessal.socket");
