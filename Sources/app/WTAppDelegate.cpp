@@ -1,5 +1,6 @@
 #include "WTAppDelegate.h"
 
+#include "RZSyncManager.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTObject.h"
@@ -16,6 +17,7 @@ WTAppDelegate::WTAppDelegate(UserDefaults* defaults, WTAlertPresenter* presenter
     : QObject(parent), defaults_(defaults), presenter_(presenter) {}
 
 WTAppDelegate::~WTAppDelegate() {
+  syncManager_.reset();
   if (WTObjectContext::defaultContext() == context_.get()) WTObjectContext::setDefaultContext(nullptr);
 }
 
@@ -25,7 +27,9 @@ QString WTAppDelegate::applicationSupportFolder() {
   return base + QStringLiteral("/Tessal2");
 }
 
-QString WTAppDelegate::storePath() const { return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite"); }
+QString WTAppDelegate::storePath() const {
+  return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
+}
 
 QString WTAppDelegate::syncJournalPath() const {
   const QFileInfo store(storePath());
@@ -48,7 +52,17 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   }
   connect(context_.get(), &WTObjectContext::objectsDidChange, this,
           &WTAppDelegate::managedObjectContextObjectsDidChange);
-  // The sync manager joins here once it exists, with syncJournalPath().
+
+  syncManager_ = std::make_unique<RZSyncManager>(context_.get(), syncJournalPath());
+  syncManager_->syncNetwork()->setCredentialDelegate(this);
+  if (syncErrorPresenter_) syncManager_->setErrorPresenter(syncErrorPresenter_);
+  // A merge first saves what the user is typing, the way every safe save does.
+  syncManager_->setSaveHandler([this]() -> Result<void> {
+    Error error;
+    if (saveChanges(&error)) return {};
+    return error;
+  });
+  syncManager_->enableSync();
   return context_.get();
 }
 
@@ -85,11 +99,16 @@ void WTAppDelegate::toggleArchived() {
   emit archivedPredicateChanged();
 }
 
-QString WTAppDelegate::syncNetworkRequestsUser() const {
+void WTAppDelegate::setSyncErrorPresenter(RZSyncErrorPresenter* presenter) {
+  syncErrorPresenter_ = presenter;
+  if (syncManager_) syncManager_->setErrorPresenter(presenter);
+}
+
+QString WTAppDelegate::syncNetworkRequestsUser(RZSyncNetwork*) {
   return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncUser")) : QString();
 }
 
-QString WTAppDelegate::syncNetworkRequestsPassword() const {
+QString WTAppDelegate::syncNetworkRequestsPassword(RZSyncNetwork*) {
   return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncPassword")) : QString();
 }
 
@@ -104,5 +123,5 @@ WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
 }
 
 void WTAppDelegate::applicationWillTerminate() {
-  // Switches the sync off once there is one.
+  if (syncManager_) syncManager_->disableSync();
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "RZSyncNetwork.h"
 #include "Result.h"
 
 #include <QObject>
@@ -8,15 +9,18 @@
 #include <functional>
 #include <memory>
 
+class RZSyncErrorPresenter;
+class RZSyncManager;
 class UserDefaults;
 class WTAlertPresenter;
 class WTObject;
 class WTObjectContext;
 
-// Owns the one object context and its store file, saves half a second after every change, and decides
-// what happens when the application quits. The context, the store and (later) the sync are made on the
-// first call of managedObjectContext(), not at launch.
-class WTAppDelegate : public QObject {
+// Owns the one object context, its store file and the sync manager that keeps them in step with the
+// account's server; saves half a second after every change, and decides what happens when the
+// application quits. The context, the store and the sync manager are made on the first call of
+// managedObjectContext(), not at launch.
+class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   Q_OBJECT
  public:
   // Neither is owned; both must outlive the delegate.
@@ -33,6 +37,10 @@ class WTAppDelegate : public QObject {
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.
   WTObjectContext* managedObjectContext();
   bool hasContext() const { return context_ != nullptr; }
+  // Made with the context, over syncJournalPath(), with syncing switched on; null before that.
+  RZSyncManager* syncManager() const { return syncManager_.get(); }
+  // Where sync errors are shown (not owned); the log until set. Applies to a manager made later too.
+  void setSyncErrorPresenter(RZSyncErrorPresenter* presenter);
 
   // Saves when there are changes; a failure is shown (unless there is no store at all, which was
   // reported when opening) and the changes stay for the next attempt. Logs "Saved" either way.
@@ -47,9 +55,9 @@ class WTAppDelegate : public QObject {
   std::function<bool(const WTObject*)> archivedPredicate() const;
   void toggleArchived();
 
-  // Credentials for the sync client.
-  QString syncNetworkRequestsUser() const;
-  QString syncNetworkRequestsPassword() const;
+  // The sync account: the user defaults "WTSyncUser" and "WTSyncPassword".
+  QString syncNetworkRequestsUser(RZSyncNetwork* network) override;
+  QString syncNetworkRequestsPassword(RZSyncNetwork* network) override;
 
   enum class TerminateReply { TerminateNow, TerminateCancel };
   // Commits editing, saves, and on a failed save asks whether to quit anyway.
@@ -67,7 +75,10 @@ class WTAppDelegate : public QObject {
 
   UserDefaults* defaults_;
   WTAlertPresenter* presenter_;
+  RZSyncErrorPresenter* syncErrorPresenter_ = nullptr;
   std::unique_ptr<WTObjectContext> context_;
+  // After the context: the manager detaches its journal from the context when it goes.
+  std::unique_ptr<RZSyncManager> syncManager_;
   std::function<bool()> commitEditing_;
   bool displayArchived_ = false;
 };

@@ -16,6 +16,7 @@ WTApplication::WTApplication(int& argc, char** argv)
   setWindowIcon(WTImages::icon(QStringLiteral("tessal")));
   registerDefaults(*defaults_);
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
+  delegate_->setSyncErrorPresenter(presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);
 }
 

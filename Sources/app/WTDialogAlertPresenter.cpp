@@ -5,7 +5,8 @@
 #include <QPushButton>
 
 bool WTDialogAlertPresenter::presentError(const QString& message) {
-  QMessageBox box(QMessageBox::Warning, QCoreApplication::applicationName(), message, QMessageBox::Ok, parent_);
+  QMessageBox box(QMessageBox::Warning, QCoreApplication::applicationName(), message, QMessageBox::Ok,
+                  parent_);
   box.exec();
   return false;
 }
@@ -13,11 +14,27 @@ bool WTDialogAlertPresenter::presentError(const QString& message) {
 bool WTDialogAlertPresenter::confirmQuitAnyway() {
   QMessageBox box(parent_);
   box.setIcon(QMessageBox::Warning);
-  box.setText(QCoreApplication::translate("WTAppDelegate", "Could not save changes while quitting. Quit anyway?"));
-  QPushButton* quit = box.addButton(QCoreApplication::translate("WTAppDelegate", "Quit anyway"), QMessageBox::AcceptRole);
-  QPushButton* cancel = box.addButton(QCoreApplication::translate("WTAppDelegate", "Cancel"), QMessageBox::RejectRole);
+  box.setText(
+      QCoreApplication::translate("WTAppDelegate", "Could not save changes while quitting. Quit anyway?"));
+  QPushButton* quit =
+      box.addButton(QCoreApplication::translate("WTAppDelegate", "Quit anyway"), QMessageBox::AcceptRole);
+  QPushButton* cancel =
+      box.addButton(QCoreApplication::translate("WTAppDelegate", "Cancel"), QMessageBox::RejectRole);
   box.setDefaultButton(quit);
   box.setEscapeButton(cancel);
   box.exec();
   return box.clickedButton() != cancel;
+}
+
+void WTDialogAlertPresenter::presentSyncError(const QString& message) {
+  QMessageBox box(parent_);
+  box.setIcon(QMessageBox::Warning);
+  box.setText(QCoreApplication::translate("RZSyncManager", "Sync Error"));
+  box.setInformativeText(message);
+  box.addButton(QCoreApplication::translate("RZSyncManager", "Ok"), QMessageBox::AcceptRole);
+  box.exec();
+}
+
+void WTDialogAlertPresenter::presentNetworkError(const QString& message) {
+  presentError(message);
 }

@@ -1,9 +1,13 @@
 #include "WTApplication.h"
+#include "WTCommandLine.h"
 #include "WTSingleInstance.h"
 
 #include <QMainWindow>
 
 int main(int argc, char** argv) {
+  // `tessal template …` and `tessal sync …` run without a window.
+  if (const std::optional<int> status = runCommandLine(argc, argv)) return *status;
+
   WTApplication app(argc, argv);
   // One copy per user: a second launch brings the first one's window forward and never opens the
   // store itself.

@@ -1,3 +1,4 @@
+#include "RZSyncManager.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
@@ -166,6 +167,34 @@ TEST_F(WTAppDelegateTest, RegisteredDefaultsGiveWayToStoredValues) {
   EXPECT_EQ(defaults->integerForKey("WTIdleTime"), 5);
   defaults->setValue("WTIdleTime", 10);
   EXPECT_EQ(defaults->integerForKey("WTIdleTime"), 10);
+}
+
+// The sync manager is made with the context, journals what the delegate saves beside the store, asks
+// the delegate for the account, and stops when the application quits.
+TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) {
   defaults->setValue("WTSyncUser", "me@example.org");
-  EXPECT_EQ(makeDelegate()->syncNetworkRequestsUser(), "me@example.org");
+  defaults->setValue("WTSyncPassword", "secret");
+  auto delegate = makeDelegate();
+  EXPECT_EQ(delegate->syncManager(), nullptr);
+  WTObjectContext* context = delegate->managedObjectContext();
+  RZSyncManager* sync = delegate->syncManager();
+  ASSERT_NE(sync, nullptr);
+  EXPECT_EQ(sync->managedObjectContext(), context);
+  EXPECT_EQ(sync->trackFilePath(), delegate->syncJournalPath());
+  EXPECT_TRUE(sync->syncEnabled());
+  EXPECT_EQ(sync->syncNetwork()->user(), "me@example.org");
+  EXPECT_EQ(sync->syncNetwork()->password(), "secret");
+
+  auto* project = WTProject::insertNewObject(context);
+  project->setName("journaled");
+  ASSERT_TRUE(delegate->saveChanges());
+  ASSERT_NE(sync->syncTrack(), nullptr);
+  EXPECT_EQ(sync->syncTrack()->entry(RZSyncTrack::Section::Inserted, project->uuid()).value("name"),
+            "journaled");
+  QFile journal(delegate->syncJournalPath());
+  ASSERT_TRUE(journal.open(QIODevice::ReadOnly));
+  EXPECT_TRUE(journal.readAll().contains(project->uuid().toUtf8()));
+
+  delegate->applicationWillTerminate();
+  EXPECT_FALSE(sync->syncEnabled());
 }

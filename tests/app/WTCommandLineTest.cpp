@@ -1,0 +1,156 @@
+// The `tessal` executable's window-less commands, run as a user's shell would run them: a separate
+// process with its own data and settings folders.
+#include "SyncTestSupport.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTSingleInstance.h"
+#include "WTStore.h"
+#include "WTTask.h"
+
+#include <gtest/gtest.h>
+
+#include <QDir>
+#include <QFile>
+#include <QProcess>
+#include <QSettings>
+#include <QTemporaryDir>
+
+namespace {
+
+struct Outcome {
+  int code = -1;
+  QString out;
+  QString err;
+};
+
+// One installation: its own data, settings and runtime folders.
+class Installation {
+ public:
+  Installation() {
+    for (const char* sub : {"data", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
+    // A runtime folder must be the user's alone, or Qt looks elsewhere.
+    QFile::setPermissions(runtimeFolder(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
+  }
+  QString storePath() const { return home_.filePath("data/Tessal2/Tessal.sqlite"); }
+  QString journalPath() const { return home_.filePath("data/Tessal2/Tessal.sync"); }
+  QString runtimeFolder() const { return home_.filePath("runtime"); }
+  void setSetting(const QString& key, const QString& value) {
+    QSettings settings(home_.filePath("config/Tessal/Tessal.conf"), QSettings::IniFormat);
+    settings.setValue(key, value);
+  }
+  // The context over this installation's store, made (with its folder) when missing.
+  std::unique_ptr<WTObjectContext> openStore() {
+    QDir().mkpath(QFileInfo(storePath()).path());
+    auto context = std::make_unique<WTObjectContext>();
+    auto store = WTStore::open(storePath());
+    EXPECT_TRUE(store);
+    if (store) {
+      EXPECT_TRUE(context->attachStore(std::move(store.value())));
+    }
+    return context;
+  }
+  Outcome tessal(const QStringList& arguments) const {
+    QProcess process;
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    environment.insert("XDG_DATA_HOME", home_.filePath("data"));
+    environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
+    environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
+    process.setProcessEnvironment(environment);
+    process.start(QString::fromUtf8(TESSAL_EXE), arguments);
+    Outcome run;
+    if (!process.waitForFinished(60000)) {
+      process.kill();
+      process.waitForFinished();
+      return run;
+    }
+    run.code = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
+    run.out = QString::fromUtf8(process.readAllStandardOutput());
+    run.err = QString::fromUtf8(process.readAllStandardError());
+    return run;
+  }
+  QString file(const QString& name, const QByteArray& contents) const {
+    QFile file(home_.filePath(name));
+    EXPECT_TRUE(file.open(QIODevice::WriteOnly));
+    file.write(contents);
+    return file.fileName();
+  }
+
+ private:
+  QTemporaryDir home_;
+};
+
+TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
+  Installation here;
+  const QString templateFile = here.file(
+      "report.txt",
+      "{% for p in projects %}{{ p.name | uppercase }}: {{ p.minutes | digiclock }}\n{% /for %}{{ nobody }}");
+  const QString vars = here.file("vars.json", R"({"projects": [{"name": "Atlas", "minutes": 95}]})");
+  const Outcome rendered = here.tessal({"template", templateFile, "--vars", vars});
+  EXPECT_EQ(rendered.code, 0) << rendered.err.toStdString();
+  EXPECT_EQ(rendered.out, "ATLAS: 01:35\n");
+  EXPECT_EQ(rendered.err, "error 3: \"nobody\" is not a valid variable\n");
+
+  const Outcome missing = here.tessal({"template", templateFile, "--vars", "/nonexistent/vars.json"});
+  EXPECT_EQ(missing.code, 2);
+  EXPECT_TRUE(missing.err.contains("/nonexistent/vars.json")) << missing.err.toStdString();
+  EXPECT_EQ(missing.out, "");
+}
+
+TEST(WTCommandLine, SyncExplainsWhatIsMissingAndLeavesNoStoreBehind) {
+  Installation here;
+  const Outcome run = here.tessal({"sync"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("WTSyncServer")) << run.err.toStdString();
+  EXPECT_EQ(here.tessal({"sync", "--timeout"}).code, 2);
+}
+
+TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
+  Installation here;
+  WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
+  ASSERT_TRUE(desktop.start());
+  const Outcome run = here.tessal({"sync"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("Tessal is running")) << run.err.toStdString();
+  EXPECT_FALSE(QFile::exists(here.storePath()));  // the running copy's store is not opened twice
+}
+
+// What one installation made reaches another through the real server, by the command alone.
+TEST(WTCommandLine, SyncBringsTwoInstallationsInStepThroughTheRealServer) {
+  if (!synctest::SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  synctest::SyncServerProcess server;
+  ASSERT_TRUE(server.addUser("shell@example.org", "a password"));
+  ASSERT_TRUE(server.start());
+  Installation laptop, desktop;
+  for (Installation* installation : {&laptop, &desktop}) {
+    installation->setSetting("WTSyncServer", server.address());
+    installation->setSetting("WTSyncUser", "shell@example.org");
+    installation->setSetting("WTSyncPassword", "a password");
+  }
+  QString projectId;
+  {
+    // Made the way the desktop copy makes records: with the sync manager journaling every save.
+    auto context = laptop.openStore();
+    RZSyncManager journaling(context.get(), laptop.journalPath());
+    auto* project = WTProject::insertNewObject(context.get());
+    project->setName("Made on the laptop");
+    auto* task = WTTask::insertNewObject(context.get());
+    task->setName("Its task");
+    task->setProject(project);
+    projectId = project->uuid();
+    ASSERT_TRUE(context->save());
+  }
+  const Outcome first = laptop.tessal({"sync", "--timeout", "30"});
+  ASSERT_EQ(first.code, 0) << first.err.toStdString();
+  EXPECT_TRUE(first.out.startsWith("In step with ")) << first.out.toStdString();
+
+  const Outcome second = desktop.tessal({"sync", "--timeout", "30"});
+  ASSERT_EQ(second.code, 0) << second.err.toStdString();
+  auto context = desktop.openStore();
+  auto* project = dynamic_cast<WTProject*>(context->objectWithUUID(projectId));
+  ASSERT_NE(project, nullptr);
+  EXPECT_EQ(project->name(), "Made on the laptop");
+  ASSERT_EQ(project->tasks().size(), 1);
+  EXPECT_EQ(project->tasks()[0]->name(), "Its task");
+}
+
+}  // namespace
