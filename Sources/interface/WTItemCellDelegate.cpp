@@ -10,10 +10,12 @@
 #include "WTTableRowView.h"
 
 #include <QApplication>
+#include <QHelpEvent>
 #include <QLineEdit>
 #include <QMouseEvent>
 #include <QPainter>
 #include <QPainterPath>
+#include <QToolTip>
 
 namespace {
 
@@ -374,6 +376,53 @@ void WTItemCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptio
   rect.setHeight(std::min<qreal>(rect.height(), 24.0));
   rect.moveTop(row.y() + (cell.initialFrame().height() - rect.height()) / 2.0);
   editor->setGeometry(rect.toRect().adjusted(-3, 0, 3, 0));
+}
+
+bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
+                                   const QStyleOptionViewItem& option, const QModelIndex& index) {
+  if (event->type() != QEvent::ToolTip || !index.isValid())
+    return QStyledItemDelegate::helpEvent(event, view, option, index);
+  const QRectF row(0, option.rect.y(), view_->viewport()->width(), option.rect.height());
+  const WTTableCellView& cell = controller_->cellViewPrototypeForIndex(index);
+  const auto part = cell.partAt(event->pos(), row, view_->hoverIndex() == index);
+  QString text;
+  using Part = WTTableCellView::Part;
+  switch (part.value_or(Part::Name)) {
+    case Part::TimerButton:
+      text = index.data(Qt::ToolTipRole).toString();
+      if (text.isEmpty()) text = tr("Stop");
+      break;
+    case Part::AddTime:
+      text = tr("New Time Entry");
+      break;
+    case Part::AddFlat:
+      text = tr("New Flat Fee");
+      break;
+    case Part::AddNote:
+      text = tr("New Note");
+      break;
+    case Part::AddExpense:
+      text = tr("New Expense");
+      break;
+    case Part::AddToDo:
+      text = tr("New To-Do");
+      break;
+    case Part::DateButton:
+      text = tr("Move to Another Day");
+      break;
+    case Part::NotesButton:
+      text = tr("Notes");
+      break;
+    default:
+      break;
+  }
+  if (text.isEmpty()) {
+    QToolTip::hideText();
+    event->ignore();
+  } else {
+    QToolTip::showText(event->globalPos(), text, view, cell.partRect(*part, row).toRect());
+  }
+  return true;
 }
 
 bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,

@@ -49,6 +49,9 @@ class WTItemCellDelegate : public QStyledItemDelegate {
  protected:
   bool editorEvent(QEvent* event, QAbstractItemModel* model, const QStyleOptionViewItem& option,
                    const QModelIndex& index) override;
+  // Tool tips name the button under the mouse; the rest of a row has none.
+  bool helpEvent(QHelpEvent* event, QAbstractItemView* view, const QStyleOptionViewItem& option,
+                 const QModelIndex& index) override;
 
  private:
   void paintTask(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,

@@ -9,7 +9,9 @@
 #include "WTOutlineView.h"
 
 #include <QCalendarWidget>
+#include <QHelpEvent>
 #include <QLineEdit>
+#include <QToolTip>
 
 namespace {
 
@@ -91,6 +93,28 @@ TEST_F(WTItemsViewControllerTest, TheTimerButtonStartsAndSelectsThenStops) {
   EXPECT_TRUE(design->running());
   controller->stopTimer(design->runningTimes().value(0));
   EXPECT_FALSE(design->running());
+}
+
+// The tip names the button under the mouse; a row's text has none (it once said "Start" everywhere).
+TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsNotToTheWholeRow) {
+  const QModelIndex task = rowOf(design);
+  const QRect visual = outline()->visualRect(task);
+  const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
+  const WTTableCellView& cell = controller->cellViewPrototypeForIndex(task);
+  auto tipAt = [&](const QPointF& point) {
+    QToolTip::hideText();  // fades out: wait until it is gone
+    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
+    QHelpEvent help(QEvent::ToolTip, point.toPoint(), outline()->viewport()->mapToGlobal(point.toPoint()));
+    QApplication::sendEvent(outline()->viewport(), &help);
+    return QToolTip::isVisible() ? QToolTip::text() : QString();
+  };
+  const QRectF button = cell.partRect(WTTableCellView::Part::TimerButton, row);
+  ASSERT_FALSE(button.isEmpty());
+  EXPECT_EQ(tipAt(button.center()), design->buttonTitle());
+  EXPECT_FALSE(design->buttonTitle().isEmpty());
+  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
+  EXPECT_EQ(tipAt(name.center()), QString());
+  QToolTip::hideText();
 }
 
 TEST_F(WTItemsViewControllerTest, CompletingAToDoStampsItsDateAndRegroupsIt) {
