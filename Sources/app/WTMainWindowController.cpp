@@ -19,6 +19,8 @@
 #include <QApplication>
 #include <QCloseEvent>
 #include <QMenuBar>
+#include <QScreen>
+#include <QStyle>
 #include <QToolBar>
 #include <QVBoxLayout>
 
@@ -27,11 +29,11 @@ WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget*
   setWindowTitle(QStringLiteral("Tessal"));
   setWindowIcon(WTImages::icon(QStringLiteral("tessal")));
   setObjectName(QStringLiteral("MainWindow"));
-  resize(960, 640);
   setMinimumSize(640, 360);
 
   WTObjectContext* context = delegate_.managedObjectContext();
   if (UserDefaults* defaults = context->userDefaults()) registerDefaults(*defaults);
+  restoreWindowGeometry();
   // Commits an edit in progress before a save on quitting.
   delegate_.setCommitEditingHandler([] {
     if (QWidget* focus = QApplication::focusWidget()) focus->clearFocus();
@@ -350,11 +352,32 @@ void WTMainWindowController::bringToFront() {
   activateWindow();
 }
 
+void WTMainWindowController::restoreWindowGeometry() {
+  UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults();
+  const QString saved = defaults ? defaults->stringForKey(QString::fromLatin1(kGeometryKey)) : QString();
+  if (!saved.isEmpty() && restoreGeometry(QByteArray::fromBase64(saved.toLatin1()))) return;
+  // First run: a comfortable size that still fits a small or highly scaled screen, centred on it.
+  QSize size(960, 640);
+  if (const QScreen* screen = QGuiApplication::primaryScreen()) {
+    const QRect available = screen->availableGeometry();
+    size = size.boundedTo(available.size() * 0.9).expandedTo(minimumSize());
+    setGeometry(QStyle::alignedRect(Qt::LeftToRight, Qt::AlignCenter, size, available));
+    return;
+  }
+  resize(size);
+}
+
+void WTMainWindowController::saveWindowGeometry() {
+  if (UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults())
+    defaults->setValue(QString::fromLatin1(kGeometryKey), QString::fromLatin1(saveGeometry().toBase64()));
+}
+
 void WTMainWindowController::closeEvent(QCloseEvent* event) {
   if (delegate_.applicationShouldTerminate() == WTAppDelegate::TerminateReply::TerminateCancel) {
     event->ignore();
     return;
   }
+  saveWindowGeometry();
   event->accept();
   QApplication::quit();
 }

@@ -80,6 +80,10 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void closeEvent(QCloseEvent* event) override;
 
  private:
+  // The window's place and size are kept under this user default (ours) from one run to the next.
+  static constexpr const char* kGeometryKey = "WTMainWindowGeometry";
+  void restoreWindowGeometry();
+  void saveWindowGeometry();
   void buildActions();
   void showStack(WTNavigationController* stack, const QString& identifier);
   void setSelectedToolbarItemIdentifier(const QString& identifier);

@@ -17,6 +17,7 @@
 #include <gtest/gtest.h>
 
 #include <QAction>
+#include <QScreen>
 #include <QTemporaryDir>
 #include <QTest>
 
@@ -180,6 +181,25 @@ TEST_F(WTMainWindowControllerTest, CustomRangeDefaultsAreRegisteredAndStoredValu
   EXPECT_EQ(defaults->dateForKey("WTCustomRangeEnd"), stored);
   window->saveLastSelectedProject(3);
   EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 3);
+}
+
+}  // namespace
+
+namespace {
+
+// The first window fits the screen however it is scaled; later ones come back where the last one was.
+TEST_F(WTMainWindowControllerTest, TheWindowFitsTheScreenAndKeepsItsPlace) {
+  open();
+  const QRect available = window->screen()->availableGeometry();
+  EXPECT_TRUE(available.contains(window->geometry()))
+      << window->geometry().width() << "x" << window->geometry().height();
+  window->resize(700, 480);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return window->size() == QSize(700, 480); }));
+  EXPECT_TRUE(window->close());
+  window.reset();
+
+  open();
+  EXPECT_EQ(window->size(), QSize(700, 480));
 }
 
 }  // namespace
