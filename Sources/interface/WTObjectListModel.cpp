@@ -113,7 +113,8 @@ void WTObjectListModel::reindex() {
 void WTObjectListModel::rearrangeObjects() {
   rearrangeTimer_.stop();
   const QList<WTObject*> target = computeArrangement();
-  if (target == arranged_) return;
+  // Element by element: QList's own == hands two empty lists' null buffers to memcmp.
+  if (std::equal(target.cbegin(), target.cend(), arranged_.cbegin(), arranged_.cend())) return;
   struct Ops {
     WTObjectListModel* model;
     void remove(int first, int last) {
