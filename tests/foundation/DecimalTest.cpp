@@ -31,7 +31,8 @@ std::string coefficientDigits(const Decimal& value) {
   std::string digits;
   for (char c : value.toString().toStdString())
     if (c != '-' && c != '.') digits += c;
-  if (value.exponent() > 0 && !value.isZero()) digits.resize(digits.size() - std::size_t(value.exponent()));
+  if (value.exponent() > 0 && !value.isZero())
+    digits.erase(digits.size() - std::min(digits.size(), std::size_t(value.exponent())));
   const std::size_t first = std::min(digits.find_first_not_of('0'), digits.size() - 1);
   return (value.isNegative() ? "-" : "") + digits.substr(first);
 }
