@@ -5,6 +5,7 @@
 #include "GXTemplateClassRegistry.h"
 #include "GXTemplateEngine.h"
 #include "GXTemplateValue.h"
+#include "VariantNumbers.h"
 
 #include <algorithm>
 #include <limits>
@@ -20,28 +21,12 @@ const QString kReversed = QStringLiteral("reversed");
 
 // Whether a number is true: any non-zero value.
 std::optional<bool> numberTruth(const QVariant& value) {
-  switch (value.typeId()) {
-    case QMetaType::Bool:
-      return value.toBool();
-    case QMetaType::Int:
-    case QMetaType::LongLong:
-    case QMetaType::Long:
-    case QMetaType::Short:
-    case QMetaType::Char:
-    case QMetaType::SChar:
-    case QMetaType::UInt:
-    case QMetaType::ULongLong:
-    case QMetaType::ULong:
-    case QMetaType::UShort:
-    case QMetaType::UChar:
-      return value.toLongLong() != 0 || value.toULongLong() != 0;
-    case QMetaType::Double:
-    case QMetaType::Float:
-      return value.toDouble() != 0.0;
-    default:
-      break;
-  }
-  if (value.typeId() == QMetaType::fromType<Decimal>().id()) return !value.value<Decimal>().isZero();
+  const int type = value.typeId();
+  if (type == QMetaType::Bool) return value.toBool();
+  if (VariantNumbers::isSignedInteger(type) || VariantNumbers::isUnsignedInteger(type))
+    return value.toLongLong() != 0 || value.toULongLong() != 0;
+  if (VariantNumbers::isFloatingPoint(type)) return value.toDouble() != 0.0;
+  if (type == QMetaType::fromType<Decimal>().id()) return !value.value<Decimal>().isZero();
   return std::nullopt;
 }
 

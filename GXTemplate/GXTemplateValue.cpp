@@ -2,6 +2,7 @@
 
 #include "Decimal.h"
 #include "KeyPath.h"
+#include "VariantNumbers.h"
 
 #include <QDateTime>
 #include <QStringList>
@@ -93,32 +94,8 @@ void describe(const QVariant& value, int depth, QString& out) {
   out += GXTemplateValue::description(value);
 }
 
-bool isSignedInteger(int type) {
-  switch (type) {
-    case QMetaType::Int:
-    case QMetaType::LongLong:
-    case QMetaType::Long:
-    case QMetaType::Short:
-    case QMetaType::Char:
-    case QMetaType::SChar:
-      return true;
-    default:
-      return false;
-  }
-}
-
-bool isUnsignedInteger(int type) {
-  switch (type) {
-    case QMetaType::UInt:
-    case QMetaType::ULongLong:
-    case QMetaType::ULong:
-    case QMetaType::UShort:
-    case QMetaType::UChar:
-      return true;
-    default:
-      return false;
-  }
-}
+using VariantNumbers::isSignedInteger;
+using VariantNumbers::isUnsignedInteger;
 
 }  // namespace
 

@@ -2,6 +2,7 @@
 
 #include "Date.h"
 #include "Decimal.h"
+#include "VariantNumbers.h"
 
 #include <QDateTime>
 #include <QStringList>
@@ -53,24 +54,10 @@ int objectTypeId() {
 Kind kindOf(const QVariant& value) {
   if (!value.isValid() || value.isNull()) return Kind::Null;
   const int type = value.typeId();
+  if (type == QMetaType::Bool || VariantNumbers::isSignedInteger(type)) return Kind::Signed;
+  if (VariantNumbers::isUnsignedInteger(type)) return Kind::Unsigned;
+  if (VariantNumbers::isFloatingPoint(type)) return Kind::Double;
   switch (type) {
-    case QMetaType::Bool:
-    case QMetaType::Int:
-    case QMetaType::LongLong:
-    case QMetaType::Long:
-    case QMetaType::Short:
-    case QMetaType::Char:
-    case QMetaType::SChar:
-      return Kind::Signed;
-    case QMetaType::UInt:
-    case QMetaType::ULongLong:
-    case QMetaType::ULong:
-    case QMetaType::UShort:
-    case QMetaType::UChar:
-      return Kind::Unsigned;
-    case QMetaType::Double:
-    case QMetaType::Float:
-      return Kind::Double;
     case QMetaType::QString:
       return Kind::String;
     case QMetaType::QDateTime:

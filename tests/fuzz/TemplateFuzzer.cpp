@@ -6,9 +6,8 @@
 //         -DTESSAL_BUILD_FUZZERS=ON -DTESSAL_BUILD_TESTS=OFF
 //   ninja -C build-gx-fuzz template_fuzzer
 //   mkdir -p /tmp/template-corpus
-//   build-gx-fuzz/GXTemplate/template_fuzzer -max_total_time=600 -timeout=10 -rss_limit_mb=2048 -max_len=4096
-//   \
-//         -dict=tests/fuzz/template.dict /tmp/template-corpus tests/fuzz/corpus
+//   build-gx-fuzz/GXTemplate/template_fuzzer -max_total_time=600 -timeout=10 -rss_limit_mb=2048 \
+//     -max_len=4096 -dict=tests/fuzz/template.dict /tmp/template-corpus tests/fuzz/corpus
 // New inputs go to the scratch corpus (first folder); tests/fuzz/corpus holds the few seeds kept in the
 // repository. Reproduce a finding with: build-gx-fuzz/GXTemplate/template_fuzzer CRASH_FILE
 #include "Date.h"
