@@ -1,6 +1,5 @@
+#include "AppFixture.h"
 #include "RZSyncManager.h"
-#include "UserDefaults.h"
-#include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
@@ -23,42 +22,8 @@
 
 namespace {
 
-class RecordingPresenter final : public WTAlertPresenter {
- public:
-  bool presentError(const QString& message) override {
-    errors << message;
-    return false;
-  }
-  bool confirmQuitAnyway() override {
-    ++questions;
-    return quitAnyway;
-  }
-  QStringList errors;
-  int questions = 0;
-  bool quitAnyway = false;
-};
-
 // Each test gets its own data and settings folders.
-class WTAppDelegateTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    ASSERT_TRUE(home.isValid());
-    previousData = qgetenv("XDG_DATA_HOME");
-    qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
-    defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
-    WTApplication::registerDefaults(*defaults);
-  }
-  void TearDown() override { qputenv("XDG_DATA_HOME", previousData); }
-
-  std::unique_ptr<WTAppDelegate> makeDelegate() {
-    return std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
-  }
-
-  QTemporaryDir home;
-  QByteArray previousData;
-  std::unique_ptr<UserDefaults> defaults;
-  RecordingPresenter presenter;
-};
+class WTAppDelegateTest : public AppTest {};
 
 }  // namespace
 

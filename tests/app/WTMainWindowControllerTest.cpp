@@ -1,5 +1,5 @@
+#include "AppFixture.h"
 #include "UserDefaults.h"
-#include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
@@ -23,26 +23,17 @@
 
 namespace {
 
-class SilentPresenter final : public WTAlertPresenter {
- public:
-  bool presentError(const QString&) override { return false; }
-  bool confirmQuitAnyway() override { return true; }
-};
-
-class WTMainWindowControllerTest : public ::testing::Test {
+class WTMainWindowControllerTest : public AppTest {
  protected:
   void SetUp() override {
-    ASSERT_TRUE(home.isValid());
-    previousData = qgetenv("XDG_DATA_HOME");
-    qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
-    defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
-    WTApplication::registerDefaults(*defaults);
-    delegate = std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
+    AppTest::SetUp();
+    presenter.quitAnyway = true;
+    delegate = makeDelegate();
   }
   void TearDown() override {
     window.reset();
     delegate.reset();
-    qputenv("XDG_DATA_HOME", previousData);
+    AppTest::TearDown();
   }
   void open() {
     window = std::make_unique<WTMainWindowController>(*delegate);
@@ -53,10 +44,6 @@ class WTMainWindowControllerTest : public ::testing::Test {
   bool validate(const char* identifier) { return window->validateToolbarItem(item(identifier)); }
   void select(WTProject* project) { window->projectsViewController()->selectObject(project); }
 
-  QTemporaryDir home;
-  QByteArray previousData;
-  std::unique_ptr<UserDefaults> defaults;
-  SilentPresenter presenter;
   std::unique_ptr<WTAppDelegate> delegate;
   std::unique_ptr<WTMainWindowController> window;
 };

@@ -1,0 +1,51 @@
+#pragma once
+
+// What the application tests share: their own data folder (XDG_DATA_HOME) and settings file with the
+// application's defaults registered, and a presenter that records what the delegate would have said.
+#include "UserDefaults.h"
+#include "WTAlertPresenter.h"
+#include "WTAppDelegate.h"
+#include "WTApplication.h"
+
+#include <gtest/gtest.h>
+
+#include <QStringList>
+#include <QTemporaryDir>
+
+#include <memory>
+
+class RecordingPresenter final : public WTAlertPresenter {
+ public:
+  bool presentError(const QString& message) override {
+    errors << message;
+    return false;
+  }
+  bool confirmQuitAnyway() override {
+    ++questions;
+    return quitAnyway;
+  }
+  QStringList errors;
+  int questions = 0;
+  bool quitAnyway = false;
+};
+
+class AppTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_TRUE(home.isValid());
+    previousData = qgetenv("XDG_DATA_HOME");
+    qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
+    defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
+    WTApplication::registerDefaults(*defaults);
+  }
+  void TearDown() override { qputenv("XDG_DATA_HOME", previousData); }
+
+  std::unique_ptr<WTAppDelegate> makeDelegate() {
+    return std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
+  }
+
+  QTemporaryDir home;
+  QByteArray previousData;
+  std::unique_ptr<UserDefaults> defaults;
+  RecordingPresenter presenter;
+};
