@@ -5,6 +5,7 @@
 //
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
 #include "Decimal.h"
+#include "ServerTestSupport.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
 #include "WTExpense.h"
@@ -511,11 +512,17 @@ std::vector<unsigned> seeds() {
 
 }  // namespace
 
-TEST(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
+// Over both storages of the server: PostgreSQL when a throw-away cluster is given (TESSAL_TEST_POSTGRES).
+class RZSyncSimulation : public testing::TestWithParam<servertest::Storage> {};
+
+TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
   if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  if (GetParam() == servertest::Storage::PostgreSQL && servertest::postgresUri().empty())
+    GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";
   for (const unsigned seed : seeds()) {
     SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
-    SyncServerProcess server;
+    const servertest::StorageLocation storage(GetParam());
+    SyncServerProcess server(QString::fromStdString(storage.location()));
     ASSERT_TRUE(server.addUser(Simulation::kUser, Simulation::kPassword));
     ASSERT_TRUE(server.start());
     Simulation simulation(seed, server);
@@ -528,3 +535,7 @@ TEST(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
     if (HasFailure()) break;
   }
 }
+
+INSTANTIATE_TEST_SUITE_P(Storage, RZSyncSimulation,
+                         testing::Values(servertest::Storage::SQLite, servertest::Storage::PostgreSQL),
+                         servertest::storageName);

@@ -332,7 +332,8 @@ class SyncServerProcess {
     return !executable().isEmpty() && QFileInfo::exists(executable());
   }
 
-  SyncServerProcess() {
+  // Serves from `database` (a SQLite path or a PostgreSQL URI); a SQLite file of its own when empty.
+  explicit SyncServerProcess(const QString& database = {}) : database_(database) {
     EXPECT_TRUE(dir.isValid());
   }
   ~SyncServerProcess() {
@@ -340,7 +341,7 @@ class SyncServerProcess {
   }
 
   QString database() const {
-    return dir.filePath(QStringLiteral("sync.sqlite"));
+    return database_.isEmpty() ? dir.filePath(QStringLiteral("sync.sqlite")) : database_;
   }
 
   bool addUser(const QString& email, const QString& password) {
@@ -387,6 +388,7 @@ class SyncServerProcess {
   }
 
   QTemporaryDir dir;
+  QString database_;
 
  private:
   std::unique_ptr<QProcess> process_;
