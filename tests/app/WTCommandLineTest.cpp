@@ -96,14 +96,6 @@ TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
   EXPECT_EQ(missing.out, "");
 }
 
-TEST(WTCommandLine, SyncExplainsWhatIsMissingAndLeavesNoStoreBehind) {
-  Installation here;
-  const Outcome run = here.tessal({"sync"});
-  EXPECT_EQ(run.code, 1);
-  EXPECT_TRUE(run.err.contains("WTSyncServer")) << run.err.toStdString();
-  EXPECT_EQ(here.tessal({"sync", "--timeout"}).code, 2);
-}
-
 TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
   Installation here;
   WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
