@@ -80,8 +80,9 @@ void WTAppDelegate::saveAction() {
 
 bool WTAppDelegate::saveChanges(Error* error) {
   WTObjectContext* context = managedObjectContext();
-  if (!context->hasChanges()) return true;
+  // The edit in progress first: committing it may be the only change there is.
   if (commitEditing_) commitEditing_();
+  if (!context->hasChanges()) return true;
   const Result<void> saved = context->save();
   if (saved) return true;
   qWarning("ERROR: %s", qUtf8Printable(saved.error().message));

@@ -112,6 +112,25 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
   ASSERT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(), 1);
 }
 
+// A save for a merge or the menu first commits what the user is typing, even when nothing else changed.
+TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressFirst) {
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  WTProject* project = WTProject::insertNewObject(context);
+  ASSERT_TRUE(delegate->saveChanges());
+  delegate->setCommitEditingHandler([&] {
+    project->setName("typed, not yet committed");
+    return true;
+  });
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_FALSE(context->hasChanges());
+  auto other = makeDelegate();
+  delegate.reset();
+  const QList<WTProject*> stored = WTProject::fetchByPredicate({}, other->managedObjectContext());
+  ASSERT_EQ(stored.size(), 1);
+  EXPECT_EQ(stored[0]->name(), "typed, not yet committed");
+}
+
 TEST_F(WTAppDelegateTest, ArchivedRecordsAreHiddenUntilShown) {
   auto delegate = makeDelegate();
   WTObjectContext* context = delegate->managedObjectContext();
