@@ -113,7 +113,10 @@ class PostgresConnection final : public SqlConnection {
     if (found != names_.end()) return found->second;
     int count = 0;
     const std::string numbered = numberedPlaceholders(sql, count);
-    std::string name = "s" + std::to_string(names_.size() + 1);
+    // Appending rather than `"s" + std::to_string(...)`: GCC 12 at -O3 reports a false -Wrestrict inside
+    // std::string for the latter.
+    std::string name(1, 's');
+    name += std::to_string(names_.size() + 1);
     ResultHolder result(PQprepare(connection_, name.c_str(), numbered.c_str(), count, nullptr));
     if (PQresultStatus(result.get()) != PGRES_COMMAND_OK) fail(result.get());
     return names_.emplace(sql, std::move(name)).first->second;
