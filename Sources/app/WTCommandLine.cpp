@@ -60,12 +60,68 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   return status;
 }
 
+constexpr char kUsage[] = "usage: tessal [template|sync] [ARGS...]   (tessal --help tells more)\n";
+
+constexpr char kHelp[] =
+    "Tessal tracks working time and bills it.\n"
+    "\n"
+    "usage:\n"
+    "  tessal                                        start the desktop application (or bring it forward)\n"
+    "  tessal template TEMPLATE_FILE [--vars VARS.json]\n"
+    "                                                render a report template with a JSON object's "
+    "variables\n"
+    "  tessal sync [--timeout SECONDS]               bring this installation in step with its sync server\n"
+    "  tessal --help                                 show this text\n"
+    "  tessal --version                              show the version\n"
+    "\n"
+    "The desktop application also takes Qt's own options (-platform NAME, -style NAME, -session ID, ...).\n"
+    "Data: $XDG_DATA_HOME/Tessal2/Tessal.sqlite; settings: $XDG_CONFIG_HOME/Tessal/Tessal.conf.\n";
+
+// Options Qt's application object takes for the desktop application, with whether each takes a value.
+// A session manager restores a session with "-session ID", so these must keep reaching Qt.
+bool isQtOption(const QString& argument, bool& takesValue) {
+  static const QStringList withValue = {
+      "-platform",     "-platformpluginpath", "-platformtheme", "-plugin",     "-qwindowgeometry",
+      "-qwindowicon",  "-qwindowtitle",       "-style",         "-stylesheet", "-session",
+      "-display",      "-geometry",           "-name",          "-title",      "-widgetcount",
+      "-qmljsdebugger"};
+  static const QStringList plain = {"-reverse", "-nograb", "-dograb", "-sync", "-visual"};
+  QString name = argument.section(u'=', 0, 0);
+  if (name.startsWith(QLatin1String("--"))) name.remove(0, 1);
+  takesValue = withValue.contains(name) && !argument.contains(u'=');
+  return withValue.contains(name) || plain.contains(name);
+}
+
+// Whether the arguments (after the program name) are all the desktop application's own.
+bool desktopArgumentsValid(int argc, char** argv) {
+  for (int i = 1; i < argc; ++i) {
+    bool takesValue = false;
+    if (!isQtOption(QString::fromLocal8Bit(argv[i]), takesValue)) return false;
+    if (takesValue && ++i >= argc) return false;
+  }
+  return true;
+}
+
 }  // namespace
 
 std::optional<int> runCommandLine(int argc, char** argv) {
   if (argc < 2) return std::nullopt;
   const QString command = QString::fromLocal8Bit(argv[1]);
-  if (command != QLatin1String("template") && command != QLatin1String("sync")) return std::nullopt;
+  // Nothing here may need a display: these answer before any application object exists.
+  if (command == QLatin1String("--help") || command == QLatin1String("-h")) {
+    std::fputs(kHelp, stdout);
+    return 0;
+  }
+  if (command == QLatin1String("--version")) {
+    std::printf("tessal %s\n", TESSAL_VERSION);
+    return 0;
+  }
+  if (command != QLatin1String("template") && command != QLatin1String("sync")) {
+    if (desktopArgumentsValid(argc, argv)) return std::nullopt;
+    std::fprintf(stderr, "tessal: unknown command or option '%s'\n", argv[1]);
+    std::fputs(kUsage, stderr);
+    return 2;
+  }
 
   QCoreApplication app(argc, argv);
   app.setApplicationName(QStringLiteral("Tessal"));

@@ -55,6 +55,8 @@ class Installation {
     environment.insert("XDG_DATA_HOME", home_.filePath("data"));
     environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
     environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
+    // As on a server or over ssh: no display of any kind, and no platform plugin chosen for us.
+    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
     process.setProcessEnvironment(environment);
     process.start(QString::fromUtf8(TESSAL_EXE), arguments);
     Outcome run;
@@ -94,6 +96,28 @@ TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
   EXPECT_EQ(missing.code, 2);
   EXPECT_TRUE(missing.err.contains("/nonexistent/vars.json")) << missing.err.toStdString();
   EXPECT_EQ(missing.out, "");
+}
+
+TEST(WTCommandLine, HelpVersionAndBadArgumentsNeedNoDisplay) {
+  Installation here;
+  for (const char* flag : {"--help", "-h"}) {
+    const Outcome help = here.tessal({flag});
+    EXPECT_EQ(help.code, 0) << flag << ": " << help.err.toStdString();
+    EXPECT_TRUE(help.out.contains("tessal template TEMPLATE_FILE")) << help.out.toStdString();
+    EXPECT_TRUE(help.out.contains("tessal sync")) << help.out.toStdString();
+  }
+  const Outcome version = here.tessal({"--version"});
+  EXPECT_EQ(version.code, 0) << version.err.toStdString();
+  EXPECT_EQ(version.out, QStringLiteral("tessal %1\n").arg(QStringLiteral(TESSAL_VERSION)));
+
+  // Neither a command nor a Qt option: refused with a usage line before anything needs a display.
+  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}}) {
+    const Outcome run = here.tessal(bad);
+    EXPECT_EQ(run.code, 2) << bad.join(' ').toStdString() << ": " << run.err.toStdString();
+    EXPECT_TRUE(run.err.contains("usage: tessal")) << run.err.toStdString();
+    EXPECT_EQ(run.out, "");
+  }
+  EXPECT_FALSE(QFile::exists(here.storePath()));
 }
 
 TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
