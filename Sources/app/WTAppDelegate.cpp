@@ -80,9 +80,10 @@ void WTAppDelegate::saveAction() {
 
 bool WTAppDelegate::saveChanges(Error* error) {
   WTObjectContext* context = managedObjectContext();
-  // The edit in progress first: committing it may be the only change there is.
-  if (commitEditing_) commitEditing_();
+  // Nothing to save: return before touching anything the user may be typing in. An edit in progress is
+  // committed (not ended) only when a save happens anyway.
   if (!context->hasChanges()) return true;
+  if (commitEditing_) commitEditing_();
   const Result<void> saved = context->save();
   if (saved) return true;
   qWarning("ERROR: %s", qUtf8Printable(saved.error().message));

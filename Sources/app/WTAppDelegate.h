@@ -46,8 +46,9 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // reported when opening) and the changes stay for the next attempt. Logs "Saved" either way.
   void saveAction();
 
-  // A save that first commits an edit in progress (through the commit-editing handler), for callers
-  // that save while the user may be typing. Logs "ERROR: ..." and fills `error` when it fails.
+  // A save for callers that run while the user may be typing (a sync merge): returns true at once when
+  // nothing changed; otherwise commits an edit in progress through the commit-editing handler (which
+  // must not end it) and saves. Logs "ERROR: ..." and fills `error` when it fails.
   bool saveChanges(Error* error = nullptr);
 
   // Whether archived clients and projects are listed, and the filter that says so.
@@ -64,7 +65,8 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   TerminateReply applicationShouldTerminate();
   void applicationWillTerminate();
 
-  // Runs before quitting and before each safe save, to commit an edit in progress; false refuses.
+  // Runs before quitting and before each safe save that has something to save, to commit an edit in
+  // progress without ending it; false refuses.
   void setCommitEditingHandler(std::function<bool()> handler) { commitEditing_ = std::move(handler); }
 
  signals:

@@ -4,6 +4,7 @@
 #include "UserDefaults.h"
 #include "WTAppDelegate.h"
 #include "WTClientsViewController.h"
+#include "WTEditCommitter.h"
 #include "WTImages.h"
 #include "WTItemsViewController.h"
 #include "WTNavigationController.h"
@@ -34,9 +35,9 @@ WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget*
   WTObjectContext* context = delegate_.managedObjectContext();
   if (UserDefaults* defaults = context->userDefaults()) registerDefaults(*defaults);
   restoreWindowGeometry();
-  // Commits an edit in progress before a save on quitting.
+  // A save (the autosave, a sync merge, quitting) stores what the user is typing without ending the edit.
   delegate_.setCommitEditingHandler([] {
-    if (QWidget* focus = QApplication::focusWidget()) focus->clearFocus();
+    WTEditCommitter::commitWithoutEnding(QApplication::focusWidget());
     return true;
   });
 

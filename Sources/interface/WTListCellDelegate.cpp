@@ -97,6 +97,10 @@ QWidget* WTListCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
 }
 
 void WTListCellDelegate::setEditorData(QWidget* editor, const QModelIndex& index) const {
+  // Only when the editor opens: a change announced for the row later (a save committing this very
+  // edit, a merge) must not replace or select what is being typed.
+  if (editor->property("loaded").toBool()) return;
+  editor->setProperty("loaded", true);
   auto* line = static_cast<QLineEdit*>(editor);
   line->setText(index.data(WTObjectListModel::NameRole).toString());
   line->selectAll();

@@ -112,23 +112,34 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
   ASSERT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(), 1);
 }
 
-// A save for a merge or the menu first commits what the user is typing, even when nothing else changed.
-TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressFirst) {
+// A save with nothing to save touches nothing the user is typing in; one with changes commits the edit in
+// progress with them.
+TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressOnlyWhenThereIsSomethingToSave) {
   auto delegate = makeDelegate();
   WTObjectContext* context = delegate->managedObjectContext();
   WTProject* project = WTProject::insertNewObject(context);
   ASSERT_TRUE(delegate->saveChanges());
+  int commits = 0;
   delegate->setCommitEditingHandler([&] {
+    ++commits;
     project->setName("typed, not yet committed");
     return true;
   });
   ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(commits, 0);
+  EXPECT_EQ(project->name(), "");
+
+  WTProject::insertNewObject(context)->setName("another change");
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(commits, 1);
   EXPECT_FALSE(context->hasChanges());
   auto other = makeDelegate();
   delegate.reset();
-  const QList<WTProject*> stored = WTProject::fetchByPredicate({}, other->managedObjectContext());
-  ASSERT_EQ(stored.size(), 1);
-  EXPECT_EQ(stored[0]->name(), "typed, not yet committed");
+  QStringList names;
+  for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
+    names << stored->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"another change", "typed, not yet committed"}));
 }
 
 TEST_F(WTAppDelegateTest, ArchivedRecordsAreHiddenUntilShown) {

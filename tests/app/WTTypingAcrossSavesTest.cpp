@@ -1,0 +1,177 @@
+// Saves happen while the user types: the autosave, every sync reply, quitting. Whatever saves must leave
+// the open editor, its text, cursor and selection, and the keyboard focus exactly as they were.
+#include "AppFixture.h"
+#include "SyncTestSupport.h"
+#include "WTClient.h"
+#include "WTClientsViewController.h"
+#include "WTItemsViewController.h"
+#include "WTListView.h"
+#include "WTMainWindowController.h"
+#include "WTNavigationController.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTProjectsViewController.h"
+
+#include <gtest/gtest.h>
+
+#include <QApplication>
+#include <QLineEdit>
+#include <QPointer>
+#include <QTest>
+
+namespace {
+
+class WTTypingAcrossSavesTest : public AppTest {
+ protected:
+  void TearDown() override {
+    window.reset();
+    delegate.reset();
+    AppTest::TearDown();
+  }
+  void open() {
+    delegate = makeDelegate();
+    window = std::make_unique<WTMainWindowController>(*delegate);
+    window->show();
+    window->activateWindow();
+    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+  }
+  // A new client with its name editor open, as Ctrl+2 then Ctrl+N leave it.
+  QLineEdit* newClientEditor() {
+    window->showClients();
+    window->clientsViewController()->addObject();
+    return qobject_cast<QLineEdit*>(QApplication::focusWidget());
+  }
+  // Another record changes, as a merge or another window would change it, so that the save has work.
+  void changeSomethingElse(const QString& name) {
+    WTProject::insertNewObject(delegate->managedObjectContext())->setName(name);
+  }
+  QStringList storedClientNames() {
+    QStringList names;
+    auto other = makeDelegate();
+    for (WTClient* client : WTClient::fetchByPredicate({}, other->managedObjectContext()))
+      names << client->name();
+    return names;
+  }
+
+  std::unique_ptr<WTAppDelegate> delegate;
+  std::unique_ptr<WTMainWindowController> window;
+};
+
+TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChanges) {
+  open();
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  QTest::keyClicks(editor, "Alpha");
+
+  // Nothing else changed since the insertion was saved: the save must not even look at the editor.
+  ASSERT_TRUE(delegate->managedObjectContext()->save());
+  ASSERT_TRUE(delegate->saveChanges());
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
+  EXPECT_EQ(editor->text(), "Alpha");
+
+  // With something to save, the typed text is saved too, and the editor stays as the user left it.
+  QTest::keyClicks(editor, "Beta");
+  editor->setSelection(5, 3);  // "Bet", cursor after it
+  changeSomethingElse("merged elsewhere");
+  ASSERT_TRUE(delegate->saveChanges());
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
+  EXPECT_EQ(editor->text(), "AlphaBeta");
+  EXPECT_EQ(editor->selectedText(), "Bet");
+  EXPECT_EQ(editor->cursorPosition(), 8);
+  EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
+  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBeta"}));
+
+  editor->end(false);
+  QTest::keyClicks(editor, "Gamma");
+  QTest::keyClick(editor, Qt::Key_Return);
+  // The view commits and closes on its next turn of the event loop.
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
+}
+
+TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave) {
+  open();
+  WTProject* project = window->fetchProjects().value(0);
+  ASSERT_TRUE(project);
+  window->projectsViewController()->openProject(project);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  ASSERT_TRUE(items);
+  QLineEdit* rate = items->rateField();
+  rate->setFocus();
+  ASSERT_TRUE(QTest::qWaitFor([&] { return rate->hasFocus(); }, 2000));
+  QTest::keyClicks(rate, "125");
+  rate->setCursorPosition(1);
+
+  changeSomethingElse("merged elsewhere");
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(QApplication::focusWidget(), rate);
+  EXPECT_EQ(rate->text(), "125");
+  EXPECT_EQ(rate->cursorPosition(), 1);
+  ASSERT_TRUE(project->storedRate());
+  EXPECT_EQ(project->storedRate()->toString(), "125");
+}
+
+// The real path of the report: a "head" reply that changes another record is merged and saved while the
+// user types a new client's name.
+TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
+  synctest::LoopbackHttpServer server;
+  qint64 iteration = 1;
+  QVariantMap pendingChange;
+  server.handler = [&](const synctest::HttpRequest& request) {
+    const QVariantMap body = request.json();
+    QVariantMap reply{{"action", body.value("action")}, {"iteration", ++iteration}};
+    if (body.value("action") == "head") {
+      reply.insert("result",
+                   pendingChange.isEmpty()
+                       ? QVariantMap{{"i", QVariantMap{}}, {"u", QVariantMap{}}, {"x", QVariantList{}}}
+                       : pendingChange);
+      pendingChange.clear();
+    }
+    return synctest::LoopbackHttpServer::json(reply);
+  };
+  defaults->setValue("WTSyncServer", server.address());
+  defaults->setValue("WTSyncUser", "typist@example.org");
+  defaults->setValue("WTSyncPassword", "a password");
+  open();
+  RZSyncManager* sync = delegate->syncManager();
+  ASSERT_TRUE(sync);
+  sync->setIntervals({50, 50, 50});
+  sync->rescheduleTimer(0);
+
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  QTest::keyClicks(editor, "Alpha");
+  // Let the autosave store the new client and a few polls pass, as the user pauses.
+  const qsizetype seen = server.requests.size();
+  ASSERT_TRUE(synctest::waitUntil([&] { return server.requests.size() >= seen + 3; }));
+
+  const QString projectId = window->fetchProjects().value(0)->uuid();
+  pendingChange = QVariantMap{{"i", QVariantMap{}},
+                              {"u", QVariantMap{{projectId, QVariantMap{{"name", "Renamed on the laptop"}}}}},
+                              {"x", QVariantList{}}};
+  ASSERT_TRUE(synctest::waitUntil(
+      [&] { return window->fetchProjects().value(0)->name() == "Renamed on the laptop"; }));
+  ASSERT_TRUE(synctest::waitUntil([&] { return !delegate->managedObjectContext()->hasChanges(); }));
+
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
+  EXPECT_EQ(editor->text(), "Alpha");
+  EXPECT_EQ(editor->cursorPosition(), 5);
+  EXPECT_FALSE(editor->hasSelectedText());  // or the next key would replace what was typed
+  QTest::keyClicks(editor, "BetaGamma");
+  QTest::keyClick(editor, Qt::Key_Return);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  sync->disableSync();
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
+}
+
+}  // namespace
