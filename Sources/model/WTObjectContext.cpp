@@ -245,11 +245,10 @@ void WTObjectContext::setChangeJournal(WTChangeJournal* journal) {
 
 void WTObjectContext::storedValueChanged(WTObject* object, const QString& key, const QVariant& oldValue) {
   markChanged(object, key);
-  if (key == QLatin1String("uuid")) {
-    undo_.registerUndo([object, oldValue] { object->setUuid(oldValue.toString()); });
-  } else {
-    undo_.registerUndo([object, key, oldValue] { object->setStoredValue(key, oldValue); });
-  }
+  // Identity is never undone: an undone insertion leaves the graph under the identity it was saved
+  // with, so that the store can remove that row and the journal can name it to the other devices.
+  if (key == QLatin1String("uuid")) return;
+  undo_.registerUndo([object, key, oldValue] { object->setStoredValue(key, oldValue); });
 }
 
 void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int oldIndex) {
@@ -289,6 +288,13 @@ Result<void> WTObjectContext::save() {
 
   std::vector<WTObject*> written(inserted_.begin(), inserted_.end());
   written.insert(written.end(), updated_.begin(), updated_.end());
+  // A row or a journal entry without identity could never be matched again: refuse before writing.
+  for (const auto* set : {&inserted_, &updated_, &deleted_}) {
+    for (WTObject* object : *set) {
+      if (object->uuid_.isEmpty())
+        return Error{2, tr("A %1 without identity cannot be saved.").arg(object->entityName())};
+    }
+  }
   for (WTObject* object : written) object->willSave();
   for (WTObject* object : deleted_) object->willSave();
 
