@@ -34,6 +34,7 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
   bool string(string_t& value) override { return add(QString::fromStdString(value)); }
   bool binary(binary_t&) override { return false; }
   bool start_object(std::size_t) override {
+    if (!enter()) return false;
     stack_.push_back({true, {}, {}, {}});
     return true;
   }
@@ -43,6 +44,7 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
   }
   bool end_object() override { return close(); }
   bool start_array(std::size_t) override {
+    if (!enter()) return false;
     stack_.push_back({false, {}, {}, {}});
     return true;
   }
@@ -62,6 +64,14 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
     QVariantList list;
     QString key;
   };
+
+  // Documents of this protocol nest a few levels; a deep one is refused before it is built, since
+  // building, copying and destroying nested values recurses once per level.
+  bool enter() {
+    if (stack_.size() < kMaxDepth) return true;
+    error = QStringLiteral("JSON nested deeper than %1 levels").arg(kMaxDepth);
+    return false;
+  }
 
   bool add(QVariant value) {
     if (stack_.empty()) {

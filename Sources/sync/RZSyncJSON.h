@@ -16,8 +16,12 @@
 // false a bool, and null a null (invalid) QVariant.
 namespace RZSyncJSON {
 
+// Containers nested deeper than this are refused while parsing.
+inline constexpr std::size_t kMaxDepth = 64;
+
 // Parses one JSON text; a bare string or number at the top level is accepted (the caller decides
-// whether it wants a container). None for malformed text, with a description in `error` when given.
+// whether it wants a container). None for malformed text or nesting deeper than kMaxDepth, with a
+// description in `error` when given.
 std::optional<QVariant> parse(QByteArrayView text, QString* error = nullptr);
 
 enum class Style {

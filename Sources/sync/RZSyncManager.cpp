@@ -4,6 +4,7 @@
 #include "KeyPath.h"
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
+#include "RZSyncReply.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTItem.h"
@@ -201,23 +202,22 @@ void RZSyncManager::post(const QVariantMap& data, const QString& action, qint64 
     inFlight_ = {action, action == kSave ? data : QVariantMap()};
 }
 
-void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork*, const QVariant& object) {
+void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const QVariant& object) {
+  const Result<RZSyncReply> parsed = RZSyncReply::fromJSON(object);
+  if (!parsed) {
+    if (object.typeId() != QMetaType::QVariantMap || !object.toMap().contains(QStringLiteral("iteration")))
+      qWarning("Iteration not received");
+    // Nothing of it is taken: the journal keeps its iteration and changes, and the poll is retried.
+    qWarning().noquote() << parsed.error().message;
+    return syncNetworkDidFailWithError(network, parsed.error().message);
+  }
+  const RZSyncReply& reply = parsed.value();
   const Request answered = std::exchange(inFlight_, {});
   RZSyncExchange exchange{answered.action, RZSyncExchange::Outcome::Answered, false, {}};
-  if (object.typeId() != QMetaType::QVariantMap) {
-    qWarning("Iteration not received");
-    endFailureRun();
-    return finish(exchange);
-  }
-  const QVariantMap reply = object.toMap();
-  const QVariant error = reply.value(QStringLiteral("error"));
-  const QString action = reply.value(QStringLiteral("action")).toString();
-  const QVariant iterationValue = reply.value(QStringLiteral("iteration"));
 
-  if (error.isValid()) {
-    const qint64 code = integerValue(reply.value(QStringLiteral("code"))).value_or(0);
-    if (code != 4) {
-      const QString message = QStringLiteral("%1 - (Code: %2)").arg(error.toString()).arg(code);
+  if (reply.error) {
+    if (reply.code != 4) {
+      const QString message = QStringLiteral("%1 - (Code: %2)").arg(*reply.error).arg(reply.code);
       presenter_->presentSyncError(message);
       disableSync();
       exchange.outcome = RZSyncExchange::Outcome::Refused;
@@ -226,7 +226,7 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork*, const QVariant
     }
     // Code 4: the save was not taken as it stood. With an iteration, send the journal again claiming
     // it; without one (below 1), keep the journal for the next poll, which fetches what was missing.
-    const qint64 base = integerValue(iterationValue).value_or(0);
+    const qint64 base = reply.iteration.value_or(0);
     if (base < 1) {
       qInfo("Head iteration problem");
     } else {
@@ -236,21 +236,14 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork*, const QVariant
     return finish(exchange);
   }
 
-  const std::optional<qint64> iteration = integerValue(iterationValue);
-  if (!iteration) {
-    qWarning("Iteration not received");
-    endFailureRun();
-    return finish(exchange);
-  }
-
-  if (action == kHead) {
-    const QVariantMap result = reply.value(QStringLiteral("result")).toMap();
-    exchange.receivedChanges = !isEmptyChangeSet(result);
-    mergeHead(result, *iteration);
-  } else if (action == kSave) {
+  const qint64 iteration = *reply.iteration;
+  if (reply.action == kHead) {
+    exchange.receivedChanges = !isEmptyChangeSet(reply.result);
+    mergeHead(reply.result, iteration);
+  } else {
     // Only what this request carried is confirmed; the user may have gone on editing meanwhile.
     if (answered.action == kSave) track_->removeSentChanges(answered.data);
-    track_->setIteration(*iteration);
+    track_->setIteration(iteration);
     writeTrack(false);
   }
   endFailureRun();

@@ -52,6 +52,8 @@ void RZSyncNetwork::postJSONObject(const QVariant& data, const QString& action, 
 
   QNetworkRequest request(url_);
   request.setTransferTimeout(timeoutMs_);
+  // The body carries the password: it goes to the configured address and nowhere a redirect points.
+  request.setAttribute(QNetworkRequest::RedirectPolicyAttribute, QNetworkRequest::ManualRedirectPolicy);
   request.setRawHeader("Accept", "application/json");
   request.setRawHeader("Content-Type", "application/json");
   request.setRawHeader("Content-Length", QByteArray::number(bytes.size()));
@@ -69,10 +71,28 @@ void RZSyncNetwork::postJSONObject(const QVariant& data, const QString& action, 
 void RZSyncNetwork::replyMetaDataChanged() {
   // A new response (after a redirect, say) starts the body over.
   responseData_.clear();
+  if (!reply_) return;
+  const QVariant length = reply_->header(QNetworkRequest::ContentLengthHeader);
+  if (length.isValid() && length.toLongLong() > maxReplyBytes_) refuseOversizedReply();
 }
 
 void RZSyncNetwork::replyReadyRead() {
-  if (reply_) responseData_.append(reply_->readAll());
+  if (!reply_) return;
+  responseData_.append(reply_->readAll());
+  if (responseData_.size() > maxReplyBytes_) refuseOversizedReply();
+}
+
+void RZSyncNetwork::refuseOversizedReply() {
+  // Counted as it arrives, whatever the headers claimed: no answer of this protocol is that large.
+  QNetworkReply* reply = std::exchange(reply_, nullptr);
+  reply->disconnect(this);
+  reply->abort();
+  reply->deleteLater();
+  responseData_.clear();
+  networkAction_ = Idle;
+  const QString error = QStringLiteral("The server's reply is larger than %1 bytes.").arg(maxReplyBytes_);
+  qWarning().noquote() << error;
+  if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
 }
 
 void RZSyncNetwork::replyFinished() {
@@ -95,6 +115,18 @@ void RZSyncNetwork::replyFinished() {
   }
 
   const QByteArray body = std::exchange(responseData_, {});
+  const int status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
+  if (status >= 300 && status < 400) {
+    // Never followed (see postJSONObject), whatever its body says.
+    const QString target = reply->header(QNetworkRequest::LocationHeader).toUrl().toString();
+    const QString error =
+        QStringLiteral("The server answered HTTP %1, a redirect to %2, which is not followed.")
+            .arg(status)
+            .arg(target.isEmpty() ? QStringLiteral("nowhere") : target);
+    qWarning().noquote() << error;
+    if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
+    return;
+  }
   QString error;
   const std::optional<QVariant> object = RZSyncJSON::parse(body, &error);
   if (object && RZSyncJSON::isContainer(*object)) {
@@ -102,7 +134,6 @@ void RZSyncNetwork::replyFinished() {
     return;
   }
   if (object) error = QStringLiteral("The reply is not a JSON object or array.");
-  const int status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
   if (status != 200) {
     // A plain-text answer (a proxy's or the server's "try again later") says more than the parser.
     const QString text = QString::fromUtf8(body).simplified().left(200);

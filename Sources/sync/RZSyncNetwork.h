@@ -73,10 +73,16 @@ class RZSyncNetwork : public QObject {
   // The body received so far (for inspection in tests).
   QByteArray responseData() const { return responseData_; }
 
+  // A reply larger than this fails the exchange and is not read further (64 MiB unless changed).
+  static constexpr qsizetype kMaxReplyBytes = qsizetype(64) << 20;
+  qsizetype maxReplyBytes() const { return maxReplyBytes_; }
+  void setMaxReplyBytes(qsizetype bytes) { maxReplyBytes_ = bytes; }
+
  private:
   void replyMetaDataChanged();
   void replyReadyRead();
   void replyFinished();
+  void refuseOversizedReply();
 
   QUrl url_;
   RZSyncNetworkDelegate* delegate_;
@@ -85,6 +91,7 @@ class RZSyncNetwork : public QObject {
   QString password_;
   QString device_;
   int timeoutMs_ = 60000;
+  qsizetype maxReplyBytes_ = kMaxReplyBytes;
   int networkAction_ = Idle;
   QNetworkAccessManager* manager_;
   QPointer<QNetworkReply> reply_;

@@ -114,3 +114,14 @@ TEST(RZSyncJSON, PrettyAndCompactWriteTheSameValue) {
   EXPECT_TRUE(RZSyncJSON::sameValue(QVariant::fromValue(dec("12.30")), *RZSyncJSON::parse("12.30")));
   EXPECT_FALSE(RZSyncJSON::sameValue(QVariant::fromValue(dec("12.30")), QVariant::fromValue(dec("12.3"))));
 }
+
+TEST(RZSyncJSON, NestingIsBoundedWhileParsing) {
+  const auto nested = [](std::size_t depth) {
+    return QByteArray(qsizetype(depth), '[') + QByteArray(qsizetype(depth), ']');
+  };
+  EXPECT_TRUE(RZSyncJSON::parse(nested(RZSyncJSON::kMaxDepth)));
+  QString error;
+  EXPECT_FALSE(RZSyncJSON::parse(nested(RZSyncJSON::kMaxDepth + 1), &error));
+  EXPECT_TRUE(error.contains("nested")) << error.toStdString();
+  EXPECT_FALSE(RZSyncJSON::parse(nested(1000000)));
+}

@@ -506,3 +506,66 @@ TEST_F(RZSyncManagerTest, NoMergeWhenLocalEditsCannotBeSaved) {
   EXPECT_NE(client.find<WTTask>("New@WTTask"), nullptr);
   EXPECT_EQ(sent("head").last().value("iteration").toLongLong(), iteration);
 }
+
+// A reply not of the protocol's exact shape is a failed exchange: shown once for the run of failures,
+// retried, and nothing of it reaches the journal, its file or the store.
+TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
+  WTTask* task = syncedTask();
+  const qint64 before = client.track().iteration();
+  QFile file(client.journalPath());
+  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
+  const QByteArray journalFile = file.readAll();
+  file.close();
+  const QByteArray bad[] = {
+      R"({"action": "head", "iteration": -5, "result": {}})",
+      R"({"action": "head", "iteration": "abc", "result": {}})",
+      R"({"action": "head", "iteration": true, "result": {}})",
+      R"({"action": "head", "iteration": 1e300, "result": {}})",
+      R"({"action": "head", "iteration": 7.5, "result": {}})",
+      R"({"action": "save", "iteration": -1})",
+      R"({"action": "head", "iteration": 7})",
+      R"({"action": "head", "iteration": 7, "result": []})",
+      R"({"action": "head", "iteration": 7, "result": {"i": []}})",
+      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTTask": "name"}}})",
+      R"({"action": "head", "iteration": 7, "result": {"x": "A@WTTask"}})",
+      R"({"action": "head", "iteration": 7, "result": {"x": [5]}})",
+      R"({"action": "head", "iteration": 7, "result": {"q": {}}})",
+      R"({"action": "push", "iteration": 7})",
+      R"({"error": ["not", "text"], "code": 1})",
+      R"({"error": "Busy", "code": "4", "iteration": 7})",
+      R"([1, 2, 3])",
+  };
+  for (const QByteArray& body : bad) {
+    SCOPED_TRACE(body.toStdString());
+    server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(body); };
+    ASSERT_TRUE(client.syncOnce());
+    EXPECT_TRUE(client.manager->hasNetworkError());
+    EXPECT_EQ(client.track().iteration(), before);
+    EXPECT_EQ(task->name(), "Design");
+  }
+  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
+  EXPECT_EQ(file.readAll(), journalFile);
+  ASSERT_EQ(client.presenter.networkErrors.size(), 1);  // one run of failures, shown once
+  EXPECT_TRUE(client.presenter.networkErrors[0].contains("not in the expected form"))
+      << client.presenter.networkErrors[0].toStdString();
+  EXPECT_TRUE(client.presenter.syncErrors.isEmpty());
+
+  // The next good reply ends the run and is taken.
+  server.handler = [&](const HttpRequest&) { return headReply(before + 1); };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_FALSE(client.manager->hasNetworkError());
+  EXPECT_EQ(client.track().iteration(), before + 1);
+}
+
+// A reply nesting arrays far deeper than any of the protocol's (a few hundred kilobytes) fails like any
+// malformed one instead of exhausting the stack.
+TEST_F(RZSyncManagerTest, ADeeplyNestedReplyFailsWithoutCrashing) {
+  syncedTask();
+  const int depth = 200000;
+  const QByteArray body = R"({"action": "head", "iteration": 9, "result": {"x": )" + QByteArray(depth, '[') +
+                          QByteArray(depth, ']') + "}}";
+  server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(body); };
+  ASSERT_TRUE(client.syncOnce());
+  EXPECT_TRUE(client.manager->hasNetworkError());
+  EXPECT_NE(client.track().iteration(), 9);
+}

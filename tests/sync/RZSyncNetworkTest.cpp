@@ -174,17 +174,51 @@ TEST_F(RZSyncNetworkTest, AnErrorPageSaysWhatTheServerAnswered) {
 }
 
 // A second response in one exchange (here after a redirect) starts the body over.
-TEST_F(RZSyncNetworkTest, ASecondResponseDiscardsTheFirstBody) {
-  server.handler = [this](const HttpRequest& request) -> QByteArray {
-    if (request.path == "/moved") return LoopbackHttpServer::json(QVariantMap{{"iteration", 5}});
-    return LoopbackHttpServer::raw("{\"not\": \"this\"", 307, "application/json",
-                                   "Location: " + server.url(QStringLiteral("/moved")).toEncoded() + "\r\n");
+// The request carries the password: a redirect, even with a JSON body, is a failure that names it, and
+// nothing is sent where it points (here another port on the same host).
+TEST_F(RZSyncNetworkTest, ARedirectIsAFailureAndTheCredentialsStayHome) {
+  LoopbackHttpServer elsewhere;
+  elsewhere.handler = [](const HttpRequest&) {
+    return LoopbackHttpServer::json(QVariantMap{{"iteration", 5}});
+  };
+  server.handler = [&](const HttpRequest&) -> QByteArray {
+    return LoopbackHttpServer::raw("{\"iteration\": 6}", 307, "application/json",
+                                   "Location: " + elsewhere.url().toEncoded() + "\r\n");
   };
   exchange();
-  ASSERT_EQ(delegate.objects.size(), 1) << delegate.errors.join(' ').toStdString();
-  EXPECT_EQ(delegate.objects[0].toMap().value("iteration").toLongLong(), 5);
-  ASSERT_EQ(server.requests.size(), 2);
-  EXPECT_EQ(server.requests[1].json().value("action"), "head");  // the body went along
+  EXPECT_TRUE(delegate.objects.isEmpty());
+  ASSERT_EQ(delegate.errors.size(), 1);
+  EXPECT_TRUE(delegate.errors[0].contains("307")) << delegate.errors[0].toStdString();
+  EXPECT_EQ(server.requests.size(), 1);
+  QTest::qWait(50);
+  EXPECT_TRUE(elsewhere.requests.isEmpty());
+}
+
+// Counted as the bytes arrive: a declared length over the limit fails at once, and so does a chunked
+// body that declares none; the rest is not read.
+TEST_F(RZSyncNetworkTest, AReplyOverTheSizeLimitFails) {
+  EXPECT_EQ(network.maxReplyBytes(), 64 << 20);
+  network.setMaxReplyBytes(1024);
+  const QByteArray big = "{\"pad\": \"" + QByteArray(4096, 'x') + "\"}";
+  server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(big); };
+  exchange();
+  EXPECT_TRUE(delegate.objects.isEmpty());
+  ASSERT_EQ(delegate.errors.size(), 1);
+  EXPECT_TRUE(delegate.errors[0].contains("larger than 1024 bytes")) << delegate.errors[0].toStdString();
+  EXPECT_EQ(network.networkAction(), RZSyncNetwork::Idle);
+
+  delegate.errors.clear();
+  server.handler = [&](const HttpRequest&) {
+    QByteArray chunked =
+        "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n"
+        "Connection: close\r\n\r\n";
+    for (int i = 0; i < 4; ++i) chunked += "400\r\n" + QByteArray(1024, ' ') + "\r\n";
+    return chunked + "2\r\n{}\r\n0\r\n\r\n";
+  };
+  exchange();
+  EXPECT_TRUE(delegate.objects.isEmpty());
+  ASSERT_EQ(delegate.errors.size(), 1);
+  EXPECT_TRUE(delegate.errors[0].contains("larger than")) << delegate.errors[0].toStdString();
 }
 
 TEST_F(RZSyncNetworkTest, ConnectionFailureIsReportedAndLogged) {
