@@ -173,7 +173,10 @@ void WTMainWindowController::buildActions() {
 
   QMenu* edit = menuBar()->addMenu(tr("&Edit"));
   QAction* undo = edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
-    if (QWidget* focus = QApplication::focusWidget()) focus->clearFocus();
+    // Typing is undone where it was typed; only then the records, with the keyboard focus kept.
+    QWidget* focus = QApplication::focusWidget();
+    if (WTEditCommitter::undoTyping(focus)) return;
+    WTEditCommitter::closeUntouchedEditor(focus);
     delegate_.managedObjectContext()->undoManager().undo();
   });
   undo->setObjectName(QStringLiteral("undo"));

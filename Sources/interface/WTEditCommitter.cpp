@@ -1,7 +1,9 @@
 #include "WTEditCommitter.h"
 
+#include <QAbstractItemDelegate>
 #include <QAbstractItemView>
 #include <QLineEdit>
+#include <QPlainTextEdit>
 #include <QPointer>
 
 namespace {
@@ -68,4 +70,26 @@ bool WTEditCommitter::commitWithoutEnding(QWidget* focus) {
     return true;
   }
   return false;
+}
+
+bool WTEditCommitter::undoTyping(QWidget* focus) {
+  if (auto* edit = qobject_cast<QLineEdit*>(focus); edit && edit->isUndoAvailable()) {
+    edit->undo();
+    return true;
+  }
+  if (auto* text = qobject_cast<QPlainTextEdit*>(focus); text && text->document()->isUndoAvailable()) {
+    text->undo();
+    return true;
+  }
+  return false;
+}
+
+bool WTEditCommitter::closeUntouchedEditor(QWidget* focus) {
+  if (!focus) return false;
+  QWidget* editor = nullptr;
+  QAbstractItemView* view = owningEditor(focus, editor);
+  if (!view) return false;
+  // The view's own slot releases the editor and, as it had the focus, gives the focus to the view.
+  return QMetaObject::invokeMethod(view, "closeEditor", Qt::DirectConnection, Q_ARG(QWidget*, editor),
+                                   Q_ARG(QAbstractItemDelegate::EndEditHint, QAbstractItemDelegate::NoHint));
 }

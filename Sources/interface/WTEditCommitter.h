@@ -12,4 +12,13 @@ namespace WTEditCommitter {
 // is left alone. Returns whether there was an edit to commit.
 bool commitWithoutEnding(QWidget* focus);
 
+// The first part of Undo, as the user means it: what they typed into `focus` (a field or an open cell
+// editor) is taken back there, the editor staying open. Returns false when there is no typing to undo.
+bool undoTyping(QWidget* focus);
+
+// Before the records themselves are undone: an open cell editor with nothing typed in it is closed (it
+// would otherwise show, and later store, a value the undo replaced), the keyboard focus going to its
+// view. Focused fields stay as they are. Returns whether an editor was closed.
+bool closeUntouchedEditor(QWidget* focus);
+
 }  // namespace WTEditCommitter

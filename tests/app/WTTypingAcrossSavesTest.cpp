@@ -9,11 +9,15 @@
 #include "WTMainWindowController.h"
 #include "WTNavigationController.h"
 #include "WTObjectContext.h"
+#include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTTask.h"
 
 #include <gtest/gtest.h>
 
+#include <QAbstractItemView>
+#include <QAction>
 #include <QApplication>
 #include <QLineEdit>
 #include <QPointer>
@@ -116,6 +120,89 @@ TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave)
   EXPECT_EQ(rate->cursorPosition(), 1);
   ASSERT_TRUE(project->storedRate());
   EXPECT_EQ(project->storedRate()->toString(), "125");
+}
+
+TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
+  open();
+  WTProject* project = window->fetchProjects().value(0);
+  ASSERT_TRUE(project);
+  window->projectsViewController()->openProject(project);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  items->addObject();  // a new task, its name editor open
+  QPointer<QLineEdit> editor = qobject_cast<QLineEdit*>(QApplication::focusWidget());
+  ASSERT_TRUE(editor);
+  ASSERT_TRUE(items->outlineView()->isAncestorOf(editor));
+  editor->selectAll();
+  QTest::keyClicks(editor, "Deploy");
+  editor->setSelection(6, -3);  // "loy", cursor before it
+
+  changeSomethingElse("merged elsewhere");
+  ASSERT_TRUE(delegate->saveChanges());
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());
+  EXPECT_EQ(editor->text(), "Deploy");
+  EXPECT_EQ(editor->selectedText(), "loy");
+  EXPECT_EQ(editor->cursorPosition(), 3);
+  QStringList names;
+  auto other = makeDelegate();
+  for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
+    for (WTTask* task : stored->tasks()) names << task->name();
+  EXPECT_TRUE(names.contains("Deploy")) << names.join(", ").toStdString();
+}
+
+// Undo takes back typing where it was typed, and records with the keyboard focus kept where it was.
+TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
+  open();
+  auto* undo = window->findChild<QAction*>("undo");
+  ASSERT_TRUE(undo);
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  ASSERT_TRUE(delegate->managedObjectContext()->save());
+  QTest::keyClicks(editor, "Alpha");
+  undo->trigger();
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());
+  EXPECT_EQ(editor->text(), "");
+  EXPECT_EQ(WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size(), 1);
+}
+
+TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
+  open();
+  auto* undo = window->findChild<QAction*>("undo");
+  ASSERT_TRUE(undo);
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  QTest::keyClicks(editor, "Alpha");
+  QTest::keyClick(editor, Qt::Key_Return);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  QCoreApplication::processEvents();  // the name's undo group ends with this turn
+  QWidget* list = QApplication::focusWidget();
+  ASSERT_TRUE(list);
+  WTClient* client = WTClient::fetchByPredicate({}, delegate->managedObjectContext()).value(0);
+  ASSERT_TRUE(client);
+  ASSERT_EQ(client->name(), "Alpha");
+  undo->trigger();
+  EXPECT_EQ(client->name(), "");
+  EXPECT_EQ(QApplication::focusWidget(), list);
+
+  // An editor opened on the row, nothing typed: undoing the row's name must not leave the editor showing
+  // (and on Return storing) the name the undo replaced.
+  client->setName("Beta");
+  QCoreApplication::processEvents();
+  auto* view = qobject_cast<QAbstractItemView*>(list);
+  ASSERT_TRUE(view);
+  view->edit(view->currentIndex());
+  QPointer<QLineEdit> untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
+  ASSERT_TRUE(untouched);
+  ASSERT_EQ(untouched->text(), "Beta");
+  undo->trigger();
+  EXPECT_EQ(client->name(), "");
+  EXPECT_TRUE(!untouched || !untouched->isVisible());
+  EXPECT_EQ(QApplication::focusWidget(), list);
 }
 
 // The real path of the report: a "head" reply that changes another record is merged and saved while the
