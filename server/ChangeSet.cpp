@@ -14,14 +14,18 @@ constexpr std::array<std::string_view, 8> kEntities = {"WTClient", "WTProject", 
 constexpr size_t kMaxIdentityLength = 200;
 
 bool hasControlCharacter(std::string_view text) {
-  return std::any_of(text.begin(), text.end(), [](char c) { return static_cast<unsigned char>(c) < 0x20; });
+  return std::any_of(text.begin(), text.end(),
+                     [](char c) { return static_cast<unsigned char>(c) < 0x20 || c == 0x7f; });
 }
 }  // namespace
 
 std::optional<std::string_view> entityOf(std::string_view uuid) {
   if (uuid.size() > kMaxIdentityLength || hasControlCharacter(uuid)) return std::nullopt;
-  const size_t at = uuid.rfind('@');
-  if (at == std::string_view::npos || at == 0) return std::nullopt;
+  // NAME@ENTITY with one "@": the client takes the text after the last "@" as the entity, and a name
+  // holding another "@" ("a@@WTTask") would name something else elsewhere.
+  const size_t at = uuid.find('@');
+  if (at == std::string_view::npos || at == 0 || uuid.find('@', at + 1) != std::string_view::npos)
+    return std::nullopt;
   const std::string_view entity = uuid.substr(at + 1);
   for (const std::string_view known : kEntities) {
     if (known == entity) return known;

@@ -119,16 +119,20 @@ PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::st
     outcome.retryAfter = std::max(left, std::chrono::seconds(1));
     return true;
   };
+  bool owner = false;
   {
-    const auto now = std::chrono::steady_clock::now();
+    const auto now = options_.now();
     std::lock_guard lock(mutex_);
     auto found = remembered_.find(digest);
     if (found != remembered_.end() && found->second.expires > now) {
       outcome.verdict = Verdict::Accepted;
       outcome.accountId = found->second.accountId;
+      owners_[digest] = now + options_.ownerLifetime;
       return outcome;
     }
-    if (lockedOut(now)) return outcome;
+    auto proven = owners_.find(digest);
+    owner = proven != owners_.end() && proven->second > now;
+    if (!owner && lockedOut(now)) return outcome;
   }
 
   SyncStore::Account account;
@@ -138,22 +142,46 @@ PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::st
     return outcome;
   }
   const bool known = status == SyncStore::Status::Ok;
-  verifications_.acquire();
+  // The same credentials arriving together (one owner's devices after a restart) share one
+  // verification. A new one never waits for a slot: waiting would hold the request's worker, and a flood
+  // of guesses would then hold them all.
+  std::optional<std::promise<bool>> verifying;
+  std::shared_future<bool> shared;
   {
-    // Attempts that queued while another failed must not slip past the lock it set.
     std::lock_guard lock(mutex_);
-    if (lockedOut(std::chrono::steady_clock::now())) {
-      verifications_.release();
+    auto running = inFlight_.find(digest);
+    if (running != inFlight_.end()) {
+      shared = running->second;
+    } else if (verifications_.try_acquire()) {
+      verifying.emplace();
+      shared = verifying->get_future().share();
+      inFlight_.emplace(digest, shared);
+    } else {
+      outcome.verdict = Verdict::Busy;
       return outcome;
     }
   }
-  const std::string& hash = known ? account.passwordHash : decoyHash();
-  const bool good = crypto_pwhash_str_verify(hash.c_str(), secret.data(), secret.size()) == 0 && known;
-  verifications_.release();
+  if (verifying) {
+    const std::string& hash = known ? account.passwordHash : decoyHash();
+    const bool verified = crypto_pwhash_str_verify(hash.c_str(), secret.data(), secret.size()) == 0 && known;
+    verifications_.release();
+    {
+      std::lock_guard lock(mutex_);
+      inFlight_.erase(digest);
+    }
+    verifying->set_value(verified);
+  }
+  const bool good = shared.get();
+  if (!verifying && !good) {
+    outcome.verdict = Verdict::Rejected;  // the one who verified recorded the failure
+    return outcome;
+  }
 
-  const auto now = std::chrono::steady_clock::now();
+  const auto now = options_.now();
   if (!good) {
-    recordFailure(*address, now);
+    // An owner's stale password (changed on another device) fails like anyone's, but its failures do
+    // not lock the account for the others.
+    if (!owner) recordFailure(*address, now);
     outcome.verdict = Verdict::Rejected;
     return outcome;
   }
@@ -162,7 +190,12 @@ PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::st
     std::erase_if(remembered_, [&](const auto& entry) { return entry.second.expires <= now; });
     if (remembered_.size() >= kMaxRemembered) remembered_.clear();
   }
+  if (owners_.size() >= kMaxRemembered) {
+    std::erase_if(owners_, [&](const auto& entry) { return entry.second <= now; });
+    if (owners_.size() >= kMaxRemembered) owners_.clear();
+  }
   remembered_[digest] = Remembered{account.id, now + options_.successLifetime};
+  owners_[digest] = now + options_.ownerLifetime;
   failures_.erase(*address);
   outcome.verdict = Verdict::Accepted;
   outcome.accountId = account.id;
@@ -177,7 +210,8 @@ PasswordAuthenticator::SignUp PasswordAuthenticator::createAccount(const std::st
   // Characters, not bytes: UTF-8 continuation bytes do not count.
   const size_t characters = static_cast<size_t>(std::count_if(
       secret.begin(), secret.end(), [](char c) { return (static_cast<unsigned char>(c) & 0xc0) != 0x80; }));
-  if (characters < kMinPasswordCharacters || secret.size() > kMaxPasswordBytes) return SignUp::BadPassword;
+  if (secret.size() > kMaxPasswordBytes) return SignUp::PasswordTooLong;
+  if (characters < kMinPasswordCharacters) return SignUp::BadPassword;
   verifications_.acquire();
   const std::optional<std::string> hash = hashPassword(secret);
   verifications_.release();

@@ -5,6 +5,8 @@
 #include <array>
 #include <chrono>
 #include <cstdint>
+#include <functional>
+#include <future>
 #include <mutex>
 #include <optional>
 #include <semaphore>
@@ -20,15 +22,23 @@ namespace tessal::server {
 // a success is remembered for a bounded time under a keyed hash of the credentials (the key is random
 // per process): a poll then costs a hash and a lookup, and a changed password stops working when the
 // entry expires. Failed attempts lock the account for a time that doubles with each consecutive
-// failure; while locked no verification runs at all, but credentials remembered as good still pass, so
-// somebody guessing cannot lock out the owner's devices.
+// failure; while locked no verification runs for strangers. Credentials that were proven once are
+// remembered much longer (under the same keyed hash) as the owner's: they pass a lock and are verified
+// again, so however many strangers fail, the owner's devices keep working, also after a night offline.
+// A verification never waits for a free slot: when all are taken the request is told to come back.
 class PasswordAuthenticator {
  public:
   struct Options {
     std::chrono::milliseconds successLifetime = std::chrono::minutes(10);
+    // How long proven credentials pass a lock after their last successful use.
+    std::chrono::milliseconds ownerLifetime = std::chrono::hours(24 * 30);
     std::chrono::milliseconds firstLock = std::chrono::seconds(1);  // after the first failure
     std::chrono::milliseconds longestLock = std::chrono::minutes(5);
     int concurrentVerifications = 2;  // bounds the memory Argon2id takes under load
+    // The clock (tests move it instead of waiting).
+    std::function<std::chrono::steady_clock::time_point()> now = [] {
+      return std::chrono::steady_clock::now();
+    };
   };
 
   explicit PasswordAuthenticator(SyncStore& store) : PasswordAuthenticator(store, Options{}) {}
@@ -39,6 +49,7 @@ class PasswordAuthenticator {
     Rejected,     // unknown address or wrong password
     Locked,       // too many failures; `retryAfter` tells how long
     Unavailable,  // the storage failed
+    Busy,         // every verification slot is taken; try again shortly
   };
   struct Outcome {
     Verdict verdict = Verdict::Rejected;
@@ -50,8 +61,8 @@ class PasswordAuthenticator {
   Outcome authenticate(const std::string& email, const std::string& password);
 
   // Creates an account. Fails with a reason for an address that is not one, a password shorter than 8
-  // characters, or an address already taken.
-  enum class SignUp { Created, BadEmail, BadPassword, Exists, Unavailable };
+  // characters or longer than 1024 bytes, or an address already taken.
+  enum class SignUp { Created, BadEmail, BadPassword, PasswordTooLong, Exists, Unavailable };
   SignUp createAccount(const std::string& email, const std::string& password);
 
   // The Argon2id hash of a password in libsodium's string form; none when out of memory.
@@ -86,6 +97,8 @@ class PasswordAuthenticator {
 
   std::mutex mutex_;
   std::unordered_map<Digest, Remembered, DigestHash> remembered_;
+  std::unordered_map<Digest, std::chrono::steady_clock::time_point, DigestHash> owners_;  // until when
+  std::unordered_map<Digest, std::shared_future<bool>, DigestHash> inFlight_;  // verifications running
   std::unordered_map<std::string, Failures> failures_;
 };
 

@@ -1,5 +1,7 @@
 #include "SignUpPage.h"
 
+#include <cctype>
+
 namespace tessal::server {
 
 namespace {
@@ -99,12 +101,115 @@ HttpReply SignUpPage::submit(const std::string& email, const std::string& passwo
       return page(400, kTitle, formHtml(email, "That is not an e-mail address."));
     case PasswordAuthenticator::SignUp::BadPassword:
       return page(400, kTitle, formHtml(email, "The password needs at least 8 characters."));
+    case PasswordAuthenticator::SignUp::PasswordTooLong:
+      return page(400, kTitle, formHtml(email, "The password is too long: at most 1024 bytes."));
     case PasswordAuthenticator::SignUp::Exists:
       return page(409, kTitle, formHtml(email, "There already is an account for this address."));
     case PasswordAuthenticator::SignUp::Unavailable:
       break;
   }
   return page(503, kTitle, formHtml(email, "The account could not be stored; please try again later."));
+}
+
+namespace {
+
+int hexDigit(char c) {
+  if (c >= '0' && c <= '9') return c - '0';
+  if (c >= 'a' && c <= 'f') return c - 'a' + 10;
+  if (c >= 'A' && c <= 'F') return c - 'A' + 10;
+  return -1;
+}
+
+std::string decodeComponent(const std::string& text) {
+  std::string out;
+  out.reserve(text.size());
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '+') {
+      out += ' ';
+    } else if (text[i] == '%' && i + 2 < text.size() && hexDigit(text[i + 1]) >= 0 &&
+               hexDigit(text[i + 2]) >= 0) {
+      out += static_cast<char>(hexDigit(text[i + 1]) * 16 + hexDigit(text[i + 2]));
+      i += 2;
+    } else {
+      out += text[i];
+    }
+  }
+  return out;
+}
+
+// "host[:port]" of an absolute URL, lower-cased; empty when it has none.
+std::string authorityOf(const std::string& url) {
+  const size_t scheme = url.find("://");
+  if (scheme == std::string::npos) return {};
+  const size_t start = scheme + 3;
+  std::string authority = url.substr(start, url.find_first_of("/?#", start) - start);
+  for (char& c : authority) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+  return authority;
+}
+
+bool isLoopback(const std::string& address) {
+  return address.rfind("127.", 0) == 0 || address == "::1" || address.rfind("::ffff:127.", 0) == 0;
+}
+
+}  // namespace
+
+std::unordered_map<std::string, std::string> parseForm(const std::string& body) {
+  std::unordered_map<std::string, std::string> fields;
+  size_t start = 0;
+  while (start <= body.size()) {
+    size_t end = body.find('&', start);
+    if (end == std::string::npos) end = body.size();
+    const std::string pair = body.substr(start, end - start);
+    const size_t equals = pair.find('=');
+    if (!pair.empty())
+      fields.emplace(decodeComponent(pair.substr(0, equals)),
+                     equals == std::string::npos ? std::string() : decodeComponent(pair.substr(equals + 1)));
+    start = end + 1;
+  }
+  return fields;
+}
+
+bool SignUpPage::admit(const std::string& client) {
+  const auto now = std::chrono::steady_clock::now();
+  std::lock_guard lock(mutex_);
+  if (attempts_.size() > 100000) attempts_.clear();  // flooded with addresses: forget rather than grow
+  std::deque<std::chrono::steady_clock::time_point>& times = attempts_[client];
+  while (!times.empty() && times.front() + window <= now) times.pop_front();
+  if (static_cast<int>(times.size()) >= maxPerWindow) return false;
+  times.push_back(now);
+  return true;
+}
+
+HttpReply SignUpPage::submit(const HttpRequest& request) {
+  const std::string host = authorityOf("http://" + request.header("host"));
+  std::string origin = request.header("origin");
+  if (origin.empty()) origin = request.header("referer");
+  // Browsers name the page a form was sent from; a form without either header is no browser's.
+  if (origin == "null" || (!origin.empty() && authorityOf(origin) != host))
+    return textReply(403, "Accounts are created from this server's own page only.");
+  const std::string type = request.header("content-type");
+  if (type.rfind("application/x-www-form-urlencoded", 0) != 0 || !request.query.empty())
+    return textReply(415, "Send the form's fields in a url-encoded request body.");
+  std::string client = request.peer;
+  if (isLoopback(client)) {
+    const std::string forwarded = request.header("x-forwarded-for");
+    const size_t comma = forwarded.rfind(',');
+    const std::string last = forwarded.substr(comma == std::string::npos ? 0 : comma + 1);
+    const size_t begin = last.find_first_not_of(' ');
+    if (begin != std::string::npos) client = last.substr(begin);
+  }
+  if (!admit(client)) {
+    HttpReply reply =
+        page(429, kTitle, formHtml({}, "Too many sign-ups from your address; please try again later."));
+    reply.headers.emplace_back("Retry-After", std::to_string(window.count()));
+    return reply;
+  }
+  const auto fields = parseForm(request.body);
+  auto field = [&](const char* name) {
+    auto found = fields.find(name);
+    return found == fields.end() ? std::string() : found->second;
+  };
+  return submit(field("email"), field("password"), field("password2"));
 }
 
 }  // namespace tessal::server

@@ -1,9 +1,6 @@
 #include "SyncServer.h"
 
-#include <httplib.h>
-
-#include <chrono>
-#include <iostream>
+#include <algorithm>
 
 namespace tessal::server {
 
@@ -11,12 +8,6 @@ namespace {
 
 constexpr const char* kSyncPath = "/sync/tessal/sync.php";
 constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
-
-void send(const HttpReply& reply, httplib::Response& res) {
-  res.status = reply.status;
-  for (const auto& [name, value] : reply.headers) res.set_header(name, value);
-  res.set_content(reply.body, reply.contentType);
-}
 
 }  // namespace
 
@@ -38,43 +29,24 @@ SyncServer::~SyncServer() {
   stop();
 }
 
-void SyncServer::installRoutes() {
-  httplib::Server& http = *http_;
-  http.Post(kSyncPath, [this](const httplib::Request& req, httplib::Response& res) {
-    send(service_->handle(req.body), res);
-  });
-  if (options_.signUp) {
-    http.Get(kSignUpPath,
-             [this](const httplib::Request&, httplib::Response& res) { send(signUpPage_->form(), res); });
-    http.Post(kSignUpPath, [this](const httplib::Request& req, httplib::Response& res) {
-      send(signUpPage_->submit(req.get_param_value("email"), req.get_param_value("password"),
-                               req.get_param_value("password2")),
-           res);
-    });
+HttpReply SyncServer::route(const HttpRequest& request) {
+  if (request.path == kSyncPath) {
+    if (request.method != "POST") return textReply(405, "POST a sync request here.");
+    return service_->handle(request.body);
   }
-  // Runs for every answer of status 400 or more, also for those a route wrote itself: leave those be.
-  http.set_error_handler(
-      httplib::Server::HandlerWithResponse([](const httplib::Request& req, httplib::Response& res) {
-        if (!res.body.empty()) return httplib::Server::HandlerResponse::Unhandled;
-        if (res.status == 413 && req.path == kSyncPath) {
-          send(SyncService::errorReply(SyncService::kRequestTooLarge,
-                                       "The request is larger than this server accepts.", 413),
-               res);
-        } else {
-          res.set_content(std::to_string(res.status) + "\n", "text/plain; charset=utf-8");
-        }
-        return httplib::Server::HandlerResponse::Handled;
-      }));
-  http.set_exception_handler([](const httplib::Request&, httplib::Response& res, std::exception_ptr error) {
-    try {
-      if (error) std::rethrow_exception(error);
-    } catch (const std::exception& e) {
-      std::cerr << "tessal-sync-server: request failed: " << e.what() << std::endl;
-    } catch (...) {
-    }
-    res.status = 500;
-    res.set_content("Internal error; try again later.\n", "text/plain; charset=utf-8");
-  });
+  if (request.path == kSignUpPath && options_.signUp) {
+    if (request.method == "GET") return signUpPage_->form();
+    if (request.method == "POST") return signUpPage_->submit(request);
+    return textReply(405, "GET the form or POST it.");
+  }
+  return textReply(404, "404");
+}
+
+HttpReply SyncServer::refusal(const HttpRequest& request, int status, const std::string& why) {
+  // A sync client reads JSON: an oversized request is the protocol's code 6.
+  if (status == 413 && request.path == kSyncPath)
+    return SyncService::errorReply(SyncService::kRequestTooLarge, why, 413);
+  return textReply(status, why);
 }
 
 bool SyncServer::start(std::string& error) {
@@ -82,38 +54,20 @@ bool SyncServer::start(std::string& error) {
     error = "already started";
     return false;
   }
-  http_ = std::make_unique<httplib::Server>();
-  const int threads = std::max(options_.threads, 2);
-  http_->new_task_queue = [threads] { return new httplib::ThreadPool(static_cast<size_t>(threads)); };
-  // Without it a second request on a kept-alive connection waits for the delayed ACK (~40 ms).
-  http_->set_tcp_nodelay(true);
-  http_->set_keep_alive_max_count(10000);
-  // Devices poll every 5 s; a shorter keep-alive frees the worker between polls.
-  http_->set_keep_alive_timeout(2);
-  http_->set_payload_max_length(options_.maxBodyBytes);
-  installRoutes();
-  if (options_.port == 0) {
-    port_ = http_->bind_to_any_port(options_.host);
-  } else {
-    port_ = http_->bind_to_port(options_.host, options_.port) ? options_.port : -1;
-  }
-  if (port_ < 0) {
-    error = "cannot listen on " + options_.host + ":" + std::to_string(options_.port);
-    http_.reset();
-    return false;
-  }
-  thread_ = std::thread([this] { http_->listen_after_bind(); });
-  // stop() is a no-op until the loop runs; wait for it so a quick stop cannot be lost.
-  while (!http_->is_running()) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  HttpListener::Limits limits = options_.limits;
+  limits.maxBodyBytes = options_.maxBodyBytes;
+  auto http = std::make_unique<HttpListener>(
+      limits, std::max(options_.threads, 2), [this](const HttpRequest& request) { return route(request); },
+      &SyncServer::refusal);
+  if (!http->start(options_.host, options_.port, error)) return false;
+  http_ = std::move(http);
   return true;
 }
 
 void SyncServer::stop() {
   if (!http_) return;
   http_->stop();
-  if (thread_.joinable()) thread_.join();
   http_.reset();
-  port_ = -1;
 }
 
 }  // namespace tessal::server

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "HttpListener.h"
 #include "PasswordAuthenticator.h"
 #include "SignUpPage.h"
 #include "SyncService.h"
@@ -8,11 +9,6 @@
 #include <cstddef>
 #include <memory>
 #include <string>
-#include <thread>
-
-namespace httplib {
-class Server;
-}
 
 namespace tessal::server {
 
@@ -25,8 +21,10 @@ class SyncServer {
     std::string host = "127.0.0.1";
     int port = 0;  // 0: any free port (see port())
     size_t maxBodyBytes = 32u << 20;
-    // Each open connection holds a worker while it is kept alive.
+    // Workers answer complete requests only; connections that are slow, idle or kept alive hold none.
     int threads = 64;
+    // Header caps and read deadlines of every connection (its maxBodyBytes is the one above).
+    HttpListener::Limits limits;
     bool signUp = true;  // false: the sign-up page answers 404
     PasswordAuthenticator::Options authentication;
   };
@@ -43,23 +41,22 @@ class SyncServer {
   // Stops accepting, finishes the requests in progress and joins the workers. Idempotent.
   void stop();
   // The bound port once started.
-  int port() const { return port_; }
+  int port() const { return http_ ? http_->port() : -1; }
 
   SyncStore& store() { return *store_; }
   PasswordAuthenticator& authenticator() { return *authenticator_; }
 
  private:
   SyncServer(std::unique_ptr<SyncStore> store, Options options);
-  void installRoutes();
+  HttpReply route(const HttpRequest& request);
+  static HttpReply refusal(const HttpRequest& request, int status, const std::string& why);
 
   Options options_;
   std::unique_ptr<SyncStore> store_;
   std::unique_ptr<PasswordAuthenticator> authenticator_;
   std::unique_ptr<SyncService> service_;
   std::unique_ptr<SignUpPage> signUpPage_;
-  std::unique_ptr<httplib::Server> http_;
-  std::thread thread_;
-  int port_ = -1;
+  std::unique_ptr<HttpListener> http_;
 };
 
 }  // namespace tessal::server

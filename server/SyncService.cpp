@@ -89,6 +89,9 @@ HttpReply SyncService::handle(std::string_view body) {
                         login.retryAfter);
     case PasswordAuthenticator::Verdict::Unavailable:
       return unavailable();
+    case PasswordAuthenticator::Verdict::Busy:
+      return retryLater(503, "The sync service is busy checking passwords; try again shortly.",
+                        std::chrono::seconds(1));
   }
 
   if (*action == "head") return head(login.accountId, *iteration, deviceId);

@@ -138,6 +138,9 @@ int addUser(const std::vector<std::string>& args) {
     case PasswordAuthenticator::SignUp::BadPassword:
       std::cerr << "tessal-sync-server: the password needs at least 8 characters\n";
       break;
+    case PasswordAuthenticator::SignUp::PasswordTooLong:
+      std::cerr << "tessal-sync-server: the password is too long: at most 1024 bytes\n";
+      break;
     case PasswordAuthenticator::SignUp::Exists:
       std::cerr << "tessal-sync-server: there already is an account for this address\n";
       break;

@@ -1,0 +1,113 @@
+#pragma once
+
+#include "SyncService.h"
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <deque>
+#include <functional>
+#include <map>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace tessal::server {
+
+// One request, read completely before any worker sees it.
+struct HttpRequest {
+  std::string method;
+  std::string path;                            // without the query
+  std::string query;                           // after "?", undecoded
+  std::map<std::string, std::string> headers;  // names in lower case
+  std::string body;
+  std::string peer;  // the client's address
+
+  // A header's value, or empty.
+  std::string header(const std::string& lowerCaseName) const;
+};
+
+// A plain-text answer: `text` and a line break.
+HttpReply textReply(int status, const std::string& text);
+
+// The HTTP/1.1 front of the server, written for a service that strangers can reach.
+//
+// One thread reads every connection without blocking, with a deadline for the whole request (not per
+// byte, which one byte every few seconds would defeat) and caps on header lines, header count, header
+// size and body size, counted on the bytes as they arrive whatever the framing (Content-Length or
+// chunked); compressed bodies are refused. Only complete requests reach the workers, so slow or idle
+// connections never hold one, and a flood of them costs memory bounded by the caps and the connection
+// limit, not service. The listen backlog is the system's maximum.
+class HttpListener {
+ public:
+  struct Limits {
+    size_t maxBodyBytes = 32u << 20;
+    size_t maxHeaderBytes = 64u << 10;  // request line and headers together
+    size_t maxHeaderLine = 8u << 10;
+    size_t maxHeaderCount = 100;
+    std::chrono::milliseconds requestTimeout{10000};  // from the first byte to the end of the body
+    std::chrono::milliseconds idleTimeout{5000};      // a kept-alive connection between requests
+    std::chrono::milliseconds writeTimeout{10000};
+    size_t maxConnections = 4096;
+  };
+  using Handler = std::function<HttpReply(const HttpRequest&)>;
+  // What to answer a request refused before it was complete (status 400, 408, 411, 413, 415, 431).
+  using Refusal = std::function<HttpReply(const HttpRequest& partial, int status, const std::string& why)>;
+
+  HttpListener(Limits limits, int workers, Handler handler, Refusal refusal);
+  ~HttpListener();
+  HttpListener(const HttpListener&) = delete;
+  HttpListener& operator=(const HttpListener&) = delete;
+
+  // Binds HOST:PORT (port 0: any free one) and starts serving. False with `error` set when it cannot.
+  bool start(const std::string& host, int port, std::string& error);
+  // Stops accepting, lets the workers finish what they hold and closes every connection. Idempotent.
+  void stop();
+  int port() const { return port_; }
+
+ private:
+  struct Connection;
+  struct Job {
+    int fd;
+    HttpRequest request;
+    bool keepAlive;
+  };
+
+  void readLoop();
+  void workLoop();
+  void accept();
+  void readFrom(int fd);
+  void refuse(Connection& connection, int status, const std::string& why);
+  void close(int fd);
+  void dispatch(int fd);
+  void sweepDeadlines(std::chrono::steady_clock::time_point now);
+  bool writeAll(int fd, const std::string& bytes);
+  // A worker is done with a connection: the reader keeps it for the next request or closes it.
+  void handBack(int fd, bool keepAlive);
+  void wake();
+
+  Limits limits_;
+  int workerCount_;
+  Handler handler_;
+  Refusal refusal_;
+  int listenFd_ = -1;
+  int epollFd_ = -1;
+  int wakeFd_ = -1;
+  int port_ = -1;
+  std::atomic<bool> stopping_{false};
+  std::thread reader_;
+  std::vector<std::thread> workers_;
+
+  // Read thread only.
+  std::map<int, Connection*> connections_;
+
+  std::mutex mutex_;
+  std::condition_variable work_;
+  std::deque<Job> jobs_;
+  std::vector<std::pair<int, bool>> returned_;  // connections back from workers, and whether to keep them
+};
+
+}  // namespace tessal::server

@@ -1,0 +1,244 @@
+// The server as strangers on the network meet it: oversized, compressed, slow and header-flooding
+// requests, password guessing aimed at locking the owner out, and sign-ups from other sites. Everything
+// here runs over real sockets on 127.0.0.1.
+#include "ServerTestSupport.h"
+
+#include <arpa/inet.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
+#include <thread>
+#include <vector>
+
+namespace servertest {
+namespace {
+
+using namespace std::chrono_literals;
+
+// One TCP connection driven byte by byte, the way a hostile client would.
+class RawConnection {
+ public:
+  explicit RawConnection(int port) {
+    fd_ = socket(AF_INET, SOCK_STREAM, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(static_cast<uint16_t>(port));
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    connected_ = connect(fd_, reinterpret_cast<sockaddr*>(&address), sizeof address) == 0;
+    timeval timeout{5, 0};
+    setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
+  }
+  ~RawConnection() { ::close(fd_); }
+  bool connected() const { return connected_; }
+  bool send(const std::string& bytes) {
+    return ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+  }
+  // Everything until the server closes (or 5 s pass).
+  std::string readAll() {
+    std::string out;
+    char buffer[4096];
+    for (;;) {
+      const ssize_t got = recv(fd_, buffer, sizeof buffer, 0);
+      if (got <= 0) return out;
+      out.append(buffer, static_cast<size_t>(got));
+    }
+  }
+  static int status(const std::string& response) {
+    if (response.rfind("HTTP/1.1 ", 0) != 0 || response.size() < 12) return 0;
+    return std::stoi(response.substr(9, 3));
+  }
+
+ private:
+  int fd_ = -1;
+  bool connected_ = false;
+};
+
+std::string requestHead(const std::string& extraHeaders) {
+  return "POST /sync/tessal/sync.php HTTP/1.1\r\nHost: 127.0.0.1\r\nContent-Type: application/json\r\n" +
+         extraHeaders + "\r\n";
+}
+
+class ServerHardeningTest : public ServerTest {};
+
+TEST_P(ServerHardeningTest, BodiesAreCountedAsTheyArriveWhateverTheFraming) {
+  options.maxBodyBytes = 64 * 1024;
+  startServer();
+  // Chunked, no length announced: refused once the decoded bytes pass the limit, as code 6.
+  RawConnection chunked(port());
+  ASSERT_TRUE(chunked.send(requestHead("Transfer-Encoding: chunked\r\n")));
+  const std::string chunk = "4000\r\n" + std::string(0x4000, ' ') + "\r\n";
+  int sent = 0;
+  while (sent < 64 && chunked.send(chunk)) ++sent;  // up to 1 MiB; the server stops reading long before
+  const std::string refused = chunked.readAll();
+  EXPECT_EQ(RawConnection::status(refused), 413) << refused.substr(0, 200);
+  EXPECT_NE(refused.find("\"code\":6"), std::string::npos) << refused.substr(0, 400);
+
+  // A small chunked request under the limit is read like any other.
+  RawConnection small(port());
+  const std::string body = requestBody("nobody@example.com", "whatever-it-is", "head", 0);
+  char size[16];
+  std::snprintf(size, sizeof size, "%zx", body.size());
+  ASSERT_TRUE(small.send(requestHead("Transfer-Encoding: chunked\r\nConnection: close\r\n") + size + "\r\n" +
+                         body + "\r\n0\r\n\r\n"));
+  const std::string answered = small.readAll();
+  EXPECT_EQ(RawConnection::status(answered), 200) << answered.substr(0, 300);
+  EXPECT_NE(answered.find("\"code\":2"), std::string::npos) << answered;
+
+  // A compressed body could unpack to anything: refused before it is read.
+  RawConnection gzip(port());
+  ASSERT_TRUE(
+      gzip.send(requestHead("Content-Encoding: gzip\r\nContent-Length: 20\r\n") + std::string(20, 'x')));
+  EXPECT_EQ(RawConnection::status(gzip.readAll()), 415);
+}
+
+TEST_P(ServerHardeningTest, HeaderCountLineAndTotalSizeAreCapped) {
+  startServer();
+  std::string many;
+  for (int i = 0; i < 150; ++i) many += "X-Filler-" + std::to_string(i) + ": a\r\n";
+  const std::string longLine = "X-Long: " + std::string(9000, 'a') + "\r\n";
+  std::string large;
+  for (int i = 0; i < 20; ++i) large += "X-Big-" + std::to_string(i) + ": " + std::string(4000, 'b') + "\r\n";
+  for (const std::string& headers : {many, longLine, large}) {
+    RawConnection connection(port());
+    ASSERT_TRUE(connection.send(requestHead(headers + "Content-Length: 2\r\n") + "{}"));
+    EXPECT_EQ(RawConnection::status(connection.readAll()), 431) << headers.substr(0, 40);
+  }
+}
+
+// Connections that send a byte now and then hold no worker, are cut off at the request deadline, and
+// never keep a device's polls from being answered.
+TEST_P(ServerHardeningTest, SlowConnectionsDoNotStarveADevicesPolls) {
+  options.threads = 4;
+  options.limits.requestTimeout = 1500ms;
+  startServer();
+  const std::string user = newUser("owner");
+  ASSERT_EQ(head(user, 0, "laptop").status, 200);
+
+  std::atomic<bool> done{false};
+  std::atomic<int> cutOff{0};
+  std::vector<std::thread> slow;
+  for (int i = 0; i < 70; ++i) {
+    slow.emplace_back([&, port = port()] {
+      RawConnection connection(port);
+      const std::string request = requestHead("Content-Length: 2\r\n") + "{}";
+      for (size_t at = 0; at < request.size() && !done; ++at) {
+        if (!connection.send(request.substr(at, 1))) break;
+        std::this_thread::sleep_for(200ms);
+      }
+      if (RawConnection::status(connection.readAll()) == 408) ++cutOff;
+    });
+  }
+  std::this_thread::sleep_for(300ms);  // every slow connection is open and talking
+  int answered = 0;
+  const auto until = std::chrono::steady_clock::now() + 2s;
+  while (std::chrono::steady_clock::now() < until) {
+    const Reply reply = head(user, 0, "laptop");
+    EXPECT_EQ(reply.status, 200) << reply.body;
+    if (reply.status == 200) ++answered;
+    std::this_thread::sleep_for(100ms);
+  }
+  done = true;
+  for (std::thread& thread : slow) thread.join();
+  EXPECT_GE(answered, 10);
+  EXPECT_EQ(cutOff, 70) << "every slow request ends at the deadline with 408";
+}
+
+// A stranger who knows the address cannot lock the owner's devices out, also once the owner's
+// remembered success has expired; the stranger stays locked.
+TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePassword) {
+  std::atomic<int64_t> offset{0};
+  options.authentication.now = [&] {
+    return std::chrono::steady_clock::now() + std::chrono::seconds(offset.load());
+  };
+  options.authentication.successLifetime = 10min;
+  options.authentication.firstLock = 60s;
+  options.authentication.longestLock = 10min;
+  startServer();
+  const std::string user = newUser("owner");
+  const std::string password = "password-of-" + user;
+  auto attempt = [&](const std::string& secret) {
+    return post(port(), "/sync/tessal/sync.php", requestBody(user, secret, "head", 0, "laptop"));
+  };
+  ASSERT_EQ(attempt(password).status, 200);
+  for (int minute = 0; minute < 30; ++minute) {
+    offset += 70;  // past the remembered success after ten minutes
+    const Reply guess = attempt("guess-" + std::to_string(minute));
+    EXPECT_TRUE(guess.status == 429 || guess.code() == 2) << guess.body;
+    const Reply owner = attempt(password);
+    EXPECT_EQ(owner.status, 200) << "minute " << minute << ": " << owner.body;
+  }
+  EXPECT_EQ(attempt("one-more-guess").status, 429);
+}
+
+TEST_P(ServerHardeningTest, SignUpRefusesOtherSitesQueriesFloodsAndSaysWhatIsWrong) {
+  startServer();
+  auto signUp = [&](const std::string& email, const std::string& password, const std::string& headers,
+                    const std::string& query = {}) {
+    RawConnection connection(port());
+    const std::string body = "email=" + email + "&password=" + password + "&password2=" + password;
+    connection.send("POST /sync/tessal/signup.php" + query +
+                    " HTTP/1.1\r\nHost: 127.0.0.1:" + std::to_string(port()) +
+                    "\r\nContent-Type: application/x-www-form-urlencoded\r\nConnection: close\r\n" + headers +
+                    "Content-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body);
+    return connection.readAll();
+  };
+  auto exists = [&](const std::string& email) {
+    // The account exists when the password gets past the credentials check.
+    const Reply reply =
+        post(port(), "/sync/tessal/sync.php", requestBody(email, "long enough password", "head", 0));
+    return reply.status == 200 && reply.code() == 0;
+  };
+  const std::string password = "long+enough+password";
+
+  EXPECT_EQ(RawConnection::status(signUp("a%40example.com", password, "Origin: https://evil.example\r\n")),
+            403);
+  EXPECT_EQ(RawConnection::status(signUp("a%40example.com", password, "Origin: null\r\n")), 403);
+  EXPECT_EQ(RawConnection::status(
+                signUp("a%40example.com", password, "Referer: https://evil.example/form.html\r\n")),
+            403);
+  EXPECT_EQ(RawConnection::status(signUp("a%40example.com", password, {}, "?email=a%40example.com")), 415);
+  EXPECT_FALSE(exists("a@example.com"));
+
+  const std::string sameSite = "Origin: http://127.0.0.1:" + std::to_string(port()) + "\r\n";
+  const std::string tooLong = signUp("b%40example.com", std::string(1025, 'p'), sameSite);
+  EXPECT_EQ(RawConnection::status(tooLong), 400);
+  EXPECT_NE(tooLong.find("The password is too long"), std::string::npos);
+  EXPECT_EQ(tooLong.find("needs at least 8"), std::string::npos);
+
+  // That was the first of five attempts this address may make in the window.
+  for (int i = 0; i < 4; ++i) {
+    const std::string email = "c" + std::to_string(i) + "%40example.com";
+    EXPECT_EQ(RawConnection::status(signUp(email, password, sameSite)), 201) << i;
+  }
+  EXPECT_TRUE(exists("c0@example.com"));
+  const std::string flooded = signUp("d%40example.com", password, sameSite);
+  EXPECT_EQ(RawConnection::status(flooded), 429);
+  EXPECT_NE(flooded.find("Retry-After:"), std::string::npos);
+  EXPECT_FALSE(exists("d@example.com"));
+}
+
+TEST_P(ServerHardeningTest, IdentitiesWithControlCharactersOrASecondAtAreRefused) {
+  startServer();
+  const std::string user = newUser("strict");
+  for (const std::string& uuid :
+       {std::string("a\x7f@WTTask"), std::string("a@@WTTask"), std::string("a@b@WTTask")}) {
+    std::string escaped;
+    for (char c : uuid) {
+      if (c == 0x7f)
+        escaped += "\\u007f";
+      else
+        escaped += c;
+    }
+    const Reply reply = save(user, 0, "laptop", R"({"i":{")" + escaped + R"(":{"name":"x"}}})");
+    EXPECT_EQ(reply.code(), 5) << escaped << ": " << reply.body;
+  }
+  EXPECT_EQ(head(user, 0, "other").integer("iteration"), 0);
+}
+
+INSTANTIATE_TEST_SUITE_P(Storage, ServerHardeningTest, testing::Values(Storage::SQLite), storageName);
+
+}  // namespace
+}  // namespace servertest
