@@ -180,8 +180,12 @@ void WTMainWindowController::buildActions() {
     delegate_.managedObjectContext()->undoManager().undo();
   });
   undo->setObjectName(QStringLiteral("undo"));
-  QAction* redo = edit->addAction(tr("&Redo"), QKeySequence::Redo,
-                                  [this] { delegate_.managedObjectContext()->undoManager().redo(); });
+  QAction* redo = edit->addAction(tr("&Redo"), QKeySequence::Redo, [this] {
+    QWidget* focus = QApplication::focusWidget();
+    if (WTEditCommitter::redoTyping(focus)) return;
+    WTEditCommitter::closeUntouchedEditor(focus);
+    delegate_.managedObjectContext()->undoManager().redo();
+  });
   redo->setObjectName(QStringLiteral("redo"));
   connect(edit, &QMenu::aboutToShow, this, [this, undo, redo] {
     WTUndoManager& manager = delegate_.managedObjectContext()->undoManager();

@@ -84,6 +84,18 @@ bool WTEditCommitter::undoTyping(QWidget* focus) {
   return false;
 }
 
+bool WTEditCommitter::redoTyping(QWidget* focus) {
+  if (auto* edit = qobject_cast<QLineEdit*>(focus); edit && edit->isRedoAvailable()) {
+    edit->redo();
+    return true;
+  }
+  if (auto* text = qobject_cast<QPlainTextEdit*>(focus); text && text->document()->isRedoAvailable()) {
+    text->redo();
+    return true;
+  }
+  return false;
+}
+
 bool WTEditCommitter::closeUntouchedEditor(QWidget* focus) {
   if (!focus) return false;
   QWidget* editor = nullptr;

@@ -15,6 +15,8 @@ bool commitWithoutEnding(QWidget* focus);
 // The first part of Undo, as the user means it: what they typed into `focus` (a field or an open cell
 // editor) is taken back there, the editor staying open. Returns false when there is no typing to undo.
 bool undoTyping(QWidget* focus);
+// Its counterpart for Redo.
+bool redoTyping(QWidget* focus);
 
 // Before the records themselves are undone: an open cell editor with nothing typed in it is closed (it
 // would otherwise show, and later store, a value the undo replaced), the keyboard focus going to its

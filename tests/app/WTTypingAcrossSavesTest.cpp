@@ -98,6 +98,36 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChang
   EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
 }
 
+// Committing the name re-sorts the list: the edited row moves under its open editor.
+TEST_F(WTTypingAcrossSavesTest, AnEditorFollowsItsRowWhenTheCommittedNameReordersTheList) {
+  open();
+  WTClient::insertNewObject(delegate->managedObjectContext())->setName("Mia");
+  ASSERT_TRUE(delegate->managedObjectContext()->save());
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  auto* view = qobject_cast<QAbstractItemView*>(editor->parentWidget()->parentWidget());
+  ASSERT_TRUE(view);
+  ASSERT_EQ(view->indexAt(editor->geometry().center()).row(), 0);  // an empty name sorts first
+  QTest::keyClicks(editor, "Zed");
+
+  changeSomethingElse("merged elsewhere");
+  ASSERT_TRUE(delegate->saveChanges());
+  QCoreApplication::processEvents();  // the list re-sorts on its next turn
+  QCoreApplication::processEvents();
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_TRUE(editor->isVisible());
+  EXPECT_EQ(editor->text(), "Zed");
+  EXPECT_EQ(view->indexAt(editor->geometry().center()).row(), 1);
+  QTest::keyClicks(editor, "ta");
+  QTest::keyClick(editor, Qt::Key_Return);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  ASSERT_TRUE(delegate->saveChanges());
+  QStringList names = storedClientNames();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Mia", "Zedta"}));
+}
+
 TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave) {
   open();
   WTProject* project = window->fetchProjects().value(0);
@@ -153,7 +183,7 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
   EXPECT_TRUE(names.contains("Deploy")) << names.join(", ").toStdString();
 }
 
-// Undo takes back typing where it was typed, and records with the keyboard focus kept where it was.
+// Undo and Redo take back typing where it was typed, and records with the keyboard focus kept where it was.
 TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
   open();
   auto* undo = window->findChild<QAction*>("undo");
@@ -168,6 +198,13 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
   EXPECT_TRUE(editor->isVisible());
   EXPECT_EQ(editor->text(), "");
   EXPECT_EQ(WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size(), 1);
+
+  auto* redo = window->findChild<QAction*>("redo");
+  ASSERT_TRUE(redo);
+  redo->trigger();
+  ASSERT_TRUE(editor);
+  EXPECT_EQ(QApplication::focusWidget(), editor.data());
+  EXPECT_EQ(editor->text(), "Alpha");
 }
 
 TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
@@ -201,6 +238,14 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   ASSERT_EQ(untouched->text(), "Beta");
   undo->trigger();
   EXPECT_EQ(client->name(), "");
+  EXPECT_TRUE(!untouched || !untouched->isVisible());
+  EXPECT_EQ(QApplication::focusWidget(), list);
+
+  view->edit(view->currentIndex());
+  untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
+  ASSERT_TRUE(untouched);
+  window->findChild<QAction*>("redo")->trigger();
+  EXPECT_EQ(client->name(), "Beta");
   EXPECT_TRUE(!untouched || !untouched->isVisible());
   EXPECT_EQ(QApplication::focusWidget(), list);
 }
@@ -240,11 +285,16 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   ASSERT_TRUE(synctest::waitUntil([&] { return server.requests.size() >= seen + 3; }));
 
   const QString projectId = window->fetchProjects().value(0)->uuid();
-  pendingChange = QVariantMap{{"i", QVariantMap{}},
-                              {"u", QVariantMap{{projectId, QVariantMap{{"name", "Renamed on the laptop"}}}}},
-                              {"x", QVariantList{}}};
+  // Another record renamed, and a client that joins the list being edited.
+  pendingChange = QVariantMap{
+      {"i", QVariantMap{{"AA@WTClient", QVariantMap{{"name", "Aaron"}, {"uuid", "AA@WTClient"}}}}},
+      {"u", QVariantMap{{projectId, QVariantMap{{"name", "Renamed on the laptop"}}}}},
+      {"x", QVariantList{}}};
   ASSERT_TRUE(synctest::waitUntil(
       [&] { return window->fetchProjects().value(0)->name() == "Renamed on the laptop"; }));
+  ASSERT_TRUE(synctest::waitUntil(
+      [&] { return WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size() == 2; }));
+  QTest::qWait(50);  // the list takes the new row on its next turn
   ASSERT_TRUE(synctest::waitUntil([&] { return !delegate->managedObjectContext()->hasChanges(); }));
 
   ASSERT_TRUE(editor);
@@ -258,7 +308,9 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
   sync->disableSync();
   ASSERT_TRUE(delegate->saveChanges());
-  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
+  QStringList names = storedClientNames();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Aaron", "AlphaBetaGamma"}));
 }
 
 }  // namespace
