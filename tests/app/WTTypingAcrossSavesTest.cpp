@@ -250,6 +250,17 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   EXPECT_EQ(QApplication::focusWidget(), list);
 }
 
+// Quitting is the one save that stores an edit in progress even when nothing else changed.
+TEST_F(WTTypingAcrossSavesTest, QuittingStoresWhatIsBeingTyped) {
+  open();
+  QPointer<QLineEdit> editor = newClientEditor();
+  ASSERT_TRUE(editor);
+  ASSERT_TRUE(delegate->managedObjectContext()->save());
+  QTest::keyClicks(editor, "Alpha");
+  EXPECT_TRUE(window->close());
+  EXPECT_EQ(storedClientNames(), QStringList({"Alpha"}));
+}
+
 // The real path of the report: a "head" reply that changes another record is merged and saved while the
 // user types a new client's name.
 TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
