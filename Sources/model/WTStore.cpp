@@ -7,6 +7,7 @@
 
 #include <sqlite3.h>
 
+#include <algorithm>
 #include <array>
 #include <iterator>
 #include <utility>
@@ -445,6 +446,14 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink) 
 }
 
 Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids) {
+  // A row without identity could never be found, replaced or removed again, and deleting "" would
+  // silently remove nothing: refuse the whole save before the file is touched.
+  const bool nameless = deletedUuids.contains(QString()) ||
+                        std::any_of(records.begin(), records.end(),
+                                    [](const WTStoreRecord& record) { return record.uuid.isEmpty(); });
+  if (nameless)
+    return Error{WriteFailed,
+                 tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
   int code = stepOnce(begin_);
   for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {
     code = bindRecord(replace_, *record);

@@ -24,7 +24,8 @@
 #include <memory>
 #include <vector>
 
-// A journal that remembers every call, in order.
+// A journal that remembers every call, in order. A record reported without identity could never be
+// matched on another device: any test that makes the context do so fails.
 class RecordingJournal final : public WTChangeJournal {
  public:
   struct Call {
@@ -33,12 +34,16 @@ class RecordingJournal final : public WTChangeJournal {
     QVariantMap values;
   };
   void insertValues(const QVariantMap& values, const QString& uuid) override {
-    calls.push_back({"insert", uuid, values});
+    record("insert", uuid, values);
   }
   void updateValues(const QVariantMap& values, const QString& uuid) override {
-    calls.push_back({"update", uuid, values});
+    record("update", uuid, values);
   }
-  void deleteObjectWithId(const QString& uuid) override { calls.push_back({"delete", uuid, {}}); }
+  void deleteObjectWithId(const QString& uuid) override { record("delete", uuid, {}); }
+  void record(const char* kind, const QString& uuid, const QVariantMap& values) {
+    if (uuid.isEmpty()) ADD_FAILURE() << "journaled " << kind << " of a record without identity";
+    calls.push_back({kind, uuid, values});
+  }
   std::vector<Call> callsFor(const QString& uuid) const {
     std::vector<Call> result;
     for (const Call& call : calls) {
