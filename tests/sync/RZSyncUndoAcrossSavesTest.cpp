@@ -1,0 +1,142 @@
+// Undo and redo after the autosave already wrote the change reach the journal file and, through the
+// real server, the other devices, exactly as the user's own delete and insert do.
+#include "RZSyncCommand.h"
+#include "RZSyncTrack.h"
+
+#include "SyncTestSupport.h"
+#include "WTItem.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <gtest/gtest.h>
+
+using synctest::snapshot;
+using synctest::snapshotDifference;
+using synctest::SyncClient;
+using synctest::SyncServerProcess;
+
+namespace {
+
+// One record of every entity, each made in its own turn (so each is one undo step), items and tasks
+// under owners made before them. Gives the records' identities in the order they were made.
+QStringList makeOneOfEach(WTObjectContext& context) {
+  auto* project = context.insertNewObject<WTProject>();
+  auto* task = context.insertNewObject<WTTask>();
+  task->setProject(project);
+  context.processPendingChanges();
+  QStringList made;
+  for (WTEntity entity : WTEntities::kAll) {
+    WTObject* record = context.insertNewObject(entity);
+    record->setName(QStringLiteral("one ") + WTEntities::name(entity));
+    if (entity == WTEntity::Task) static_cast<WTTask*>(record)->setProject(project);
+    if (WTEntities::isItem(entity)) static_cast<WTItem*>(record)->setTask(task);
+    context.processPendingChanges();
+    made.append(record->uuid());
+  }
+  return made;
+}
+
+void undoOrRedo(WTObjectContext& context, int steps, bool undo) {
+  for (int i = 0; i < steps; ++i) {
+    undo ? context.undoManager().undo() : context.undoManager().redo();
+    context.processPendingChanges();
+  }
+}
+
+// Every identity the journal names anywhere: inserted, updated or deleted.
+QStringList journaledIds(const RZSyncTrack& track) {
+  QStringList ids = track.deletedIds();
+  for (auto section : {RZSyncTrack::Section::Inserted, RZSyncTrack::Section::Updated})
+    ids += track.entries(section).keys();
+  return ids;
+}
+
+int sync(SyncClient& client) {
+  QString out, err;
+  QTextStream outStream(&out), errStream(&err);
+  const int code = runSyncCommand(*client.manager, {QStringLiteral("--timeout"), QStringLiteral("30")},
+                                  outStream, errStream);
+  EXPECT_EQ(code, 0) << err.toStdString();
+  return code;
+}
+
+}  // namespace
+
+// The journal file written after each save: an undone saved insertion is a deletion of its identity, its
+// redo an insertion under the same identity with its values, and nothing is ever journaled without one.
+TEST(RZSyncUndoAcrossSaves, TheJournalFileNamesWhatUndoAndRedoDid) {
+  SyncClient client(QString{});
+  const QStringList made = makeOneOfEach(*client.context);
+  client.save();
+  // As after the server confirmed it: the records are known elsewhere now.
+  client.track().resetChanges();
+
+  undoOrRedo(*client.context, int(made.size()), true);
+  client.save();
+  {
+    const RZSyncTrack file(client.journalPath());
+    QStringList deleted = file.deletedIds();
+    QStringList expected = made;
+    deleted.sort();
+    expected.sort();
+    EXPECT_EQ(deleted, expected);
+    EXPECT_FALSE(journaledIds(file).contains(QString()));
+  }
+
+  undoOrRedo(*client.context, int(made.size()), false);
+  client.save();
+  client.reopen();  // quit and start again
+  const RZSyncTrack& track = client.track();
+  EXPECT_TRUE(track.deletedIds().isEmpty());
+  EXPECT_FALSE(journaledIds(track).contains(QString()));
+  for (const QString& uuid : made) {
+    const QVariantMap inserted = track.entry(RZSyncTrack::Section::Inserted, uuid);
+    EXPECT_EQ(inserted.value("name").toString(), "one " + uuid.section(u'@', -1)) << uuid.toStdString();
+    EXPECT_NE(client.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+  }
+}
+
+// With the real server: undo and redo saved between two polls leave the other device as it was; an undo
+// that reaches the server takes the records from the other device too, for good, across restarts.
+TEST(RZSyncUndoAcrossSaves, AnotherDeviceFollowsUndoAfterTheSave) {
+  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  SyncServerProcess server;
+  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
+  ASSERT_TRUE(server.start());
+  SyncClient a(server.address(), "undo@example.org", "undo across saves");
+  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+
+  const QStringList made = makeOneOfEach(*a.context);
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  for (const QString& uuid : made) ASSERT_NE(b.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+
+  undoOrRedo(*a.context, int(made.size()), true);
+  a.save();
+  undoOrRedo(*a.context, int(made.size()), false);
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  for (const QString& uuid : made) {
+    WTObject* there = b.context->objectWithUUID(uuid);
+    ASSERT_NE(there, nullptr) << uuid.toStdString();
+    EXPECT_EQ(there->name(), "one " + uuid.section(u'@', -1));
+  }
+  auto left = snapshot(*a.context), right = snapshot(*b.context);
+  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+
+  undoOrRedo(*a.context, int(made.size()), true);
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  a.reopen();
+  b.reopen();
+  for (const QString& uuid : made) {
+    EXPECT_EQ(a.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+    EXPECT_EQ(b.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+  }
+  left = snapshot(*a.context), right = snapshot(*b.context);
+  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+  EXPECT_EQ(b.context->count(), 2);  // the project and task the records were filed under
+}
