@@ -1,8 +1,12 @@
 #include "WTClientsViewController.h"
 
 #include "WTClient.h"
+#include "WTListView.h"
 #include "WTObjectContext.h"
 #include "WTObjectListModel.h"
+#include "WTRateField.h"
+
+#include <QMenu>
 
 WTClientsViewController::WTClientsViewController(WTObjectContext* context, QObject* parent)
     : WTObjectListViewController(context, WTEntity::Client, QStringLiteral("Client"), parent) {
@@ -14,4 +18,11 @@ void WTClientsViewController::addObject() {
   context()->processPendingChanges();
   arrayController()->rearrangeObjects();
   editObject(client, false);
+}
+
+void WTClientsViewController::addRowMenuItems(QMenu* menu) {
+  menu->addAction(tr("Set Rate…"), this, [this] {
+    if (WTObject* client = clickedObject()) WTRateDialog::editRate(client, tableView());
+  });
+  menu->addSeparator();
 }

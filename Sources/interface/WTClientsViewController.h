@@ -11,4 +11,8 @@ class WTClientsViewController : public WTObjectListViewController {
 
   // Inserts a client; when the list shows it, edits its name (no scrolling).
   void addObject() override;
+
+ protected:
+  // "Set Rate…": a client row has no room for a field of its own.
+  void addRowMenuItems(QMenu* menu) override;
 };

@@ -4,6 +4,7 @@
 #include "DurationText.h"
 #include "MoneyFormat.h"
 #include "RZDate.h"
+#include "WTClient.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
 #include "WTItem.h"
@@ -284,8 +285,26 @@ void WTItemsModel::markChanged(const WTObject* object) {
   schedule();
 }
 
+void WTItemsModel::markSubtreeChanged(const Node* node) {
+  if (node->object) changed_.insert(node->object);
+  for (const auto& child : node->children) markSubtreeChanged(child.get());
+  schedule();
+}
+
 void WTItemsModel::objectValueDidChange(WTObject* object, const QString& key) {
   if (!project_) return;
+  // A rate reaches the cost of every row below the record it is set on: those rows are shown anew at
+  // once, day groups included, since no cost of theirs announces itself.
+  if (key == QLatin1String("rate")) {
+    if (object == project_) {
+      markSubtreeChanged(root_.get());
+    } else if (project_->client() && object == project_->client()) {
+      markSubtreeChanged(root_.get());
+      emit projectChanged();
+    } else if (const Node* node = nodes_.value(object); node && node->kind == Node::Task) {
+      markSubtreeChanged(node);
+    }
+  }
   if (object == project_) {
     if (key == QLatin1String("tasks")) {
       tasksDirty_ = true;

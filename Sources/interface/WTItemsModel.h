@@ -133,6 +133,7 @@ class WTItemsModel : public QAbstractItemModel {
                         const QList<WTObject*>& deleted);
   void markTaskDirty(WTTask* task);
   void markChanged(const WTObject* object);
+  void markSubtreeChanged(const Node* node);
   void schedule();
   bool belongsHere(const WTObject* object) const;
 

@@ -16,6 +16,7 @@
 #include "WTObjectContext.h"
 #include "WTOutlineView.h"
 #include "WTProject.h"
+#include "WTRateField.h"
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
@@ -25,6 +26,7 @@
 #include <QLabel>
 #include <QLineEdit>
 #include <QLocale>
+#include <QMenu>
 #include <QScrollBar>
 #include <QTimer>
 #include <QToolButton>
@@ -60,6 +62,7 @@ WTItemsViewController::~WTItemsViewController() {
 }
 
 void WTItemsViewController::setProject(WTProject* project) {
+  if (rateField_ && project != project_) WTRateField::setRefused(rateField_, false);
   project_ = project;
 }
 
@@ -114,11 +117,11 @@ QWidget* WTItemsViewController::loadView() {
   auto* rateLabel = new QLabel(tr("Rate"), header_);
   rateField_ = new QLineEdit(header_);
   rateField_->setObjectName(QStringLiteral("rateField"));
-  rateField_->setPlaceholderText(tr("Inherited"));
   rateField_->setAlignment(Qt::AlignRight);
   rateField_->setFixedWidth(96);
   rateLabel->setBuddy(rateField_);
   connect(rateField_, &QLineEdit::editingFinished, this, &WTItemsViewController::projectRateAction);
+  connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, false); });
   bar->addWidget(rateLabel);
   bar->addWidget(rateField_);
   totalsLabel_ = new QLabel(header_);
@@ -151,6 +154,14 @@ QWidget* WTItemsViewController::loadView() {
     delegate_->setEditField(WTItemCellDelegate::Field::Name);
     outlineView_->edit(index);
   });
+  outlineView_->setContextMenuPolicy(Qt::CustomContextMenu);
+  connect(outlineView_, &QWidget::customContextMenuRequested, this, [this](const QPoint& point) {
+    const QModelIndex index = outlineView_->indexAt(point);
+    WTObject* object = treeController_->objectAt(index);
+    if (!object || object->entity() != WTEntity::Task) return;
+    std::unique_ptr<QMenu> menu(taskMenu(static_cast<WTTask*>(object)));
+    menu->exec(outlineView_->viewport()->mapToGlobal(point));
+  });
   connect(outlineView_, &QTreeView::expanded, this, &WTItemsViewController::saveExpandedItems);
   connect(outlineView_, &QTreeView::collapsed, this, &WTItemsViewController::saveExpandedItems);
   connect(outlineView_->selectionModel(), &QItemSelectionModel::selectionChanged, this,
@@ -166,6 +177,7 @@ void WTItemsViewController::refreshHeader() {
     clientLabel_->clear();
     totalsLabel_->clear();
     rateField_->clear();
+    WTRateField::setRefused(rateField_, false);
     return;
   }
   titleLabel_->setText(project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
@@ -174,25 +186,24 @@ void WTItemsViewController::refreshHeader() {
   clientLabel_->setText(client);
   totalsLabel_->setText(DurationText::stringWithMinutes(project_->duration()) + QStringLiteral("    ") +
                         MoneyFormat::format(project_->cost()));
-  if (!rateField_->hasFocus()) {
+  rateField_->setPlaceholderText(WTRateField::placeholder(project_));
+  // A refused text stays as typed until the user changes it, so the mistake is in view.
+  if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
     rateField_->setText(project_->storedRate() ? MoneyFormat::format(*project_->storedRate()) : QString());
   }
 }
 
+QMenu* WTItemsViewController::taskMenu(WTTask* task) {
+  auto* menu = new QMenu;
+  menu->setObjectName(QStringLiteral("taskMenu"));
+  QPointer<WTOutlineView> outline = outlineView_;
+  menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
+  return menu;
+}
+
 void WTItemsViewController::projectRateAction() {
   if (!project_) return;
-  QString text = rateField_->text().trimmed();
-  if (text.isEmpty()) {
-    rateField_->setPlaceholderText(tr("Inherited"));
-    if (project_->storedRate()) project_->setRate(std::nullopt);
-    return;
-  }
-  const QLocale locale;
-  text.remove(locale.groupSeparator());
-  text.replace(locale.decimalPoint(), QStringLiteral("."));
-  const std::optional<Decimal> rate = Decimal::fromString(text);
-  if (rate && project_->storedRate() != rate) project_->setRate(rate);
-  refreshHeader();
+  if (WTRateField::apply(rateField_, project_)) refreshHeader();
 }
 
 void WTItemsViewController::willDisplayView() {

@@ -26,6 +26,8 @@ class WTToDo;
 // when a project is opened. It adds items of every kind to a task, runs and stops timers, completes
 // to-dos, moves items to another day (by dragging or with the date pop-over), reorders tasks, and
 // remembers for each project which rows were expanded.
+class QMenu;
+
 class WTItemsViewController : public WTViewController {
   Q_OBJECT
  public:
@@ -98,6 +100,8 @@ class WTItemsViewController : public WTViewController {
   // The project's rate as typed in the header; an empty field inherits.
   void projectRateAction();
   QLineEdit* rateField() const { return rateField_; }
+  // The menu of a task row (its rate among others); built anew for each task, owned by the caller.
+  QMenu* taskMenu(WTTask* task);
 
  signals:
   // The back button or its shortcut asked to go back to the projects.

@@ -292,7 +292,7 @@ TEST_F(WTItemsViewControllerTest, AnEmptyRateFieldInherits) {
   rate->clear();
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), std::nullopt);
-  EXPECT_EQ(rate->placeholderText(), "Inherited");
+  EXPECT_EQ(rate->placeholderText(), "Inherited: 50.00");
 }
 
 }  // namespace

@@ -1,0 +1,54 @@
+#pragma once
+
+#include "Decimal.h"
+
+#include <QDialog>
+#include <QString>
+
+#include <optional>
+
+class QLabel;
+class QLineEdit;
+class WTObject;
+
+// Rates are typed the same way wherever a client, project or task shows one: an empty field inherits
+// (and says from what), money in the user's locale is taken, anything else is refused where it was typed.
+namespace WTRateField {
+
+// The rate `object` would take with its own field left empty.
+Decimal rateWhenEmpty(const WTObject* object);
+// "Inherited: 80.00" for the field of `object`.
+QString placeholder(const WTObject* object);
+
+struct Parsed {
+  bool valid = false;
+  std::optional<Decimal> rate;  // empty: inherit
+};
+Parsed parse(const QString& text);
+
+// Marks or clears the field as holding a value that was not taken, with the reason as its tool tip.
+void setRefused(QLineEdit* field, bool refused);
+bool isRefused(const QLineEdit* field);
+
+// Stores the field's text as the rate of `object`; a text that is not a rate changes nothing, marks
+// the field and returns false.
+bool apply(QLineEdit* field, WTObject* object);
+
+}  // namespace WTRateField
+
+// A small sheet for the rate of a row that has no room for a field of its own (clients, tasks).
+class WTRateDialog : public QDialog {
+  Q_OBJECT
+ public:
+  explicit WTRateDialog(WTObject* object, QWidget* parent = nullptr);
+  QLineEdit* field() const { return field_; }
+  void accept() override;
+
+  // Opens the sheet for `object` and waits for it to be closed.
+  static void editRate(WTObject* object, QWidget* parent);
+
+ private:
+  WTObject* object_;
+  QLineEdit* field_;
+  QLabel* message_;
+};
