@@ -1,0 +1,62 @@
+#pragma once
+
+#include <QDBusConnection>
+#include <QDBusContext>
+#include <QDBusMessage>
+#include <QObject>
+
+#include <atomic>
+
+// How a fake desktop service answers a call.
+enum class FakeMode { Answer, Error, Silent };
+
+// Mutter's idle monitor as GNOME serves it; answers from its own thread so that a caller blocking on
+// the reply is still answered.
+class FakeMutterIdleMonitor : public QObject, protected QDBusContext {
+  Q_OBJECT
+  Q_CLASSINFO("D-Bus Interface", "org.gnome.Mutter.IdleMonitor")
+ public:
+  std::atomic<qulonglong> milliseconds{0};
+  std::atomic<FakeMode> mode{FakeMode::Answer};
+  std::atomic<int> calls{0};
+
+ public slots:
+  qulonglong GetIdletime() {
+    ++calls;
+    if (mode == FakeMode::Error) sendErrorReply(QDBusError::Failed, QStringLiteral("no idle monitor"));
+    if (mode == FakeMode::Silent) setDelayedReply(true);  // and never answer
+    return milliseconds;
+  }
+};
+
+// The freedesktop screen saver as KDE serves it.
+class FakeScreenSaver : public QObject, protected QDBusContext {
+  Q_OBJECT
+  Q_CLASSINFO("D-Bus Interface", "org.freedesktop.ScreenSaver")
+ public:
+  std::atomic<uint> seconds{0};
+  std::atomic<FakeMode> mode{FakeMode::Answer};
+  std::atomic<int> calls{0};
+
+ public slots:
+  uint GetSessionIdleTime() {
+    ++calls;
+    if (mode == FakeMode::Error) sendErrorReply(QDBusError::NotSupported, QStringLiteral("not supported"));
+    if (mode == FakeMode::Silent) setDelayedReply(true);
+    return seconds;
+  }
+};
+
+// Hears the launcher entry's Update signals.
+class LauncherListener : public QObject {
+  Q_OBJECT
+ public:
+  QList<QString> uris;
+  QList<QVariantMap> properties;
+
+ public slots:
+  void update(const QString& uri, const QVariantMap& props) {
+    uris.append(uri);
+    properties.append(props);
+  }
+};

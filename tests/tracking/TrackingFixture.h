@@ -1,0 +1,89 @@
+#pragma once
+
+#include "ModelFixture.h"
+#include "WTIdleSource.h"
+#include "WTStopwatchUpdater.h"
+#include "WTTrackingAlert.h"
+
+#include <QCoreApplication>
+#include <QElapsedTimer>
+
+#include <deque>
+#include <functional>
+#include <memory>
+#include <vector>
+
+// Answers alerts from a queue (Default when it runs dry) and remembers every alert it was shown.
+class ScriptedPresenter final : public WTTrackingAlertPresenter {
+ public:
+  WTTrackingAlertAnswer runAlert(const WTTrackingAlert& alert) override {
+    shown.push_back(alert);
+    if (whileOpen) whileOpen();
+    if (answers.empty()) return WTTrackingAlertAnswer::Default;
+    const WTTrackingAlertAnswer answer = answers.front();
+    answers.pop_front();
+    return answer;
+  }
+  std::vector<WTTrackingAlert> shown;
+  std::deque<WTTrackingAlertAnswer> answers;
+  // Runs while the alert is "open", as a dialog's nested event loop would let other things happen.
+  std::function<void()> whileOpen;
+};
+
+// The system's idle seconds as the test sets them.
+class SetIdleSource final : public WTIdleSource {
+ public:
+  qint64 idleSeconds() override {
+    ++asked;
+    return seconds;
+  }
+  qint64 seconds = 0;
+  int asked = 0;
+};
+
+// The real model over a real store file, the updater over it with a fixed clock.
+class TrackingTest : public ModelTest {
+ protected:
+  void SetUp() override {
+    ModelTest::SetUp();
+    setNow(berlin(2026, 3, 2, 12, 0, 30));
+    makeUpdater();
+  }
+
+  void TearDown() override {
+    updater.reset();
+    ModelTest::TearDown();
+  }
+
+  void makeUpdater() {
+    updater.reset();
+    updater = std::make_unique<WTStopwatchUpdater>(context.get(), defaults.get(), &idle, &presenter);
+    QObject::connect(updater.get(), &WTStopwatchUpdater::stopwatchDidUpdate,
+                     [this](WTStopwatchUpdater*) { ++ticks; });
+  }
+
+  // Lets queued work (the context's end of turn, the updater's reaction) run.
+  static void settle() {
+    for (int i = 0; i < 3; ++i) QCoreApplication::processEvents();
+  }
+
+  void advance(double seconds) { clockNow = clockNow.addingSeconds(seconds); }
+
+  void turnIdleHandlingOn(int minutes) {
+    defaults->setValue(QStringLiteral("WTShouldIdle"), true);
+    defaults->setValue(QStringLiteral("WTIdleTime"), minutes);
+  }
+
+  WTTime* startTimer(WTTask* task, Date start) {
+    auto* time = makeItem<WTTime>(task, start);
+    time->setRunning(true);
+    return time;
+  }
+
+  QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
+
+  SetIdleSource idle;
+  ScriptedPresenter presenter;
+  std::unique_ptr<WTStopwatchUpdater> updater;
+  int ticks = 0;
+};

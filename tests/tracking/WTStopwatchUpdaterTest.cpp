@@ -1,0 +1,447 @@
+#include "TrackingFixture.h"
+
+#include <QSignalSpy>
+#include <QTranslator>
+
+namespace {
+
+using Answer = WTTrackingAlertAnswer;
+
+TEST_F(TrackingTest, TickTotalsRunningEntriesSetsTheBadgeAndSchedulesOneTickInFiveSeconds) {
+  WTTask* task = makeTask();
+  WTTask* other = makeTask(nullptr, QStringLiteral("Other"));
+  startTimer(task, clockNow.addingSeconds(-45 * 60));
+  startTimer(other, clockNow.addingSeconds(-30 * 60));
+  makeTime(other, clockNow.addingSeconds(-5 * 3600), clockNow.addingSeconds(-4 * 3600));  // stopped
+  QSignalSpy badge(updater.get(), &WTStopwatchUpdater::badgeDidChange);
+
+  updater->start();
+
+  EXPECT_EQ(updater->times().size(), 2);
+  EXPECT_EQ(updater->totalActiveDuration(), 75);
+  EXPECT_EQ(updater->badgeLabel(), QStringLiteral("01:15"));
+  EXPECT_EQ(updater->windowTitle(QStringLiteral("Tessal")), QStringLiteral("Tessal — 01:15"));
+  ASSERT_EQ(badge.count(), 1);
+  EXPECT_EQ(badge.at(0).at(0).toString(), QStringLiteral("01:15"));
+  EXPECT_EQ(ticks, 1);
+  EXPECT_TRUE(updater->isTicking());
+  EXPECT_EQ(updater->tickInterval(), 5000);
+
+  // A tick with nothing new keeps the badge and still reschedules.
+  updater->update();
+  EXPECT_EQ(ticks, 2);
+  EXPECT_EQ(badge.count(), 1);
+  EXPECT_TRUE(updater->isTicking());
+}
+
+TEST_F(TrackingTest, EachTickPeeksSoTotalsMoveOncePerMinuteBoundary) {
+  WTTask* task = makeTask();
+  WTTime* time = startTimer(task, berlin(2026, 3, 2, 11, 0, 0));
+  updater->start();
+  EXPECT_EQ(time->lastDuration(), std::optional<int>(60));
+  settle();
+
+  KeyCounter taskDuration(*context, task, QStringLiteral("duration"));
+  advance(20);  // 12:00:50, same minute
+  updater->update();
+  EXPECT_EQ(taskDuration.count, 0);
+  advance(15);  // 12:01:05
+  updater->update();
+  EXPECT_EQ(taskDuration.count, 1);
+  EXPECT_EQ(updater->totalActiveDuration(), 61);
+  EXPECT_EQ(updater->badgeLabel(), QStringLiteral("01:01"));
+}
+
+TEST_F(TrackingTest, ChangingTheRunningSetTicksAtOnceAndOtherChangesDoNot) {
+  WTTask* task = makeTask();
+  updater->start();
+  settle();
+  ASSERT_EQ(ticks, 1);
+  EXPECT_TRUE(updater->badgeLabel().isEmpty());
+
+  task->setName(QStringLiteral("Renamed"));
+  makeTime(task, clockNow.addingSeconds(-600), clockNow);
+  settle();
+  EXPECT_EQ(ticks, 1) << "no running entry came or went";
+
+  WTTime* started = task->toggleTimer();
+  settle();
+  EXPECT_EQ(ticks, 2);
+  EXPECT_EQ(updater->times(), QList<WTTime*>{started});
+  EXPECT_EQ(updater->badgeLabel(), QStringLiteral("00:00"));
+
+  QSignalSpy badge(updater.get(), &WTStopwatchUpdater::badgeDidChange);
+  task->toggleTimer();
+  settle();
+  EXPECT_EQ(ticks, 3);
+  EXPECT_TRUE(updater->times().isEmpty());
+  ASSERT_EQ(badge.count(), 1);
+  EXPECT_TRUE(badge.at(0).at(0).toString().isEmpty());
+  EXPECT_EQ(updater->windowTitle(QStringLiteral("Tessal")), QStringLiteral("Tessal"));
+  EXPECT_TRUE(updater->isTicking()) << "the ticker runs on with nothing running";
+}
+
+TEST_F(TrackingTest, RunningSetFollowsRestartsOfSavedEntriesDeletionAndUndo) {
+  WTTask* task = makeTask();
+  WTTime* time = startTimer(task, clockNow.addingSeconds(-120));
+  ASSERT_TRUE(context->save().ok());
+  updater->start();
+  settle();
+
+  // Stopped and started again between two saves: each change must still be seen.
+  time->setRunning(false);
+  settle();
+  EXPECT_TRUE(updater->times().isEmpty());
+  time->setRunning(true);
+  settle();
+  EXPECT_EQ(updater->times(), QList<WTTime*>{time});
+  time->setRunning(false);
+  settle();
+  EXPECT_TRUE(updater->times().isEmpty());
+
+  // A running entry that is deleted leaves the set, whether it was saved or not.
+  WTTime* fresh = task->toggleTimer();
+  settle();
+  ASSERT_EQ(updater->times(), QList<WTTime*>{fresh});
+  context->deleteObject(fresh);
+  settle();
+  EXPECT_TRUE(updater->times().isEmpty());
+  ASSERT_TRUE(context->save().ok());
+  context->deleteObject(time);
+  time->setRunning(true);  // a deleted record's value changing does not bring it back
+  settle();
+  EXPECT_TRUE(updater->times().isEmpty());
+
+  // Undo brings a deleted running entry back into the set.
+  WTTask* second = makeTask(nullptr, QStringLiteral("Second"));
+  WTTime* undone = second->toggleTimer();
+  settle();
+  context->deleteObject(undone);
+  settle();
+  ASSERT_TRUE(updater->times().isEmpty());
+  context->undoManager().undo();
+  settle();
+  EXPECT_EQ(updater->times(), QList<WTTime*>{undone});
+}
+
+TEST_F(TrackingTest, IdleThresholdIsTheMinutesSettingOrFiveMinutesWhenZeroOrLess) {
+  struct Case {
+    int minutes;
+    qint64 below;
+    qint64 at;
+  };
+  for (const Case& c : {Case{0, 299, 300}, Case{-4, 299, 300}, Case{2, 119, 120}, Case{10, 599, 600}}) {
+    SCOPED_TRACE(c.minutes);
+    turnIdleHandlingOn(c.minutes);
+    presenter.shown.clear();
+    WTTask* task = makeTask();
+    startTimer(task, clockNow.addingSeconds(-3600));
+    idle.seconds = c.below;
+    updater->start();
+    updater->update();
+    EXPECT_TRUE(presenter.shown.empty());
+    idle.seconds = c.at;
+    updater->update();
+    EXPECT_EQ(presenter.shown.size(), 1u);
+    task->stopAllTimers();
+    settle();
+  }
+}
+
+TEST_F(TrackingTest, NoIdleQuestionWhenHandlingIsOffNothingRunsOrTheIdleTimeIsUnknown) {
+  WTTask* task = makeTask();
+  idle.seconds = 100000;
+  updater->start();
+  startTimer(task, clockNow.addingSeconds(-3600));
+  settle();
+  EXPECT_TRUE(presenter.shown.empty()) << "\"WTShouldIdle\" is off until the user turns it on";
+  defaults->setValue(QStringLiteral("WTShouldIdle"), false);
+  updater->update();
+  EXPECT_TRUE(presenter.shown.empty());
+
+  defaults->setValue(QStringLiteral("WTShouldIdle"), true);
+  idle.seconds = -1;
+  updater->update();
+  EXPECT_TRUE(presenter.shown.empty()) << "an idle source that failed asks nothing";
+
+  idle.seconds = 100000;
+  task->stopAllTimers();
+  settle();
+  const int asked = idle.asked;
+  updater->update();
+  EXPECT_TRUE(presenter.shown.empty());
+  EXPECT_EQ(idle.asked, asked) << "with nothing running the desktop is not even asked";
+}
+
+TEST_F(TrackingTest, IdleAlertTextsAndButtons) {
+  turnIdleHandlingOn(5);
+  startTimer(makeTask(), clockNow.addingSeconds(-3600));
+  idle.seconds = 659;
+  updater->start();
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  const WTTrackingAlert& alert = presenter.shown.front();
+  EXPECT_EQ(alert.messageText, QStringLiteral("Idle time"));
+  EXPECT_EQ(alert.informativeText,
+            QStringLiteral("Would you like to substract the idle time and restart the timers?"));
+  EXPECT_EQ(alert.defaultButton, QStringLiteral("No"));
+  EXPECT_EQ(alert.alternateButton, QStringLiteral("Yes"));
+
+  // A translation that shows the minutes gets the whole minutes of the idle time.
+  class Translator final : public QTranslator {
+   public:
+    QString translate(const char*, const char* source, const char*, int) const override {
+      return QLatin1String(source) == QLatin1String("Idle time") ? QStringLiteral("Untätig seit %ld Minuten")
+                                                                 : QString();
+    }
+    bool isEmpty() const override { return false; }
+  } translator;
+  QCoreApplication::installTranslator(&translator);
+  updater->update();
+  QCoreApplication::removeTranslator(&translator);
+  ASSERT_EQ(presenter.shown.size(), 2u);
+  EXPECT_EQ(presenter.shown.back().messageText, QStringLiteral("Untätig seit 10 Minuten"));
+}
+
+TEST_F(TrackingTest, AnsweringNoKeepsTheIdleTimeAndAsksAgainAtTheNextTick) {
+  turnIdleHandlingOn(5);
+  WTTask* task = makeTask();
+  WTTime* time = startTimer(task, clockNow.addingSeconds(-3600));
+  idle.seconds = 900;
+  presenter.answers = {Answer::Default};
+  updater->start();
+  settle();
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  EXPECT_TRUE(time->running());
+  EXPECT_FALSE(time->endDate());
+  EXPECT_EQ(task->times().size(), 1);
+  EXPECT_EQ(updater->totalActiveDuration(), 60);
+
+  advance(5);
+  updater->update();
+  EXPECT_EQ(presenter.shown.size(), 2u);
+}
+
+TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestartsEachTaskOnce) {
+  turnIdleHandlingOn(5);
+  WTTask* twice = makeTask(nullptr, QStringLiteral("Two entries"));
+  WTTask* once = makeTask(nullptr, QStringLiteral("One entry"));
+  WTTask* late = makeTask(nullptr, QStringLiteral("Started while idle"));
+  const Date asked = clockNow;
+  WTTime* first = startTimer(twice, asked.addingSeconds(-7200));
+  WTTime* second = startTimer(twice, asked.addingSeconds(-3600));
+  WTTime* single = startTimer(once, asked.addingSeconds(-5400));
+  WTTime* recent = startTimer(late, asked.addingSeconds(-600));
+  WTTime* atIdleStart = startTimer(late, asked.addingSeconds(-1200));
+  idle.seconds = 1200;
+  const Date idleStart = asked.addingSeconds(-1200);
+  presenter.answers = {Answer::Alternate};
+  // The user takes two minutes to answer: the idle start was fixed before the question.
+  presenter.whileOpen = [this] { advance(120); };
+  updater->start();
+  settle();
+
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  EXPECT_EQ(presenter.shown.front().messageText, QStringLiteral("Idle time"));
+  for (WTTime* stopped : {first, second, single}) {
+    EXPECT_FALSE(stopped->running());
+    EXPECT_EQ(stopped->endDate(), std::optional<Date>(idleStart));
+  }
+  for (WTTime* untouched : {recent, atIdleStart}) {
+    EXPECT_TRUE(untouched->running());
+    EXPECT_FALSE(untouched->endDate());
+  }
+  ASSERT_EQ(runningTimesOf(twice).size(), 1);
+  ASSERT_EQ(runningTimesOf(once).size(), 1);
+  EXPECT_EQ(runningTimesOf(late).size(), 2) << "no new entry for a task whose entries all started later";
+  EXPECT_EQ(twice->times().size(), 3);
+  EXPECT_EQ(runningTimesOf(twice).front()->startDate(), std::optional<Date>(asked.addingSeconds(120)));
+  EXPECT_EQ(updater->times().size(), 4);
+  EXPECT_FALSE(updater->times().contains(first));
+
+  // Saved and read back, the record is the one the user chose.
+  updater.reset();
+  saveAndReopen();
+  int running = 0;
+  for (WTTime* time : context->fetch<WTTime>()) running += time->running() ? 1 : 0;
+  EXPECT_EQ(running, 4);
+}
+
+TEST_F(TrackingTest, AnOpenIdleAlertIsNeverStackedAndTheTickerGoesOn) {
+  turnIdleHandlingOn(1);
+  WTTask* task = makeTask();
+  startTimer(task, clockNow.addingSeconds(-3600));
+  idle.seconds = 3000;
+  int nestedTicks = 0;
+  presenter.whileOpen = [&] {
+    // While the question is open, the user starts another timer elsewhere and time passes.
+    if (presenter.shown.size() > 1) return;
+    makeTask(nullptr, QStringLiteral("Other"))->toggleTimer();
+    settle();
+    updater->update();
+    nestedTicks = ticks;
+  };
+  presenter.answers = {Answer::Default, Answer::Default};
+  updater->start();
+  EXPECT_EQ(presenter.shown.size(), 1u);
+  EXPECT_GE(nestedTicks, 2) << "ticks inside the open question still ran";
+  EXPECT_EQ(updater->times().size(), 2);
+  EXPECT_TRUE(updater->isTicking());
+
+  // Closed, the next tick may ask again.
+  updater->update();
+  EXPECT_EQ(presenter.shown.size(), 2u);
+}
+
+// Captures the log lines written while it lives.
+class LogCapture {
+ public:
+  LogCapture() {
+    lines().clear();
+    previous_ = qInstallMessageHandler(
+        [](QtMsgType, const QMessageLogContext&, const QString& text) { lines().append(text); });
+  }
+  ~LogCapture() { qInstallMessageHandler(previous_); }
+  static QStringList& lines() {
+    static QStringList captured;
+    return captured;
+  }
+
+ private:
+  QtMessageHandler previous_;
+};
+
+TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
+  turnIdleHandlingOn(5);
+  WTTask* task = makeTask();
+  WTTime* time = startTimer(task, clockNow.addingSeconds(-1800));
+  updater->start();
+  const int before = ticks;
+  LogCapture log;
+
+  updater->receiveSleepNote(QStringLiteral("PrepareForSleep(true)"));
+  EXPECT_FALSE(updater->isTicking());
+  EXPECT_EQ(ticks, before);
+  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("receiveSleepNote: PrepareForSleep(true)")));
+
+  // Eight hours later the lid opens; the desktop's idle counter started again at the wake.
+  const Date sleptAt = clockNow;
+  advance(8 * 3600);
+  idle.seconds = 2;
+  presenter.answers = {Answer::Alternate};
+  updater->receiveWakeNote(QStringLiteral("PrepareForSleep(false)"));
+  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("receiveSleepNote: PrepareForSleep(false)")));
+  EXPECT_EQ(ticks, before + 1);
+  EXPECT_TRUE(updater->isTicking());
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  EXPECT_FALSE(time->running());
+  EXPECT_EQ(time->endDate(), std::optional<Date>(sleptAt));
+
+  // The night was offered once; awake and busy, nothing more is asked.
+  advance(5);
+  updater->update();
+  EXPECT_EQ(presenter.shown.size(), 1u);
+}
+
+TEST_F(TrackingTest, AWakeNobodyAnnouncedIsFoundFromTheLateTick) {
+  turnIdleHandlingOn(5);
+  startTimer(makeTask(), clockNow.addingSeconds(-1800));
+  updater->start();
+  idle.seconds = 0;
+
+  // A tick a little late (a busy machine) is no sleep.
+  advance(5 + 60);
+  updater->update();
+  EXPECT_TRUE(presenter.shown.empty());
+
+  // A tick that comes two hours after it was due: the machine was paused in between.
+  const Date lastAwake = clockNow;
+  advance(2 * 3600);
+  presenter.answers = {Answer::Default};
+  updater->update();
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  (void)lastAwake;
+
+  // An immediate tick (the running set changed) while a tick is pending finds the gap as well.
+  advance(5);
+  updater->update();
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  advance(3 * 3600);
+  makeTask(nullptr, QStringLiteral("Other"))->toggleTimer();
+  settle();
+  EXPECT_EQ(presenter.shown.size(), 2u);
+}
+
+TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
+  int saves = 0;
+  updater->setSaveCallback([&] {
+    ++saves;
+    return context->save().ok();
+  });
+  updater->start();
+  updater->applicationWillTerminate();
+  EXPECT_TRUE(presenter.shown.empty()) << "nothing runs: nothing to ask";
+  EXPECT_EQ(saves, 0);
+
+  WTTask* task = makeTask();
+  WTTime* time = task->toggleTimer();  // started in the same turn as the quit
+  presenter.answers = {Answer::Alternate};
+  updater->applicationWillTerminate();
+  ASSERT_EQ(presenter.shown.size(), 1u);
+  const WTTrackingAlert& alert = presenter.shown.front();
+  EXPECT_EQ(alert.messageText, QStringLiteral("Running Timer"));
+  EXPECT_EQ(alert.informativeText,
+            QStringLiteral("Would you like to stop the running timers before quitting?"));
+  EXPECT_EQ(alert.defaultButton, QStringLiteral("Stop"));
+  EXPECT_EQ(alert.alternateButton, QStringLiteral("Keep running"));
+  EXPECT_TRUE(time->running());
+  EXPECT_EQ(saves, 0);
+
+  const QString uuid = time->uuid();
+  updater.reset();
+  saveAndReopen();
+  auto* kept = static_cast<WTTime*>(context->objectWithUUID(uuid));
+  ASSERT_NE(kept, nullptr);
+  EXPECT_TRUE(kept->running()) << "kept running across the quit";
+
+  makeUpdater();
+  updater->setSaveCallback([&] {
+    ++saves;
+    return context->save().ok();
+  });
+  updater->start();
+  advance(90);
+  presenter.answers = {Answer::Default};
+  updater->applicationWillTerminate();
+  EXPECT_EQ(presenter.shown.size(), 2u);
+  EXPECT_EQ(saves, 1);
+  updater.reset();
+  openContext();  // no save of our own: what the prompt saved is what is on disk
+  auto* stopped = static_cast<WTTime*>(context->objectWithUUID(uuid));
+  ASSERT_NE(stopped, nullptr);
+  EXPECT_FALSE(stopped->running());
+  EXPECT_EQ(stopped->endDate(), std::optional<Date>(clockNow));
+}
+
+TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
+  int saves = 0;
+  updater->setSaveCallback([&] {
+    ++saves;
+    return context->save().ok();
+  });
+  updater->start();
+  updater->sessionWillEnd();
+  EXPECT_EQ(saves, 0) << "nothing runs: nothing to keep";
+
+  WTTime* time = makeTask()->toggleTimer();
+  updater->sessionWillEnd();
+  EXPECT_TRUE(presenter.shown.empty());
+  EXPECT_EQ(saves, 1);
+  const QString uuid = time->uuid();
+  updater.reset();
+  openContext();
+  auto* stored = static_cast<WTTime*>(context->objectWithUUID(uuid));
+  ASSERT_NE(stored, nullptr);
+  EXPECT_TRUE(stored->running());
+}
+
+}  // namespace
