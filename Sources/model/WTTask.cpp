@@ -249,6 +249,12 @@ QVariant WTTask::valueForKey(const QString& key) const {
     for (auto* object : list) result.append(KeyPath::variantFromObject(object));
     return result;
   };
+  auto groups = [](const WTItemContainerList& list) {
+    QVariantList result;
+    result.reserve(qsizetype(list.size()));
+    for (const auto& group : list) result.append(KeyPath::variantFromObject(group.get()));
+    return result;
+  };
   if (key == QLatin1String("items")) return records(items_);
   if (key == QLatin1String("project")) return project_ ? KeyPath::variantFromObject(project_) : QVariant();
   if (key == QLatin1String("duration")) return duration();
@@ -263,6 +269,12 @@ QVariant WTTask::valueForKey(const QString& key) const {
   }
   if (key == QLatin1String("pendingToDos")) return records(pendingToDos());
   if (key == QLatin1String("valuableItems")) return records(valuableItems());
+  if (key == QLatin1String("itemsWithoutPendingToDos")) return records(itemsWithoutPendingToDos());
+  // Groups are made afresh on each read; the task keeps the last list of each key alive so the records
+  // handed out stay valid while a template walks them.
+  if (key == QLatin1String("dailyItems")) return groups(keyedGroups_[0] = dailyItems());
+  if (key == QLatin1String("monthlyItems")) return groups(keyedGroups_[1] = monthlyItems());
+  if (key == QLatin1String("children")) return groups(const_cast<WTTask*>(this)->children());
   if (key == QLatin1String("tableImage")) return tableImage();
   if (key == QLatin1String("timerButtonImage")) return timerButtonImage();
   if (key == QLatin1String("buttonTitle")) return buttonTitle();

@@ -103,4 +103,6 @@ class WTTask final : public WTObject {
   std::optional<Decimal> budget_;
   QList<WTItem*> items_;
   WTItemContainerList cachedChildren_;
+  // The last "dailyItems" and "monthlyItems" read by key; valid until the same key is read again.
+  mutable WTItemContainerList keyedGroups_[2];
 };

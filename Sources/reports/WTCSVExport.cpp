@@ -1,0 +1,155 @@
+#include "WTCSVExport.h"
+
+#include "Decimal.h"
+#include "DurationText.h"
+#include "KeyPath.h"
+#include "MoneyFormat.h"
+#include "RZDate.h"
+#include "WTItem.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTReportGenerator.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <QSaveFile>
+
+#include <algorithm>
+
+namespace WTCSVExport {
+
+namespace {
+
+QString text(const QVariant& value) {
+  if (value.isNull() || !value.isValid()) return QString();
+  if (value.metaType() == QMetaType::fromType<Decimal>()) {
+    return value.value<Decimal>().toString();
+  }
+  return value.toString();
+}
+
+QString quotedLine(const QStringList& fields) {
+  QString line;
+  for (qsizetype i = 0; i < fields.size(); ++i) {
+    if (i) line += QLatin1Char(',');
+    line += QLatin1Char('"') + escapedString(fields[i]) + QLatin1Char('"');
+  }
+  return line + QLatin1Char('\n');
+}
+
+QString money(const QVariant& value) {
+  return MoneyFormat::format(Decimal::fromVariant(value).value_or(Decimal()));
+}
+
+QString minutes(const QVariant& value) {
+  return DurationText::stringWithMinutes(std::int32_t(value.toLongLong()));
+}
+
+QString shortDate(const WTItem* item, const QString& key) {
+  bool ok = false;
+  const std::optional<Date> date = dateFromVariant(item->valueForKey(key), &ok);
+  return date ? RZDate::shortFormat(*date) : QString();
+}
+
+}  // namespace
+
+QString escapedString(const QVariant& value) {
+  if (value.isNull() || !value.isValid()) return QStringLiteral("");
+  QString result = text(value);
+  result.replace(QLatin1String("\""), QLatin1String("\\\""));
+  return result;
+}
+
+QString reportCSV(const QList<WTProject*>& projects, int mode) {
+  static const QString patterns[] = {QString(), QStringLiteral("yyyy-MM-dd HH:mm"),
+                                     QStringLiteral("yyyy-MM-dd"), QStringLiteral("yyyy-MM")};
+  const QString pattern = mode >= 0 && mode <= 3 ? patterns[mode] : QString();
+  QString out;
+  WTReportGenerator generator;
+  for (const WTProject* project : projects) {
+    for (WTTask* task : project->tasks()) {
+      if (mode == 0) {
+        out += quotedLine({project->name(), task->name(), DurationText::stringWithMinutes(task->duration()),
+                           MoneyFormat::format(task->cost())});
+      }
+      const QVariant items = generator.filteredItemsForTask(task, mode);
+      for (const QVariant& entry : items.toList()) {
+        const QVariant date = KeyPath::valueForKeyPath(entry, u"date");
+        bool ok = false;
+        const std::optional<Date> day = dateFromVariant(date, &ok);
+        out += quotedLine({text(KeyPath::valueForKeyPath(entry, u"task.project.name")),
+                           text(KeyPath::valueForKeyPath(entry, u"task.name")),
+                           day && !pattern.isEmpty() ? RZDate::stringWithPattern(*day, pattern) : QString(),
+                           minutes(KeyPath::valueForKeyPath(entry, u"duration")),
+                           money(KeyPath::valueForKeyPath(entry, u"cost"))});
+      }
+    }
+  }
+  return out;
+}
+
+QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
+                             const WTProject* project) {
+  return context.fetch<WTTime>([&](const WTTime* time) {
+    if (project && (!time->task() || time->task()->project() != project)) return false;
+    return !predicate || predicate(time);
+  });
+}
+
+QString timesCSV(QList<WTTime*> times) {
+  static const QString keys[] = {QStringLiteral("task.project.name"), QStringLiteral("task.title"),
+                                 QStringLiteral("flatDateBegin"), QStringLiteral("startTime")};
+  struct Keyed {
+    QVariant values[4];
+    WTTime* time;
+  };
+  std::vector<Keyed> keyed;
+  keyed.reserve(size_t(times.size()));
+  for (WTTime* time : times) {
+    Keyed entry{{}, time};
+    const QVariant root = KeyPath::variantFromObject(time);
+    for (int i = 0; i < 4; ++i) entry.values[i] = KeyPath::valueForKeyPath(root, keys[i]);
+    keyed.push_back(std::move(entry));
+  }
+  std::stable_sort(keyed.begin(), keyed.end(), [](const Keyed& a, const Keyed& b) {
+    for (int i = 0; i < 4; ++i) {
+      const int order = KeyPath::compareValues(a.values[i], b.values[i]);
+      if (order != 0) return order < 0;
+    }
+    return false;
+  });
+  QString out;
+  for (const Keyed& entry : keyed) {
+    const WTTime* time = entry.time;
+    const WTTask* task = time->task();
+    const WTProject* project = task ? task->project() : nullptr;
+    out += quotedLine({project ? project->name() : QString(), task ? task->name() : QString(),
+                       task ? text(task->valueForKey(QStringLiteral("rate"))) : QString(), time->name(),
+                       shortDate(time, QStringLiteral("startDate")),
+                       shortDate(time, QStringLiteral("endDate")), QString::number(time->duration())});
+  }
+  return out;
+}
+
+Result<void> writeTextAtomically(const QString& path, const QString& text) {
+  QSaveFile file(path);
+  if (!file.open(QIODevice::WriteOnly)) {
+    return Error{1, QStringLiteral("%1: %2").arg(path, file.errorString())};
+  }
+  const QByteArray data = text.toUtf8();
+  if (file.write(data) != data.size() || !file.commit()) {
+    return Error{1, QStringLiteral("%1: %2").arg(path, file.errorString())};
+  }
+  return Result<void>::success();
+}
+
+Result<int> exportTimes(const WTObjectContext& context, const WTItemPredicate& predicate,
+                        const WTProject* project, const QString& path) {
+  const QList<WTTime*> times = timesMatching(context, predicate, project);
+  qInfo("%s", qPrintable(QStringLiteral("Exporting %1 items to: %2").arg(times.size()).arg(path)));
+  const Result<void> written = writeTextAtomically(path, timesCSV(times));
+  if (!written) return written.error();
+  return int(times.size());
+}
+
+}  // namespace WTCSVExport

@@ -1,0 +1,104 @@
+#include "WTRangePredicate.h"
+
+#include "WTItem.h"
+
+#include <QDate>
+#include <QRegularExpression>
+
+namespace WTRangePredicate {
+
+namespace {
+
+std::optional<Date> dateForKey(const WTItem* item, const QString& key) {
+  bool ok = false;
+  std::optional<Date> date = dateFromVariant(item->valueForKey(key), &ok);
+  return ok ? date : std::nullopt;
+}
+
+bool between(const std::optional<Date>& date, const RZDate::Range& bounds) {
+  return date && *date >= bounds[0] && *date <= bounds[1];
+}
+
+std::optional<RZDate::Range> rangeForTag(int tag) {
+  switch (tag) {
+    case Today:
+      return RZDate::rangeForToday();
+    case Yesterday:
+      return RZDate::rangeForYesterday();
+    case ThisWeek:
+      return RZDate::rangeForThisWeek();
+    case LastWeek:
+      return RZDate::rangeForLastWeek();
+    case ThisMonth:
+      return RZDate::rangeForThisMonth();
+    case LastMonth:
+      return RZDate::rangeForLastMonth();
+    case ThisYear:
+      return RZDate::rangeForThisYear();
+    case LastYear:
+      return RZDate::rangeForLastYear();
+    default:
+      return std::nullopt;
+  }
+}
+
+std::optional<Date> localDay(const QString& text) {
+  const QDate day = QDate::fromString(text, QStringLiteral("yyyy-MM-dd"));
+  if (!day.isValid()) return std::nullopt;
+  RZDate::DateComponents components;
+  components.year = day.year();
+  components.month = day.month();
+  components.day = day.day();
+  components.hour = components.minute = components.second = 0;
+  return RZDate::dateFromComponents(components);
+}
+
+}  // namespace
+
+WTItemPredicate predicateForBounds(const RZDate::Range& bounds) {
+  return [bounds](const WTItem* item) {
+    if (!item) return false;
+    if (!item->valueForKey(QStringLiteral("chargeFlat")).toBool()) {
+      return between(dateForKey(item, QStringLiteral("startTime")), bounds);
+    }
+    return between(dateForKey(item, QStringLiteral("flatDateBegin")), bounds) ||
+           between(dateForKey(item, QStringLiteral("flatDateEnd")), bounds);
+  };
+}
+
+WTItemPredicate predicateForTag(int tag, std::optional<Date> customBegin, std::optional<Date> customEnd) {
+  if (tag == AnyDate) return [](const WTItem*) { return true; };
+  if (tag == Custom) {
+    if (!customBegin || !customEnd) return {};
+    return predicateForBounds(
+        {RZDate::midnight(*customBegin), RZDate::midnight(RZDate::tomorrow(*customEnd))});
+  }
+  const std::optional<RZDate::Range> bounds = rangeForTag(tag);
+  if (!bounds) return {};
+  return predicateForBounds(*bounds);
+}
+
+Result<WTItemPredicate> predicateForRangeWord(const QString& word) {
+  static const QStringList words = {QStringLiteral("today"),      QStringLiteral("yesterday"),
+                                    QStringLiteral("this-week"),  QStringLiteral("last-week"),
+                                    QStringLiteral("this-month"), QStringLiteral("last-month"),
+                                    QStringLiteral("this-year"),  QStringLiteral("last-year")};
+  const qsizetype index = words.indexOf(word);
+  if (index >= 0) return predicateForTag(int(index));
+  if (word == QLatin1String("any")) return predicateForTag(AnyDate);
+  static const QRegularExpression custom(
+      QStringLiteral("^(\\d{4}-\\d{2}-\\d{2})\\.\\.(\\d{4}-\\d{2}-\\d{2})$"));
+  const QRegularExpressionMatch match = custom.match(word);
+  if (match.hasMatch()) {
+    const std::optional<Date> begin = localDay(match.captured(1));
+    const std::optional<Date> end = localDay(match.captured(2));
+    if (!begin || !end) return Error{1, QStringLiteral("%1: not a date in the calendar").arg(word)};
+    if (*end < *begin) return Error{1, QStringLiteral("%1: the range ends before it begins").arg(word)};
+    return predicateForTag(Custom, begin, end);
+  }
+  return Error{1, QStringLiteral("%1: not a range (today, yesterday, this-week, last-week, this-month, "
+                                 "last-month, this-year, last-year, any or YYYY-MM-DD..YYYY-MM-DD)")
+                      .arg(word)};
+}
+
+}  // namespace WTRangePredicate

@@ -1,0 +1,48 @@
+#pragma once
+
+#include "Date.h"
+#include "RZDate.h"
+#include "Result.h"
+
+#include <functional>
+#include <optional>
+
+class WTItem;
+
+// A test over items; an empty function means "no predicate" (the choice gives no range).
+using WTItemPredicate = std::function<bool(const WTItem*)>;
+
+// The ranges of the date-range pop-up, without the widget: each tag of its menu turns into a predicate
+// over the item keys "chargeFlat", "startTime", "flatDateBegin" and "flatDateEnd". A timed item matches
+// by its start, a flat-charged one when either end of its flat period lies in the range; both bounds
+// count as inside.
+namespace WTRangePredicate {
+
+enum Tag {
+  Today = 0,
+  Yesterday = 1,
+  ThisWeek = 2,
+  LastWeek = 3,
+  ThisMonth = 4,
+  LastMonth = 5,
+  ThisYear = 6,
+  LastYear = 7,
+  Custom = 20,
+  AnyDate = 21,
+};
+
+// The predicate of the items whose dates lie in [bounds[0], bounds[1]], both included.
+WTItemPredicate predicateForBounds(const RZDate::Range& bounds);
+
+// The predicate of a menu tag, read at the present instant (Date::now()). Custom covers the whole of
+// its end day (midnight of `customBegin` to midnight of the day after `customEnd`) and is empty when
+// either date is missing; AnyDate is always true (items without dates too); an unknown tag is empty.
+WTItemPredicate predicateForTag(int tag, std::optional<Date> customBegin = {},
+                                std::optional<Date> customEnd = {});
+
+// The predicate of a range word of the command line: today, yesterday, this-week, last-week,
+// this-month, last-month, this-year, last-year, any, or YYYY-MM-DD..YYYY-MM-DD (local days, the end
+// day whole). A word that is none of these, or a range ending before it begins, is an error.
+Result<WTItemPredicate> predicateForRangeWord(const QString& word);
+
+}  // namespace WTRangePredicate

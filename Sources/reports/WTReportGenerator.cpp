@@ -1,0 +1,149 @@
+#include "WTReportGenerator.h"
+
+#include "GXTemplateEngine.h"
+#include "ICUTemplateMatcher.h"
+#include "KeyPath.h"
+#include "WTClient.h"
+#include "WTItem.h"
+#include "WTItemContainer.h"
+#include "WTProject.h"
+#include "WTReportFilters.h"
+#include "WTTask.h"
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QStandardPaths>
+
+#include <algorithm>
+#include <exception>
+
+namespace {
+
+// Collects the errors with the line the engine had reached, and logs them.
+class ErrorCollector : public GXTemplateEngineDelegate {
+ public:
+  explicit ErrorCollector(std::vector<WTReportTemplateError>& errors) : errors_(errors) {}
+  void templateEngineEncounteredError(GXTemplateEngine* engine, const GXTemplateError& error, bool) override {
+    qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
+    const QString& contents = engine->templateContents();
+    const GXRange remaining = engine->remainingRange();
+    const qsizetype reached = std::clamp<qsizetype>(qsizetype(remaining.location), 0, contents.size());
+    const int line = contents.isEmpty() ? 0 : int(QStringView(contents).left(reached).count(u'\n')) + 1;
+    errors_.push_back({error.code, error.localizedDescription, line});
+  }
+
+ private:
+  std::vector<WTReportTemplateError>& errors_;
+};
+
+}  // namespace
+
+WTReportGenerator::~WTReportGenerator() = default;
+
+QVariantMap WTReportGenerator::variables() const {
+  QVariantList projects;
+  QVariant client;
+  for (WTProject* project : projects_) {
+    projects.append(KeyPath::variantFromObject(project));
+    if (project->client()) client = KeyPath::variantFromObject(project->client());
+  }
+  return {{QStringLiteral("client"), client},
+          {QStringLiteral("projects"), projects},
+          {QStringLiteral("mode"), mode_}};
+}
+
+QVariant WTReportGenerator::filteredItemsForTask(WTTask* task, int mode) {
+  if (!task) return {};
+  auto keep = [this](std::vector<std::shared_ptr<WTItemContainer>> groups) {
+    QVariantList list;
+    list.reserve(qsizetype(groups.size()));
+    for (auto& group : groups) {
+      list.append(KeyPath::variantFromObject(group.get()));
+      groups_.push_back(std::move(group));
+    }
+    return list;
+  };
+  switch (mode) {
+    case 1: {
+      QVariantList list;
+      for (WTItem* item : task->valuableItems()) list.append(KeyPath::variantFromObject(item));
+      return list;
+    }
+    case 2:
+      return keep(task->dailyItems());
+    case 3:
+      return keep(task->monthlyItems());
+    default:
+      return {};
+  }
+}
+
+QString WTReportGenerator::userTemplatePath() {
+  return QStandardPaths::writableLocation(QStandardPaths::GenericDataLocation) +
+         QStringLiteral("/Tessal2/report.txt");
+}
+
+QString WTReportGenerator::builtInTemplatePath() {
+  return QStringLiteral(":/report.txt");
+}
+
+QString WTReportGenerator::templatePath() {
+  const QString user = userTemplatePath();
+  return QFileInfo::exists(user) ? user : builtInTemplatePath();
+}
+
+Result<QString> WTReportGenerator::copyBuiltInTemplateToUserFolder() {
+  const QString user = userTemplatePath();
+  if (QFileInfo::exists(user)) return user;
+  if (!QDir().mkpath(QFileInfo(user).absolutePath())) {
+    return Error{1, QStringLiteral("%1: cannot create the folder").arg(QFileInfo(user).absolutePath())};
+  }
+  QFile builtIn(builtInTemplatePath());
+  if (!builtIn.open(QIODevice::ReadOnly)) return Error{1, QStringLiteral("the built-in template is missing")};
+  const QByteArray data = builtIn.readAll();
+  // NewOnly: a file that appeared meanwhile is still never replaced.
+  QFile out(user);
+  if (!out.open(QIODevice::WriteOnly | QIODevice::NewOnly)) {
+    if (QFileInfo::exists(user)) return user;
+    return Error{1, QStringLiteral("%1: %2").arg(user, out.errorString())};
+  }
+  if (out.write(data) != data.size()) return Error{1, QStringLiteral("%1: %2").arg(user, out.errorString())};
+  // The resource is read-only; the user's copy must be editable.
+  out.setPermissions(QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ReadGroup |
+                     QFileDevice::ReadOther);
+  return user;
+}
+
+WTReport WTReportGenerator::render(const QString& path) {
+  const QString chosen = path.isEmpty() ? templatePath() : path;
+  return run(&chosen, nullptr);
+}
+
+WTReport WTReportGenerator::renderText(const QString& templateText) {
+  return run(nullptr, &templateText);
+}
+
+WTReport WTReportGenerator::run(const QString* path, const QString* text) {
+  groups_.clear();
+  WTReport report;
+  GXTemplateEngine engine;
+  ErrorCollector collector(report.errors);
+  engine.setDelegate(&collector);
+  engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
+  engine.loadFilter(std::make_shared<WTReportFilters>());
+  QString html;
+  try {
+    html = path ? engine.processTemplateInFileAtPath(*path, variables())
+                : engine.processTemplate(*text, variables());
+  } catch (const std::exception& exception) {
+    // A pattern the regex library refuses stops the run; it is the template's error like any other.
+    const QString message = QString::fromUtf8(exception.what());
+    qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(message)));
+    report.errors.push_back({-1, message, 0});
+    html = QLatin1String("");
+  }
+  report.templateRead = !html.isNull();
+  report.html = html.isNull() ? QString() : html;
+  return report;
+}

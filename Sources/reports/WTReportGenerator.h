@@ -1,0 +1,79 @@
+#pragma once
+
+#include "Result.h"
+
+#include <QList>
+#include <QString>
+#include <QVariant>
+
+#include <memory>
+#include <vector>
+
+class WTItemContainer;
+class WTProject;
+class WTTask;
+
+// One error of a template run: the engine's code, its message and the template line it was met on
+// (1-based; 0 when the engine reported it before reading any of the template).
+struct WTReportTemplateError {
+  int code = 0;
+  QString message;
+  int line = 0;
+};
+
+// What a render gives: the HTML (empty when the template could not be read) and the template's errors
+// in the order met.
+struct WTReport {
+  QString html;
+  std::vector<WTReportTemplateError> errors;
+  bool templateRead = false;
+};
+
+// The widget-free heart of the report window: the variables a report template receives, its items per
+// task at each level of detail, where the template is found, and the render itself.
+//
+// Levels (`mode`): 0 one line per task (no items), 1 every item with a value, 2 those items grouped by
+// day, 3 grouped by month. The groups handed out stay valid as long as this generator lives and is
+// not rendered again.
+class WTReportGenerator {
+ public:
+  WTReportGenerator() = default;
+  WTReportGenerator(QList<WTProject*> projects, int mode) : projects_(std::move(projects)), mode_(mode) {}
+  ~WTReportGenerator();
+
+  const QList<WTProject*>& projects() const { return projects_; }
+  void setProjects(QList<WTProject*> projects) { projects_ = std::move(projects); }
+  int mode() const { return mode_; }
+  void setMode(int mode) { mode_ = mode; }
+
+  // "client" (the client of any one of the projects; null without projects or client), "projects" (all of
+  // them) and "mode".
+  QVariantMap variables() const;
+
+  // The items of `task` at `mode`: null at 0, the valuable items at 1, day groups at 2, month groups at 3.
+  QVariant filteredItemsForTask(WTTask* task, int mode);
+  QVariant filteredItemsForTask(WTTask* task) { return filteredItemsForTask(task, mode_); }
+
+  // $XDG_DATA_HOME/Tessal2/report.txt, whether it exists or not.
+  static QString userTemplatePath();
+  // The built-in template, compiled into the program.
+  static QString builtInTemplatePath();
+  // The user's template when the file exists, otherwise the built-in one.
+  static QString templatePath();
+  // Copies the built-in template to userTemplatePath() unless a file is already there (never
+  // overwritten); returns the user's path either way, or why the copy failed.
+  static Result<QString> copyBuiltInTemplateToUserFolder();
+
+  // Renders the template at `path` (templatePath() when empty) with variables(). Each error is also
+  // logged as "Template error: MESSAGE".
+  WTReport render(const QString& path = QString());
+  // The same with the template's text.
+  WTReport renderText(const QString& templateText);
+
+ private:
+  WTReport run(const QString* path, const QString* text);
+
+  QList<WTProject*> projects_;
+  int mode_ = 0;
+  std::vector<std::shared_ptr<WTItemContainer>> groups_;
+};

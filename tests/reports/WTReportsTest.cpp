@@ -1,0 +1,307 @@
+#include "../model/ModelFixture.h"
+
+#include "KeyPath.h"
+#include "WTCSVExport.h"
+#include "WTItemContainer.h"
+#include "WTRangePredicate.h"
+#include "WTReportGenerator.h"
+
+#include <QFile>
+#include <QLocale>
+#include <QStandardPaths>
+
+#include <unicode/locid.h>
+
+namespace {
+
+// Messages logged while alive.
+class LogCapture {
+ public:
+  LogCapture() {
+    lines().clear();
+    previous_ = qInstallMessageHandler(
+        [](QtMsgType, const QMessageLogContext&, const QString& message) { lines().append(message); });
+  }
+  ~LogCapture() { qInstallMessageHandler(previous_); }
+  static QStringList& lines() {
+    static QStringList captured;
+    return captured;
+  }
+
+ private:
+  QtMessageHandler previous_;
+};
+
+QString readAll(const QString& path) {
+  QFile file(path);
+  if (!file.open(QIODevice::ReadOnly)) return QStringLiteral("<unreadable>");
+  return QString::fromUtf8(file.readAll());
+}
+
+// A client with two projects: "Web "Site"" holds a task with time entries on two days of March and one of
+// February, an expense, a note and an open to-do; "Backend" a task with one flat fee.
+class ReportTest : public ModelTest {
+ protected:
+  void SetUp() override {
+    ModelTest::SetUp();
+    UErrorCode status = U_ZERO_ERROR;
+    previousIcuLocale = icu::Locale::getDefault();
+    icu::Locale::setDefault(icu::Locale("en_US"), status);
+    previousLocale = QLocale();
+    QLocale::setDefault(QLocale(QLocale::English, QLocale::UnitedStates));
+    setNow(berlin(2024, 3, 20, 12));
+
+    client = WTClient::insertNewObject(context.get());
+    client->setName(QStringLiteral("Acme"));
+    web = WTProject::insertNewObject(context.get());
+    web->setName(QStringLiteral("Web \"Site\""));
+    web->setClient(client);
+    backend = WTProject::insertNewObject(context.get());
+    backend->setName(QStringLiteral("Backend"));
+    backend->setClient(client);
+
+    design = makeTask(web, QStringLiteral("Design"));
+    design->setRate(dec("60"));
+    kickoff = makeTime(design, berlin(2024, 3, 3, 9), berlin(2024, 3, 3, 10, 30));
+    kickoff->setName(QStringLiteral("Kick \"off\""));
+    makeTime(design, berlin(2024, 3, 3, 14), berlin(2024, 3, 3, 14, 30))->setName(QStringLiteral("Review"));
+    makeTime(design, berlin(2024, 2, 10, 10), berlin(2024, 2, 10, 11))->setName(QStringLiteral("Sketch"));
+    auto* fonts = makeItem<WTExpense>(design, berlin(2024, 3, 4, 8));
+    fonts->setName(QStringLiteral("Fonts"));
+    fonts->setExpense(dec("1234.5"));
+    makeItem<WTNote>(design, berlin(2024, 3, 5, 8))->setName(QStringLiteral("Call notes"));
+    makeItem<WTToDo>(design, berlin(2024, 3, 6, 8))->setName(QStringLiteral("Open question"));
+
+    api = makeTask(backend, QStringLiteral("API"));
+    api->setRate(dec("100"));
+    auto* setup = makeItem<WTFlat>(api, berlin(2024, 3, 6, 9));
+    setup->setName(QStringLiteral("Setup"));
+    setup->setMinutes(120);
+    saveAndReopenKeepingPointers();
+  }
+
+  void TearDown() override {
+    QFile::remove(WTReportGenerator::userTemplatePath());
+    UErrorCode status = U_ZERO_ERROR;
+    icu::Locale::setDefault(previousIcuLocale, status);
+    QLocale::setDefault(previousLocale);
+    ModelTest::TearDown();
+  }
+
+  // Reads the store back from its file so the report sees what was saved, then finds the records again.
+  void saveAndReopenKeepingPointers() {
+    saveAndReopen();
+    auto named = [&](auto list, const char* name) {
+      for (auto* object : list) {
+        if (object->name() == QString::fromUtf8(name)) return object;
+      }
+      ADD_FAILURE() << "no record named " << name;
+      return std::remove_cvref_t<decltype(list.first())>(nullptr);
+    };
+    client = named(context->fetch<WTClient>(), "Acme");
+    web = named(context->fetch<WTProject>(), "Web \"Site\"");
+    backend = named(context->fetch<WTProject>(), "Backend");
+    design = named(context->fetch<WTTask>(), "Design");
+    api = named(context->fetch<WTTask>(), "API");
+    kickoff = named(context->fetch<WTTime>(), "Kick \"off\"");
+  }
+
+  QList<WTProject*> projects() const { return {web, backend}; }
+
+  icu::Locale previousIcuLocale;
+  QLocale previousLocale;
+  WTClient* client = nullptr;
+  WTProject* web = nullptr;
+  WTProject* backend = nullptr;
+  WTTask* design = nullptr;
+  WTTask* api = nullptr;
+  WTTime* kickoff = nullptr;
+};
+
+QVariant at(WTObject* object, const char* keyPath) {
+  return KeyPath::valueForKeyPath(KeyPath::variantFromObject(object), QString::fromUtf8(keyPath));
+}
+
+}  // namespace
+
+TEST_F(ReportTest, TaskAnswersItsItemListsAndGroupTotalsByKey) {
+  EXPECT_EQ(at(design, "itemsWithoutPendingToDos.@count").toInt(), 5);
+  EXPECT_EQ(at(design, "valuableItems.@count").toInt(), 4);
+  // Days newest first: 4 March (expense), 3 March (two entries), 10 February.
+  const QVariantList days = at(design, "dailyItems").toList();
+  ASSERT_EQ(days.size(), 3);
+  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[0], u"cost")), dec("1234.5"));
+  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
+  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"items.@count").toInt(), 2);
+  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[1], u"cost")), dec("120"));
+  EXPECT_EQ(Decimal::fromVariant(at(design, "dailyItems.@sum.cost")), dec("1414.5"));
+  const QVariantList months = at(design, "monthlyItems").toList();
+  ASSERT_EQ(months.size(), 2);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"duration").toInt(), 120);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[1], u"duration").toInt(), 60);
+  // The outline's groups: the open to-do's "Pending" group first.
+  const QVariantList children = at(design, "children").toList();
+  ASSERT_EQ(children.size(), 5);
+  EXPECT_FALSE(KeyPath::valueForKeyPath(children[0], u"date").isValid());
+  EXPECT_EQ(KeyPath::valueForKeyPath(children[0], u"items.@count").toInt(), 1);
+}
+
+TEST_F(ReportTest, VariablesFollowProjectsAndMode) {
+  WTReportGenerator generator(projects(), 2);
+  WTReport report =
+      generator.renderText(QStringLiteral("{{ mode }}|{{ client.name }}|{{ projects.@count }}"));
+  EXPECT_TRUE(report.errors.empty());
+  EXPECT_EQ(report.html, QStringLiteral("2|Acme|2"));
+  generator.setMode(0);
+  EXPECT_EQ(generator.renderText(QStringLiteral("{{ mode }}")).html, QStringLiteral("0"));
+  EXPECT_EQ(generator.variables().value(QStringLiteral("mode")).toInt(), 0);
+
+  WTReportGenerator empty;
+  EXPECT_FALSE(empty.variables().value(QStringLiteral("client")).isValid());
+  EXPECT_EQ(empty.variables().value(QStringLiteral("projects")).toList().size(), 0);
+}
+
+TEST_F(ReportTest, FilteredItemsPerMode) {
+  WTReportGenerator generator(projects(), 0);
+  EXPECT_TRUE(generator.filteredItemsForTask(design, 0).isNull());
+  const QVariantList valuable = generator.filteredItemsForTask(design, 1).toList();
+  EXPECT_EQ(valuable.size(), 4);
+  for (const QVariant& item : valuable) {
+    const QString kind = KeyPath::valueForKeyPath(item, u"entityName").toString();
+    EXPECT_TRUE(kind == "WTTime" || kind == "WTExpense") << kind.toStdString();
+  }
+  const QVariantList days = generator.filteredItemsForTask(design, 2).toList();
+  ASSERT_EQ(days.size(), 3);  // the note has no value and no group
+  const QVariantList months = generator.filteredItemsForTask(design, 3).toList();
+  ASSERT_EQ(months.size(), 2);
+  // Handed-out groups stay alive while the generator does.
+  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"items.@count").toInt(), 3);
+}
+
+TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
+  EXPECT_EQ(WTCSVExport::reportCSV(projects(), 0),
+            QStringLiteral("\"Web \\\"Site\\\"\",\"Design\",\"03:00\",\"1,414.50\"\n"
+                           "\"Backend\",\"API\",\"02:00\",\"200.00\"\n"));
+  const QString mode1 = WTCSVExport::reportCSV(projects(), 1);
+  QStringList lines = mode1.split(QLatin1Char('\n'), Qt::SkipEmptyParts);
+  lines.sort();
+  EXPECT_EQ(lines, QStringList({
+                       "\"Backend\",\"API\",\"2024-03-06 09:00\",\"02:00\",\"200.00\"",
+                       "\"Web \\\"Site\\\"\",\"Design\",\"2024-02-10 10:00\",\"01:00\",\"60.00\"",
+                       "\"Web \\\"Site\\\"\",\"Design\",\"2024-03-03 09:00\",\"01:30\",\"90.00\"",
+                       "\"Web \\\"Site\\\"\",\"Design\",\"2024-03-03 14:00\",\"00:30\",\"30.00\"",
+                       "\"Web \\\"Site\\\"\",\"Design\",\"2024-03-04 08:00\",\"00:00\",\"1,234.50\"",
+                   }));
+  EXPECT_EQ(WTCSVExport::reportCSV(projects(), 2),
+            QStringLiteral("\"Web \\\"Site\\\"\",\"Design\",\"2024-03-04\",\"00:00\",\"1,234.50\"\n"
+                           "\"Web \\\"Site\\\"\",\"Design\",\"2024-03-03\",\"02:00\",\"120.00\"\n"
+                           "\"Web \\\"Site\\\"\",\"Design\",\"2024-02-10\",\"01:00\",\"60.00\"\n"
+                           "\"Backend\",\"API\",\"2024-03-06\",\"02:00\",\"200.00\"\n"));
+  EXPECT_EQ(WTCSVExport::reportCSV(projects(), 3),
+            QStringLiteral("\"Web \\\"Site\\\"\",\"Design\",\"2024-03\",\"02:00\",\"1,354.50\"\n"
+                           "\"Web \\\"Site\\\"\",\"Design\",\"2024-02\",\"01:00\",\"60.00\"\n"
+                           "\"Backend\",\"API\",\"2024-03\",\"02:00\",\"200.00\"\n"));
+  EXPECT_EQ(WTCSVExport::reportCSV({}, 2), QString());
+}
+
+TEST_F(ReportTest, EscapingUsesBackslashQuote) {
+  EXPECT_EQ(WTCSVExport::escapedString(QVariant()), QString(""));
+  EXPECT_EQ(WTCSVExport::escapedString(QStringLiteral("a\"b\"\"")), QStringLiteral("a\\\"b\\\"\\\""));
+  EXPECT_EQ(WTCSVExport::escapedString(QStringLiteral("plain, text")), QStringLiteral("plain, text"));
+}
+
+TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
+  // A second project whose name sorts first, and an entry of the design task dated before the others.
+  auto* alpha = WTProject::insertNewObject(context.get());
+  alpha->setName(QStringLiteral("Alpha"));
+  auto* task = makeTask(alpha, QStringLiteral("Zeta"));
+  makeTime(task, berlin(2024, 3, 1, 8), berlin(2024, 3, 1, 8, 45))->setName(QStringLiteral("Early"));
+  const QString path = dir.filePath(QStringLiteral("times.csv"));
+  LogCapture log;
+  const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
+  ASSERT_TRUE(written.ok()) << written.error().message.toStdString();
+  EXPECT_EQ(written.value(), 4);
+  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("Exporting 4 items to: %1").arg(path)));
+  EXPECT_EQ(readAll(path),
+            QStringLiteral(
+                "\"Alpha\",\"Zeta\",\"\",\"Early\",\"3/1/24\",\"3/1/24\",\"45\"\n"
+                "\"Web \\\"Site\\\"\",\"Design\",\"60\",\"Sketch\",\"2/10/24\",\"2/10/24\",\"60\"\n"
+                "\"Web \\\"Site\\\"\",\"Design\",\"60\",\"Kick \\\"off\\\"\",\"3/3/24\",\"3/3/24\",\"90\"\n"
+                "\"Web \\\"Site\\\"\",\"Design\",\"60\",\"Review\",\"3/3/24\",\"3/3/24\",\"30\"\n"));
+
+  // One project and a range: only its entries of 3 March.
+  const Result<WTItemPredicate> day =
+      WTRangePredicate::predicateForRangeWord(QStringLiteral("2024-03-03..2024-03-03"));
+  ASSERT_TRUE(day.ok());
+  ASSERT_TRUE(WTCSVExport::exportTimes(*context, day.value(), web, path).ok());
+  EXPECT_EQ(readAll(path).count(QLatin1Char('\n')), 2);
+  ASSERT_TRUE(WTCSVExport::exportTimes(*context, day.value(), alpha, path).ok());
+  EXPECT_EQ(readAll(path), QString());
+  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
+}
+
+TEST_F(ReportTest, ExportToAnUnwritablePlaceFailsAndKeepsTheOldFile) {
+  const QString path = dir.filePath(QStringLiteral("missing-folder/times.csv"));
+  const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
+  EXPECT_FALSE(written.ok());
+  EXPECT_TRUE(written.error().message.contains(path));
+}
+
+TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
+  WTReportGenerator generator(projects(), 0);
+  for (int mode = 0; mode <= 3; ++mode) {
+    generator.setMode(mode);
+    const WTReport report = generator.render();
+    ASSERT_TRUE(report.templateRead);
+    for (const WTReportTemplateError& error : report.errors) {
+      ADD_FAILURE() << "mode " << mode << ": " << error.message.toStdString() << " at line " << error.line;
+    }
+    // 90 + 30 + 60 at 60/h, the 1,234.50 expense, and 120 flat minutes at 100/h.
+    EXPECT_TRUE(report.html.contains(QStringLiteral("1,614.50"))) << mode;
+    EXPECT_TRUE(report.html.contains(QStringLiteral("1,414.50"))) << mode;
+    EXPECT_TRUE(report.html.contains(QStringLiteral("05:00"))) << mode;
+    EXPECT_TRUE(report.html.contains(QStringLiteral("Acme"))) << mode;
+    EXPECT_EQ(report.html.contains(QStringLiteral("Review")), mode == 1 || mode == 2) << mode;
+  }
+  generator.setMode(1);
+  const QString html = generator.render().html;
+  EXPECT_TRUE(html.contains(QStringLiteral("Expense: Fonts")));
+  EXPECT_TRUE(html.contains(QStringLiteral("Flat fee: Setup")));
+  EXPECT_TRUE(html.contains(QStringLiteral("Time: Review")));
+  EXPECT_FALSE(html.contains(QStringLiteral("Open question")));
+}
+
+TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
+  const QString user = WTReportGenerator::userTemplatePath();
+  ASSERT_FALSE(QFile::exists(user));
+  EXPECT_EQ(WTReportGenerator::templatePath(), WTReportGenerator::builtInTemplatePath());
+
+  const Result<QString> copied = WTReportGenerator::copyBuiltInTemplateToUserFolder();
+  ASSERT_TRUE(copied.ok()) << copied.error().message.toStdString();
+  EXPECT_EQ(copied.value(), user);
+  EXPECT_EQ(readAll(user), readAll(WTReportGenerator::builtInTemplatePath()));
+
+  {
+    QFile file(user);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
+    file.write("Mine: {{ mode }} {{ client.name }}");
+  }
+  ASSERT_TRUE(WTReportGenerator::copyBuiltInTemplateToUserFolder().ok());
+  EXPECT_EQ(readAll(user), QStringLiteral("Mine: {{ mode }} {{ client.name }}"));
+  WTReportGenerator generator(projects(), 3);
+  EXPECT_EQ(generator.render().html, QStringLiteral("Mine: 3 Acme"));
+}
+
+TEST_F(ReportTest, TemplateErrorsComeBackWithTheirLineAndAreLogged) {
+  WTReportGenerator generator(projects(), 1);
+  LogCapture log;
+  const WTReport report =
+      generator.renderText(QStringLiteral("<p>one</p>\n<p>two</p>\n{% /for %}\n<p>after</p>"));
+  ASSERT_FALSE(report.errors.empty());
+  EXPECT_EQ(report.errors.front().line, 3);
+  EXPECT_FALSE(report.errors.front().message.isEmpty());
+  EXPECT_TRUE(
+      LogCapture::lines().contains(QStringLiteral("Template error: %1").arg(report.errors.front().message)));
+  EXPECT_TRUE(report.html.startsWith(QStringLiteral("<p>one</p>")));
+}
