@@ -50,6 +50,20 @@ WTItemsViewController::WTItemsViewController(WTObjectContext* context, QObject* 
       for (WTItem* item : items) expandContainerOfItem(item);
     });
   });
+  // Records that undo or redo puts back are shown and selected, not left inside a closed row.
+  connect(context_, &WTObjectContext::objectValueDidChange, this, [this](WTObject* object, const QString&) {
+    const WTUndoManager& undo = context_->undoManager();
+    if (undo.isUndoing() || undo.isRedoing()) restoredCandidates_.insert(object);
+  });
+  connect(context_, &WTObjectContext::objectsDidChange, this,
+          [this](const QList<WTObject*>& inserted, const QList<WTObject*>&, const QList<WTObject*>&) {
+            const QSet<WTObject*> candidates = std::exchange(restoredCandidates_, {});
+            QList<WTObject*> restored;
+            for (WTObject* object : inserted) {
+              if (candidates.contains(object)) restored.append(object);
+            }
+            if (!restored.isEmpty()) revealObjects(restored);
+          });
   connect(treeController_, &WTItemsModel::projectDeleted, this, [this] {
     project_ = nullptr;
     emit backRequested();
@@ -406,6 +420,34 @@ void WTItemsViewController::selectItem(WTItem* item) {
   delegate_->setEditField(WTItemCellDelegate::Field::Name);
   outlineView_->edit(index);
   outlineView_->scrollTo(index);
+}
+
+void WTItemsViewController::revealObjects(const QList<WTObject*>& objects) {
+  if (!project_ || !outlineView_) return;
+  treeController_->processChanges();
+  // Only the outermost of what came back is selected: a task brings its items with it.
+  const QSet<WTObject*> all(objects.begin(), objects.end());
+  QList<QModelIndex> rows;
+  for (WTObject* object : objects) {
+    if (object->entity() == WTEntity::Task) {
+      if (static_cast<WTTask*>(object)->project() != project_) continue;
+    } else if (WTEntities::isItem(object->entity())) {
+      auto* item = static_cast<WTItem*>(object);
+      if (!item->task() || item->task()->project() != project_ || all.contains(item->task())) continue;
+      expandContainerOfItem(item);
+    } else {
+      continue;
+    }
+    const QModelIndex index = treeController_->indexOfObject(object);
+    if (index.isValid()) rows.append(index);
+  }
+  if (rows.isEmpty()) return;
+  QItemSelection selection;
+  for (const QModelIndex& index : rows) selection.select(index, index);
+  outlineView_->selectionModel()->setCurrentIndex(rows.first(), QItemSelectionModel::NoUpdate);
+  outlineView_->selectionModel()->select(selection,
+                                         QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  outlineView_->scrollTo(rows.first());
 }
 
 void WTItemsViewController::expandContainerOfItem(WTItem* item) {

@@ -6,6 +6,7 @@
 
 #include <QHash>
 #include <QPointer>
+#include <QSet>
 
 class QLabel;
 class QLineEdit;
@@ -85,6 +86,8 @@ class WTItemsViewController : public WTViewController {
   // Brings the tree up to date, opens the item's task and group, selects the item and edits its text.
   void selectItem(WTItem* item);
   void expandContainerOfItem(WTItem* item);
+  // Opens the rows above the given tasks and items of this project and selects them.
+  void revealObjects(const QList<WTObject*>& objects);
 
   // Row heights: a task or group row takes its cell's height, an item row at least 30 points.
   qreal heightOfRow(const QModelIndex& index);
@@ -131,4 +134,6 @@ class WTItemsViewController : public WTViewController {
   QLabel* clientLabel_ = nullptr;
   QLabel* totalsLabel_ = nullptr;
   QLineEdit* rateField_ = nullptr;
+  // Records changed by undo or redo in the present turn.
+  QSet<WTObject*> restoredCandidates_;
 };

@@ -296,3 +296,53 @@ TEST_F(WTItemsViewControllerTest, AnEmptyRateFieldInherits) {
 }
 
 }  // namespace
+
+namespace {
+
+TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
+  WTNote* kept = makeItem<WTNote>(build, "kept", at(2024, 3, 13));
+  WTNote* note = makeItem<WTNote>(build, "gone", at(2024, 3, 12));
+  endTurn();
+  auto selectOnly = [&](const WTObject* object) {
+    outline()->selectionModel()->select(rowOf(object),
+                                        QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  };
+  auto selected = [&] {
+    QList<const WTObject*> objects;
+    for (const QModelIndex& index : outline()->selectionModel()->selectedRows()) {
+      objects.append(model()->objectAt(index));
+    }
+    return objects;
+  };
+
+  controller->expandContainerOfItem(note);
+  selectOnly(note);
+  controller->removeSelectedObjects();
+  endTurn();
+  outline()->collapseAll();
+  selectOnly(design);
+  context->undoManager().undo();
+  endTurn();
+  ASSERT_TRUE(rowOf(note).isValid());
+  EXPECT_TRUE(outline()->isExpanded(rowOf(build)));
+  EXPECT_TRUE(outline()->isExpanded(rowOf(note).parent()));
+  EXPECT_FALSE(outline()->isExpanded(model()->indexOfContainerOfItem(kept)));
+  EXPECT_EQ(selected(), (QList<const WTObject*>{note}));
+  EXPECT_EQ(outline()->currentIndex(), rowOf(note));
+
+  // A whole task comes back as itself: its row is selected, not each of its items.
+  selectOnly(build);
+  controller->removeSelectedObjects();
+  endTurn();
+  selectOnly(design);
+  context->undoManager().undo();
+  endTurn();
+  EXPECT_EQ(selected(), (QList<const WTObject*>{build}));
+
+  // A change that is not undo leaves the selection alone.
+  makeItem<WTNote>(design, "new", at(2024, 3, 14));
+  endTurn();
+  EXPECT_EQ(selected(), (QList<const WTObject*>{build}));
+}
+
+}  // namespace
