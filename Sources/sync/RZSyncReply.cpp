@@ -2,6 +2,8 @@
 
 #include <QStringList>
 
+#include <algorithm>
+
 namespace {
 
 Error malformed(const QString& what) {
@@ -17,6 +19,32 @@ std::optional<qint64> nonNegativeInteger(const QVariant& value) {
   return number;
 }
 
+bool isPlain(const QVariant& value) {
+  const int type = value.typeId();
+  return type != QMetaType::QVariantMap && type != QMetaType::QVariantList;
+}
+
+// A record's values are what the journal sends: plain values (null, flags, numbers, text) or lists of
+// them (the uuids of a relationship); its "uuid", when given, is its own.
+std::optional<QString> recordProblem(const QString& uuid, const QVariantMap& values) {
+  for (auto value = values.begin(); value != values.end(); ++value) {
+    if (value.key() == QLatin1String("uuid")) {
+      if (value.value().typeId() != QMetaType::QString || value.value().toString() != uuid)
+        return QStringLiteral("the \"uuid\" of \"%1\" is not its own").arg(uuid);
+      continue;
+    }
+    bool fits = isPlain(value.value());
+    if (value.value().typeId() == QMetaType::QVariantList) {
+      const QVariantList members = value.value().toList();
+      fits = std::all_of(members.begin(), members.end(), isPlain);
+    }
+    if (!fits)
+      return QStringLiteral("the value of \"%1\" in \"%2\" is neither a plain value nor a list of them")
+          .arg(value.key(), uuid);
+  }
+  return std::nullopt;
+}
+
 std::optional<QString> changeSetProblem(const QVariant& value) {
   if (value.typeId() != QMetaType::QVariantMap) return QStringLiteral("\"result\" is not an object");
   const QVariantMap changes = value.toMap();
@@ -30,6 +58,8 @@ std::optional<QString> changeSetProblem(const QVariant& value) {
         if (record.value().typeId() != QMetaType::QVariantMap)
           return QStringLiteral("the values of \"%1\" in \"%2\" are not an object")
               .arg(record.key(), section);
+        if (const std::optional<QString> problem = recordProblem(record.key(), record.value().toMap()))
+          return problem;
       }
     } else if (section == QLatin1String("x")) {
       if (it.value().typeId() != QMetaType::QVariantList) return QStringLiteral("\"x\" is not a list");
