@@ -262,6 +262,9 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
     EXPECT_TRUE(report.html.contains(QStringLiteral("1,414.50"))) << mode;
     EXPECT_TRUE(report.html.contains(QStringLiteral("05:00"))) << mode;
     EXPECT_TRUE(report.html.contains(QStringLiteral("Acme"))) << mode;
+    // The period runs from the oldest item with a value to the newest.
+    EXPECT_TRUE(report.html.contains(QStringLiteral("Period: 10 February 2024 – 6 March 2024"))) << mode;
+    EXPECT_TRUE(report.html.contains(QStringLiteral("Report date: 20 March 2024"))) << mode;
     EXPECT_EQ(report.html.contains(QStringLiteral("Review")), mode == 1 || mode == 2) << mode;
   }
   generator.setMode(1);
