@@ -238,7 +238,8 @@ TEST_P(ServerHardeningTest, IdentitiesWithControlCharactersOrASecondAtAreRefused
   EXPECT_EQ(head(user, 0, "other").integer("iteration"), 0);
 }
 
-INSTANTIATE_TEST_SUITE_P(Storage, ServerHardeningTest, testing::Values(Storage::SQLite), storageName);
+INSTANTIATE_TEST_SUITE_P(Storage, ServerHardeningTest, testing::Values(Storage::SQLite, Storage::PostgreSQL),
+                         storageName);
 
 }  // namespace
 }  // namespace servertest
