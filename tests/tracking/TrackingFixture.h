@@ -11,7 +11,13 @@
 #include <deque>
 #include <functional>
 #include <memory>
+#include <ostream>
 #include <vector>
+
+// Failures show texts as text.
+inline void PrintTo(const QString& text, std::ostream* os) {
+  *os << '"' << text.toStdString() << '"';
+}
 
 // Answers alerts from a queue (Default when it runs dry) and remembers every alert it was shown.
 class ScriptedPresenter final : public WTTrackingAlertPresenter {
