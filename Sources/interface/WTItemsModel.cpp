@@ -16,6 +16,9 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <unicode/dtptngen.h>
+#include <unicode/locid.h>
+
 #include <QDataStream>
 #include <QIODevice>
 #include <QLocale>
@@ -24,6 +27,8 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <memory>
+#include <string>
 
 const QString WTItemsModel::kObjectUUIDsType = QStringLiteral("WTObjectUUIDs");
 const QString WTItemsModel::kContainsTasksType = QStringLiteral("WTContainsTasks");
@@ -89,6 +94,28 @@ std::optional<Decimal> parseAmount(QString text) {
   text.remove(u' ');
   if (text.isEmpty()) return std::nullopt;
   return Decimal::fromString(text);
+}
+
+// A day group's heading: weekday, day, month and year in the order and words of the user's locale
+// ("Tue 24 Nov 2026"), which a numeric short date ("11/24/26") leaves for the reader to work out.
+QString dayTitle(Date day) {
+  struct Cached {
+    std::string locale;
+    QString pattern;
+  };
+  static Cached cached;
+  const icu::Locale& locale = icu::Locale::getDefault();
+  if (cached.pattern.isEmpty() || cached.locale != locale.getName()) {
+    UErrorCode status = U_ZERO_ERROR;
+    std::unique_ptr<icu::DateTimePatternGenerator> generator(
+        icu::DateTimePatternGenerator::createInstance(locale, status));
+    if (U_FAILURE(status) || !generator) return RZDate::shortFormat(day);
+    const icu::UnicodeString pattern = generator->getBestPattern(icu::UnicodeString(u"EEEdMMMy"), status);
+    if (U_FAILURE(status)) return RZDate::shortFormat(day);
+    cached.locale = locale.getName();
+    cached.pattern = QString(reinterpret_cast<const QChar*>(pattern.getBuffer()), pattern.length());
+  }
+  return RZDate::stringWithPattern(day, cached.pattern);
 }
 
 }  // namespace
@@ -562,7 +589,7 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
     switch (role) {
       case Qt::DisplayRole:
       case NameRole:
-        return container.title();
+        return container.date() ? dayTitle(*container.date()) : container.title();
       case DurationTextRole:
         return DurationText::stringWithMinutes(container.duration());
       case CostTextRole:

@@ -5,6 +5,8 @@
 #include <QMimeData>
 #include <QSignalSpy>
 
+#include <unicode/locid.h>
+
 namespace {
 
 class WTItemsModelTest : public UiTest {
@@ -78,6 +80,24 @@ TEST_F(WTItemsModelTest, TasksInStoredOrderThenPendingThenDaysNewestFirst) {
   EXPECT_TRUE(model->flags(task) & Qt::ItemIsSelectable);
   EXPECT_TRUE(model->flags(model->index(0, 0, pending)) & Qt::ItemIsSelectable);
   EXPECT_EQ(pending.data(WTItemsModel::NameRole).toString(), "Pending");
+}
+
+TEST_F(WTItemsModelTest, DayHeadingsNameTheWeekdayAndTheDateInTheUsersLocale) {
+  makeItem<WTNote>(design, "note", at(2026, 11, 24, 23, 30));  // late evening: still the 24th here
+  model->setProject(project);
+  const QModelIndex day = model->index(0, 0, model->index(0, 0));
+  const icu::Locale previous = icu::Locale::getDefault();
+  auto headingIn = [&](const char* name) {
+    UErrorCode status = U_ZERO_ERROR;
+    icu::Locale::setDefault(icu::Locale(name), status);
+    EXPECT_TRUE(U_SUCCESS(status));
+    return day.data(WTItemsModel::NameRole).toString().toStdString();
+  };
+  EXPECT_EQ(headingIn("en_GB"), "Tue, 24 Nov 2026");
+  EXPECT_EQ(headingIn("en_US"), "Tue, Nov 24, 2026");
+  EXPECT_EQ(headingIn("de_DE"), "Di., 24. Nov. 2026");
+  UErrorCode status = U_ZERO_ERROR;
+  icu::Locale::setDefault(previous, status);
 }
 
 TEST_F(WTItemsModelTest, ChangesArriveAsRowMovesNotResets) {
