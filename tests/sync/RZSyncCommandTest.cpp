@@ -101,3 +101,24 @@ TEST(RZSyncCommand, NeedsAServerAndAnAccount) {
     EXPECT_EQ(run(client, arguments).code, 2);
   }
 }
+
+// What a hostile or broken server answers ends the command with a failure instead of a crash or a
+// journal the real server refuses from then on.
+TEST(RZSyncCommand, FailsOnAReplyNotOfTheProtocolsShape) {
+  LoopbackHttpServer server;
+  const int depth = 200000;
+  const QByteArray deep =
+      "{\"action\": \"head\", \"iteration\": 3, \"result\": {\"x\": " + QByteArray(depth, '[') +
+      QByteArray(depth, ']') + "}}";
+  const QByteArray negative = R"({"action": "head", "iteration": -5, "result": {}})";
+  for (const QByteArray& body : {deep, negative}) {
+    SCOPED_TRACE(body.left(60).toStdString());
+    server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(body); };
+    SyncClient client(server.address());
+    const qint64 before = client.track().iteration();
+    const CommandResult result = run(client, {"--timeout", "5"});
+    EXPECT_EQ(result.code, 1);
+    EXPECT_TRUE(result.err.startsWith("Sync failed: ")) << result.err.toStdString();
+    EXPECT_EQ(client.track().iteration(), before);
+  }
+}
