@@ -3,6 +3,8 @@
 wrk.method = "POST"
 wrk.headers["Content-Type"] = "application/json"
 wrk.headers["Accept"] = "application/json"
+-- WRK_RECONNECT=1: a new connection for every poll, as devices behind some proxies do.
+if os.getenv("WRK_RECONNECT") == "1" then wrk.headers["Connection"] = "close" end
 wrk.body = string.format(
   '{\n  "user" : "%s",\n  "password" : "%s",\n  "action" : "head",\n  "iteration" : %s,\n  "device" : "wrk-bench"\n}',
   os.getenv("TESSAL_USER"), os.getenv("TESSAL_PASSWORD"), os.getenv("TESSAL_ITERATION") or "0")

@@ -7,7 +7,8 @@
 #   bench/server-head-wrk.sh [SERVER_BINARY]
 # SERVER_BINARY defaults to build-server/server/tessal-sync-server; build it with optimisation
 # (-DCMAKE_BUILD_TYPE=RelWithDebInfo) for meaningful figures. WRK_CONNECTIONS, WRK_DURATION and
-# WRK_THREADS override the wrk settings.
+# WRK_THREADS override the wrk settings; WRK_RECONNECT=1 opens a new connection for every poll (the
+# listen backlog's test). Listen queue overflows during the run are printed when nstat is installed.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 server=${1:-build-server/server/tessal-sync-server}
@@ -40,5 +41,9 @@ reply=$(curl -s --max-time 10 -X POST -H 'Content-Type: application/json' -d "$b
 echo "first reply: $reply"
 
 echo "wrk: ${WRK_CONNECTIONS:-50} connections, ${WRK_DURATION:-10s}, $endpoint"
+overflows() { nstat -az TcpExtListenOverflows 2>/dev/null | awk '/ListenOverflows/ {print $2}'; }
+before=$(overflows || true)
 wrk -t "${WRK_THREADS:-2}" -c "${WRK_CONNECTIONS:-50}" -d "${WRK_DURATION:-10s}" --latency \
   -s bench/server-head-wrk.lua "$endpoint"
+after=$(overflows || true)
+if [ -n "$before" ] && [ -n "$after" ]; then echo "listen queue overflows: $((after - before))"; fi
