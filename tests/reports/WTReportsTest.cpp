@@ -273,6 +273,10 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
   EXPECT_TRUE(html.contains(QStringLiteral("Flat fee: Setup")));
   EXPECT_TRUE(html.contains(QStringLiteral("Time: Review")));
   EXPECT_FALSE(html.contains(QStringLiteral("Open question")));
+  generator.setMode(3);
+  const QString months = generator.render().html;
+  EXPECT_TRUE(months.contains(QStringLiteral("3 entries"))) << months.toStdString();
+  EXPECT_TRUE(months.contains(QStringLiteral("1 entry<"))) << months.toStdString();
 }
 
 TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
