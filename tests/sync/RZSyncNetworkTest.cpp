@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <QPointer>
 #include <QTcpServer>
 #include <QTcpSocket>
 
@@ -232,6 +233,38 @@ TEST_F(RZSyncNetworkTest, ConnectionFailureIsReportedAndLogged) {
   ASSERT_EQ(delegate.errors.size(), 1);
   EXPECT_EQ(delegate.actionWhenCalled, RZSyncNetwork::Idle);
   EXPECT_TRUE(log.contains(QStringLiteral("Connection failed: ")));
+}
+
+// A server that streams a reply without end: the exchange fails as soon as the limit is passed, and the
+// client hangs up instead of waiting for the rest.
+TEST(RZSyncNetworkSizeLimit, AnEndlessReplyIsCutOffAtTheLimit) {
+  QTcpServer endless;
+  ASSERT_TRUE(endless.listen(QHostAddress::LocalHost, 0));
+  QPointer<QTcpSocket> connection;
+  QObject::connect(&endless, &QTcpServer::newConnection, [&] {
+    connection = endless.nextPendingConnection();
+    QObject::connect(connection, &QTcpSocket::readyRead, connection, [&] {
+      connection->readAll();
+      // Headers and a first chunk of 4 KiB of white space; the rest never comes.
+      connection->write(
+          "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n\r\n"
+          "1000\r\n" +
+          QByteArray(4096, ' ') + "\r\n");
+    });
+  });
+  RecordingDelegate delegate;
+  RZSyncNetwork network(QUrl(QStringLiteral("http://127.0.0.1:%1/sync").arg(endless.serverPort())),
+                        &delegate);
+  network.setUser(QStringLiteral("ann@example.org"));
+  network.setPassword(QStringLiteral("pw"));
+  network.setMaxReplyBytes(1024);
+  network.postJSONObject({}, QStringLiteral("head"), 7);
+  ASSERT_TRUE(waitUntil([&] { return delegate.calls() > 0; }, 3000));
+  ASSERT_EQ(delegate.errors.size(), 1);
+  EXPECT_TRUE(delegate.errors[0].contains("larger than 1024 bytes")) << delegate.errors[0].toStdString();
+  EXPECT_EQ(network.networkAction(), RZSyncNetwork::Idle);
+  EXPECT_TRUE(
+      waitUntil([&] { return !connection || connection->state() != QAbstractSocket::ConnectedState; }));
 }
 
 TEST_F(RZSyncNetworkTest, SilentServerTimesOut) {
