@@ -344,7 +344,8 @@ TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
 
 TEST_F(TrackingTest, AWakeNobodyAnnouncedIsFoundFromTheLateTick) {
   turnIdleHandlingOn(5);
-  startTimer(makeTask(), clockNow.addingSeconds(-1800));
+  WTTask* task = makeTask();
+  WTTime* time = startTimer(task, clockNow.addingSeconds(-1800));
   updater->start();
   idle.seconds = 0;
 
@@ -356,10 +357,11 @@ TEST_F(TrackingTest, AWakeNobodyAnnouncedIsFoundFromTheLateTick) {
   // A tick that comes two hours after it was due: the machine was paused in between.
   const Date lastAwake = clockNow;
   advance(2 * 3600);
-  presenter.answers = {Answer::Default};
+  presenter.answers = {Answer::Alternate};
   updater->update();
   ASSERT_EQ(presenter.shown.size(), 1u);
-  (void)lastAwake;
+  EXPECT_EQ(time->endDate(), std::optional<Date>(lastAwake)) << "cut where the machine was last seen awake";
+  EXPECT_EQ(runningTimesOf(task).size(), 1);
 
   // An immediate tick (the running set changed) while a tick is pending finds the gap as well.
   advance(5);
