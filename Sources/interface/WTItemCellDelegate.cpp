@@ -29,6 +29,23 @@ const QColor& greyText() {
   return colour;
 }
 
+// On a selected row text takes the palette's colour for highlighted text, so it stays readable on the
+// highlight whatever the theme; dimmed text stays a little dimmer than the rest.
+bool isSelected(const QStyleOptionViewItem& option) {
+  return option.state & QStyle::State_Selected;
+}
+
+QColor textColour(const QStyleOptionViewItem& option) {
+  return isSelected(option) ? option.palette.color(QPalette::HighlightedText) : darkText();
+}
+
+QColor dimTextColour(const QStyleOptionViewItem& option) {
+  if (!isSelected(option)) return greyText();
+  QColor colour = option.palette.color(QPalette::HighlightedText);
+  colour.setAlphaF(0.75f);
+  return colour;
+}
+
 void drawDisclosure(QPainter& painter, const QRectF& rect, bool expanded, const QColor& colour) {
   if (rect.isEmpty()) return;
   QPainterPath triangle;
@@ -98,11 +115,7 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
   const bool selected = option.state & QStyle::State_Selected;
   // A plain row: the window's background, the regular selection.
   painter.fillRect(row, option.palette.color(QPalette::Base));
-  if (selected) {
-    QColor highlight = option.palette.color(QPalette::Highlight);
-    highlight.setAlphaF(0.22f);
-    painter.fillRect(row, highlight);
-  }
+  if (selected) painter.fillRect(row, option.palette.color(QPalette::Highlight));
   if (view_->dropTargetIndex() == index) {
     QColor highlight = option.palette.color(QPalette::Highlight);
     highlight.setAlphaF(0.45f);
@@ -122,12 +135,12 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
   painter.setFont(bold);
   const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString title = index.data(WTItemsModel::NameRole).toString();
-  painter.setPen(title.isEmpty() ? greyText() : darkText());
+  painter.setPen(title.isEmpty() ? dimTextColour(option) : textColour(option));
   if (title.isEmpty()) title = tr("Untitled Task");
   painter.drawText(name, Qt::AlignLeft | Qt::AlignVCenter, elided(painter, title, name.width()));
 
   painter.setFont(option.font);
-  painter.setPen(darkText());
+  painter.setPen(textColour(option));
   painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::DurationTextRole).toString());
   painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
@@ -171,7 +184,9 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   // The groove separates items from items; above a group or a task the row ends flat.
   const QModelIndex below = view_->rowBelow(index);
   if (below.isValid()) rowView.setDrawsSeparator(model->isItemIndex(below));
-  rowView.draw(painter, row, option.state & QStyle::State_Selected);
+  // The palette's highlight, not a grey a shade off the row's own.
+  rowView.setSelectionColor(option.palette.color(QPalette::Highlight));
+  rowView.draw(painter, row, isSelected(option));
 
   const QString kind = index.data(WTItemsModel::KindRole).toString();
   const bool running = index.data(WTItemsModel::RunningRole).toBool();
@@ -182,7 +197,7 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   const QRectF label = cell.partRect(WTTableCellView::Part::Label, row);
   if (!label.isEmpty()) {
     painter.setFont(kind == QLatin1String("WTTime") ? option.font : small);
-    painter.setPen(kind == QLatin1String("WTTime") ? darkText() : greyText());
+    painter.setPen(kind == QLatin1String("WTTime") ? textColour(option) : dimTextColour(option));
     painter.drawText(label, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::LabelRole).toString());
   }
   const QRectF box = cell.partRect(WTTableCellView::Part::Checkbox, row);
@@ -199,18 +214,18 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   painter.setFont(nameFont);
   const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString text = index.data(WTItemsModel::NameRole).toString();
-  painter.setPen(text.isEmpty() || completed ? greyText() : darkText());
+  painter.setPen(text.isEmpty() || completed ? dimTextColour(option) : textColour(option));
   if (text.isEmpty()) text = kind == QLatin1String("WTNote") ? tr("Empty note") : tr("No description");
   painter.drawText(name, Qt::AlignLeft | Qt::AlignVCenter, elided(painter, text, name.width()));
 
   QFont totals = option.font;
   totals.setBold(running);
   painter.setFont(totals);
-  painter.setPen(running ? QColor(0x2f, 0x9e, 0x44) : darkText());
+  painter.setPen(running && !isSelected(option) ? QColor(0x2f, 0x9e, 0x44) : textColour(option));
   painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::DurationTextRole).toString());
   painter.setFont(option.font);
-  painter.setPen(darkText());
+  painter.setPen(textColour(option));
   painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::CostTextRole).toString());
   if (running) {

@@ -22,7 +22,13 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
   const bool selected = option.state & QStyle::State_Selected;
   const bool archived = index.data(WTObjectListModel::ArchivedRole).toBool();
   painter->save();
-  WTTableRowView().draw(*painter, row, selected);
+  // The palette's highlight with its own text colour: readable whatever the theme.
+  WTTableRowView rowView;
+  rowView.setSelectionColor(option.palette.color(QPalette::Highlight));
+  rowView.draw(*painter, row, selected);
+  const QColor selectedText = option.palette.color(QPalette::HighlightedText);
+  QColor dimSelectedText = selectedText;
+  dimSelectedText.setAlphaF(0.75f);
 
   const qreal ratio = painter->device() ? painter->device()->devicePixelRatioF() : 1.0;
   const QRectF icon = cell_.partRect(WTTableCellView::Part::Icon, row);
@@ -30,7 +36,9 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
   if (!image.isEmpty())
     painter->drawPixmap(icon.topLeft(), WTImages::pixmap(image, icon.size().toSize(), ratio));
 
-  const QColor text = archived ? RZColor::calibratedWhite(0.55) : RZColor::calibratedWhite(0.1);
+  const QColor text = selected   ? (archived ? dimSelectedText : selectedText)
+                      : archived ? RZColor::calibratedWhite(0.55)
+                                 : RZColor::calibratedWhite(0.1);
   QFont nameFont = option.font;
   nameFont.setBold(true);
   painter->setFont(nameFont);
@@ -38,7 +46,7 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
   const QRectF name = cell_.partRect(WTTableCellView::Part::Name, row);
   QString title = index.data(WTObjectListModel::NameRole).toString();
   if (title.isEmpty()) {
-    painter->setPen(RZColor::calibratedWhite(0.55));
+    painter->setPen(selected ? dimSelectedText : RZColor::calibratedWhite(0.55));
     title = tr("Untitled");
   }
   painter->drawText(name, Qt::AlignLeft | Qt::AlignVCenter,
@@ -53,7 +61,7 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
     WTPopUpButtonCell::drawWithFrame(*painter, subtitle, subtitleText, small, 1);
   } else {
     painter->setFont(small);
-    painter->setPen(RZColor::calibratedWhite(0.4));
+    painter->setPen(selected ? dimSelectedText : RZColor::calibratedWhite(0.4));
     painter->drawText(subtitle.adjusted(4, 0, 0, 0), Qt::AlignLeft | Qt::AlignVCenter, subtitleText);
   }
 
