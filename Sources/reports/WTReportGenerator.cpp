@@ -4,6 +4,7 @@
 #include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
 #include "WTClient.h"
+#include "WTHTMLFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTProject.h"
@@ -132,6 +133,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.setDelegate(&collector);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
+  engine.loadFilter(std::make_shared<WTHTMLFilter>());
   QString html;
   try {
     html = path ? engine.processTemplateInFileAtPath(*path, variables())

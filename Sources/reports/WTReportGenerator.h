@@ -64,7 +64,8 @@ class WTReportGenerator {
   // overwritten); returns the user's path either way, or why the copy failed.
   static Result<QString> copyBuiltInTemplateToUserFolder();
 
-  // Renders the template at `path` (templatePath() when empty) with variables(). Each error is also
+  // Renders the template at `path` (templatePath() when empty) with variables() and the filters
+  // "digiclock", "decimal" and "html". Each error is also
   // logged as "Template error: MESSAGE".
   WTReport render(const QString& path = QString());
   // The same with the template's text.

@@ -279,6 +279,19 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
   EXPECT_TRUE(months.contains(QStringLiteral("1 entry<"))) << months.toStdString();
 }
 
+TEST_F(ReportTest, BuiltInTemplateShowsNamesWithMarkupCharactersAsTyped) {
+  client->setName(QStringLiteral("Smith & <Co>"));
+  design->setName(QStringLiteral("a<b"));
+  WTReportGenerator generator(projects(), 1);
+  const WTReport report = generator.render();
+  EXPECT_TRUE(report.errors.empty());
+  EXPECT_TRUE(report.html.contains(QStringLiteral("<h1>Smith &amp; &lt;Co&gt;</h1>")))
+      << report.html.toStdString();
+  EXPECT_TRUE(report.html.contains(QStringLiteral("<td>a&lt;b</td>")));
+  EXPECT_FALSE(report.html.contains(QStringLiteral("<Co>")));
+  EXPECT_EQ(generator.renderText(QStringLiteral("[{{ missing | html }}]")).html, QStringLiteral("[]"));
+}
+
 TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
   const QString user = WTReportGenerator::userTemplatePath();
   ASSERT_FALSE(QFile::exists(user));
