@@ -241,11 +241,12 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
 }
 
-TEST_F(ReportTest, ExportToAnUnwritablePlaceFailsAndKeepsTheOldFile) {
+TEST_F(ReportTest, ExportToAMissingFolderFailsNamingThePath) {
   const QString path = dir.filePath(QStringLiteral("missing-folder/times.csv"));
   const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
   EXPECT_FALSE(written.ok());
   EXPECT_TRUE(written.error().message.contains(path));
+  EXPECT_FALSE(QFile::exists(path));
 }
 
 TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
