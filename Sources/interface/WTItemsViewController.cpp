@@ -8,6 +8,7 @@
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTDatePopover.h"
+#include "WTEmptyHint.h"
 #include "WTImages.h"
 #include "WTItem.h"
 #include "WTItemCellDelegate.h"
@@ -155,6 +156,7 @@ QWidget* WTItemsViewController::loadView() {
 
   outlineView_ = new WTOutlineView(container);
   outlineView_->setObjectName(QStringLiteral("itemsOutline"));
+  outlineView_->setEmptyHint(WTEmptyHint::forAdding(tr("No tasks yet")));
   delegate_ = new WTItemCellDelegate(this, outlineView_);
   outlineView_->setItemDelegate(delegate_);
   outlineView_->setModel(treeController_);

@@ -1,6 +1,7 @@
 #include "WTListView.h"
 
 #include "RZColor.h"
+#include "WTEmptyHint.h"
 
 #include <QContextMenuEvent>
 #include <QKeyEvent>
@@ -58,4 +59,9 @@ void WTListView::mousePressEvent(QMouseEvent* event) {
 void WTListView::contextMenuEvent(QContextMenuEvent* event) {
   const QModelIndex index = indexAt(event->pos());
   emit contextMenuRequestedForRow(index.isValid() ? index.row() : -1, event->globalPos());
+}
+
+void WTListView::paintEvent(QPaintEvent* event) {
+  QListView::paintEvent(event);
+  WTEmptyHint::paint(this, emptyHint_);
 }

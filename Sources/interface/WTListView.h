@@ -7,6 +7,13 @@
 class WTListView : public QListView {
   Q_OBJECT
  public:
+  // Shown in the middle while the view has no rows.
+  void setEmptyHint(const QString& hint) {
+    emptyHint_ = hint;
+    viewport()->update();
+  }
+  QString emptyHint() const { return emptyHint_; }
+
   explicit WTListView(QWidget* parent = nullptr);
 
   // Whether a field of a row is being edited.
@@ -39,4 +46,10 @@ class WTListView : public QListView {
 
  private:
   int clickedRow_ = -1;
+
+ protected:
+  void paintEvent(QPaintEvent* event) override;
+
+ private:
+  QString emptyHint_;
 };

@@ -1,5 +1,6 @@
 #include "WTObjectListViewController.h"
 
+#include "WTEmptyHint.h"
 #include "WTListCellDelegate.h"
 #include "WTListView.h"
 #include "WTObject.h"
@@ -36,6 +37,8 @@ QWidget* WTObjectListViewController::loadView() {
   layout->setContentsMargins(0, 0, 0, 0);
   tableView_ = new WTListView(container);
   tableView_->setObjectName(identifier_ + QStringLiteral("sTable"));
+  tableView_->setEmptyHint(WTEmptyHint::forAdding(
+      identifier_ == QLatin1String("Client") ? tr("No clients yet") : tr("No projects yet")));
   delegate_ = new WTListCellDelegate(identifier_, tableView_);
   tableView_->setItemDelegate(delegate_);
   tableView_->setModel(arrayController_);

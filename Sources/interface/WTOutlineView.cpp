@@ -1,5 +1,6 @@
 #include "WTOutlineView.h"
 
+#include "WTEmptyHint.h"
 #include "WTTableRowView.h"
 
 #include <QDrag>
@@ -180,4 +181,9 @@ void WTOutlineView::startDrag(Qt::DropActions supportedActions) {
   drag->setHotSpot(QPoint(-14, -10));
   drag->exec(supportedActions, defaultDropAction());
   setDropTarget(QModelIndex());
+}
+
+void WTOutlineView::paintEvent(QPaintEvent* event) {
+  QTreeView::paintEvent(event);
+  WTEmptyHint::paint(this, emptyHint_);
 }

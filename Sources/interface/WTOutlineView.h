@@ -9,6 +9,13 @@
 class WTOutlineView : public QTreeView {
   Q_OBJECT
  public:
+  // Shown in the middle while the view has no rows.
+  void setEmptyHint(const QString& hint) {
+    emptyHint_ = hint;
+    viewport()->update();
+  }
+  QString emptyHint() const { return emptyHint_; }
+
   explicit WTOutlineView(QWidget* parent = nullptr);
 
   // Whether a field of a row is being edited.
@@ -55,4 +62,10 @@ class WTOutlineView : public QTreeView {
   QPersistentModelIndex hoverIndex_;
   int laidOutWidth_ = -1;
   QPersistentModelIndex dropTarget_;
+
+ protected:
+  void paintEvent(QPaintEvent* event) override;
+
+ private:
+  QString emptyHint_;
 };
