@@ -146,6 +146,41 @@ TEST_P(ServerHardeningTest, SlowConnectionsDoNotStarveADevicesPolls) {
   EXPECT_EQ(cutOff, 70) << "every slow request ends at the deadline with 408";
 }
 
+// Password guesses that find every verification slot taken are told to come back at once instead of
+// holding a worker while they wait, so the workers stay free for a device that proved its password.
+TEST_P(ServerHardeningTest, AFloodOfGuessesWaitsForNoVerificationSlot) {
+  options.threads = 4;
+  options.authentication.concurrentVerifications = 1;
+  startServer();
+  const std::string user = newUser("owner");
+  ASSERT_EQ(head(user, 0, "laptop").status, 200);
+
+  std::atomic<bool> done{false};
+  std::atomic<int> busy{0}, unanswered{0};
+  std::vector<std::thread> strangers;
+  for (int t = 0; t < 12; ++t) {
+    strangers.emplace_back([&, t, port = port()] {
+      for (int n = 0; !done; ++n) {
+        // A new address each time, so no lock spares the server a verification.
+        const std::string address =
+            "stranger-" + std::to_string(t) + "-" + std::to_string(n) + "@example.com";
+        const Reply reply = post(port, "/sync/tessal/sync.php", requestBody(address, "guess", "head", 0));
+        if (reply.status == 503 && reply.retryAfter == "1") ++busy;
+        if (reply.status == 0) ++unanswered;
+      }
+    });
+  }
+  for (int poll = 0; poll < 20; ++poll) {
+    const Reply reply = head(user, 0, "laptop");
+    EXPECT_EQ(reply.status, 200) << reply.body;
+    std::this_thread::sleep_for(50ms);
+  }
+  done = true;
+  for (std::thread& thread : strangers) thread.join();
+  EXPECT_GT(busy, 0) << "guesses beyond the free slot are answered 503 at once";
+  EXPECT_EQ(unanswered, 0);
+}
+
 // A stranger who knows the address cannot lock the owner's devices out, also once the owner's
 // remembered success has expired; the stranger stays locked.
 TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePassword) {
