@@ -5,6 +5,7 @@
 #include "WTAppDelegate.h"
 #include "WTClientsViewController.h"
 #include "WTEditCommitter.h"
+#include "WTHelpDialogs.h"
 #include "WTImages.h"
 #include "WTItemsViewController.h"
 #include "WTNavigationController.h"
@@ -212,6 +213,22 @@ void WTMainWindowController::buildActions() {
   record->addAction(report);
   record->addSeparator();
   record->addAction(timer);
+
+  QMenu* help = menuBar()->addMenu(tr("&Help"));
+  help->setObjectName(QStringLiteral("helpMenu"));
+  QAction* shortcuts = help->addAction(tr("&Keyboard Shortcuts"), [this] {
+    QDialog* dialog = WTHelpDialogs::makeShortcutsDialog(menuBar(), this);
+    dialog->setAttribute(Qt::WA_DeleteOnClose);
+    dialog->open();
+  });
+  shortcuts->setObjectName(QStringLiteral("keyboardShortcuts"));
+  QAction* about = help->addAction(tr("&About Tessal"), [this] {
+    QDialog* dialog = WTHelpDialogs::makeAboutDialog(this);
+    dialog->setAttribute(Qt::WA_DeleteOnClose);
+    dialog->open();
+  });
+  about->setObjectName(QStringLiteral("about"));
+  about->setMenuRole(QAction::AboutRole);
 }
 
 QList<WTProject*> WTMainWindowController::fetchProjects() const {
