@@ -1,6 +1,7 @@
 #include "HttpListener.h"
 
 #include <arpa/inet.h>
+#include <dirent.h>
 #include <fcntl.h>
 #include <netdb.h>
 #include <netinet/in.h>
@@ -8,13 +9,16 @@
 #include <poll.h>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
 #include <fstream>
+#include <iostream>
 
 namespace tessal::server {
 
@@ -93,6 +97,21 @@ int listenBacklog() {
   int value = 0;
   if (file >> value && value > 0) return value;
   return SOMAXCONN;
+}
+
+// How many more connections the process can hold open, leaving room for storage connections, files
+// and the workers. Accepting past the descriptor limit fails, leaving the listening socket readable
+// (the reader would spin) and the connection waiting in the backlog with nobody to answer it.
+size_t connectionsTheFileLimitAllows(int workers) {
+  rlimit files{};
+  if (getrlimit(RLIMIT_NOFILE, &files) != 0 || files.rlim_cur == RLIM_INFINITY) return SIZE_MAX;
+  size_t open = 0;
+  if (DIR* folder = opendir("/proc/self/fd")) {
+    while (readdir(folder)) ++open;
+    closedir(folder);
+  }
+  const size_t reserve = open + 64 + 2 * static_cast<size_t>(workers);
+  return files.rlim_cur > reserve ? files.rlim_cur - reserve : 1;
 }
 
 void setNonBlocking(int fd) {
@@ -193,6 +212,7 @@ bool HttpListener::start(const std::string& host, int port, std::string& error) 
     event.data.fd = fd;
     epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event);
   }
+  limits_.maxConnections = std::min(limits_.maxConnections, connectionsTheFileLimitAllows(workerCount_));
   stopping_ = false;
   for (int i = 0; i < workerCount_; ++i) workers_.emplace_back([this] { workLoop(); });
   reader_ = std::thread([this] { readLoop(); });
@@ -261,6 +281,13 @@ void HttpListener::readLoop() {
       if (!connection.buffer.empty()) dispatch(fd);
     }
     sweepDeadlines(Clock::now());
+    if (acceptPausedUntil_ && Clock::now() >= *acceptPausedUntil_) {
+      acceptPausedUntil_.reset();
+      epoll_event event{};
+      event.events = EPOLLIN;
+      event.data.fd = listenFd_;
+      epoll_ctl(epollFd_, EPOLL_CTL_ADD, listenFd_, &event);
+    }
   }
 }
 
@@ -270,7 +297,15 @@ void HttpListener::accept() {
     socklen_t length = sizeof address;
     const int fd =
         accept4(listenFd_, reinterpret_cast<sockaddr*>(&address), &length, SOCK_NONBLOCK | SOCK_CLOEXEC);
-    if (fd < 0) return;
+    if (fd < 0) {
+      // Out of descriptors after all (something else holds them): stop listening for a moment rather
+      // than being woken for the same connection again and again.
+      if (errno == EMFILE || errno == ENFILE || errno == ENOBUFS || errno == ENOMEM) {
+        epoll_ctl(epollFd_, EPOLL_CTL_DEL, listenFd_, nullptr);
+        acceptPausedUntil_ = Clock::now() + std::chrono::milliseconds(100);
+      }
+      return;
+    }
     if (connections_.size() >= limits_.maxConnections) {
       ::close(fd);
       continue;
@@ -532,7 +567,8 @@ void HttpListener::workLoop() {
     HttpReply reply;
     try {
       reply = handler_(job.request);
-    } catch (const std::exception&) {
+    } catch (const std::exception& e) {
+      std::cerr << "tessal-sync-server: request failed: " << e.what() << std::endl;
       reply = HttpReply{500, "Internal error; try again later.\n", "text/plain; charset=utf-8", {}};
     }
     const bool keep = job.keepAlive && !stopping_;

@@ -51,7 +51,7 @@ class HttpListener {
     std::chrono::milliseconds requestTimeout{10000};  // from the first byte to the end of the body
     std::chrono::milliseconds idleTimeout{5000};      // a kept-alive connection between requests
     std::chrono::milliseconds writeTimeout{10000};
-    size_t maxConnections = 4096;
+    size_t maxConnections = 4096;  // lowered to what the process's descriptor limit allows
   };
   using Handler = std::function<HttpReply(const HttpRequest&)>;
   // What to answer a request refused before it was complete (status 400, 408, 411, 413, 415, 431).
@@ -103,6 +103,7 @@ class HttpListener {
 
   // Read thread only.
   std::map<int, Connection*> connections_;
+  std::optional<std::chrono::steady_clock::time_point> acceptPausedUntil_;
 
   std::mutex mutex_;
   std::condition_variable work_;

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include <pthread.h>
+#include <sys/resource.h>
 
 using tessal::server::PasswordAuthenticator;
 using tessal::server::SyncServer;
@@ -85,6 +86,13 @@ int serve(const std::vector<std::string>& args) {
   sigaddset(&signals, SIGTERM);
   pthread_sigmask(SIG_BLOCK, &signals, nullptr);
   std::signal(SIGPIPE, SIG_IGN);
+  // Every open connection is a descriptor; the usual soft limit of 1,024 is below the connections the
+  // server is meant to hold.
+  rlimit files{};
+  if (getrlimit(RLIMIT_NOFILE, &files) == 0 && files.rlim_cur < files.rlim_max) {
+    files.rlim_cur = files.rlim_max;
+    setrlimit(RLIMIT_NOFILE, &files);
+  }
 
   std::string error;
   std::unique_ptr<SyncServer> server = SyncServer::create(location, options, error);

@@ -5,7 +5,17 @@
 #include <QProcess>
 #include <QRegularExpression>
 
+#include <arpa/inet.h>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <chrono>
 #include <csignal>
+#include <thread>
+#include <vector>
 
 namespace servertest {
 namespace {
@@ -63,6 +73,53 @@ TEST_P(ServerCommandLineTest, AddUserThenServe) {
   ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
   ASSERT_TRUE(server.waitForFinished(10000));
   EXPECT_EQ(server.exitStatus(), QProcess::NormalExit);
+  EXPECT_EQ(server.exitCode(), 0);
+}
+
+// Under a low descriptor limit the server holds only the connections it has descriptors for and closes
+// the rest at once, instead of leaving them unanswered in the backlog while it fails to accept them.
+TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce) {
+  ASSERT_EQ(run({"add-user", "fd@example.com", "--db", db_}, "a password on stdin\n").exitCode, 0);
+  QProcess server;
+  server.setChildProcessModifier([] {
+    const rlimit files{160, 160};  // soft and hard: the server cannot raise it
+    setrlimit(RLIMIT_NOFILE, &files);
+  });
+  server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE),
+               {"serve", "--listen", "127.0.0.1:0", "--db", db_, "--threads", "4"});
+  ASSERT_TRUE(server.waitForStarted(10000));
+  ASSERT_TRUE(server.waitForReadyRead(10000)) << server.readAllStandardError().toStdString();
+  const QRegularExpressionMatch match = QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)")
+                                            .match(QString::fromUtf8(server.readLine()));
+  ASSERT_TRUE(match.hasMatch());
+  const int port = match.captured(1).toInt();
+
+  std::vector<int> clients;
+  for (int i = 0; i < 300; ++i) {
+    const int fd = socket(AF_INET, SOCK_STREAM, 0);
+    ASSERT_GE(fd, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(static_cast<uint16_t>(port));
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    ASSERT_EQ(connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    clients.push_back(fd);
+  }
+  std::this_thread::sleep_for(std::chrono::milliseconds(500));
+  int closedAtOnce = 0;
+  for (int fd : clients) {
+    pollfd readable{fd, POLLIN, 0};
+    char byte;
+    if (poll(&readable, 1, 0) == 1 && recv(fd, &byte, 1, MSG_DONTWAIT) == 0) ++closedAtOnce;
+  }
+  for (int fd : clients) ::close(fd);
+  EXPECT_GE(closedAtOnce, 150) << "of 300, with descriptors for fewer than 160";
+
+  const Reply reply = post(port, "/sync/tessal/sync.php",
+                           requestBody("fd@example.com", "a password on stdin", "head", 0, "cli-device"));
+  EXPECT_EQ(reply.status, 200) << reply.body;
+  ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
+  ASSERT_TRUE(server.waitForFinished(10000));
   EXPECT_EQ(server.exitCode(), 0);
 }
 
