@@ -22,6 +22,7 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <QEvent>
 #include <QHBoxLayout>
 #include <QItemSelectionModel>
 #include <QLabel>
@@ -139,14 +140,20 @@ QWidget* WTItemsViewController::loadView() {
   connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, false); });
   bar->addWidget(rateLabel);
   bar->addWidget(rateField_);
+  // The totals sit right above the rows' duration and cost columns (alignTotals places them); the
+  // layout only keeps their room free.
+  durationLabel_ = new QLabel(header_);
+  durationLabel_->setObjectName(QStringLiteral("projectDuration"));
   totalsLabel_ = new QLabel(header_);
-  totalsLabel_->setObjectName(QStringLiteral("projectTotals"));
-  totalsLabel_->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
-  totalsLabel_->setMinimumWidth(170);
-  QFont totalsFont = totalsLabel_->font();
-  totalsFont.setBold(true);
-  totalsLabel_->setFont(totalsFont);
-  bar->addWidget(totalsLabel_);
+  totalsLabel_->setObjectName(QStringLiteral("projectCost"));
+  for (QLabel* label : {durationLabel_, totalsLabel_}) {
+    label->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
+    QFont totalsFont = label->font();
+    totalsFont.setBold(true);
+    label->setFont(totalsFont);
+  }
+  bar->addSpacing(190);
+  header_->installEventFilter(this);
   layout->addWidget(header_);
 
   auto* line = new QFrame(container);
@@ -159,6 +166,7 @@ QWidget* WTItemsViewController::loadView() {
   outlineView_->setEmptyHint(WTEmptyHint::forAdding(tr("No tasks yet")));
   delegate_ = new WTItemCellDelegate(this, outlineView_);
   outlineView_->setItemDelegate(delegate_);
+  outlineView_->viewport()->installEventFilter(this);
   outlineView_->setModel(treeController_);
   layout->addWidget(outlineView_, 1);
 
@@ -192,6 +200,7 @@ void WTItemsViewController::refreshHeader() {
     titleLabel_->clear();
     clientLabel_->clear();
     totalsLabel_->clear();
+    durationLabel_->clear();
     rateField_->clear();
     WTRateField::setRefused(rateField_, false);
     return;
@@ -200,13 +209,37 @@ void WTItemsViewController::refreshHeader() {
   QString client = project_->client() ? project_->client()->name() : tr("No Client");
   if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
   clientLabel_->setText(client);
-  totalsLabel_->setText(DurationText::stringWithMinutes(project_->duration()) + QStringLiteral("    ") +
-                        MoneyFormat::format(project_->cost()));
+  durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
+  totalsLabel_->setText(MoneyFormat::format(project_->cost()));
   rateField_->setPlaceholderText(WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
     rateField_->setText(project_->storedRate() ? MoneyFormat::format(*project_->storedRate()) : QString());
   }
+}
+
+bool WTItemsViewController::eventFilter(QObject* watched, QEvent* event) {
+  const auto type = event->type();
+  if ((type == QEvent::Resize || type == QEvent::Show || type == QEvent::Move) &&
+      (watched == header_ || (outlineView_ && watched == outlineView_->viewport()))) {
+    alignTotals();
+  }
+  return WTViewController::eventFilter(watched, event);
+}
+
+void WTItemsViewController::alignTotals() {
+  if (!header_ || !outlineView_) return;
+  QWidget* viewport = outlineView_->viewport();
+  const WTTableCellView cell(QStringLiteral("WTTask"));
+  const QRectF row(0, 0, viewport->width(), 30.0);  // the columns do not depend on the height
+  const auto place = [&](QLabel* label, WTTableCellView::Part part) {
+    const QRect column = cell.partRect(part, row).toRect();
+    const QPoint left =
+        header_->mapFrom(outlineView_->window(), viewport->mapTo(outlineView_->window(), column.topLeft()));
+    label->setGeometry(left.x(), 0, column.width(), header_->height());
+  };
+  place(durationLabel_, WTTableCellView::Part::Duration);
+  place(totalsLabel_, WTTableCellView::Part::Cost);
 }
 
 QMenu* WTItemsViewController::taskMenu(WTTask* task) {

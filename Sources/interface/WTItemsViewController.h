@@ -118,6 +118,9 @@ class WTItemsViewController : public WTViewController {
   void saveExpandedItems();
   void restoreExpandedItems();
   void refreshHeader();
+  // Puts the header's totals over the duration and cost columns of the rows below.
+  void alignTotals();
+  bool eventFilter(QObject* watched, QEvent* event) override;
   WTTask* taskOfIndex(const QModelIndex& index) const;
 
   WTObjectContext* context_;
@@ -132,6 +135,7 @@ class WTItemsViewController : public WTViewController {
   RZBackgroundView* header_ = nullptr;
   QLabel* titleLabel_ = nullptr;
   QLabel* clientLabel_ = nullptr;
+  QLabel* durationLabel_ = nullptr;
   QLabel* totalsLabel_ = nullptr;
   QLineEdit* rateField_ = nullptr;
   // Records changed by undo or redo in the present turn.

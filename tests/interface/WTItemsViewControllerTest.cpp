@@ -8,8 +8,10 @@
 #include "WTNotesTextView.h"
 #include "WTOutlineView.h"
 
+#include <QApplication>
 #include <QCalendarWidget>
 #include <QHelpEvent>
+#include <QLabel>
 #include <QLineEdit>
 #include <QToolTip>
 
@@ -343,6 +345,35 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
   makeItem<WTNote>(design, "new", at(2024, 3, 14));
   endTurn();
   EXPECT_EQ(selected(), (QList<const WTObject*>{build}));
+}
+
+}  // namespace
+
+namespace {
+
+TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCostColumns) {
+  makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
+  endTurn();
+  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
+  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
+  ASSERT_NE(duration, nullptr);
+  ASSERT_NE(cost, nullptr);
+  EXPECT_EQ(duration->text(), "00:30");
+  for (const QSize size : {QSize(900, 600), QSize(700, 500), QSize(1200, 600)}) {
+    window->resize(size);
+    QApplication::processEvents();
+    const QRect row = outline()->visualRect(rowOf(design));
+    const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
+    WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
+    for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
+                                      std::pair{cost, WTTableCellView::Part::Cost}}) {
+      const QRect column = cell.partRect(part, line).toRect();
+      const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
+      const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
+      EXPECT_EQ(labelLeft.x(), columnLeft.x()) << size.width();
+      EXPECT_EQ(label->width(), column.width()) << size.width();
+    }
+  }
 }
 
 }  // namespace

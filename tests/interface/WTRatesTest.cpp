@@ -50,7 +50,7 @@ class WTRatesTest : public UiTest {
 
   WTItemsModel* model() { return controller->treeController(); }
   QString costShown(const QModelIndex& index) { return index.data(WTItemsModel::CostTextRole).toString(); }
-  QLabel* totals() { return controller->view()->findChild<QLabel*>("projectTotals"); }
+  QLabel* totals() { return controller->view()->findChild<QLabel*>("projectCost"); }
 
   // Runs `fill` on the rate sheet once it is open, from inside its own event loop.
   static void whenRateDialogOpens(std::function<void(WTRateDialog*)> fill) {
