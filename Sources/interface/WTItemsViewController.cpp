@@ -134,7 +134,10 @@ QWidget* WTItemsViewController::loadView() {
   rateField_ = new QLineEdit(header_);
   rateField_->setObjectName(QStringLiteral("rateField"));
   rateField_->setAlignment(Qt::AlignRight);
-  rateField_->setFixedWidth(96);
+  // Wide enough for what it inherits ("Inherited: 1,250.00"), not only for a typed rate.
+  rateField_->setMinimumWidth(
+      rateField_->fontMetrics().horizontalAdvance(tr("Inherited: %1").arg(QStringLiteral("00,000.00"))) + 16);
+  rateField_->setMaximumWidth(rateField_->minimumWidth());
   rateLabel->setBuddy(rateField_);
   connect(rateField_, &QLineEdit::editingFinished, this, &WTItemsViewController::projectRateAction);
   connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, false); });

@@ -77,6 +77,14 @@ TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) 
   acme->setRate(Decimal(95));
   endTurn();
   EXPECT_EQ(field->placeholderText(), "Inherited: 95.00");
+  acme->setRate(Decimal(1250));
+  endTurn();
+  // The whole placeholder is readable in the field.
+  const int room =
+      field->contentsRect().width() - field->textMargins().left() - field->textMargins().right() - 4;
+  EXPECT_LE(field->fontMetrics().horizontalAdvance(field->placeholderText()), room);
+  acme->setRate(Decimal(95));
+  endTurn();
 
   field->setText("120");
   controller->projectRateAction();
