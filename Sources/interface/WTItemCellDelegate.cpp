@@ -428,6 +428,18 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
     case Part::NotesButton:
       text = tr("Notes");
       break;
+    case Part::Duration: {
+      // Nothing on the row says these can be changed; the tip does.
+      const QString kind = index.data(WTItemsModel::KindRole).toString();
+      const bool stopped = !index.data(WTItemsModel::RunningRole).toBool();
+      if (stopped && (kind == QLatin1String("WTTime") || kind == QLatin1String("WTFlat")))
+        text = tr("Duration — double-click to change it (hours:minutes)");
+      break;
+    }
+    case Part::Cost:
+      if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTExpense"))
+        text = tr("Amount — double-click to change it");
+      break;
     default:
       break;
   }

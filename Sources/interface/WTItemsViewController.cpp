@@ -249,6 +249,7 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   auto* menu = new QMenu;
   menu->setObjectName(QStringLiteral("taskMenu"));
   QPointer<WTOutlineView> outline = outlineView_;
+  menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
   return menu;
 }
@@ -380,6 +381,22 @@ WTItem* WTItemsViewController::addItem(WTEntity kind, WTTask* task) {
 WTTime* WTItemsViewController::addTimeItem(WTTask* task) {
   auto* time = static_cast<WTTime*>(addItem(WTEntity::Time, task));
   if (time) time->setRunning(true);
+  return time;
+}
+
+WTTime* WTItemsViewController::addStoppedTimeItem(WTTask* task) {
+  if (!task) return nullptr;
+  auto* time = static_cast<WTTime*>(context_->insertNewObject(WTEntity::Time));
+  time->setTask(task);
+  // Time already spent: it ends now and its length is typed at once.
+  time->setEndDate(time->startDate());
+  selectItem(time);
+  if (outlineView_ && outlineView_->isEditing()) outlineView_->endEditing();
+  const QModelIndex index = treeController_->indexOfObject(time);
+  if (index.isValid()) {
+    delegate_->setEditField(WTItemCellDelegate::Field::Duration);
+    outlineView_->edit(index);
+  }
   return time;
 }
 

@@ -13,6 +13,7 @@
 #include <QHelpEvent>
 #include <QLabel>
 #include <QLineEdit>
+#include <QMenu>
 #include <QToolTip>
 
 namespace {
@@ -374,6 +375,56 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCost
       EXPECT_EQ(label->width(), column.width()) << size.width();
     }
   }
+}
+
+}  // namespace
+
+namespace {
+
+TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
+  std::unique_ptr<QMenu> menu(controller->taskMenu(build));
+  QAction* spent = nullptr;
+  for (QAction* action : menu->actions()) {
+    if (action->text().startsWith("New Time Entry")) spent = action;
+  }
+  ASSERT_NE(spent, nullptr);
+  spent->trigger();
+  const QList<WTItem*> items = build->items();
+  ASSERT_EQ(items.size(), 1);
+  ASSERT_EQ(items.first()->entity(), WTEntity::Time);
+  auto* time = static_cast<WTTime*>(items.first());
+  EXPECT_FALSE(time->running());
+  ASSERT_TRUE(isEditing());
+  auto* editor = outline()->viewport()->findChild<QLineEdit*>("durationEditor");
+  ASSERT_NE(editor, nullptr);
+  editor->setText("1:30");
+  outline()->endEditing();
+  endTurn();
+  EXPECT_EQ(time->duration(), 90);
+  EXPECT_FALSE(time->running());
+  EXPECT_TRUE(time->endDate().has_value());
+}
+
+TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
+  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
+  endTurn();
+  controller->expandContainerOfItem(time);
+  auto tipAt = [&](const WTObject* object, WTTableCellView::Part part) {
+    const QModelIndex index = rowOf(object);
+    const QRect visual = outline()->visualRect(index);
+    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
+    const QPoint point = controller->cellViewPrototypeForIndex(index).partRect(part, row).center().toPoint();
+    QToolTip::hideText();
+    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
+    QHelpEvent help(QEvent::ToolTip, point, outline()->viewport()->mapToGlobal(point));
+    QApplication::sendEvent(outline()->viewport(), &help);
+    return QToolTip::isVisible() ? QToolTip::text() : QString();
+  };
+  EXPECT_TRUE(tipAt(time, WTTableCellView::Part::Duration).contains("double-click"));
+  EXPECT_TRUE(tipAt(expense, WTTableCellView::Part::Cost).contains("double-click"));
+  EXPECT_EQ(tipAt(time, WTTableCellView::Part::Cost), QString());  // a time's cost follows from it
+  QToolTip::hideText();
 }
 
 }  // namespace
