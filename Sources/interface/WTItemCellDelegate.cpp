@@ -285,6 +285,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
     field = Field::Name;
   }
   if (field == Field::Amount && kind != QLatin1String("WTExpense")) field = Field::Name;
+  if (field == Field::Start && kind != QLatin1String("WTTime")) field = Field::Name;
   if (field == Field::Duration && index.data(WTItemsModel::RunningRole).toBool()) return nullptr;
   openField_ = field;
   if (field == Field::Notes) {
@@ -307,6 +308,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
     editor->setFont(font);
   } else {
     editor->setObjectName(field == Field::Duration ? QStringLiteral("durationEditor")
+                          : field == Field::Start  ? QStringLiteral("startEditor")
                                                    : QStringLiteral("amountEditor"));
     editor->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
   }
@@ -341,6 +343,9 @@ void WTItemCellDelegate::setEditorData(QWidget* editor, const QModelIndex& index
     case Field::Amount:
       line->setText(index.data(WTItemsModel::AmountEditRole).toString());
       break;
+    case Field::Start:
+      line->setText(index.data(WTItemsModel::StartTimeEditRole).toString());
+      break;
     default:
       line->setText(index.data(WTItemsModel::NameRole).toString());
       break;
@@ -361,6 +366,9 @@ void WTItemCellDelegate::setModelData(QWidget* editor, QAbstractItemModel* model
       break;
     case Field::Amount:
       model->setData(index, line->text(), WTItemsModel::AmountEditRole);
+      break;
+    case Field::Start:
+      model->setData(index, line->text(), WTItemsModel::StartTimeEditRole);
       break;
     default:
       model->setData(index, line->text(), WTItemsModel::NameRole);
@@ -383,6 +391,9 @@ void WTItemCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptio
       break;
     case Field::Amount:
       part = WTTableCellView::Part::Cost;
+      break;
+    case Field::Start:
+      part = WTTableCellView::Part::Label;
       break;
     default:
       break;
@@ -436,6 +447,10 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
         text = tr("Duration — double-click to change it (hours:minutes)");
       break;
     }
+    case Part::Label:
+      if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTTime"))
+        text = tr("Start — double-click to change it (hours:minutes)");
+      break;
     case Part::Cost:
       if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTExpense"))
         text = tr("Amount — double-click to change it");
@@ -480,6 +495,8 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
       setEditField(Field::Duration);
     } else if (part == Part::Cost && items->kindAt(index) == QLatin1String("WTExpense")) {
       setEditField(Field::Amount);
+    } else if (part == Part::Label && items->kindAt(index) == QLatin1String("WTTime")) {
+      setEditField(Field::Start);
     } else if (part == Part::Notes) {
       setEditField(Field::Notes);
     } else if (part == Part::Name && items->objectAt(index)) {

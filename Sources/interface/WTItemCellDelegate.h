@@ -16,7 +16,7 @@ class WTOutlineView;
 class WTItemCellDelegate : public QStyledItemDelegate {
   Q_OBJECT
  public:
-  enum class Field { Name, Duration, Amount, Notes };
+  enum class Field { Name, Duration, Amount, Notes, Start };
 
   WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view);
 

@@ -23,6 +23,7 @@
 #include <QIODevice>
 #include <QLocale>
 #include <QMimeData>
+#include <QRegularExpression>
 
 #include <algorithm>
 #include <cmath>
@@ -94,6 +95,22 @@ std::optional<Decimal> parseAmount(QString text) {
   text.remove(u' ');
   if (text.isEmpty()) return std::nullopt;
   return Decimal::fromString(text);
+}
+
+// "9:05", "09:05" or "9" on the day of `day`; none when the text is not a time of day.
+std::optional<Date> timeOnDay(Date day, const QString& text) {
+  static const QRegularExpression pattern(QStringLiteral("^\\s*(\\d{1,2})(?:[:.](\\d{2}))?\\s*$"));
+  const QRegularExpressionMatch match = pattern.match(text);
+  if (!match.hasMatch()) return std::nullopt;
+  const int hour = match.captured(1).toInt();
+  const int minute = match.captured(2).isEmpty() ? 0 : match.captured(2).toInt();
+  if (hour > 23 || minute > 59) return std::nullopt;
+  RZDate::DateComponents components;
+  RZDate::assignFlags(day, RZDate::DayUnits, components);
+  components.hour = hour;
+  components.minute = minute;
+  components.second = 0;
+  return RZDate::dateFromComponents(components);
 }
 
 // A day group's heading: weekday, day, month and year in the order and words of the user's locale
@@ -634,6 +651,10 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       return item->name();
     case NotesRole:
       return item->notes();
+    case StartTimeEditRole:
+      return entity == WTEntity::Time && item->startDate()
+                 ? QVariant(RZDate::stringWithPattern(*item->startDate(), QStringLiteral("HH:mm")))
+                 : QVariant();
     case LabelRole:
       switch (entity) {
         case WTEntity::Time:
@@ -701,6 +722,17 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
         return true;
       }
       return false;
+    }
+    case StartTimeEditRole: {
+      if (object->entity() != WTEntity::Time) return false;
+      auto* time = static_cast<WTTime*>(object);
+      const std::optional<Date> start = time->startDate();
+      const std::optional<Date> moved = start ? timeOnDay(*start, value.toString()) : std::nullopt;
+      // Only the beginning moves: the end stays, so a start after it is refused.
+      if (!moved || (!time->running() && time->endDate() && *moved > *time->endDate())) return false;
+      if (*moved == *start) return false;
+      time->setStartDate(moved);
+      return true;
     }
     case AmountEditRole: {
       if (object->entity() != WTEntity::Expense) return false;

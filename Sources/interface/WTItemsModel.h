@@ -44,8 +44,9 @@ class WTItemsModel : public QAbstractItemModel {
     ImageRole,         // tasks: "notepad_32" or "notepad_clock_32"
     TimerImageRole,    // tasks: "play_32" or "stop_32"; running time entries: "stop_32"
     RunningRole,
-    CompletedRole,  // to-dos, settable
-    DateRole,       // items: the start date as a QDateTime
+    CompletedRole,      // to-dos, settable
+    DateRole,           // items: the start date as a QDateTime
+    StartTimeEditRole,  // time entries: the start's hour and minute ("9:05"), settable on its day
   };
 
   static const QString kObjectUUIDsType;    // "WTObjectUUIDs"

@@ -428,3 +428,42 @@ TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
 }
 
 }  // namespace
+
+namespace {
+
+TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
+  endTurn();
+  controller->expandContainerOfItem(time);
+  const Date end = *time->endDate();
+  auto typeStart = [&](const char* text) {
+    const QModelIndex index = rowOf(time);
+    const QRect visual = outline()->visualRect(index);
+    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
+    const QRectF label =
+        controller->cellViewPrototypeForIndex(index).partRect(WTTableCellView::Part::Label, row);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
+    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
+    auto* editor = outline()->viewport()->findChild<QLineEdit*>("startEditor");
+    if (!editor) return QString("no editor");
+    const QString shown = editor->text();
+    editor->setText(text);
+    outline()->endEditing();
+    endTurn();
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);  // the closed editor goes
+    return shown;
+  };
+  EXPECT_EQ(typeStart("11:45"), "12:00");
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45));
+  EXPECT_EQ(time->endDate(), end);
+  EXPECT_EQ(time->duration(), 45);
+  for (const char* refused : {"12:40", "25:00", "noon", "9:7"}) {
+    EXPECT_EQ(typeStart(refused), "11:45") << refused;
+    EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45)) << refused;
+  }
+  EXPECT_EQ(typeStart("9"), "11:45");
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
+  EXPECT_EQ(time->duration(), 210);
+}
+
+}  // namespace
