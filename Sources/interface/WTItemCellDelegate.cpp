@@ -11,10 +11,12 @@
 
 #include <QApplication>
 #include <QHelpEvent>
+#include <QKeyEvent>
 #include <QLineEdit>
 #include <QMouseEvent>
 #include <QPainter>
 #include <QPainterPath>
+#include <QTimer>
 #include <QToolTip>
 
 namespace {
@@ -507,4 +509,39 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
     }
   }
   return false;
+}
+
+bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
+  auto* line = qobject_cast<QLineEdit*>(object);
+  if (!line || event->type() != QEvent::KeyPress) return QStyledItemDelegate::eventFilter(object, event);
+  const auto* key = static_cast<QKeyEvent*>(event);
+  const bool forward = key->key() == Qt::Key_Tab && !(key->modifiers() & Qt::ShiftModifier);
+  const bool backward = key->key() == Qt::Key_Backtab || (key->key() == Qt::Key_Tab && !forward);
+  if (!forward && !backward) return QStyledItemDelegate::eventFilter(object, event);
+  const QPersistentModelIndex index = view_->currentIndex();
+  const auto* model = qobject_cast<const WTItemsModel*>(index.model());
+  if (!model || !model->isItemIndex(index)) return QStyledItemDelegate::eventFilter(object, event);
+  // The fields of the row in the order they stand, left to right.
+  const QString kind = model->kindAt(index);
+  QList<Field> fields;
+  if (kind == QLatin1String("WTTime"))
+    fields = {Field::Start, Field::Name};
+  else
+    fields = {Field::Name};
+  const bool running = index.data(WTItemsModel::RunningRole).toBool();
+  if ((kind == QLatin1String("WTTime") && !running) || kind == QLatin1String("WTFlat"))
+    fields.append(Field::Duration);
+  if (kind == QLatin1String("WTExpense")) fields.append(Field::Amount);
+  const int at = fields.indexOf(static_cast<Field>(line->property("field").toInt()));
+  const int next = at + (forward ? 1 : -1);
+  if (at < 0 || next < 0 || next >= fields.size()) return QStyledItemDelegate::eventFilter(object, event);
+  emit commitData(line);
+  emit closeEditor(line, QAbstractItemDelegate::NoHint);
+  const Field field = fields[next];
+  QTimer::singleShot(0, view_, [this, index, field] {
+    if (!index.isValid()) return;
+    setEditField(field);
+    view_->edit(index);
+  });
+  return true;
 }

@@ -47,6 +47,9 @@ class WTItemCellDelegate : public QStyledItemDelegate {
   void rowHeightChanged(const QModelIndex& index);
 
  protected:
+  // Tab and Shift+Tab in an item's field move to its next or previous field (start, name, duration or
+  // amount) before leaving the row.
+  bool eventFilter(QObject* object, QEvent* event) override;
   bool editorEvent(QEvent* event, QAbstractItemModel* model, const QStyleOptionViewItem& option,
                    const QModelIndex& index) override;
   // Tool tips name the button under the mouse; the rest of a row has none.

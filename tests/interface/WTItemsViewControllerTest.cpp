@@ -467,3 +467,45 @@ TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) 
 }
 
 }  // namespace
+
+namespace {
+
+TEST_F(WTItemsViewControllerTest, TabWalksThroughAnEntrysFieldsInTheirOrder) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));
+  endTurn();
+  controller->expandContainerOfItem(time);
+  const QModelIndex index = rowOf(time);
+  outline()->setCurrentIndex(index);
+  controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Start);
+  outline()->edit(index);
+  auto openEditor = [&] {
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    QApplication::processEvents();
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
+    return editors.size() == 1 ? editors.first() : nullptr;
+  };
+  QLineEdit* editor = openEditor();
+  ASSERT_NE(editor, nullptr);
+  EXPECT_EQ(editor->objectName(), "startEditor");
+  editor->setText("11:00");
+  QTest::keyClick(editor, Qt::Key_Tab);
+  editor = openEditor();
+  ASSERT_NE(editor, nullptr);
+  EXPECT_EQ(editor->objectName(), "nameEditor");
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));  // committed on the way
+  editor->setText("Drawings");
+  QTest::keyClick(editor, Qt::Key_Tab);
+  editor = openEditor();
+  ASSERT_NE(editor, nullptr);
+  EXPECT_EQ(editor->objectName(), "durationEditor");
+  EXPECT_EQ(time->name(), "Drawings");
+  QTest::keyClick(editor, Qt::Key_Backtab, Qt::ShiftModifier);
+  editor = openEditor();
+  ASSERT_NE(editor, nullptr);
+  EXPECT_EQ(editor->objectName(), "nameEditor");
+  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  outline()->endEditing();
+}
+
+}  // namespace
