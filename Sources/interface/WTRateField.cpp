@@ -1,7 +1,6 @@
 #include "WTRateField.h"
 
 #include "MoneyFormat.h"
-#include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -19,33 +18,10 @@ namespace {
 
 const char* const kRefusedProperty = "rateRefused";
 
-std::optional<Decimal> defaultRate(const WTObject* object) {
-  const UserDefaults* defaults = object->context() ? object->context()->userDefaults() : nullptr;
-  return defaults ? defaults->decimalForKey(QStringLiteral("WTDefaultRate")) : std::nullopt;
-}
-
 }  // namespace
 
-Decimal rateWhenEmpty(const WTObject* object) {
-  // The same chain the records follow, one level up from `object`.
-  switch (object->entity()) {
-    case WTEntity::Client:
-      return defaultRate(object).value_or(Decimal(100));
-    case WTEntity::Project:
-      if (const WTClient* client = static_cast<const WTProject*>(object)->client())
-        return client->inheritedRate();
-      return defaultRate(object).value_or(Decimal(50));
-    case WTEntity::Task:
-      if (const WTProject* project = static_cast<const WTTask*>(object)->project())
-        return project->inheritedRate();
-      return defaultRate(object).value_or(Decimal(75));
-    default:
-      return object->inheritedRate();
-  }
-}
-
 QString placeholder(const WTObject* object) {
-  return QObject::tr("Inherited: %1").arg(MoneyFormat::format(rateWhenEmpty(object)));
+  return QObject::tr("Inherited: %1").arg(MoneyFormat::format(object->rateFromAbove()));
 }
 
 Parsed parse(const QString& typed) {

@@ -15,8 +15,6 @@ class WTObject;
 // (and says from what), money in the user's locale is taken, anything else is refused where it was typed.
 namespace WTRateField {
 
-// The rate `object` would take with its own field left empty.
-Decimal rateWhenEmpty(const WTObject* object);
 // "Inherited: 80.00" for the field of `object`.
 QString placeholder(const WTObject* object);
 

@@ -13,8 +13,7 @@ void WTClient::setTotalsUID(const QString& uid) {
   setStoredValue(QStringLiteral("totalsUID"), uid);
 }
 
-Decimal WTClient::inheritedRate() const {
-  if (storedRate()) return *storedRate();
+Decimal WTClient::rateFromAbove() const {
   return userDefaultRate().value_or(Decimal(100));
 }
 

@@ -20,7 +20,7 @@ class WTClient final : public WTObject {
   const QList<WTProject*>& projects() const { return projects_; }
 
   // Own rate, else "WTDefaultRate", else 100.
-  Decimal inheritedRate() const override;
+  Decimal rateFromAbove() const override;
   void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 

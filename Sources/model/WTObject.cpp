@@ -40,7 +40,7 @@ void WTObject::setRate(const std::optional<Decimal>& rate) {
   setStoredValue(QStringLiteral("rate"), rate ? QVariant::fromValue(*rate) : QVariant());
 }
 
-Decimal WTObject::inheritedRate() const {
+Decimal WTObject::rateFromAbove() const {
   return Decimal(100);
 }
 

@@ -67,8 +67,11 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   std::optional<Decimal> storedRate() const { return rate_; }
   // Stores the record's own rate; clients, projects and tasks also announce the cost change upward.
   virtual void setRate(const std::optional<Decimal>& rate);
-  // The rate in force for this record after inheritance; the base answers "100".
-  virtual Decimal inheritedRate() const;
+  // The rate in force for this record after inheritance: its own rate, else rateFromAbove().
+  Decimal inheritedRate() const { return rate_ ? *rate_ : rateFromAbove(); }
+  // What this record inherits while it has no rate of its own (its owner's rate, or the default rate
+  // of its kind); the base answers "100".
+  virtual Decimal rateFromAbove() const;
 
   // Key-value access by the stored and derived key names the lists, reports and sync use.
   QVariant valueForKey(const QString& key) const override;

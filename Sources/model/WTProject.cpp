@@ -26,8 +26,7 @@ void WTProject::moveTask(WTTask* task, int index) {
   task->changeOwner(this, std::clamp(index, 0, static_cast<int>(tasks_.size()) - 1));
 }
 
-Decimal WTProject::inheritedRate() const {
-  if (storedRate()) return *storedRate();
+Decimal WTProject::rateFromAbove() const {
   if (client_) return client_->inheritedRate();
   return userDefaultRate().value_or(Decimal(50));
 }

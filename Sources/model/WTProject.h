@@ -23,7 +23,7 @@ class WTProject final : public WTObject {
   void moveTask(WTTask* task, int index);
 
   // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else 50.
-  Decimal inheritedRate() const override;
+  Decimal rateFromAbove() const override;
   void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 

@@ -42,8 +42,7 @@ void WTTask::relinkOwner(WTObject* owner, int index) {
   tasks.insert(index, this);
 }
 
-Decimal WTTask::inheritedRate() const {
-  if (storedRate()) return *storedRate();
+Decimal WTTask::rateFromAbove() const {
   if (project_) return project_->inheritedRate();
   return userDefaultRate().value_or(Decimal(75));
 }

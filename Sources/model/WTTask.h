@@ -32,7 +32,7 @@ class WTTask final : public WTObject {
   const QList<WTItem*>& items() const { return items_; }
 
   // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else 75.
-  Decimal inheritedRate() const override;
+  Decimal rateFromAbove() const override;
   void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
