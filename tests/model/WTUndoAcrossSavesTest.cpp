@@ -162,6 +162,14 @@ INSTANTIATE_TEST_SUITE_P(EveryEntity, WTUndoAcrossSavesTest,
                            return WTEntities::name(info.param).toStdString();
                          });
 
+void expectJournaledOnceEach(const RecordingJournal& journal, const QStringList& uuids, const QString& kind) {
+  for (const QString& uuid : uuids) {
+    const auto calls = journal.callsFor(uuid);
+    ASSERT_EQ(calls.size(), 1u) << uuid.toStdString();
+    EXPECT_EQ(calls[0].kind, kind);
+  }
+}
+
 // Undoing a whole project with its tasks and items, after the save that wrote them, removes all of them
 // from the file and tells the journal about each; redo brings all back.
 TEST_F(ModelTest, UndoingASavedProjectWithItsContentsReachesTheStoreForEachRecord) {
@@ -176,20 +184,12 @@ TEST_F(ModelTest, UndoingASavedProjectWithItsContentsReachesTheStoreForEachRecor
   context->undoManager().undo();
   context->processPendingChanges();
   ASSERT_TRUE(context->save().ok());
-  for (const QString& uuid : uuids) {
-    const auto calls = journal.callsFor(uuid);
-    ASSERT_EQ(calls.size(), 1u) << uuid.toStdString();
-    EXPECT_EQ(calls[0].kind, "delete");
-  }
+  expectJournaledOnceEach(journal, uuids, "delete");
   journal.calls.clear();
   context->undoManager().redo();
   context->processPendingChanges();
   ASSERT_TRUE(context->save().ok());
-  for (const QString& uuid : uuids) {
-    const auto calls = journal.callsFor(uuid);
-    ASSERT_EQ(calls.size(), 1u) << uuid.toStdString();
-    EXPECT_EQ(calls[0].kind, "insert");
-  }
+  expectJournaledOnceEach(journal, uuids, "insert");
   openContext();
   for (const QString& uuid : uuids) EXPECT_NE(context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
 }

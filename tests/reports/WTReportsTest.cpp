@@ -1,6 +1,7 @@
 #include "../model/ModelFixture.h"
 
 #include "KeyPath.h"
+#include "LogCapture.h"
 #include "WTCSVExport.h"
 #include "WTItemContainer.h"
 #include "WTRangePredicate.h"
@@ -13,24 +14,6 @@
 #include <unicode/locid.h>
 
 namespace {
-
-// Messages logged while alive.
-class LogCapture {
- public:
-  LogCapture() {
-    lines().clear();
-    previous_ = qInstallMessageHandler(
-        [](QtMsgType, const QMessageLogContext&, const QString& message) { lines().append(message); });
-  }
-  ~LogCapture() { qInstallMessageHandler(previous_); }
-  static QStringList& lines() {
-    static QStringList captured;
-    return captured;
-  }
-
- private:
-  QtMessageHandler previous_;
-};
 
 QString readAll(const QString& path) {
   QFile file(path);
@@ -222,7 +205,7 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
   ASSERT_TRUE(written.ok()) << written.error().message.toStdString();
   EXPECT_EQ(written.value(), 4);
-  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("Exporting 4 items to: %1").arg(path)));
+  EXPECT_TRUE(log.lines.contains(QStringLiteral("Exporting 4 items to: %1").arg(path)));
   EXPECT_EQ(readAll(path),
             QStringLiteral(
                 "\"Alpha\",\"Zeta\",\"\",\"Early\",\"3/1/24\",\"3/1/24\",\"45\"\n"
@@ -238,7 +221,7 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   EXPECT_EQ(readAll(path).count(QLatin1Char('\n')), 2);
   ASSERT_TRUE(WTCSVExport::exportTimes(*context, day.value(), alpha, path).ok());
   EXPECT_EQ(readAll(path), QString());
-  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
+  EXPECT_TRUE(log.lines.contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
 }
 
 TEST_F(ReportTest, ExportToAMissingFolderFailsNamingThePath) {
@@ -322,7 +305,6 @@ TEST_F(ReportTest, TemplateErrorsComeBackWithTheirLineAndAreLogged) {
   ASSERT_FALSE(report.errors.empty());
   EXPECT_EQ(report.errors.front().line, 3);
   EXPECT_FALSE(report.errors.front().message.isEmpty());
-  EXPECT_TRUE(
-      LogCapture::lines().contains(QStringLiteral("Template error: %1").arg(report.errors.front().message)));
+  EXPECT_TRUE(log.lines.contains(QStringLiteral("Template error: %1").arg(report.errors.front().message)));
   EXPECT_TRUE(report.html.startsWith(QStringLiteral("<p>one</p>")));
 }

@@ -3,6 +3,7 @@
 // Real parts for the sync tests: an HTTP server on 127.0.0.1 inside the test (answers are scripted per
 // test), a client made of a real store file, context and sync manager in a temp folder, and the real
 // tessal-sync-server process.
+#include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
 #include "RZSyncManager.h"
@@ -45,37 +46,7 @@ inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
   return true;
 }
 
-// Collects the log lines written while it lives (and still lets them through to the previous handler).
-class LogCapture {
- public:
-  LogCapture() {
-    current() = this;
-    previous_ =
-        qInstallMessageHandler([](QtMsgType type, const QMessageLogContext& context, const QString& text) {
-          current()->lines.append(text);
-          if (current()->previous_ && type != QtDebugMsg) current()->previous_(type, context, text);
-        });
-  }
-  ~LogCapture() {
-    qInstallMessageHandler(previous_);
-    current() = nullptr;
-  }
-  bool contains(const QString& text) const {
-    return std::any_of(lines.begin(), lines.end(), [&](const QString& line) { return line.contains(text); });
-  }
-  qsizetype count(const QString& text) const {
-    return std::count_if(lines.begin(), lines.end(),
-                         [&](const QString& line) { return line.contains(text); });
-  }
-  QStringList lines;
-
- private:
-  static LogCapture*& current() {
-    static LogCapture* capture = nullptr;
-    return capture;
-  }
-  QtMessageHandler previous_ = nullptr;
-};
+using ::LogCapture;
 
 // One HTTP request as the test server received it.
 struct HttpRequest {

@@ -1,3 +1,4 @@
+#include "LogCapture.h"
 #include "TrackingFixture.h"
 
 #include <QSignalSpy>
@@ -292,24 +293,6 @@ TEST_F(TrackingTest, AnOpenIdleAlertIsNeverStackedAndTheTickerGoesOn) {
   EXPECT_EQ(presenter.shown.size(), 2u);
 }
 
-// Captures the log lines written while it lives.
-class LogCapture {
- public:
-  LogCapture() {
-    lines().clear();
-    previous_ = qInstallMessageHandler(
-        [](QtMsgType, const QMessageLogContext&, const QString& text) { lines().append(text); });
-  }
-  ~LogCapture() { qInstallMessageHandler(previous_); }
-  static QStringList& lines() {
-    static QStringList captured;
-    return captured;
-  }
-
- private:
-  QtMessageHandler previous_;
-};
-
 TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
   turnIdleHandlingOn(5);
   WTTask* task = makeTask();
@@ -321,7 +304,7 @@ TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
   updater->receiveSleepNote(QStringLiteral("PrepareForSleep(true)"));
   EXPECT_FALSE(updater->isTicking());
   EXPECT_EQ(ticks, before);
-  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("receiveSleepNote: PrepareForSleep(true)")));
+  EXPECT_TRUE(log.lines.contains(QStringLiteral("receiveSleepNote: PrepareForSleep(true)")));
 
   // Eight hours later the lid opens; the desktop's idle counter started again at the wake.
   const Date sleptAt = clockNow;
@@ -329,7 +312,7 @@ TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
   idle.seconds = 2;
   presenter.answers = {Answer::Alternate};
   updater->receiveWakeNote(QStringLiteral("PrepareForSleep(false)"));
-  EXPECT_TRUE(LogCapture::lines().contains(QStringLiteral("receiveSleepNote: PrepareForSleep(false)")));
+  EXPECT_TRUE(log.lines.contains(QStringLiteral("receiveSleepNote: PrepareForSleep(false)")));
   EXPECT_EQ(ticks, before + 1);
   EXPECT_TRUE(updater->isTicking());
   ASSERT_EQ(presenter.shown.size(), 1u);

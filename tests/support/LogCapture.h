@@ -1,0 +1,40 @@
+#pragma once
+
+// Collects the log lines written while it lives (and still lets them through to the previous handler,
+// debug lines excepted).
+#include <QString>
+#include <QStringList>
+#include <QtGlobal>
+
+#include <algorithm>
+
+class LogCapture {
+ public:
+  LogCapture() {
+    current() = this;
+    previous_ =
+        qInstallMessageHandler([](QtMsgType type, const QMessageLogContext& context, const QString& text) {
+          current()->lines.append(text);
+          if (current()->previous_ && type != QtDebugMsg) current()->previous_(type, context, text);
+        });
+  }
+  ~LogCapture() {
+    qInstallMessageHandler(previous_);
+    current() = nullptr;
+  }
+  bool contains(const QString& text) const {
+    return std::any_of(lines.begin(), lines.end(), [&](const QString& line) { return line.contains(text); });
+  }
+  qsizetype count(const QString& text) const {
+    return std::count_if(lines.begin(), lines.end(),
+                         [&](const QString& line) { return line.contains(text); });
+  }
+  QStringList lines;
+
+ private:
+  static LogCapture*& current() {
+    static LogCapture* capture = nullptr;
+    return capture;
+  }
+  QtMessageHandler previous_ = nullptr;
+};
