@@ -5,6 +5,7 @@
 #include "UserDefaults.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
+#include "WTItemsViewController.h"
 #include "WTNote.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -32,6 +33,23 @@ class TestHostWindow : public QMainWindow, public WTNavigationHost {
   WTNavigationController* currentNavigationController() const override { return stack; }
   void showProjects() override {}
   void showClients() override { ++clientsShown; }
+};
+
+// A project's items outline shown in a host window, as the main window shows it, with its first
+// screen displayed. The window gives the view back before either goes.
+struct ShownOutline {
+  ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
+      : controller(context) {
+    controller.setProject(project);
+    window.setCentralWidget(controller.view());
+    window.resize(size);
+    window.show();
+    EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
+    controller.willDisplayView();
+  }
+  ~ShownOutline() { window.takeCentralWidget(); }
+  WTItemsViewController controller;
+  TestHostWindow window;
 };
 
 // A context without a store (records live in memory), its own settings file, a fixed zone and a

@@ -46,14 +46,8 @@ TEST_F(WTEmptyHintTest, AnEmptyListSaysHowToAddTheFirstRowAndForgetsItOnceThereI
 
 TEST_F(WTEmptyHintTest, AProjectWithoutTasksSaysHowToAddOne) {
   WTProject* project = makeProject("Website");
-  WTItemsViewController items(context.get());
-  items.setProject(project);
-  TestHostWindow window;
-  window.setCentralWidget(items.view());
-  window.resize(800, 400);
-  window.show();
-  ASSERT_TRUE(QTest::qWaitForWindowExposed(&window));
-  items.willDisplayView();
+  ShownOutline shown(context.get(), project, QSize(800, 400));
+  WTItemsViewController& items = shown.controller;
   endTurn();
   WTOutlineView* outline = items.outlineView();
   EXPECT_EQ(outline->emptyHint(), "No tasks yet — press Ctrl+N");
@@ -62,7 +56,6 @@ TEST_F(WTEmptyHintTest, AProjectWithoutTasksSaysHowToAddOne) {
   endTurn();
   items.treeController()->processChanges();
   EXPECT_EQ(inkInMiddle(outline), 0);
-  window.takeCentralWidget();
 }
 
 }  // namespace

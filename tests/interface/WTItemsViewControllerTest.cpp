@@ -25,22 +25,15 @@ class WTItemsViewControllerTest : public UiTest {
     project = makeProject("Website");
     design = makeTask(project, "Design");
     build = makeTask(project, "Build");
-    controller = std::make_unique<WTItemsViewController>(context.get());
-    controller->setProject(project);
-    window = std::make_unique<TestHostWindow>();
-    window->setCentralWidget(controller->view());
-    window->resize(900, 600);
-    window->show();
-    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
-    controller->willDisplayView();
+    shown = std::make_unique<ShownOutline>(context.get(), project);
+    controller = &shown->controller;
+    window = &shown->window;
     tester = std::make_unique<QAbstractItemModelTester>(
         controller->treeController(), QAbstractItemModelTester::FailureReportingMode::Fatal);
   }
   void TearDown() override {
     tester.reset();
-    window->takeCentralWidget();
-    controller.reset();
-    window.reset();
+    shown.reset();
     UiTest::TearDown();
   }
 
@@ -52,8 +45,9 @@ class WTItemsViewControllerTest : public UiTest {
   WTProject* project = nullptr;
   WTTask* design = nullptr;
   WTTask* build = nullptr;
-  std::unique_ptr<WTItemsViewController> controller;
-  std::unique_ptr<TestHostWindow> window;
+  std::unique_ptr<ShownOutline> shown;
+  WTItemsViewController* controller = nullptr;
+  TestHostWindow* window = nullptr;
   std::unique_ptr<QAbstractItemModelTester> tester;
 };
 

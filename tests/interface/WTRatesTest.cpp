@@ -31,20 +31,12 @@ class WTRatesTest : public UiTest {
     design = makeTask(project, "Design");
     monday = makeItem<WTTime>(design, "Monday", at(2024, 3, 11, 9));
     tuesday = makeItem<WTTime>(design, "Tuesday", at(2024, 3, 12, 9));
-    controller = std::make_unique<WTItemsViewController>(context.get());
-    controller->setProject(project);
-    window = std::make_unique<TestHostWindow>();
-    window->setCentralWidget(controller->view());
-    window->resize(900, 600);
-    window->show();
-    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
-    controller->willDisplayView();
+    shown = std::make_unique<ShownOutline>(context.get(), project);
+    controller = &shown->controller;
     endTurn();
   }
   void TearDown() override {
-    window->takeCentralWidget();
-    controller.reset();
-    window.reset();
+    shown.reset();
     UiTest::TearDown();
   }
 
@@ -67,8 +59,8 @@ class WTRatesTest : public UiTest {
   WTTask* design = nullptr;
   WTTime* monday = nullptr;
   WTTime* tuesday = nullptr;
-  std::unique_ptr<WTItemsViewController> controller;
-  std::unique_ptr<TestHostWindow> window;
+  std::unique_ptr<ShownOutline> shown;
+  WTItemsViewController* controller = nullptr;
 };
 
 TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) {

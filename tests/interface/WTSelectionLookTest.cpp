@@ -44,14 +44,8 @@ TEST_F(WTSelectionLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour
   WTProject* project = makeProject("Website");
   WTTask* task = makeTask(project, "Design");
   WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
-  WTItemsViewController items(context.get());
-  items.setProject(project);
-  TestHostWindow window;
-  window.setCentralWidget(items.view());
-  window.resize(800, 400);
-  window.show();
-  ASSERT_TRUE(QTest::qWaitForWindowExposed(&window));
-  items.willDisplayView();
+  ShownOutline shown(context.get(), project, QSize(800, 400));
+  WTItemsViewController& items = shown.controller;
   endTurn();
   WTOutlineView* outline = items.outlineView();
   useDistinctHighlight(outline);
@@ -66,7 +60,6 @@ TEST_F(WTSelectionLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour
     EXPECT_GT(counts.highlight, row.width() * row.height() / 2) << object->name().toStdString();
     EXPECT_GT(counts.text, 20) << object->name().toStdString();
   }
-  window.takeCentralWidget();
 }
 
 TEST_F(WTSelectionLookTest, SelectedListRowsTakeThePalettesHighlightAndItsTextColour) {
