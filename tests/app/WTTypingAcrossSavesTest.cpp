@@ -45,6 +45,13 @@ class WTTypingAcrossSavesTest : public AppTest {
     window->clientsViewController()->addObject();
     return qobject_cast<QLineEdit*>(QApplication::focusWidget());
   }
+  // The project's outline, opened the way its row's button opens it.
+  WTItemsViewController* openOutline(WTProject* project) {
+    window->projectsViewController()->openProject(project);
+    EXPECT_TRUE(QTest::qWaitFor(
+        [&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+    return window->projectsViewController()->itemsViewController();
+  }
   // Another record changes, as a merge or another window would change it, so that the save has work.
   void changeSomethingElse(const QString& name) {
     WTProject::insertNewObject(delegate->managedObjectContext())->setName(name);
@@ -132,10 +139,7 @@ TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave)
   open();
   WTProject* project = window->fetchProjects().value(0);
   ASSERT_TRUE(project);
-  window->projectsViewController()->openProject(project);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
-  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  WTItemsViewController* items = openOutline(project);
   ASSERT_TRUE(items);
   QLineEdit* rate = items->rateField();
   rate->setFocus();
@@ -156,10 +160,7 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
   open();
   WTProject* project = window->fetchProjects().value(0);
   ASSERT_TRUE(project);
-  window->projectsViewController()->openProject(project);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
-  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  WTItemsViewController* items = openOutline(project);
   items->addObject();  // a new task, its name editor open
   QPointer<QLineEdit> editor = qobject_cast<QLineEdit*>(QApplication::focusWidget());
   ASSERT_TRUE(editor);
