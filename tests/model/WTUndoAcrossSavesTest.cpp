@@ -52,6 +52,17 @@ class WTUndoAcrossSavesTest : public ModelTest, public ::testing::WithParamInter
     auto* owner = static_cast<WTObject*>(KeyPath::objectFromVariant(record->valueForKey(ownerKey())));
     return owner ? owner->uuid() : QString();
   }
+  // What the user's Ctrl+Z (Ctrl+Shift+Z) and the autosave after it do.
+  void undoAndSave() {
+    context->undoManager().undo();
+    endTurn();
+    save();
+  }
+  void redoAndSave() {
+    context->undoManager().redo();
+    endTurn();
+    save();
+  }
   void save() {
     const Result<void> saved = context->save();
     ASSERT_TRUE(saved.ok()) << saved.error().message.toStdString();
@@ -96,14 +107,10 @@ TEST_P(WTUndoAcrossSavesTest, ARedoneInsertionComesBackUnderItsIdentity) {
   save();
   const WTStoreRecord saved = rowsOf(storePath()).value(uuid);
   ASSERT_EQ(saved.uuid, uuid);
-  context->undoManager().undo();
-  endTurn();
-  save();
+  undoAndSave();
   journal.calls.clear();
 
-  context->undoManager().redo();
-  endTurn();
-  save();
+  redoAndSave();
   EXPECT_EQ(journaled(uuid), std::vector<QString>{"insert"});
   EXPECT_EQ(rowsOf(storePath()).value(uuid), saved);
   ASSERT_TRUE(stored(uuid));
@@ -125,9 +132,7 @@ TEST_P(WTUndoAcrossSavesTest, DeleteSaveUndoSaveRestoresTheRecordInStoreAndJourn
   EXPECT_EQ(journaled(uuid), std::vector<QString>{"delete"});
   EXPECT_FALSE(rowsOf(storePath()).contains(uuid));
 
-  context->undoManager().undo();
-  endTurn();
-  save();
+  undoAndSave();
   EXPECT_EQ(journaled(uuid), std::vector<QString>{"insert"});
   EXPECT_EQ(rowsOf(storePath()).value(uuid), saved);
   ASSERT_TRUE(stored(uuid));
@@ -144,9 +149,7 @@ TEST_P(WTUndoAcrossSavesTest, AnUndoneSavedRenameWritesTheOldName) {
   save();
   journal.calls.clear();
 
-  context->undoManager().undo();
-  endTurn();
-  save();
+  undoAndSave();
   const auto calls = journal.callsFor(uuid);
   ASSERT_EQ(calls.size(), 1u);
   EXPECT_EQ(calls[0].kind, "update");
