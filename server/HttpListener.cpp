@@ -227,10 +227,7 @@ void HttpListener::stop() {
   work_.notify_all();
   for (std::thread& worker : workers_) worker.join();
   workers_.clear();
-  for (auto& [fd, connection] : connections_) {
-    ::close(fd);
-    delete connection;
-  }
+  for (const auto& entry : connections_) ::close(entry.first);
   connections_.clear();
   ::close(listenFd_);
   ::close(epollFd_);
@@ -318,11 +315,11 @@ void HttpListener::accept() {
     } else {
       inet_ntop(AF_INET, &reinterpret_cast<sockaddr_in*>(&address)->sin_addr, text, sizeof text);
     }
-    auto* connection = new Connection;
+    auto connection = std::make_unique<Connection>();
     connection->fd = fd;
     connection->peer = text;
     connection->reset(Clock::now() + limits_.idleTimeout);
-    connections_[fd] = connection;
+    connections_[fd] = std::move(connection);
     epoll_event event{};
     event.events = EPOLLIN | EPOLLRDHUP;
     event.data.fd = fd;
@@ -335,7 +332,6 @@ void HttpListener::close(int fd) {
   if (found == connections_.end()) return;
   epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
   ::close(fd);
-  delete found->second;
   connections_.erase(found);
 }
 

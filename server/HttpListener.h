@@ -9,6 +9,7 @@
 #include <deque>
 #include <functional>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
@@ -102,7 +103,7 @@ class HttpListener {
   std::vector<std::thread> workers_;
 
   // Read thread only.
-  std::map<int, Connection*> connections_;
+  std::map<int, std::unique_ptr<Connection>> connections_;
   std::optional<std::chrono::steady_clock::time_point> acceptPausedUntil_;
 
   std::mutex mutex_;
