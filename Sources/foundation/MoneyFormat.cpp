@@ -1,5 +1,7 @@
 #include "MoneyFormat.h"
 
+#include <QLocale>
+
 #include <unicode/decimfmt.h>
 #include <unicode/locid.h>
 
@@ -23,6 +25,16 @@ QString format(const Decimal& amount) {
   formatter->format(icu::StringPiece(digits.constData(), int32_t(digits.size())), text, nullptr, status);
   if (U_FAILURE(status)) return QString::fromLatin1(digits);
   return QString(reinterpret_cast<const QChar*>(text.getBuffer()), text.length());
+}
+
+std::optional<Decimal> parse(const QString& typed) {
+  const QLocale locale;
+  QString text = typed.trimmed();
+  text.remove(locale.groupSeparator());
+  text.replace(locale.decimalPoint(), QStringLiteral("."));
+  text.remove(u' ');
+  if (text.isEmpty()) return std::nullopt;
+  return Decimal::fromString(text);
 }
 
 }  // namespace MoneyFormat

@@ -21,7 +21,6 @@
 
 #include <QDataStream>
 #include <QIODevice>
-#include <QLocale>
 #include <QMimeData>
 #include <QRegularExpression>
 
@@ -84,17 +83,6 @@ bool isShownKeyOfTask(const QString& key) {
 
 QVariant pointerVariant(const WTObject* object) {
   return object ? QVariant::fromValue(reinterpret_cast<quintptr>(object)) : QVariant();
-}
-
-// Money typed by a person: the locale's grouping and decimal signs allowed.
-std::optional<Decimal> parseAmount(QString text) {
-  const QLocale locale;
-  text = text.trimmed();
-  text.remove(locale.groupSeparator());
-  text.replace(locale.decimalPoint(), QStringLiteral("."));
-  text.remove(u' ');
-  if (text.isEmpty()) return std::nullopt;
-  return Decimal::fromString(text);
 }
 
 // "9:05", "09:05" or "9" on the day of `day`; none when the text is not a time of day.
@@ -736,7 +724,7 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     }
     case AmountEditRole: {
       if (object->entity() != WTEntity::Expense) return false;
-      const std::optional<Decimal> amount = parseAmount(value.toString());
+      const std::optional<Decimal> amount = MoneyFormat::parse(value.toString());
       if (!amount && !value.toString().trimmed().isEmpty()) return false;
       static_cast<WTExpense*>(object)->setExpense(amount);
       return true;

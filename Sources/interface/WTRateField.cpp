@@ -9,7 +9,6 @@
 #include <QDialogButtonBox>
 #include <QLabel>
 #include <QLineEdit>
-#include <QLocale>
 #include <QVBoxLayout>
 
 namespace WTRateField {
@@ -25,13 +24,8 @@ QString placeholder(const WTObject* object) {
 }
 
 Parsed parse(const QString& typed) {
-  const QLocale locale;
-  QString text = typed.trimmed();
-  if (text.isEmpty()) return {true, std::nullopt};
-  text.remove(locale.groupSeparator());
-  text.replace(locale.decimalPoint(), QStringLiteral("."));
-  text.remove(u' ');
-  const std::optional<Decimal> rate = Decimal::fromString(text);
+  if (typed.trimmed().isEmpty()) return {true, std::nullopt};
+  const std::optional<Decimal> rate = MoneyFormat::parse(typed);
   if (!rate || *rate < Decimal(0)) return {false, std::nullopt};
   return {true, rate};
 }
