@@ -12,7 +12,7 @@ packages=(
   libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk
   sqlite3 python3 python3-jinja2
   xvfb xauth xdotool imagemagick dbus-x11 fonts-dejavu-core
-  dpkg-dev file appstream desktop-file-utils systemd
+  dpkg-dev file appstream desktop-file-utils systemd poppler-utils
 )
 missing=()
 for p in "${packages[@]}"; do

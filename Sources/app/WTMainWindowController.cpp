@@ -5,6 +5,7 @@
 #include "WTAppDelegate.h"
 #include "WTClientsViewController.h"
 #include "WTEditCommitter.h"
+#include "WTExportController.h"
 #include "WTHelpDialogs.h"
 #include "WTImages.h"
 #include "WTItemsViewController.h"
@@ -170,6 +171,10 @@ void WTMainWindowController::buildActions() {
   file->addSeparator();
   file->addAction(tr("&Save"), QKeySequence::Save, [this] { delegate_.saveAction(); });
   file->addSeparator();
+  QAction* exportAction = file->addAction(tr("&Export…"), QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_E), this,
+                                          &WTMainWindowController::exportData);
+  exportAction->setObjectName(QStringLiteral("export"));
+  file->addSeparator();
   file->addAction(tr("&Quit"), QKeySequence::Quit, this, &QWidget::close);
 
   QMenu* edit = menuBar()->addMenu(tr("&Edit"));
@@ -229,6 +234,20 @@ void WTMainWindowController::buildActions() {
   });
   about->setObjectName(QStringLiteral("about"));
   about->setMenuRole(QAction::AboutRole);
+}
+
+WTProject* WTMainWindowController::selectedProject() const {
+  // The projects stack answers whichever stack is on screen: an open project, else the selected row.
+  WTViewController* top = projectsNavigationController_ ? projectsNavigationController_->topViewController() : nullptr;
+  if (auto* items = qobject_cast<WTItemsViewController*>(top)) return items->project();
+  return dynamic_cast<WTProject*>(projectsViewController_->selectedObject());
+}
+
+WTExportController* WTMainWindowController::exportData() {
+  auto* dialog = new WTExportController(delegate_.managedObjectContext(), [this] { return selectedProject(); }, this);
+  dialog->setAttribute(Qt::WA_DeleteOnClose);
+  dialog->open();
+  return dialog;
 }
 
 QList<WTProject*> WTMainWindowController::fetchProjects() const {

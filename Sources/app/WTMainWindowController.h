@@ -13,6 +13,7 @@ class QToolBar;
 class UserDefaults;
 class WTAppDelegate;
 class WTClientsViewController;
+class WTExportController;
 class WTNavigationController;
 class WTProject;
 class WTProjectsViewController;
@@ -54,6 +55,10 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void toggleArchive();
   void report();
   void toggleTimer();
+  // The project selected in the projects list, or open in its outline; none otherwise.
+  WTProject* selectedProject() const;
+  // File › Export…: the time-entry export dialog, over the window.
+  WTExportController* exportData();
   // Pops the visible stack, unless only its root is left.
   void goBack();
 

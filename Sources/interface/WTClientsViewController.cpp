@@ -5,12 +5,17 @@
 #include "WTObjectContext.h"
 #include "WTObjectListModel.h"
 #include "WTRateField.h"
+#include "WTReportWindowController.h"
 
 #include <QMenu>
 
 WTClientsViewController::WTClientsViewController(WTObjectContext* context, QObject* parent)
     : WTObjectListViewController(context, WTEntity::Client, QStringLiteral("Client"), parent) {
   setObjectName(QStringLiteral("Clients"));
+}
+
+void WTClientsViewController::report() {
+  if (auto* client = dynamic_cast<WTClient*>(selectedObject())) WTReportWindowController::showReport(context(), client);
 }
 
 void WTClientsViewController::addObject() {

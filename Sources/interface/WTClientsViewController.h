@@ -11,6 +11,8 @@ class WTClientsViewController : public WTObjectListViewController {
 
   // Inserts a client; when the list shows it, edits its name (no scrolling).
   void addObject() override;
+  // Opens a report window on the selected client's projects.
+  void report() override;
 
  protected:
   // "Set Rate…": a client row has no room for a field of its own.

@@ -18,6 +18,7 @@
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTRateField.h"
+#include "WTReportWindowController.h"
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
@@ -312,6 +313,7 @@ bool WTItemsViewController::respondsTo(Command command) const {
     case Command::AddObject:
     case Command::RemoveSelectedObjects:
     case Command::ToggleArchive:
+    case Command::Report:
     case Command::SelectedObject:
     case Command::ToggleTimer:
       return true;
@@ -349,6 +351,10 @@ void WTItemsViewController::toggleArchive() {
   if (!project_) return;
   project_->setArchived(!project_->archived());
   emit validationChanged();
+}
+
+void WTItemsViewController::report() {
+  if (project_) WTReportWindowController::showReport(context_, QList<WTProject*>{project_});
 }
 
 WTObject* WTItemsViewController::selectedObject() const {

@@ -56,6 +56,8 @@ class WTItemsViewController : public WTViewController {
   void removeSelectedObjects() override;
   // Archives or unarchives the project.
   void toggleArchive() override;
+  // Opens a report window on the project.
+  void report() override;
   // The project (the toolbar's archive label follows it).
   WTObject* selectedObject() const override;
   // Starts or stops the timer of the selected task, or of the selected item's task.

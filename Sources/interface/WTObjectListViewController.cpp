@@ -85,6 +85,7 @@ bool WTObjectListViewController::respondsTo(Command command) const {
     case Command::AddObject:
     case Command::RemoveSelectedObjects:
     case Command::ToggleArchive:
+    case Command::Report:
     case Command::SelectedObject:
       return true;
     default:

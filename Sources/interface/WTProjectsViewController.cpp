@@ -6,6 +6,7 @@
 #include "WTObjectContext.h"
 #include "WTObjectListModel.h"
 #include "WTProject.h"
+#include "WTReportWindowController.h"
 #include "WTTask.h"
 
 #include <QAction>
@@ -23,6 +24,12 @@ WTProjectsViewController::~WTProjectsViewController() = default;
 void WTProjectsViewController::setArchivedPredicate(std::function<bool(const WTObject*)> predicate) {
   clientsArrayController_->setFilterPredicate(predicate);
   WTObjectListViewController::setArchivedPredicate(std::move(predicate));
+}
+
+void WTProjectsViewController::report() {
+  if (auto* project = dynamic_cast<WTProject*>(selectedObject())) {
+    WTReportWindowController::showReport(context(), QList<WTProject*>{project});
+  }
 }
 
 void WTProjectsViewController::addObject() {

@@ -20,6 +20,8 @@ class WTProjectsViewController : public WTObjectListViewController {
 
   // Inserts a project with a task "General"; when the list shows it, scrolls to it and edits its name.
   void addObject() override;
+  // Opens a report window on the selected project.
+  void report() override;
   // Pushes the (one, reused) items outline for `project`.
   void openProject(WTProject* project);
   // Shows the clients stack.

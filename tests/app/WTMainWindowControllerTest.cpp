@@ -4,6 +4,7 @@
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
+#include "WTExportController.h"
 #include "WTItemsViewController.h"
 #include "WTListView.h"
 #include "WTMainWindowController.h"
@@ -12,11 +13,14 @@
 #include "WTObjectListModel.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTReportWindowController.h"
 #include "WTTask.h"
 
 #include <gtest/gtest.h>
 
+#include <QAbstractButton>
 #include <QAction>
+#include <QButtonGroup>
 #include <QScreen>
 #include <QTemporaryDir>
 #include <QTest>
@@ -92,7 +96,7 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 1);
 }
 
-TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndReportWaitsForAReportWindow) {
+TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsOfferReports) {
   open();
   WTObjectContext* context = delegate->managedObjectContext();
   auto* archived = WTProject::insertNewObject(context);
@@ -120,7 +124,7 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndReportWai
   EXPECT_EQ(item("archive")->text(), "Archive");
   EXPECT_TRUE(item("archive")->isEnabled());
 
-  EXPECT_FALSE(validate("report"));
+  EXPECT_TRUE(validate("report"));
   for (const char* identifier : {"projects", "clients", "add", "remove"})
     EXPECT_TRUE(validate(identifier)) << identifier;
   EXPECT_FALSE(validate("toggleTimer"));  // no task to time in the lists
@@ -156,7 +160,48 @@ TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnThe
   window->showClients();
   item("add")->trigger();
   EXPECT_EQ(context->fetch<WTClient>().size(), 1);
-  item("report")->trigger();  // nobody offers it: dropped silently
+  // A client's report covers exactly its projects, in a window of its own.
+  auto* client = context->fetch<WTClient>().front();
+  auto* project = WTProject::insertNewObject(context);
+  project->setName("Client work");
+  project->setClient(client);
+  window->clientsViewController()->selectObject(client);
+  item("report")->trigger();
+  QList<WTReportWindowController*> reports;
+  for (QWidget* widget : QApplication::topLevelWidgets()) {
+    if (auto* report = qobject_cast<WTReportWindowController*>(widget)) reports.append(report);
+  }
+  ASSERT_EQ(reports.size(), 1);
+  EXPECT_TRUE(reports.front()->isVisible());
+  EXPECT_EQ(reports.front()->projects(), QList<WTProject*>{project});
+  reports.front()->close();
+}
+
+TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
+  open();
+  WTObjectContext* context = delegate->managedObjectContext();
+  auto* other = WTProject::insertNewObject(context);
+  other->setName("Other");
+  context->processPendingChanges();
+  window->projectsViewController()->arrayController()->rearrangeObjects();
+  EXPECT_EQ(window->selectedProject(), nullptr);
+  select(other);
+  EXPECT_EQ(window->selectedProject(), other);
+  WTProject* first =
+      window->fetchProjects().value(0) == other ? window->fetchProjects()[1] : window->fetchProjects()[0];
+  window->projectsViewController()->openProject(first);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  EXPECT_EQ(window->selectedProject(), first);
+
+  QAction* exportAction = window->findChild<QAction*>("export");
+  ASSERT_NE(exportAction, nullptr);
+  EXPECT_EQ(exportAction->shortcut(), QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_E));
+  WTExportController* exporter = window->exportData();
+  EXPECT_TRUE(exporter->isVisible());
+  exporter->projectFilterMatrix()->button(WTExportController::SelectedProject)->click();
+  EXPECT_EQ(exporter->projectLimit(), first);
+  exporter->reject();
 }
 
 TEST_F(WTMainWindowControllerTest, CustomRangeDefaultsAreRegisteredAndStoredValuesWin) {

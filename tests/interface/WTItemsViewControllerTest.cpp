@@ -255,7 +255,7 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
 TEST_F(WTItemsViewControllerTest, WindowCommandsActOnTheProjectAndTheSelection) {
   using Command = WTViewController::Command;
   EXPECT_TRUE(controller->respondsTo(Command::ToggleArchive));
-  EXPECT_FALSE(controller->respondsTo(Command::Report));  // no report window yet
+  EXPECT_TRUE(controller->respondsTo(Command::Report));
   EXPECT_EQ(controller->selectedObject(), project);
   controller->toggleArchive();
   EXPECT_TRUE(project->archived());

@@ -1,0 +1,68 @@
+#include "WTCustomRangeDialog.h"
+
+#include "RZDate.h"
+#include "UserDefaults.h"
+
+#include <QDateEdit>
+#include <QDialogButtonBox>
+#include <QFormLayout>
+#include <QVBoxLayout>
+
+namespace {
+
+// Days are the user's calendar days (the calendar's zone), not the system clock's.
+QDate dayOf(Date date) {
+  RZDate::DateComponents components;
+  RZDate::assignFlags(date, RZDate::DayUnits, components);
+  return QDate(components.year, components.month, components.day);
+}
+
+Date midnightOf(QDate day) {
+  RZDate::DateComponents components;
+  components.year = day.year();
+  components.month = day.month();
+  components.day = day.day();
+  return RZDate::dateFromComponents(components);
+}
+
+}  // namespace
+
+WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& beginKey,
+                                         const QString& endKey, QWidget* parent)
+    : QDialog(parent), defaults_(defaults), beginKey_(beginKey), endKey_(endKey) {
+  setObjectName(QStringLiteral("customRangeWindow"));
+  setWindowTitle(tr("Custom Range"));
+  auto* layout = new QVBoxLayout(this);
+  auto* form = new QFormLayout;
+  begin_ = new QDateEdit(this);
+  begin_->setObjectName(QStringLiteral("rangeBegin"));
+  end_ = new QDateEdit(this);
+  end_->setObjectName(QStringLiteral("rangeEnd"));
+  for (QDateEdit* edit : {begin_, end_}) {
+    edit->setCalendarPopup(true);
+    edit->setDisplayFormat(QLocale().dateFormat(QLocale::ShortFormat));
+  }
+  form->addRow(tr("From:"), begin_);
+  form->addRow(tr("To:"), end_);
+  layout->addLayout(form);
+  auto* buttons = new QDialogButtonBox(QDialogButtonBox::Ok, this);
+  connect(buttons, &QDialogButtonBox::accepted, this, &QDialog::accept);
+  layout->addWidget(buttons);
+
+  load();
+  connect(begin_, &QDateEdit::dateChanged, this, [this](QDate day) { store(beginKey_, day); });
+  connect(end_, &QDateEdit::dateChanged, this, [this](QDate day) { store(endKey_, day); });
+}
+
+void WTCustomRangeDialog::load() {
+  const Date now = Date::now();
+  begin_->setDate(dayOf(defaults_->dateForKey(beginKey_).value_or(RZDate::addMonth(now, -1))));
+  end_->setDate(dayOf(defaults_->dateForKey(endKey_).value_or(now)));
+  // What the dialog shows is the range, even when it is closed untouched.
+  store(beginKey_, begin_->date());
+  store(endKey_, end_->date());
+}
+
+void WTCustomRangeDialog::store(const QString& key, QDate day) {
+  if (day.isValid()) defaults_->setValue(key, QVariant::fromValue(midnightOf(day)));
+}

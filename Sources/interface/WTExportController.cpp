@@ -1,0 +1,99 @@
+#include "WTExportController.h"
+
+#include "WTCSVExport.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTRangePopUpButton.h"
+
+#include <QButtonGroup>
+#include <QDialogButtonBox>
+#include <QFormLayout>
+#include <QLabel>
+#include <QMessageBox>
+#include <QPushButton>
+#include <QRadioButton>
+#include <QVBoxLayout>
+
+WTExportController::WTExportController(WTObjectContext* context, std::function<WTProject*()> selectedProject,
+                                       QWidget* parent)
+    : QDialog(parent),
+      context_(context),
+      selectedProject_(std::move(selectedProject)),
+      chooseSaveLocation_(askForSaveLocation) {
+  setObjectName(QStringLiteral("exportWindow"));
+  setWindowTitle(tr("Export Time Entries"));
+  auto* layout = new QVBoxLayout(this);
+  auto* form = new QFormLayout;
+  rangeButton_ = new WTRangePopUpButton(context ? context->userDefaults() : nullptr, this);
+  form->addRow(tr("Date range:"), rangeButton_);
+
+  projectFilterMatrix_ = new QButtonGroup(this);
+  auto* all = new QRadioButton(tr("All projects"), this);
+  all->setObjectName(QStringLiteral("allProjects"));
+  auto* selected = new QRadioButton(tr("Selected project"), this);
+  selected->setObjectName(QStringLiteral("selectedProject"));
+  projectFilterMatrix_->addButton(all, AllProjects);
+  projectFilterMatrix_->addButton(selected, SelectedProject);
+  all->setChecked(true);
+  selectedProjectLabel_ = new QLabel(this);
+  selectedProjectLabel_->setObjectName(QStringLiteral("selectedProjectName"));
+  selectedProjectLabel_->setIndent(24);
+  auto* choices = new QVBoxLayout;
+  choices->addWidget(all);
+  choices->addWidget(selected);
+  choices->addWidget(selectedProjectLabel_);
+  form->addRow(tr("Export:"), choices);
+  layout->addLayout(form);
+
+  auto* note = new QLabel(tr("Time entries are written as CSV: project, task, rate, name, start, end and "
+                             "minutes, one entry a line."),
+                          this);
+  note->setWordWrap(true);
+  note->setForegroundRole(QPalette::PlaceholderText);
+  layout->addWidget(note);
+
+  auto* buttons = new QDialogButtonBox(QDialogButtonBox::Cancel, this);
+  QPushButton* exportButton = buttons->addButton(tr("Export…"), QDialogButtonBox::AcceptRole);
+  exportButton->setObjectName(QStringLiteral("exportButton"));
+  exportButton->setDefault(true);
+  connect(buttons, &QDialogButtonBox::accepted, this, &WTExportController::accept);
+  connect(buttons, &QDialogButtonBox::rejected, this, &QDialog::reject);
+  layout->addWidget(buttons);
+  updateSelectedProjectLabel();
+}
+
+WTExportController::~WTExportController() = default;
+
+void WTExportController::showEvent(QShowEvent* event) {
+  updateSelectedProjectLabel();
+  QDialog::showEvent(event);
+}
+
+void WTExportController::updateSelectedProjectLabel() {
+  WTProject* project = selectedProject_ ? selectedProject_() : nullptr;
+  selectedProjectLabel_->setText(project ? project->name()
+                                         : tr("(no project is selected: all are exported)"));
+  selectedProjectLabel_->setEnabled(project != nullptr);
+}
+
+WTProject* WTExportController::projectLimit() const {
+  if (projectFilterMatrix_->checkedId() != SelectedProject || !selectedProject_) return nullptr;
+  return selectedProject_();
+}
+
+Result<int> WTExportController::exportToPath(const QString& path) const {
+  if (!context_) return Error{1, tr("There is no store to export from.")};
+  return WTCSVExport::exportTimes(*context_, rangeButton_->selectedPredicate(), projectLimit(), path);
+}
+
+void WTExportController::accept() {
+  const QString path =
+      chooseSaveLocation_(this, tr("Export Time Entries"), tr("CSV files (*.csv)"), QStringLiteral("csv"));
+  if (path.isEmpty()) return;  // the choices stay on screen for another try
+  const Result<int> written = exportToPath(path);
+  if (!written) {
+    QMessageBox::warning(this, tr("Export Time Entries"), written.error().message);
+    return;
+  }
+  QDialog::accept();
+}

@@ -1,0 +1,82 @@
+#include "WTRangePopUpButton.h"
+
+#include "RZDate.h"
+#include "UserDefaults.h"
+#include "WTCustomRangeDialog.h"
+
+WTRangePopUpButton::WTRangePopUpButton(UserDefaults* defaults, QWidget* parent)
+    : QComboBox(parent), defaults_(defaults) {
+  setObjectName(QStringLiteral("rangeButton"));
+  const Date now = Date::now();
+  customRangeBegin_ = RZDate::addMonth(now, -1);
+  customRangeEnd_ = now;
+  setupMenu();
+  connect(this, &QComboBox::activated, this, &WTRangePopUpButton::itemActivated);
+}
+
+WTRangePopUpButton::~WTRangePopUpButton() = default;
+
+void WTRangePopUpButton::setupMenu() {
+  using namespace WTRangePredicate;
+  const std::pair<const char*, int> items[] = {
+      {QT_TR_NOOP("Today"), Today},          {QT_TR_NOOP("Yesterday"), Yesterday},
+      {QT_TR_NOOP("This week"), ThisWeek},   {QT_TR_NOOP("Last week"), LastWeek},
+      {QT_TR_NOOP("This month"), ThisMonth}, {QT_TR_NOOP("Last month"), LastMonth},
+      {QT_TR_NOOP("This year"), ThisYear},   {QT_TR_NOOP("Last year"), LastYear},
+      {QT_TR_NOOP("Any date"), AnyDate},     {QT_TR_NOOP("Custom..."), Custom},
+  };
+  for (const auto& [title, tag] : items) {
+    if (tag == Custom) insertSeparator(count());
+    addItem(tr(title), tag);
+  }
+}
+
+void WTRangePopUpButton::setCustomRange(std::optional<Date> begin, std::optional<Date> end) {
+  customRangeBegin_ = begin;
+  customRangeEnd_ = end;
+}
+
+int WTRangePopUpButton::selectedTag() const {
+  const QVariant tag = currentData();
+  return tag.isValid() ? tag.toInt() : -1;
+}
+
+bool WTRangePopUpButton::selectTag(int tag) {
+  const int index = findData(tag);
+  if (index < 0) return false;
+  setCurrentIndex(index);
+  return true;
+}
+
+WTItemPredicate WTRangePopUpButton::selectedPredicate() const {
+  return WTRangePredicate::predicateForTag(selectedTag(), customRangeBegin_, customRangeEnd_);
+}
+
+void WTRangePopUpButton::itemActivated(int index) {
+  if (itemData(index).toInt() == WTRangePredicate::Custom) {
+    showRangeWindow();
+    return;
+  }
+  emit rangeChosen();
+}
+
+WTCustomRangeDialog* WTRangePopUpButton::showRangeWindow() {
+  if (!defaults_) return nullptr;
+  if (rangeWindow_) return rangeWindow_;
+  auto date = [](std::optional<Date> value) { return value ? QVariant::fromValue(*value) : QVariant(); };
+  defaults_->setValue(QString::fromLatin1(kBeginKey), date(customRangeBegin_));
+  defaults_->setValue(QString::fromLatin1(kEndKey), date(customRangeEnd_));
+  rangeWindow_ = new WTCustomRangeDialog(defaults_, QString::fromLatin1(kBeginKey),
+                                         QString::fromLatin1(kEndKey), window());
+  rangeWindow_->setAttribute(Qt::WA_DeleteOnClose);
+  connect(rangeWindow_, &QDialog::finished, this, &WTRangePopUpButton::didEndRangeWindow);
+  rangeWindow_->open();
+  return rangeWindow_;
+}
+
+void WTRangePopUpButton::didEndRangeWindow() {
+  // Whatever ended the dialog, the dates it showed are the range: they were stored as they were chosen.
+  customRangeBegin_ = defaults_->dateForKey(QString::fromLatin1(kBeginKey));
+  customRangeEnd_ = defaults_->dateForKey(QString::fromLatin1(kEndKey));
+  emit rangeChosen();
+}

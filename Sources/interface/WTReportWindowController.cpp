@@ -1,0 +1,360 @@
+#include "WTReportWindowController.h"
+
+#include "WTCSVExport.h"
+#include "WTClient.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTSaveLocation.h"
+
+#include <QButtonGroup>
+#include <QDesktopServices>
+#include <QFileInfo>
+#include <QFileSystemWatcher>
+#include <QHBoxLayout>
+#include <QLabel>
+#include <QLocale>
+#include <QMessageBox>
+#include <QPageLayout>
+#include <QPageSize>
+#include <QPdfWriter>
+#include <QPrintDialog>
+#include <QPrinter>
+#include <QPushButton>
+#include <QScrollBar>
+#include <QTextBrowser>
+#include <QTextDocument>
+#include <QToolButton>
+#include <QUrl>
+#include <QVBoxLayout>
+
+namespace {
+
+// Paper as the user's country prints it: Letter where US measures are used, A4 everywhere else.
+QPageSize localPageSize() {
+  return QPageSize(QLocale().measurementSystem() == QLocale::ImperialUSSystem ? QPageSize::Letter
+                                                                              : QPageSize::A4);
+}
+
+}  // namespace
+
+WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWidget* parent)
+    : QWidget(parent, Qt::Window), context_(context), chooseSaveLocation_(askForSaveLocation) {
+  setObjectName(QStringLiteral("reportWindow"));
+  buildInterface();
+  resize(860, 900);
+  if (context) {
+    // Records a report holds live as long as their context; the window must not outlive it.
+    connect(context, &QObject::destroyed, this, [this] {
+      projects_.clear();
+      client_ = nullptr;
+      close();
+    });
+    connect(context, &WTObjectContext::didSave, this, &WTReportWindowController::refreshWebContent);
+  }
+}
+
+WTReportWindowController::~WTReportWindowController() = default;
+
+WTReportWindowController* WTReportWindowController::showReport(WTObjectContext* context,
+                                                               const QList<WTProject*>& projects) {
+  auto* window = new WTReportWindowController(context);
+  window->setAttribute(Qt::WA_DeleteOnClose);
+  window->show();
+  window->setProjects(projects);
+  return window;
+}
+
+WTReportWindowController* WTReportWindowController::showReport(WTObjectContext* context, WTClient* client) {
+  auto* window = new WTReportWindowController(context);
+  window->setAttribute(Qt::WA_DeleteOnClose);
+  window->show();
+  window->setClient(client);
+  return window;
+}
+
+void WTReportWindowController::buildInterface() {
+  auto* layout = new QVBoxLayout(this);
+  layout->setContentsMargins(0, 0, 0, 0);
+  layout->setSpacing(0);
+
+  auto* bar = new QWidget(this);
+  bar->setObjectName(QStringLiteral("reportToolbar"));
+  auto* barLayout = new QHBoxLayout(bar);
+  barLayout->setContentsMargins(10, 8, 10, 8);
+  barLayout->setSpacing(0);
+
+  // Four buttons that touch and behave as one control: exactly one level of detail is chosen.
+  segments_ = new QButtonGroup(this);
+  segments_->setExclusive(true);
+  const struct {
+    const char* title;
+    const char* tip;
+  } levels[] = {
+      {QT_TR_NOOP("Tasks"), QT_TR_NOOP("One line per task")},
+      {QT_TR_NOOP("Items"), QT_TR_NOOP("Every item with a value")},
+      {QT_TR_NOOP("Days"), QT_TR_NOOP("Items grouped by day")},
+      {QT_TR_NOOP("Months"), QT_TR_NOOP("Items grouped by month")},
+  };
+  for (int mode = 0; mode < 4; ++mode) {
+    auto* button = new QToolButton(bar);
+    button->setObjectName(QStringLiteral("mode%1").arg(mode));
+    button->setText(tr(levels[mode].title));
+    button->setToolTip(tr(levels[mode].tip));
+    button->setCheckable(true);
+    button->setAutoRaise(false);
+    button->setMinimumWidth(72);
+    segments_->addButton(button, mode);
+    barLayout->addWidget(button);
+  }
+  segments_->button(0)->setChecked(true);
+  connect(segments_, &QButtonGroup::idClicked, this, [this] { refreshWebContent(); });
+  barLayout->addStretch(1);
+  barLayout->setSpacing(6);
+
+  auto addButton = [&](const QString& name, const QString& title, const QString& tip,
+                       void (WTReportWindowController::*slot)()) {
+    auto* button = new QPushButton(title, bar);
+    button->setObjectName(name);
+    button->setToolTip(tip);
+    connect(button, &QPushButton::clicked, this, slot);
+    barLayout->addWidget(button);
+  };
+  addButton(QStringLiteral("exportCSV"), tr("Export CSV…"), tr("Save the report's lines as a CSV file"),
+            &WTReportWindowController::exportCSV);
+  addButton(QStringLiteral("saveHTML"), tr("Save as HTML…"), tr("Save the report as a web page"),
+            &WTReportWindowController::saveHTML);
+  addButton(QStringLiteral("savePDF"), tr("Save as PDF…"), tr("Save the report as a PDF document"),
+            &WTReportWindowController::savePDF);
+  addButton(QStringLiteral("print"), tr("Print…"), tr("Print the report"), &WTReportWindowController::print);
+  addButton(QStringLiteral("editTemplate"), tr("Edit Report Template…"),
+            tr("Open your own copy of the report template in your text editor"),
+            &WTReportWindowController::editReportTemplate);
+  layout->addWidget(bar);
+
+  errorBar_ = new QLabel(this);
+  errorBar_->setObjectName(QStringLiteral("templateErrorBar"));
+  errorBar_->setWordWrap(false);
+  errorBar_->setTextInteractionFlags(Qt::TextSelectableByMouse);
+  errorBar_->setContentsMargins(12, 6, 12, 6);
+  errorBar_->setStyleSheet(
+      QStringLiteral("QLabel { background: #fff4ce; color: #5c4400; "
+                     "border-top: 1px solid #e6d28c; border-bottom: 1px solid #e6d28c; }"));
+  errorBar_->hide();
+  layout->addWidget(errorBar_);
+
+  webView_ = new QTextBrowser(this);
+  webView_->setObjectName(QStringLiteral("reportView"));
+  webView_->setOpenExternalLinks(true);
+  webView_->setFrameShape(QFrame::NoFrame);
+  layout->addWidget(webView_, 1);
+
+  setWindowTitle(tr("Report"));
+}
+
+QList<WTProject*> WTReportWindowController::projects() const {
+  return liveProjects();
+}
+
+void WTReportWindowController::setProjects(const QList<WTProject*>& projects) {
+  projects_ = projects;
+  client_ = nullptr;
+  refreshWebContent();
+}
+
+void WTReportWindowController::setClient(WTClient* client) {
+  client_ = client;
+  projects_.clear();
+  refreshWebContent();
+}
+
+QList<WTProject*> WTReportWindowController::liveProjects() const {
+  if (!context_) return {};
+  // A record deleted while its report is open leaves the report (undo brings it back). Deleted records
+  // stay in memory for undo, so the context's identity map says which ones still count.
+  auto live = [this](WTObject* object) { return context_->objectWithUUID(object->uuid()) == object; };
+  if (client_ && !live(client_)) return {};
+  QList<WTProject*> projects;
+  for (WTProject* project : client_ ? client_->projects() : projects_) {
+    if (live(project)) projects.append(project);
+  }
+  return projects;
+}
+
+int WTReportWindowController::mode() const {
+  return segments_->checkedId();
+}
+
+void WTReportWindowController::setMode(int mode) {
+  if (QAbstractButton* button = segments_->button(mode)) {
+    button->setChecked(true);
+    refreshWebContent();
+  }
+}
+
+QString WTReportWindowController::windowTitleForProjects() const {
+  if (client_) return tr("Report — %1").arg(client_->name());
+  const QList<WTProject*> projects = liveProjects();
+  if (projects.size() == 1) return tr("Report — %1").arg(projects.constFirst()->name());
+  return tr("Report");
+}
+
+void WTReportWindowController::refreshWebContent() {
+  if (!context_) return;
+  generator_.setProjects(liveProjects());
+  generator_.setMode(mode());
+  const WTReport report = generator_.render();
+  html_ = report.html;
+
+  // The reader stays where they were: a save while reading must not throw them back to the top.
+  QScrollBar* vertical = webView_->verticalScrollBar();
+  QScrollBar* horizontal = webView_->horizontalScrollBar();
+  const int top = vertical->value();
+  const int left = horizontal->value();
+  webView_->setHtml(html_);
+  vertical->setValue(top);
+  horizontal->setValue(left);
+
+  showTemplateErrors(report);
+  setWindowTitle(windowTitleForProjects());
+  watchUserTemplate();
+  emit reportRendered();
+}
+
+void WTReportWindowController::showTemplateErrors(const WTReport& report) {
+  if (!report.templateRead) {
+    errorBar_->setText(
+        tr("The report template could not be read: %1").arg(WTReportGenerator::templatePath()));
+    errorBar_->show();
+    return;
+  }
+  if (report.errors.empty()) {
+    errorBar_->clear();
+    errorBar_->hide();
+    return;
+  }
+  const WTReportTemplateError& first = report.errors.front();
+  QString text = first.line > 0 ? tr("Template error on line %1: %2").arg(first.line).arg(first.message)
+                                : tr("Template error: %1").arg(first.message);
+  if (report.errors.size() > 1)
+    text += QLatin1Char(' ') + tr("(and %n more)", "", int(report.errors.size() - 1));
+  errorBar_->setText(text);
+  errorBar_->setToolTip(WTReportGenerator::templatePath());
+  errorBar_->show();
+}
+
+void WTReportWindowController::watchUserTemplate() {
+  // Editors save by writing a new file over the old one, which ends a watch on the file itself; the
+  // folder's watch sees the new file arrive and the file is watched again.
+  const QString path = WTReportGenerator::userTemplatePath();
+  const QString folder = QFileInfo(path).absolutePath();
+  if (!templateWatcher_) {
+    templateWatcher_ = new QFileSystemWatcher(this);
+    auto changed = [this] {
+      if (isVisible()) refreshWebContent();
+    };
+    connect(templateWatcher_, &QFileSystemWatcher::fileChanged, this, changed);
+    connect(templateWatcher_, &QFileSystemWatcher::directoryChanged, this, [this, path, changed] {
+      if (QFileInfo::exists(path) && !templateWatcher_->files().contains(path)) changed();
+    });
+  }
+  if (QFileInfo::exists(folder) && !templateWatcher_->directories().contains(folder)) {
+    templateWatcher_->addPath(folder);
+  }
+  if (QFileInfo::exists(path) && !templateWatcher_->files().contains(path)) templateWatcher_->addPath(path);
+}
+
+Result<void> WTReportWindowController::exportCSVToFile(const QString& path) const {
+  return WTCSVExport::writeTextAtomically(path, WTCSVExport::reportCSV(liveProjects(), mode()));
+}
+
+Result<void> WTReportWindowController::saveHTMLToFile(const QString& path) const {
+  return WTCSVExport::writeTextAtomically(path, html_);
+}
+
+std::unique_ptr<QTextDocument> WTReportWindowController::printableDocument() const {
+  auto document = std::make_unique<QTextDocument>();
+  document->setDefaultFont(webView_->document()->defaultFont());
+  document->setDefaultStyleSheet(webView_->document()->defaultStyleSheet());
+  document->setHtml(html_);
+  document->setMetaInformation(QTextDocument::DocumentTitle, windowTitleForProjects());
+  return document;
+}
+
+void WTReportWindowController::printToDevice(QPagedPaintDevice* device) const {
+  // QTextDocument breaks an unpaginated document into the device's pages itself, never inside a line,
+  // and numbers the pages at their foot.
+  printableDocument()->print(device);
+}
+
+Result<void> WTReportWindowController::savePDFToFile(const QString& path) const {
+  // Written beside the target and renamed over it, so a failed run leaves the old file as it was.
+  const QString partial = path + QStringLiteral(".part");
+  {
+    QPdfWriter writer(partial);
+    writer.setCreator(QStringLiteral("Tessal"));
+    writer.setTitle(windowTitleForProjects());
+    writer.setPageSize(localPageSize());
+    writer.setPageMargins(QMarginsF(15, 15, 15, 15), QPageLayout::Millimeter);
+    printToDevice(&writer);
+  }
+  QFileInfo written(partial);
+  if (!written.exists() || written.size() == 0) {
+    QFile::remove(partial);
+    return Error{1, tr("%1 could not be written.").arg(path)};
+  }
+  QFile::remove(path);
+  if (!QFile::rename(partial, path)) {
+    QFile::remove(partial);
+    return Error{1, tr("%1 could not be written.").arg(path)};
+  }
+  return Result<void>::success();
+}
+
+void WTReportWindowController::saveWith(const QString& title, const QString& filter, const QString& suffix,
+                                        Result<void> (WTReportWindowController::*write)(const QString&)
+                                            const) {
+  const QString path = chooseSaveLocation_(this, title, filter, suffix);
+  if (path.isEmpty()) return;
+  const Result<void> written = (this->*write)(path);
+  if (!written) QMessageBox::warning(this, title, written.error().message);
+}
+
+void WTReportWindowController::exportCSV() {
+  saveWith(tr("Export CSV"), tr("CSV files (*.csv)"), QStringLiteral("csv"),
+           &WTReportWindowController::exportCSVToFile);
+}
+
+void WTReportWindowController::saveHTML() {
+  saveWith(tr("Save as HTML"), tr("Web pages (*.html *.htm)"), QStringLiteral("html"),
+           &WTReportWindowController::saveHTMLToFile);
+}
+
+void WTReportWindowController::savePDF() {
+  saveWith(tr("Save as PDF"), tr("PDF documents (*.pdf)"), QStringLiteral("pdf"),
+           &WTReportWindowController::savePDFToFile);
+}
+
+void WTReportWindowController::print() {
+  QPrinter printer(QPrinter::HighResolution);
+  printer.setPageSize(localPageSize());
+  printer.setDocName(windowTitleForProjects());
+  QPrintDialog dialog(&printer, this);
+  if (dialog.exec() != QDialog::Accepted) return;
+  printToDevice(&printer);
+}
+
+void WTReportWindowController::editReportTemplate() {
+  const Result<QString> copied = WTReportGenerator::copyBuiltInTemplateToUserFolder();
+  if (!copied) {
+    QMessageBox::warning(this, tr("Edit Report Template"), copied.error().message);
+    return;
+  }
+  watchUserTemplate();
+  // The user's copy now stands in for the built-in one; it is the same text until they change it.
+  refreshWebContent();
+  if (!QDesktopServices::openUrl(QUrl::fromLocalFile(copied.value()))) {
+    QMessageBox::information(
+        this, tr("Edit Report Template"),
+        tr("No editor could be opened. Your report template is at:\n%1").arg(copied.value()));
+  }
+}

@@ -1,0 +1,103 @@
+#pragma once
+
+#include "Result.h"
+#include "WTReportGenerator.h"
+#include "WTSaveLocation.h"
+
+#include <QList>
+#include <QPointer>
+#include <QWidget>
+
+class QAbstractButton;
+class QButtonGroup;
+class QFileSystemWatcher;
+class QLabel;
+class QPagedPaintDevice;
+class QTextBrowser;
+class QTextDocument;
+class WTClient;
+class WTObjectContext;
+class WTProject;
+
+// The report of a set of projects, as the client would receive it: the report template rendered to HTML
+// at one of four levels of detail (whole tasks, every item with a value, items by day, items by month),
+// saved as HTML or PDF, printed, or exported as the report's own CSV.
+//
+// The report follows the data: every save of the store renders it again, keeping the place the reader
+// scrolled to, and so does a change to the user's own template file. Template errors are logged and the
+// first of them is named, with its line, in a bar above the report until the next render.
+class WTReportWindowController : public QWidget {
+  Q_OBJECT
+ public:
+  // `context` is not owned; the window closes when it goes.
+  explicit WTReportWindowController(WTObjectContext* context, QWidget* parent = nullptr);
+  ~WTReportWindowController() override;
+
+  // Opens a window of its own on the report of `projects` (or of every project of `client`), deleted
+  // when closed.
+  static WTReportWindowController* showReport(WTObjectContext* context, const QList<WTProject*>& projects);
+  static WTReportWindowController* showReport(WTObjectContext* context, WTClient* client);
+
+  QList<WTProject*> projects() const;
+  // Reports on these projects (renders at once when there are any).
+  void setProjects(const QList<WTProject*>& projects);
+  // Reports on the client's projects, read again at each render, so a project added later appears.
+  void setClient(WTClient* client);
+
+  // The level of detail 0–3, as the segmented control shows it.
+  int mode() const;
+  void setMode(int mode);
+
+  // Renders again and shows the result, keeping the scroll position.
+  void refreshWebContent();
+
+  QString html() const { return html_; }
+  QTextBrowser* webView() const { return webView_; }
+  QButtonGroup* segmentedControl() const { return segments_; }
+  // The bar naming the last render's first template error; hidden when there was none.
+  QLabel* errorBar() const { return errorBar_; }
+
+  // The outputs, to a chosen path; each is written whole or not at all.
+  Result<void> exportCSVToFile(const QString& path) const;
+  Result<void> saveHTMLToFile(const QString& path) const;
+  Result<void> savePDFToFile(const QString& path) const;
+  // Lays the report out on `device`'s pages with page numbers; rows are never cut between pages.
+  void printToDevice(QPagedPaintDevice* device) const;
+
+  // Asks for a location, then writes; a failure is shown in a message box.
+  void exportCSV();
+  void saveHTML();
+  void savePDF();
+  // The system's print dialog, then the printer.
+  void print();
+  // Copies the built-in template to the user's data folder unless one is there, and opens it in the
+  // desktop's editor; the report renders again whenever the file changes.
+  void editReportTemplate();
+
+  void setSaveLocationChooser(WTSaveLocationChooser chooser) { chooseSaveLocation_ = std::move(chooser); }
+
+ signals:
+  // After each render.
+  void reportRendered();
+
+ private:
+  void buildInterface();
+  QList<WTProject*> liveProjects() const;
+  void showTemplateErrors(const WTReport& report);
+  void watchUserTemplate();
+  std::unique_ptr<QTextDocument> printableDocument() const;
+  void saveWith(const QString& title, const QString& filter, const QString& suffix,
+                Result<void> (WTReportWindowController::*write)(const QString&) const);
+  QString windowTitleForProjects() const;
+
+  QPointer<WTObjectContext> context_;
+  QList<WTProject*> projects_;
+  WTClient* client_ = nullptr;
+  WTReportGenerator generator_;
+  QString html_;
+  QTextBrowser* webView_ = nullptr;
+  QButtonGroup* segments_ = nullptr;
+  QLabel* errorBar_ = nullptr;
+  QFileSystemWatcher* templateWatcher_ = nullptr;
+  WTSaveLocationChooser chooseSaveLocation_;
+};
