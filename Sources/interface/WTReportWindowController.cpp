@@ -294,7 +294,8 @@ Result<void> WTReportWindowController::savePDFToFile(const QString& path) const 
     writer.setCreator(QStringLiteral("Tessal"));
     writer.setTitle(windowTitleForProjects());
     writer.setPageSize(localPageSize());
-    writer.setPageMargins(QMarginsF(15, 15, 15, 15), QPageLayout::Millimeter);
+    // The document keeps a margin of its own around the text, and its page numbers sit inside it.
+    writer.setPageMargins(QMarginsF(0, 0, 0, 0));
     printToDevice(&writer);
   }
   QFileInfo written(partial);
