@@ -22,6 +22,7 @@ WTExportController::WTExportController(WTObjectContext* context, std::function<W
       chooseSaveLocation_(askForSaveLocation) {
   setObjectName(QStringLiteral("exportWindow"));
   setWindowTitle(tr("Export Time Entries"));
+  setMinimumWidth(420);
   auto* layout = new QVBoxLayout(this);
   auto* form = new QFormLayout;
   rangeButton_ = new WTRangePopUpButton(context ? context->userDefaults() : nullptr, this);

@@ -5,6 +5,7 @@
 #include "KeyPath.h"
 #include "WTClient.h"
 #include "WTHTMLFilter.h"
+#include "WTItemKindFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTProject.h"
@@ -134,6 +135,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
   engine.loadFilter(std::make_shared<WTHTMLFilter>());
+  engine.loadFilter(std::make_shared<WTItemKindFilter>());
   QString html;
   try {
     html = path ? engine.processTemplateInFileAtPath(*path, variables())

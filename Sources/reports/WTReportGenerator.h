@@ -65,7 +65,7 @@ class WTReportGenerator {
   static Result<QString> copyBuiltInTemplateToUserFolder();
 
   // Renders the template at `path` (templatePath() when empty) with variables() and the filters
-  // "digiclock", "decimal" and "html". Each error is also
+  // "digiclock", "decimal", "html" and "item_kind". Each error is also
   // logged as "Template error: MESSAGE".
   WTReport render(const QString& path = QString());
   // The same with the template's text.
