@@ -21,6 +21,7 @@
 #include <QPrinter>
 #include <QPushButton>
 #include <QScrollBar>
+#include <QShortcut>
 #include <QTextBrowser>
 #include <QTextDocument>
 #include <QToolButton>
@@ -149,6 +150,10 @@ void WTReportWindowController::buildInterface() {
   layout->addWidget(webView_, 1);
 
   setWindowTitle(tr("Report"));
+  auto* closeShortcut = new QShortcut(QKeySequence::Close, this);
+  connect(closeShortcut, &QShortcut::activated, this, &QWidget::close);
+  auto* printShortcut = new QShortcut(QKeySequence::Print, this);
+  connect(printShortcut, &QShortcut::activated, this, &WTReportWindowController::print);
 }
 
 QList<WTProject*> WTReportWindowController::projects() const {
