@@ -24,5 +24,6 @@ class WTIdleSourceChain final : public WTIdleSource {
 };
 
 // The idle sources of this desktop, in the order they are trusted: the session bus's services (Mutter,
-// then the freedesktop screen saver), then, in an X11 session, the X server's own counter.
+// then the freedesktop screen saver), then a Wayland compositor's ext-idle-notify, then, in an X11
+// session, the X server's own counter. Main thread: the Wayland source reads through the event loop.
 std::unique_ptr<WTIdleSource> makeDesktopIdleSource(const QDBusConnection& bus);

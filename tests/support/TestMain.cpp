@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <QDir>
+#include <QFile>
 #include <QTemporaryDir>
 #include <cstdlib>
 
@@ -17,6 +18,9 @@ int main(int argc, char** argv) {
   QTemporaryDir home;
   const QByteArray root = home.path().toUtf8();
   for (const char* sub : {"data", "config", "runtime", "cache"}) QDir(home.path()).mkpath(sub);
+  // A runtime folder others may read is refused by Qt (and by Wayland), as a real one would be.
+  QFile::setPermissions(home.filePath("runtime"),
+                        QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
   setenv("XDG_DATA_HOME", (root + "/data").constData(), 1);
   setenv("XDG_CONFIG_HOME", (root + "/config").constData(), 1);
   setenv("XDG_RUNTIME_DIR", (root + "/runtime").constData(), 1);
