@@ -490,7 +490,9 @@ QString GXTemplateEngine::processTemplate(const QString& templateText, const QVa
     Prepared& prepared = prepared_[match.get()];
     if (!prepared.match) prepared.match = match;
     if (!isMarker) {
-      if (!name.isNull()) {
+      // An expression's value is only ever written or reported while output is enabled, and looking a
+      // value up changes nothing, so a disabled region (the other levels of a report) skips the lookup.
+      if (!name.isNull() && outputEnabled()) {
         if (!prepared.name) prepared.name = &nameOf(name);
         value = lookUp(*prepared.name, name, nullptr);
       }

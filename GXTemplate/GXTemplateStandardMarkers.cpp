@@ -181,7 +181,9 @@ QVariant GXTemplateStandardMarkers::markerEncountered(const QString& marker, con
       // One or three arguments only: "if not x" is never evaluated and starts no block.
       if (args.size() != 1 && args.size() != 3) return {};
       blockStarted = true;
-      const bool result = condition(args);
+      // Inside a disabled region the outcome is never used (neither the branch nor its "else" can enable
+      // output), so the condition is not evaluated there.
+      const bool result = outputEnabled && condition(args);
       const bool wasEnabled = outputEnabled;
       if (outputEnabled && !result) outputEnabled = false;
       ifStack_.push_back({markerRange, result, wasEnabled, false});
