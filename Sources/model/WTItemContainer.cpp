@@ -1,5 +1,7 @@
 #include "WTItemContainer.h"
 
+#include <QMetaMethod>
+
 #include "RZDate.h"
 #include "WTItem.h"
 #include "WTTask.h"
@@ -122,7 +124,20 @@ Decimal WTItemContainer::cost() const {
 void WTItemContainer::setItems(QList<WTItem*> items) {
   stopObserving();
   items_ = std::move(items);
-  startObserving();
+  if (listeners_ > 0) startObserving();
+}
+
+// Qt calls these with its connection lock held, so they count instead of asking isSignalConnected().
+void WTItemContainer::connectNotify(const QMetaMethod& signal) {
+  if (signal != QMetaMethod::fromSignal(&WTItemContainer::valueChanged)) return;
+  if (listeners_++ == 0) startObserving();
+}
+
+void WTItemContainer::disconnectNotify(const QMetaMethod& signal) {
+  // An invalid method stands for "some or all signals" and says not how many listeners went: keep
+  // observing then, which costs a little and never misses a change.
+  if (signal != QMetaMethod::fromSignal(&WTItemContainer::valueChanged) || listeners_ == 0) return;
+  if (--listeners_ == 0) stopObserving();
 }
 
 void WTItemContainer::startObserving() {

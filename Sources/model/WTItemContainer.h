@@ -21,8 +21,9 @@ class WTTask;
 // day or month. Never stored; made afresh whenever a task's groups or a report are rebuilt. It keeps
 // an identity of date and task so the outline can find the same group again after a rebuild.
 //
-// While it holds items it observes their duration and cost and re-announces them as its own through
-// valueChanged, so a running entry's minutes reach the group's total.
+// While it holds items and someone listens to valueChanged, it observes their duration and cost and
+// re-announces them as its own, so a running entry's minutes reach the group's total. Groups nobody
+// listens to (those of a report, made by the ten thousand) cost no observers.
 class WTItemContainer : public QObject, public KeyValueCoding {
   Q_OBJECT
  public:
@@ -66,6 +67,7 @@ class WTItemContainer : public QObject, public KeyValueCoding {
 
   void startObserving();
   void stopObserving();
+  bool isObserving() const { return !observers_.empty(); }
 
   QVariant valueForKey(const QString& key) const override;
 
@@ -73,7 +75,12 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   // "duration" or "cost" of the group changed because one of its items' did.
   void valueChanged(const QString& key);
 
+ protected:
+  void connectNotify(const QMetaMethod& signal) override;
+  void disconnectNotify(const QMetaMethod& signal) override;
+
  private:
+  int listeners_ = 0;  // connections to valueChanged
   QList<WTItem*> items_;
   std::optional<Date> date_;
   WTTask* task_;

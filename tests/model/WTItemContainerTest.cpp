@@ -90,6 +90,35 @@ TEST_F(WTItemContainerTest, AGroupRelaysItsRunningEntrysMinutes) {
   EXPECT_EQ(children[0]->duration(), 2);
 }
 
+TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
+  WTTask* task = makeTask();
+  WTTime* first = makeTime(task, berlin(2026, 4, 2, 9), berlin(2026, 4, 2, 10));
+  WTTime* second = makeTime(task, berlin(2026, 4, 2, 11), berlin(2026, 4, 2, 12));
+  WTItemContainer group({first}, first->startDate(), task);
+  EXPECT_FALSE(group.isObserving());
+
+  QStringList heard;
+  auto connection =
+      QObject::connect(&group, &WTItemContainer::valueChanged, [&](const QString& key) { heard << key; });
+  EXPECT_TRUE(group.isObserving());
+  first->setDuration(90);
+  EXPECT_TRUE(heard.contains("duration"));
+
+  // New items are observed in place of the old ones while the listener stays.
+  group.setItems({second});
+  heard.clear();
+  first->setDuration(30);
+  EXPECT_TRUE(heard.isEmpty());
+  second->setDuration(30);
+  EXPECT_TRUE(heard.contains("duration"));
+
+  QObject::disconnect(connection);
+  EXPECT_FALSE(group.isObserving());
+  heard.clear();
+  second->setDuration(45);
+  EXPECT_TRUE(heard.isEmpty());
+}
+
 TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
   WTTask* a = makeTask();
   WTTask* b = makeTask();
