@@ -310,6 +310,16 @@ WTStore::~WTStore() {
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs) {
+  return open(path, vfs, false);
+}
+
+Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path) {
+  if (!QFileInfo::exists(path))
+    return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
+  return open(path, nullptr, true);
+}
+
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -323,7 +333,8 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   const bool logHasFrames = QFileInfo(path + QStringLiteral("-wal")).size() > 0;
 
   sqlite3* db = nullptr;
-  const int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | (existed ? 0 : SQLITE_OPEN_CREATE);
+  const int flags = SQLITE_OPEN_NOMUTEX | (readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE) |
+                    (existed ? 0 : SQLITE_OPEN_CREATE);
   int code = sqlite3_open_v2(QFile::encodeName(path).constData(), &db, flags, vfs);
   std::unique_ptr<WTStore> store(new WTStore(path, db));  // closes the connection on every way out
   if (code != SQLITE_OK) {
@@ -363,6 +374,14 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     }
     // A current file must also have the shape this version reads and writes.
     if (version == kSchemaVersion && !store->prepareStatements()) return damagedError(path);
+  }
+  if (readOnly) {
+    if (!empty && version < kSchemaVersion) {
+      return Error{MigrationFailed,
+                   tr("The data file “%1” needs to be updated by starting Tessal once before it can be read.")
+                       .arg(path)};
+    }
+    return store;
   }
   if (sqlite3_db_readonly(db, "main") == 1) {
     return Error{OpenFailed,
@@ -408,6 +427,7 @@ Error WTStore::writeError(int code) const {
 
 Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink) {
   sqlite3_stmt* const s = selectAll_;
+  if (!s) return {};  // a file opened for reading before anything was ever written to it
   WTStoreRecord record;
   int code;
   while ((code = sqlite3_step(s)) == SQLITE_ROW) {
@@ -454,6 +474,7 @@ Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStr
   if (nameless)
     return Error{WriteFailed,
                  tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
+  if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading before the file had a table
   int code = stepOnce(begin_);
   for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {
     code = bindRecord(replace_, *record);

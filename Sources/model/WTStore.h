@@ -35,6 +35,10 @@ class WTStore {
   // names the file and says what is wrong, ready to show to the user. `vfs` names the SQLite VFS to
   // use; none for the default (tests pass one that injects faults).
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr);
+  // Opens an existing store for reading only, beside a process that may be writing it: nothing is
+  // created, migrated or changed, and save() fails. A file that holds no records yet reads as empty; one
+  // written by an older version that still needs migrating is refused (the application updates it).
+  static Result<std::unique_ptr<WTStore>> openReadOnly(const QString& path);
   ~WTStore();
 
   WTStore(const WTStore&) = delete;
@@ -52,6 +56,7 @@ class WTStore {
 
  private:
   WTStore(QString path, sqlite3* db);
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly);
   Result<void> prepareStatements();
   Error writeError(int code) const;
 

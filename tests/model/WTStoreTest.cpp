@@ -602,3 +602,54 @@ TEST_F(WTStoreTest, AFailedFirstOpenLeavesAFileThatOpensLater) {
 }
 
 }  // namespace
+
+// Commands that only read (reports, exports) open the store beside a running application that writes it.
+TEST_F(WTStoreTest, AReaderSeesWhatAWriterSavedAndCannotChangeIt) {
+  const Records records = sampleRecords();
+  makeStore(records);
+  auto writer = open();
+  ASSERT_TRUE(writer);
+  WTStoreRecord added = record(QStringLiteral("late@WTNote"), QStringLiteral("WTNote"));
+  added.taskUuid = QStringLiteral("T1@WTTask");
+  ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
+
+  auto reader = WTStore::openReadOnly(path());
+  ASSERT_TRUE(reader) << reader.error().message.toStdString();
+  Records expected = records;
+  expected[added.uuid] = added;
+  expectSameRecords(loadAll(*reader.value()), expected);
+
+  const Result<void> refused = reader.value()->save({record(QStringLiteral("x@WTNote"), QStringLiteral("WTNote"))}, {});
+  ASSERT_FALSE(refused.ok());
+  EXPECT_EQ(refused.error().code, WTStore::WriteFailed);
+  // The writer goes on saving while the reader is open.
+  EXPECT_TRUE(writer->save({record(QStringLiteral("later@WTNote"), QStringLiteral("WTNote"))}, {}).ok());
+}
+
+TEST_F(WTStoreTest, ReadingNeverCreatesOrChangesAFile) {
+  auto missing = WTStore::openReadOnly(path());
+  ASSERT_FALSE(missing.ok());
+  EXPECT_EQ(missing.error().code, WTStore::OpenFailed);
+  EXPECT_TRUE(missing.error().message.contains(path()));
+  EXPECT_FALSE(QFileInfo::exists(path()));
+
+  // An empty file (made but never written) reads as a store without records and stays empty.
+  writeFile(path(), QByteArray());
+  auto empty = WTStore::openReadOnly(path());
+  ASSERT_TRUE(empty) << empty.error().message.toStdString();
+  EXPECT_TRUE(loadAll(*empty.value()).empty());
+  EXPECT_FALSE(empty.value()->save({record(QStringLiteral("x@WTNote"), QStringLiteral("WTNote"))}, {}).ok());
+  empty.value().reset();
+  EXPECT_TRUE(fileBytes(path()).isEmpty());
+
+  for (const RefusedFile& refused : kRefusedFiles) {
+    SCOPED_TRACE(refused.name);
+    QFile::remove(path());
+    refused.make(*this, path());
+    const QByteArray before = fileBytes(path());
+    auto store = WTStore::openReadOnly(path());
+    ASSERT_FALSE(store.ok());
+    EXPECT_EQ(store.error().code, refused.code);
+    EXPECT_EQ(fileBytes(path()), before);
+  }
+}
