@@ -276,6 +276,39 @@ TEST_F(ReportTest, BuiltInTemplateShowsNamesWithMarkupCharactersAsTyped) {
   EXPECT_EQ(generator.renderText(QStringLiteral("[{{ missing | html }}]")).html, QStringLiteral("[]"));
 }
 
+// What users leave out (names, tasks, dated items) and a client without projects render cleanly: no
+// template error and no stray rows from the sections of other levels.
+TEST_F(ReportTest, BuiltInTemplateRendersSparseRecordsWithoutErrorsOrStrayRows) {
+  auto* empty = WTProject::insertNewObject(context.get());
+  empty->setName(QStringLiteral("Not started"));
+  WTTask* notesOnly = makeTask(backend, QString());
+  makeItem<WTNote>(notesOnly, berlin(2024, 3, 7, 8));
+  makeTime(api, berlin(2024, 3, 8, 9), berlin(2024, 3, 8, 9, 45));  // no name
+  auto* bare = WTFlat::insertNewObject(context.get());  // neither named nor dated
+  bare->setTask(api);
+  bare->setMinutes(15);
+  const QList<QList<WTProject*>> cases = {{empty}, {}, {web, backend, empty}};
+  for (const QList<WTProject*>& chosen : cases) {
+    for (int mode = 0; mode <= 3; ++mode) {
+      SCOPED_TRACE(testing::Message() << chosen.size() << " projects, mode " << mode);
+      WTReportGenerator generator(chosen, mode);
+      const WTReport report = generator.render();
+      for (const WTReportTemplateError& error : report.errors)
+        ADD_FAILURE() << error.message.toStdString() << " at line " << error.line;
+      EXPECT_EQ(report.html.count(QStringLiteral("class=\"subtotal\"")), chosen.size());
+      EXPECT_EQ(report.html.count(QStringLiteral("<h2>")), chosen.size());
+      EXPECT_EQ(report.html.count(QStringLiteral("class=\"total\"")), 1);
+      if (mode == 0) {
+        EXPECT_FALSE(report.html.contains(QStringLiteral("class=\"item\""))) << report.html.toStdString();
+      }
+    }
+  }
+  WTReportGenerator generator({backend}, 1);
+  const QString html = generator.render().html;
+  EXPECT_EQ(html.count(QStringLiteral("class=\"item\"")), 3);  // the named flat fee, the time, the bare flat fee
+  EXPECT_TRUE(html.contains(QStringLiteral(">Time</td>"))) << html.toStdString();
+}
+
 TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
   const QString user = WTReportGenerator::userTemplatePath();
   ASSERT_FALSE(QFile::exists(user));
