@@ -4,6 +4,7 @@
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
+#include "WTReportPDF.h"
 #include "WTSaveLocation.h"
 
 #include <QButtonGroup>
@@ -12,11 +13,7 @@
 #include <QFileSystemWatcher>
 #include <QHBoxLayout>
 #include <QLabel>
-#include <QLocale>
 #include <QMessageBox>
-#include <QPageLayout>
-#include <QPageSize>
-#include <QPdfWriter>
 #include <QPrintDialog>
 #include <QPrinter>
 #include <QPushButton>
@@ -27,16 +24,6 @@
 #include <QToolButton>
 #include <QUrl>
 #include <QVBoxLayout>
-
-namespace {
-
-// Paper as the user's country prints it: Letter where US measures are used, A4 everywhere else.
-QPageSize localPageSize() {
-  return QPageSize(QLocale().measurementSystem() == QLocale::ImperialUSSystem ? QPageSize::Letter
-                                                                              : QPageSize::A4);
-}
-
-}  // namespace
 
 WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWidget* parent)
     : QWidget(parent, Qt::Window), context_(context), chooseSaveLocation_(askForSaveLocation) {
@@ -292,28 +279,7 @@ void WTReportWindowController::printToDevice(QPagedPaintDevice* device) const {
 }
 
 Result<void> WTReportWindowController::savePDFToFile(const QString& path) const {
-  // Written beside the target and renamed over it, so a failed run leaves the old file as it was.
-  const QString partial = path + QStringLiteral(".part");
-  {
-    QPdfWriter writer(partial);
-    writer.setCreator(QStringLiteral("Tessal"));
-    writer.setTitle(windowTitleForProjects());
-    writer.setPageSize(localPageSize());
-    // The document keeps a margin of its own around the text, and its page numbers sit inside it.
-    writer.setPageMargins(QMarginsF(0, 0, 0, 0));
-    printToDevice(&writer);
-  }
-  QFileInfo written(partial);
-  if (!written.exists() || written.size() == 0) {
-    QFile::remove(partial);
-    return Error{1, tr("%1 could not be written.").arg(path)};
-  }
-  QFile::remove(path);
-  if (!QFile::rename(partial, path)) {
-    QFile::remove(partial);
-    return Error{1, tr("%1 could not be written.").arg(path)};
-  }
-  return Result<void>::success();
+  return WTReportPDF::write(*printableDocument(), windowTitleForProjects(), path);
 }
 
 void WTReportWindowController::saveWith(const QString& title, const QString& filter, const QString& suffix,
@@ -342,7 +308,7 @@ void WTReportWindowController::savePDF() {
 
 void WTReportWindowController::print() {
   QPrinter printer(QPrinter::HighResolution);
-  printer.setPageSize(localPageSize());
+  printer.setPageSize(WTReportPDF::localPageSize());
   printer.setDocName(windowTitleForProjects());
   QPrintDialog dialog(&printer, this);
   if (dialog.exec() != QDialog::Accepted) return;

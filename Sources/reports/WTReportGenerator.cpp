@@ -25,9 +25,9 @@ namespace {
 // Collects the errors with the line the engine had reached, and logs them.
 class ErrorCollector : public GXTemplateEngineDelegate {
  public:
-  explicit ErrorCollector(std::vector<WTReportTemplateError>& errors) : errors_(errors) {}
+  ErrorCollector(std::vector<WTReportTemplateError>& errors, bool logs) : errors_(errors), logs_(logs) {}
   void templateEngineEncounteredError(GXTemplateEngine* engine, const GXTemplateError& error, bool) override {
-    qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
+    if (logs_) qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
     const QString& contents = engine->templateContents();
     const GXRange remaining = engine->remainingRange();
     const qsizetype reached = std::clamp<qsizetype>(qsizetype(remaining.location), 0, contents.size());
@@ -37,6 +37,7 @@ class ErrorCollector : public GXTemplateEngineDelegate {
 
  private:
   std::vector<WTReportTemplateError>& errors_;
+  bool logs_;
 };
 
 }  // namespace
@@ -130,7 +131,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   groups_.clear();
   WTReport report;
   GXTemplateEngine engine;
-  ErrorCollector collector(report.errors);
+  ErrorCollector collector(report.errors, logsErrors_);
   engine.setDelegate(&collector);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
@@ -143,7 +144,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   } catch (const std::exception& exception) {
     // A pattern the regex library refuses stops the run; it is the template's error like any other.
     const QString message = QString::fromUtf8(exception.what());
-    qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(message)));
+    if (logsErrors_) qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(message)));
     report.errors.push_back({-1, message, 0});
     html = QLatin1String("");
   }

@@ -64,9 +64,12 @@ class WTReportGenerator {
   // overwritten); returns the user's path either way, or why the copy failed.
   static Result<QString> copyBuiltInTemplateToUserFolder();
 
+  // Whether render() logs each error as "Template error: MESSAGE" (on by default; a caller that shows the
+  // errors itself, such as the command line, turns it off).
+  void setLogsErrors(bool logs) { logsErrors_ = logs; }
+
   // Renders the template at `path` (templatePath() when empty) with variables() and the filters
-  // "digiclock", "decimal", "html" and "item_kind". Each error is also
-  // logged as "Template error: MESSAGE".
+  // "digiclock", "decimal", "html" and "item_kind".
   WTReport render(const QString& path = QString());
   // The same with the template's text.
   WTReport renderText(const QString& templateText);
@@ -76,5 +79,6 @@ class WTReportGenerator {
 
   QList<WTProject*> projects_;
   int mode_ = 0;
+  bool logsErrors_ = true;
   std::vector<std::shared_ptr<WTItemContainer>> groups_;
 };
