@@ -1,6 +1,8 @@
 #include "WTSingleInstance.h"
 
+#include <QDeadlineTimer>
 #include <QDir>
+#include <QJsonDocument>
 #include <QLocalServer>
 #include <QLocalSocket>
 #include <QStandardPaths>
@@ -10,6 +12,14 @@ namespace {
 const QByteArray kReopen = "reopen\n";
 const QByteArray kPing = "ping\n";
 const QByteArray kAcknowledged = "ok\n";
+// "run " and a request as one line of compact JSON; the answer is one such line too.
+const QByteArray kRun = "run ";
+// Longer lines are no request of ours: the connection is dropped rather than its bytes kept.
+constexpr qint64 kMaxLine = 64 * 1024;
+
+QByteArray jsonLine(const QJsonObject& object) {
+  return QJsonDocument(object).toJson(QJsonDocument::Compact) + '\n';
+}
 
 QString defaultPath() {
   QString folder = QStandardPaths::writableLocation(QStandardPaths::RuntimeLocation);
@@ -65,16 +75,45 @@ bool WTSingleInstance::notifyRunningInstance(int timeoutMs, bool reopen) const {
   return true;
 }
 
+WTSingleInstance::Forwarded WTSingleInstance::sendRequest(const QJsonObject& request, int replyTimeoutMs) const {
+  Forwarded forwarded;
+  QLocalSocket socket;
+  socket.connectToServer(path_);
+  if (!socket.waitForConnected(2000)) return forwarded;
+  forwarded.reached = true;
+  socket.write(kRun + jsonLine(request));
+  const QDeadlineTimer deadline(replyTimeoutMs);
+  if (!socket.waitForBytesWritten(replyTimeoutMs)) return forwarded;
+  while (!socket.canReadLine()) {
+    if (deadline.hasExpired() || socket.state() != QLocalSocket::ConnectedState ||
+        !socket.waitForReadyRead(int(deadline.remainingTime())))
+      break;
+  }
+  if (!socket.canReadLine()) return forwarded;
+  const QJsonDocument reply = QJsonDocument::fromJson(socket.readLine());
+  if (reply.isObject()) forwarded.reply = reply.object();
+  return forwarded;
+}
+
 void WTSingleInstance::acceptConnections() {
   while (QLocalSocket* socket = server_->nextPendingConnection()) {
     connect(socket, &QLocalSocket::disconnected, socket, &QObject::deleteLater);
     connect(socket, &QLocalSocket::readyRead, this, [this, socket] {
-      if (!socket->canReadLine()) return;
-      const QByteArray line = socket->readLine();
+      if (!socket->canReadLine()) {
+        if (socket->bytesAvailable() > kMaxLine) socket->abort();
+        return;
+      }
+      const QByteArray line = socket->readLine(kMaxLine + 1);
       if (line == kReopen || line == kPing) {
         socket->write(kAcknowledged);
         socket->flush();
         if (line == kReopen) emit reopenRequested();
+      } else if (line.startsWith(kRun) && requestHandler_) {
+        const QJsonDocument request = QJsonDocument::fromJson(line.mid(kRun.size()));
+        if (request.isObject()) {
+          socket->write(jsonLine(requestHandler_(request.object())));
+          socket->flush();
+        }
       }
       socket->disconnectFromServer();
     });

@@ -1,13 +1,18 @@
 #pragma once
 
+#include <QJsonObject>
 #include <QObject>
 #include <QString>
+
+#include <functional>
+#include <optional>
 
 class QLocalServer;
 
 // Keeps the application to one running copy per user. The first copy listens on a local socket in the
 // user's runtime folder; a later copy finds it there, asks it to come forward and then leaves without
-// touching the store.
+// touching the store. The running copy also carries out requests sent to it (the shell's commands
+// that change data), so that the store keeps one writer.
 class WTSingleInstance : public QObject {
   Q_OBJECT
  public:
@@ -28,6 +33,20 @@ class WTSingleInstance : public QObject {
   // when a copy is there: it accepted the connection, whether or not it acknowledged within `timeoutMs`.
   bool notifyRunningInstance(int timeoutMs = 2000, bool reopen = true) const;
 
+  // Carries out a request in the running copy: sends it and waits up to `replyTimeoutMs` for the reply.
+  // `reached` is false when no copy listens (nothing was sent); `reply` is empty when the copy took the
+  // request but gave no answer in time or could not carry out requests.
+  struct Forwarded {
+    bool reached = false;
+    std::optional<QJsonObject> reply;
+  };
+  Forwarded sendRequest(const QJsonObject& request, int replyTimeoutMs) const;
+
+  // What answers requests in this copy, on its thread, between events; without one a request is closed
+  // unanswered.
+  using RequestHandler = std::function<QJsonObject(const QJsonObject& request)>;
+  void setRequestHandler(RequestHandler handler) { requestHandler_ = std::move(handler); }
+
  signals:
   // Another copy was started: the window should come forward.
   void reopenRequested();
@@ -37,4 +56,5 @@ class WTSingleInstance : public QObject {
 
   QString path_;
   QLocalServer* server_ = nullptr;
+  RequestHandler requestHandler_;
 };

@@ -335,6 +335,10 @@ Result<void> WTObjectContext::save() {
 }
 
 Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
+  return attachStore(std::move(store), WTStore::Records::All);
+}
+
+Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStore::Records which) {
   Q_ASSERT(count() == 0 && !store_);
   struct Link {
     WTObject* object;
@@ -359,7 +363,7 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
     if (ownerUuid.isEmpty()) return;
     (*entity == WTEntity::Task ? taskLinks : links)
         .push_back({object, std::move(ownerUuid), record.position});
-  });
+  }, which);
   if (loaded) {
     // Tasks join their projects in stored order.
     std::stable_sort(taskLinks.begin(), taskLinks.end(),

@@ -5,6 +5,7 @@
 #include "WTChangeJournal.h"
 #include "WTEntity.h"
 #include "WTObject.h"
+#include "WTStore.h"
 #include "WTUndoManager.h"
 
 #include <QHash>
@@ -18,7 +19,6 @@
 #include <vector>
 
 class UserDefaults;
-class WTStore;
 
 // The one object graph of the application: every record lives here, in memory, found by identity. A
 // store file (WTStore) mirrors it; save() writes what changed since the last save in one transaction
@@ -43,8 +43,11 @@ class WTObjectContext : public QObject {
 
   UserDefaults* userDefaults() const { return defaults_; }
 
-  // Store. Attaching loads every record of the store into this (empty) context.
+  // Store. Attaching loads every record of the store into this (empty) context. A context that loads only
+  // the timer records sees no other items: it may start and stop timers and save, but must not delete
+  // records (their unloaded items would be left behind in the file) nor answer totals.
   Result<void> attachStore(std::unique_ptr<WTStore> store);
+  Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which);
   bool hasStore() const { return store_ != nullptr; }
   WTStore* store() const { return store_.get(); }
 

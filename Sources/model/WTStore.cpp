@@ -54,6 +54,9 @@ enum Column {
   "position, budget, taskUuid, startDate, endDate, running, minutes, expense, completed"
 
 constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
+constexpr char kSelectTimerRecordsSql[] = "SELECT " WT_STORE_COLUMNS
+                                          " FROM records WHERE entity IN ('WTClient', 'WTProject', 'WTTask') "
+                                          "OR running <> 0";
 constexpr char kReplaceSql[] =
     "INSERT OR REPLACE INTO records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
@@ -304,7 +307,7 @@ int stepOnce(sqlite3_stmt* statement) {
 WTStore::WTStore(QString path, sqlite3* db) : path_(std::move(path)), db_(db) {}
 
 WTStore::~WTStore() {
-  for (sqlite3_stmt* statement : {begin_, commit_, rollback_, replace_, remove_, selectAll_})
+  for (sqlite3_stmt* statement : {begin_, commit_, rollback_, replace_, remove_, selectAll_, selectTimerRecords_})
     sqlite3_finalize(statement);
   sqlite3_close(db_);
 }
@@ -413,6 +416,7 @@ Result<void> WTStore::prepareStatements() {
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
       {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
       {&replace_, kReplaceSql},     {&remove_, kDeleteSql}, {&selectAll_, kSelectAllSql},
+      {&selectTimerRecords_, kSelectTimerRecordsSql},
   };
   for (const auto& [statement, sql] : statements) {
     const int code = sqlite3_prepare_v3(db_, sql, -1, SQLITE_PREPARE_PERSISTENT, statement, nullptr);
@@ -425,8 +429,8 @@ Error WTStore::writeError(int code) const {
   return {WriteFailed, tr("Changes could not be saved to the data file “%1”: %2.").arg(path_, reason(code))};
 }
 
-Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink) {
-  sqlite3_stmt* const s = selectAll_;
+Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which) {
+  sqlite3_stmt* const s = which == Records::All ? selectAll_ : selectTimerRecords_;
   if (!s) return {};  // a file opened for reading before anything was ever written to it
   WTStoreRecord record;
   int code;
