@@ -7,10 +7,17 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTObjectContext.h"
+#include "WTReportCommand.h"
 #include "WTSingleInstance.h"
+#include "WTStoreWriterLock.h"
 #include "WTTemplateCommand.h"
+#include "WTTimerCommands.h"
+#include "WTTrackCommand.h"
 
 #include <QCoreApplication>
+#include <QDir>
+#include <QGuiApplication>
+#include <QLoggingCategory>
 #include <QTextStream>
 
 #include <cstdio>
@@ -43,6 +50,14 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
     err.flush();
     return 1;
   }
+  // A start or stop from the shell changes the store by itself only while it holds the writer lock.
+  QDir().mkpath(WTAppDelegate::applicationSupportFolder());
+  WTStoreWriterLock writerLock(WTAppDelegate::applicationSupportFolder() + QStringLiteral("/Tessal.sqlite"));
+  if (!writerLock.lock(10000)) {
+    err << "The data file is busy (" << writerLock.filePath() << " is held); try again.\n";
+    err.flush();
+    return 1;
+  }
   UserDefaults defaults;
   WTApplication::registerDefaults(defaults);
   WTCommandLinePresenter presenter(err);
@@ -60,13 +75,29 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   return status;
 }
 
-constexpr char kUsage[] = "usage: tessal [template|sync] [ARGS...]   (tessal --help tells more)\n";
+constexpr char kUsage[] =
+    "usage: tessal [start|stop|status|log|report|export|template|sync] [ARGS...]   (tessal --help tells more)\n";
 
 constexpr char kHelp[] =
     "Tessal tracks working time and bills it.\n"
     "\n"
     "usage:\n"
     "  tessal                                        start the desktop application (or bring it forward)\n"
+    "  tessal start TASK [--project NAME] [--client NAME]\n"
+    "                                                start the task's timer (names match without regard to case)\n"
+    "  tessal stop [TASK] [--project NAME] [--client NAME]\n"
+    "                                                stop every running timer, or the task's\n"
+    "  tessal status [--json]                        the running timers and their total; exit status 1 when\n"
+    "                                                none runs\n"
+    "  tessal log [--range RANGE] [--project NAME]   the time entries of a range (today by default) and its\n"
+    "                                                totals\n"
+    "  tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n"
+    "                                                a report as HTML on stdout, or in FILE as .html, .pdf or .csv\n"
+    "                                                (modes: 0 tasks, 1 items, 2 days, 3 months)\n"
+    "  tessal export [--range RANGE] [--project NAME] [--out FILE.csv]\n"
+    "                                                time entries as CSV; RANGE is today, yesterday, this-week,\n"
+    "                                                last-week, this-month, last-month, this-year, last-year,\n"
+    "                                                any (the default) or YYYY-MM-DD..YYYY-MM-DD\n"
     "  tessal template TEMPLATE_FILE [--vars VARS.json]\n"
     "                                                render a report template with a JSON object's "
     "variables\n"
@@ -74,6 +105,7 @@ constexpr char kHelp[] =
     "  tessal --help                                 show this text\n"
     "  tessal --version                              show the version\n"
     "\n"
+    "While the desktop application runs, start and stop are carried out by it.\n"
     "The desktop application also takes Qt's own options (-platform NAME, -style NAME, -session ID, ...).\n"
     "Data: $XDG_DATA_HOME/Tessal2/Tessal.sqlite; settings: $XDG_CONFIG_HOME/Tessal/Tessal.conf.\n";
 
@@ -116,18 +148,37 @@ std::optional<int> runCommandLine(int argc, char** argv) {
     std::printf("tessal %s\n", TESSAL_VERSION);
     return 0;
   }
-  if (command != QLatin1String("template") && command != QLatin1String("sync")) {
+  static const QStringList commands = {QStringLiteral("report"), QStringLiteral("export"), QStringLiteral("log"),
+                                       QStringLiteral("template"), QStringLiteral("sync")};
+  if (!commands.contains(command) && !WTTimerCommands::isTimerCommand(command)) {
     if (desktopArgumentsValid(argc, argv)) return std::nullopt;
     std::fprintf(stderr, "tessal: unknown command or option '%s'\n", argv[1]);
     std::fputs(kUsage, stderr);
     return 2;
   }
 
-  QCoreApplication app(argc, argv);
-  app.setApplicationName(QStringLiteral("Tessal"));
-  app.setOrganizationName(QStringLiteral("Tessal"));
+  std::unique_ptr<QCoreApplication> app;
+  QStringList arguments;
+  for (int i = 2; i < argc; ++i) arguments.append(QString::fromLocal8Bit(argv[i]));
+  if (command == QLatin1String("report") && reportCommandWritesPDF(arguments)) {
+    // Laying a PDF out needs fonts, which need a GUI application; the offscreen platform gives one on
+    // any machine, with a display or without.
+    qputenv("QT_QPA_PLATFORM", "offscreen");
+    app = std::make_unique<QGuiApplication>(argc, argv);
+  } else {
+    app = std::make_unique<QCoreApplication>(argc, argv);
+  }
+  app->setApplicationName(QStringLiteral("Tessal"));
+  app->setOrganizationName(QStringLiteral("Tessal"));
   QTextStream out(stdout), err(stderr);
-  const QStringList arguments = app.arguments().mid(2);
+  if (WTTimerCommands::isTimerCommand(command) || command == QLatin1String("log")) {
+    // Their output is for people and scripts: the journal's and the store's diary stays out of it.
+    QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
+  }
+  if (WTTimerCommands::isTimerCommand(command)) return runTrackCommand(command, arguments, out, err);
+  if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);
+  if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
+  if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
   if (command == QLatin1String("template")) return runTemplateCommand(arguments, out, err);
   return runSync(arguments, out, err);
 }

@@ -3,6 +3,7 @@
 #include <optional>
 
 // The commands `tessal` runs without a window:
+//   tessal report ..., tessal export ...              read the store (see WTReportCommand.h)
 //   tessal template TEMPLATE_FILE [--vars VARS.json]   renders a report template (see WTTemplateCommand.h)
 //   tessal sync [--timeout SECONDS]                    brings this installation in step with its server
 //   tessal --help, tessal --version                    print and exit 0

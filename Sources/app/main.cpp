@@ -1,11 +1,15 @@
 #include "WTApplication.h"
 #include "WTCommandLine.h"
+#include "WTAppDelegate.h"
 #include "WTSingleInstance.h"
+#include "WTStoreWriterLock.h"
+#include "WTTimerCommands.h"
 
+#include <QDir>
 #include <QMainWindow>
 
 int main(int argc, char** argv) {
-  // `tessal template …` and `tessal sync …` run without a window.
+  // The commands (`tessal report …`, `tessal sync …`, …) run without a window.
   if (const std::optional<int> status = runCommandLine(argc, argv)) return *status;
 
   WTApplication app(argc, argv);
@@ -13,6 +17,22 @@ int main(int argc, char** argv) {
   // store itself.
   WTSingleInstance instance;
   if (!instance.start()) return 0;
+  // The store has one writer: a command changing it by itself finishes first (within milliseconds), and
+  // from now on commands hand their changes to this copy.
+  WTAppDelegate& delegate = app.delegate();
+  QDir().mkpath(WTAppDelegate::applicationSupportFolder());
+  WTStoreWriterLock writerLock(delegate.storePath());
+  if (!writerLock.lock(10000))
+    qWarning("Could not take %s; another process may be changing the store", qPrintable(writerLock.filePath()));
+  instance.setRequestHandler([&delegate](const QJsonObject& request) {
+    WTCommandOutcome outcome = WTTimerCommands::answer(*delegate.managedObjectContext(), request);
+    Error error;
+    if (!delegate.saveChanges(&error)) {
+      outcome.status = 1;
+      outcome.err += QStringLiteral("tessal: %1\n").arg(error.message);
+    }
+    return outcome.toJson();
+  });
   QObject::connect(&instance, &WTSingleInstance::reopenRequested, &app,
                    [&app] { app.applicationShouldHandleReopen(app.mainWindow()->isVisible()); });
   app.setQuitOnLastWindowClosed(false);  // quitting goes through the delegate's save

@@ -1,85 +1,17 @@
 // The `tessal` executable's window-less commands, run as a user's shell would run them: a separate
 // process with its own data and settings folders.
+#include "CommandLineInstallation.h"
 #include "SyncTestSupport.h"
-#include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTSingleInstance.h"
-#include "WTStore.h"
 #include "WTTask.h"
 
 #include <gtest/gtest.h>
 
-#include <QDir>
-#include <QFile>
-#include <QProcess>
-#include <QSettings>
-#include <QTemporaryDir>
-
 namespace {
 
-struct Outcome {
-  int code = -1;
-  QString out;
-  QString err;
-};
-
-// One installation: its own data, settings and runtime folders.
-class Installation {
- public:
-  Installation() {
-    for (const char* sub : {"data", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
-    // A runtime folder must be the user's alone, or Qt looks elsewhere.
-    QFile::setPermissions(runtimeFolder(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
-  }
-  QString storePath() const { return home_.filePath("data/Tessal2/Tessal.sqlite"); }
-  QString journalPath() const { return home_.filePath("data/Tessal2/Tessal.sync"); }
-  QString runtimeFolder() const { return home_.filePath("runtime"); }
-  void setSetting(const QString& key, const QString& value) {
-    QSettings settings(home_.filePath("config/Tessal/Tessal.conf"), QSettings::IniFormat);
-    settings.setValue(key, value);
-  }
-  // The context over this installation's store, made (with its folder) when missing.
-  std::unique_ptr<WTObjectContext> openStore() {
-    QDir().mkpath(QFileInfo(storePath()).path());
-    auto context = std::make_unique<WTObjectContext>();
-    auto store = WTStore::open(storePath());
-    EXPECT_TRUE(store);
-    if (store) {
-      EXPECT_TRUE(context->attachStore(std::move(store.value())));
-    }
-    return context;
-  }
-  Outcome tessal(const QStringList& arguments) const {
-    QProcess process;
-    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert("XDG_DATA_HOME", home_.filePath("data"));
-    environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
-    environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
-    // As on a server or over ssh: no display of any kind, and no platform plugin chosen for us.
-    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
-    process.setProcessEnvironment(environment);
-    process.start(QString::fromUtf8(TESSAL_EXE), arguments);
-    Outcome run;
-    if (!process.waitForFinished(60000)) {
-      process.kill();
-      process.waitForFinished();
-      return run;
-    }
-    run.code = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
-    run.out = QString::fromUtf8(process.readAllStandardOutput());
-    run.err = QString::fromUtf8(process.readAllStandardError());
-    return run;
-  }
-  QString file(const QString& name, const QByteArray& contents) const {
-    QFile file(home_.filePath(name));
-    EXPECT_TRUE(file.open(QIODevice::WriteOnly));
-    file.write(contents);
-    return file.fileName();
-  }
-
- private:
-  QTemporaryDir home_;
-};
+using commandtest::Installation;
+using commandtest::Outcome;
 
 TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
   Installation here;

@@ -1,0 +1,134 @@
+#include "WTStoreSnapshot.h"
+
+#include "WTAppDelegate.h"
+#include "WTApplication.h"
+#include "WTClient.h"
+#include "WTProject.h"
+#include "WTStore.h"
+#include "WTTask.h"
+
+#include <algorithm>
+
+QString WTStoreSnapshot::storePath() {
+  return WTAppDelegate::applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
+}
+
+std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which) {
+  auto defaults = std::make_unique<UserDefaults>();
+  WTApplication::registerDefaults(*defaults);
+  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(storePath(), std::move(defaults), which);
+  if (!snapshot) {
+    err << "tessal: " << snapshot.error().message << '\n';
+    err.flush();
+    return nullptr;
+  }
+  return std::move(snapshot.value());
+}
+
+Result<std::unique_ptr<WTStoreSnapshot>> WTStoreSnapshot::open(const QString& path,
+                                                               std::unique_ptr<UserDefaults> defaults,
+                                                               WTStore::Records which) {
+  Result<std::unique_ptr<WTStore>> store = WTStore::openReadOnly(path);
+  if (!store) return store.error();
+  std::unique_ptr<WTStoreSnapshot> snapshot(new WTStoreSnapshot);
+  snapshot->defaults_ = std::move(defaults);
+  snapshot->context_ = std::make_unique<WTObjectContext>(snapshot->defaults_.get());
+  const Result<void> loaded = snapshot->context_->attachStore(std::move(store.value()), which);
+  if (!loaded) return loaded.error();
+  WTObjectContext::setDefaultContext(snapshot->context_.get());
+  return snapshot;
+}
+
+WTStoreSnapshot::~WTStoreSnapshot() {
+  if (WTObjectContext::defaultContext() == context_.get()) WTObjectContext::setDefaultContext(nullptr);
+}
+
+namespace WTNamedRecords {
+namespace {
+
+constexpr qsizetype kNamesShown = 20;
+
+QString quoted(const QString& name) {
+  return QStringLiteral("“%1”").arg(name);
+}
+
+// The one record of `all` named `name`; `kinds` names what `all` holds ("projects", "tasks of “Atlas”").
+template <class T>
+Result<T*> named(const QList<T*>& all, const QString& name, const char* kind, const QString& kinds,
+                 const std::function<QString(const T*)>& describe) {
+  QList<T*> matches;
+  for (T* record : all) {
+    if (record->name().compare(name, Qt::CaseInsensitive) == 0) matches.append(record);
+  }
+  if (matches.size() == 1) return matches.first();
+  const QList<T*>& listed = matches.isEmpty() ? all : matches;
+  QStringList names;
+  for (T* record : listed) names.append(describe(record));
+  std::sort(names.begin(), names.end(),
+            [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+  const qsizetype more = names.size() - kNamesShown;
+  if (more > 0) {
+    names.resize(kNamesShown);
+    names.append(QStringLiteral("and %1 more").arg(more));
+  }
+  QString message;
+  if (!matches.isEmpty()) {
+    message = QStringLiteral("%1 %2 are named %3: %4")
+                  .arg(matches.size())
+                  .arg(kinds, quoted(name), names.join(QStringLiteral(", ")));
+  } else if (all.isEmpty()) {
+    message = QStringLiteral("no %1 is named %2, and there are no %3").arg(QLatin1String(kind), quoted(name), kinds);
+  } else {
+    message = QStringLiteral("no %1 is named %2; the %3 are: %4")
+                  .arg(QLatin1String(kind), quoted(name), kinds, names.join(QStringLiteral(", ")));
+  }
+  return Error{1, message};
+}
+
+QString describeProject(const WTProject* project) {
+  // Projects of the same name are told apart by their clients.
+  return project->client() ? QStringLiteral("%1 (%2)").arg(quoted(project->name()), project->client()->name())
+                           : quoted(project->name());
+}
+
+bool sameName(const QString& a, const QString& b) {
+  return a.compare(b, Qt::CaseInsensitive) == 0;
+}
+
+}  // namespace
+
+Result<WTProject*> project(const WTObjectContext& context, const QString& name) {
+  return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"), describeProject);
+}
+
+Result<WTClient*> client(const WTObjectContext& context, const QString& name) {
+  return named<WTClient>(context.fetch<WTClient>(), name, "client", QStringLiteral("clients"),
+                         [](const WTClient* client) { return quoted(client->name()); });
+}
+
+Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName,
+                     const QString& clientName) {
+  const QList<WTTask*> candidates = context.fetch<WTTask>([&](const WTTask* task) {
+    const WTProject* project = task->project();
+    if (!projectName.isNull() && !(project && sameName(project->name(), projectName))) return false;
+    if (!clientName.isNull() && !(project && project->client() && sameName(project->client()->name(), clientName)))
+      return false;
+    return true;
+  });
+  QString kinds = QStringLiteral("tasks");
+  if (!projectName.isNull()) kinds += QStringLiteral(" of projects named %1").arg(quoted(projectName));
+  if (!clientName.isNull())
+    kinds += QStringLiteral("%1 of clients named %2").arg(projectName.isNull() ? "" : ",", quoted(clientName));
+  return named<WTTask>(candidates, name, "task", kinds, [](const WTTask* task) {
+    return task->project() ? QStringLiteral("%1 in %2").arg(quoted(task->name()), describeProject(task->project()))
+                           : quoted(task->name());
+  });
+}
+
+QString label(const WTTask& task) {
+  const QString project = task.project() && !task.project()->name().isEmpty() ? task.project()->name()
+                                                                                : QStringLiteral("(untitled)");
+  return QStringLiteral("%1 › %2").arg(project, task.name().isEmpty() ? QStringLiteral("(untitled)") : task.name());
+}
+
+}  // namespace WTNamedRecords

@@ -1,0 +1,51 @@
+#pragma once
+
+#include "UserDefaults.h"
+#include "WTObjectContext.h"
+
+#include <QList>
+#include <QString>
+#include <QTextStream>
+
+#include <memory>
+
+class WTClient;
+class WTProject;
+class WTTask;
+
+// The store as the reading commands see it: opened for reading only, so they work beside a desktop copy
+// that is writing it and can never change it, with the user's settings for the default rate.
+class WTStoreSnapshot {
+ public:
+  // Reads the user's store; on failure writes why to `err` as "tessal: MESSAGE" and gives none.
+  static std::unique_ptr<WTStoreSnapshot> open(QTextStream& err, WTStore::Records which = WTStore::Records::All);
+  // Reads the store at `path` with `defaults` (taken over).
+  static Result<std::unique_ptr<WTStoreSnapshot>> open(const QString& path, std::unique_ptr<UserDefaults> defaults,
+                                                       WTStore::Records which = WTStore::Records::All);
+  // The user's store file.
+  static QString storePath();
+  ~WTStoreSnapshot();
+
+  WTObjectContext& context() { return *context_; }
+
+ private:
+  WTStoreSnapshot() = default;
+  std::unique_ptr<UserDefaults> defaults_;
+  std::unique_ptr<WTObjectContext> context_;
+};
+
+// Finding the one record a command names: names compare without regard to case. No match, or more than
+// one, is an error naming what there is (at most a screenful).
+namespace WTNamedRecords {
+
+Result<WTProject*> project(const WTObjectContext& context, const QString& name);
+Result<WTClient*> client(const WTObjectContext& context, const QString& name);
+// The task named `name` among those of projects named `projectName` and of clients named `clientName`;
+// a null filter lets every task through.
+Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName = {},
+                     const QString& clientName = {});
+
+// How the commands name a task: "PROJECT › TASK", "(untitled)" standing in for a missing name.
+QString label(const WTTask& task);
+
+}  // namespace WTNamedRecords

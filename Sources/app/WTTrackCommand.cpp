@@ -1,0 +1,168 @@
+#include "WTTrackCommand.h"
+
+#include "DurationText.h"
+#include "MoneyFormat.h"
+#include "RZSyncTrack.h"
+#include "UserDefaults.h"
+#include "WTApplication.h"
+#include "WTCSVExport.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTRangePredicate.h"
+#include "WTSingleInstance.h"
+#include "WTStore.h"
+#include "WTStoreSnapshot.h"
+#include "WTStoreWriterLock.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTTimerCommands.h"
+
+#include <QCommandLineParser>
+#include <QDeadlineTimer>
+#include <QFileInfo>
+#include <QThread>
+
+#include <algorithm>
+
+namespace {
+
+// How long a command waits for the store's writer: another command holds it for milliseconds, a desktop
+// copy that is still opening a large store for well under a second.
+constexpr int kWriterWaitMs = 10000;
+
+int print(const WTCommandOutcome& outcome, QTextStream& out, QTextStream& err) {
+  out << outcome.out;
+  out.flush();
+  err << outcome.err;
+  err.flush();
+  return outcome.status;
+}
+
+int failure(QTextStream& err, const QString& message) {
+  err << "tessal: " << message << '\n';
+  err.flush();
+  return 1;
+}
+
+QString journalPath(const QString& storePath) {
+  const QFileInfo store(storePath);
+  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+}
+
+// Carries a command that changes data out on the store itself, while this process holds its writer lock.
+// Only the records timers need are read; what changes is saved and written to the sync journal, as the
+// desktop copy would have done, so that the next sync sends it.
+int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments, QTextStream& out,
+               QTextStream& err) {
+  if (!QFileInfo::exists(storePath)) {
+    // The read-only opening says what is missing in the words every command uses.
+    return failure(err, WTStore::openReadOnly(storePath).error().message);
+  }
+  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath);
+  if (!store) return failure(err, store.error().message);
+  UserDefaults defaults;
+  WTApplication::registerDefaults(defaults);
+  WTObjectContext context(&defaults);
+  const Result<void> loaded = context.attachStore(std::move(store.value()), WTStore::Records::Timers);
+  if (!loaded) return failure(err, loaded.error().message);
+  const QString journalFile = journalPath(storePath);
+  RZSyncTrack journal(journalFile);
+  context.setChangeJournal(&journal);
+  const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
+  if (context.hasChanges()) {
+    const Result<void> saved = context.save();
+    context.setChangeJournal(nullptr);
+    if (!saved) return failure(err, saved.error().message);
+    const Result<void> written = journal.writeToFile(journalFile);
+    // The change is in the store; only the sync would miss it, and the user should know.
+    if (!written) err << "tessal: the change is saved but will not sync: " << written.error().message << '\n';
+  }
+  context.setChangeJournal(nullptr);
+  return print(outcome, out, err);
+}
+
+int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
+  const QString storePath = WTStoreSnapshot::storePath();
+  WTStoreWriterLock lock(storePath);
+  const WTSingleInstance desktop;
+  const QDeadlineTimer deadline(kWriterWaitMs);
+  do {
+    if (lock.tryLock()) return runOnStore(storePath, command, arguments, out, err);
+    // The writer is a desktop copy, which carries the command out, or another command, which soon lets go.
+    const WTSingleInstance::Forwarded forwarded =
+        desktop.sendRequest(WTTimerCommands::request(command, arguments), kWriterWaitMs);
+    if (forwarded.reached) {
+      if (forwarded.reply) return print(WTCommandOutcome::fromJson(*forwarded.reply), out, err);
+      return failure(err, QStringLiteral("the running Tessal did not answer; the change may not have been made"));
+    }
+    if (!QFileInfo::exists(QFileInfo(storePath).path()))
+      return failure(err, WTStore::openReadOnly(storePath).error().message);
+    QThread::msleep(5);
+  } while (!deadline.hasExpired());
+  return failure(err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
+}
+
+}  // namespace
+
+int runTrackCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
+  if (std::optional<WTCommandOutcome> problem = WTTimerCommands::checkArguments(command, arguments))
+    return print(*problem, out, err);
+  if (WTTimerCommands::changesData(command)) return runChangingCommand(command, arguments, out, err);
+  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
+  if (!snapshot) return 1;
+  return print(WTTimerCommands::run(snapshot->context(), command, arguments), out, err);
+}
+
+int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
+  constexpr char kUsage[] = "usage: tessal log [--range RANGE] [--project NAME]\n";
+  QCommandLineParser parser;
+  parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
+  parser.addOption(QCommandLineOption(QStringLiteral("range"), QString(), QStringLiteral("range")));
+  parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
+  QString problem;
+  if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments))
+    problem = parser.errorText();
+  else if (!parser.positionalArguments().isEmpty())
+    problem = QStringLiteral("unexpected argument '%1'").arg(parser.positionalArguments().first());
+  const QString rangeWord =
+      parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("today");
+  const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
+  if (problem.isEmpty() && !predicate) problem = predicate.error().message;
+  if (!problem.isEmpty()) {
+    err << "tessal: " << problem << '\n' << kUsage;
+    err.flush();
+    return 2;
+  }
+
+  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err);
+  if (!snapshot) return 1;
+  const WTProject* project = nullptr;
+  if (parser.isSet(QStringLiteral("project"))) {
+    const Result<WTProject*> named =
+        WTNamedRecords::project(snapshot->context(), parser.value(QStringLiteral("project")));
+    if (!named) return failure(err, named.error().message);
+    project = named.value();
+  }
+  QList<WTTime*> times = WTCSVExport::timesMatching(snapshot->context(), predicate.value(), project);
+  std::sort(times.begin(), times.end(), [](const WTTime* a, const WTTime* b) {
+    return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
+  });
+  int minutes = 0;
+  Decimal cost;
+  for (const WTTime* time : times) {
+    const QDateTime start = time->startDate() ? time->startDate()->toQDateTime().toLocalTime() : QDateTime();
+    const QString end = time->running()      ? QStringLiteral("now  ")
+                        : time->endDate()    ? time->endDate()->toQDateTime().toLocalTime().toString(u"HH:mm")
+                                             : QStringLiteral("     ");
+    const QString task = time->task() ? WTNamedRecords::label(*time->task()) : QStringLiteral("(no task)");
+    out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         ")) << "–"
+        << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
+        << MoneyFormat::format(time->cost()) << '\n';
+    minutes += time->duration();
+    cost += time->cost();
+  }
+  out << "Total: " << times.size() << (times.size() == 1 ? " entry  " : " entries  ")
+      << DurationText::stringWithMinutes(minutes) << "  " << MoneyFormat::format(cost) << '\n';
+  out.flush();
+  return 0;
+}

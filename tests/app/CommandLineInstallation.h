@@ -1,0 +1,97 @@
+#pragma once
+// One installation of Tessal for tests that run the real `tessal` executable as a user's shell would:
+// a separate process with its own data, settings and runtime folders and no display.
+#include "WTObjectContext.h"
+#include "WTStore.h"
+
+#include <gtest/gtest.h>
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QMap>
+#include <QProcess>
+#include <QSettings>
+#include <QTemporaryDir>
+
+#include <memory>
+
+namespace commandtest {
+
+struct Outcome {
+  int code = -1;
+  QString out;
+  QString err;
+};
+
+// One installation: its own data, settings and runtime folders.
+class Installation {
+ public:
+  Installation() {
+    for (const char* sub : {"data", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
+    // A runtime folder must be the user's alone, or Qt looks elsewhere.
+    QFile::setPermissions(runtimeFolder(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
+  }
+  QString storePath() const { return home_.filePath("data/Tessal2/Tessal.sqlite"); }
+  QString journalPath() const { return home_.filePath("data/Tessal2/Tessal.sync"); }
+  QString runtimeFolder() const { return home_.filePath("runtime"); }
+  void setSetting(const QString& key, const QString& value) {
+    QSettings settings(home_.filePath("config/Tessal/Tessal.conf"), QSettings::IniFormat);
+    settings.setValue(key, value);
+  }
+  // The context over this installation's store, made (with its folder) when missing.
+  std::unique_ptr<WTObjectContext> openStore() {
+    QDir().mkpath(QFileInfo(storePath()).path());
+    auto context = std::make_unique<WTObjectContext>();
+    auto store = WTStore::open(storePath());
+    EXPECT_TRUE(store);
+    if (store) {
+      EXPECT_TRUE(context->attachStore(std::move(store.value())));
+    }
+    return context;
+  }
+  // `tessal` with `arguments`, started but not waited for; `extra` adds to or replaces what the process
+  // inherits.
+  std::unique_ptr<QProcess> launch(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
+    auto process = std::make_unique<QProcess>();
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    environment.insert("XDG_DATA_HOME", home_.filePath("data"));
+    environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
+    environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
+    // As on a server or over ssh: no display of any kind, and no platform plugin chosen for us.
+    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
+    for (auto variable = extra.begin(); variable != extra.end(); ++variable)
+      environment.insert(variable.key(), variable.value());
+    process->setProcessEnvironment(environment);
+    process->start(QString::fromUtf8(TESSAL_EXE), arguments);
+    return process;
+  }
+  // Runs `tessal` with `arguments` to its end.
+  Outcome tessal(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
+    return finish(*launch(arguments, extra));
+  }
+  static Outcome finish(QProcess& process) {
+    Outcome run;
+    if (!process.waitForFinished(60000)) {
+      process.kill();
+      process.waitForFinished();
+      return run;
+    }
+    run.code = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
+    run.out = QString::fromUtf8(process.readAllStandardOutput());
+    run.err = QString::fromUtf8(process.readAllStandardError());
+    return run;
+  }
+  QString path(const QString& name) const { return home_.filePath(name); }
+  QString file(const QString& name, const QByteArray& contents) const {
+    QFile file(home_.filePath(name));
+    EXPECT_TRUE(file.open(QIODevice::WriteOnly));
+    file.write(contents);
+    return file.fileName();
+  }
+
+ private:
+  QTemporaryDir home_;
+};
+
+}  // namespace commandtest

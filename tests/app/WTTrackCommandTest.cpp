@@ -1,0 +1,246 @@
+// `tessal start`, `stop`, `status` and `log` as a user's shell and key bindings run them: the real
+// executable over a real store file, on its own or while a desktop copy (offscreen) holds the store.
+#include "CommandLineInstallation.h"
+#include "WTClient.h"
+#include "WTProject.h"
+#include "WTSingleInstance.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <gtest/gtest.h>
+
+#include <QElapsedTimer>
+#include <QJsonArray>
+#include <QJsonDocument>
+#include <QJsonObject>
+#include <QThread>
+#include <QTimeZone>
+
+#include <algorithm>
+
+namespace {
+
+using commandtest::Installation;
+using commandtest::Outcome;
+
+const QString kQuoted = QStringLiteral("Build \"it\" now");
+
+// Acme's Atlas and the client-less Hermes both have a "Design"; Atlas also has a task whose name holds
+// quotes and spaces. Nothing runs.
+class TrackCommand : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    std::unique_ptr<WTObjectContext> context = here.openStore();
+    auto* acme = WTClient::insertNewObject(context.get());
+    acme->setName("Acme");
+    acme->setRate(Decimal::fromString(u"80"));
+    WTProject* atlas = project(*context, "Atlas", acme);
+    WTProject* hermes = project(*context, "Hermes", nullptr);
+    hermes->setRate(Decimal::fromString(u"100"));
+    task(*context, atlas, "Design");
+    task(*context, atlas, kQuoted);
+    task(*context, hermes, "Design");
+    WTTask* old = task(*context, hermes, "Review");
+    auto* time = WTTime::insertNewObject(context.get());
+    time->setTask(old);
+    time->setStartDate(Date::fromQDateTime(QDateTime(QDate(2026, 3, 3), QTime(9, 0), QTimeZone("Europe/Berlin"))));
+    time->setEndDate(time->startDate()->addingSeconds(75 * 60));
+    ASSERT_TRUE(context->save());
+  }
+
+  static WTProject* project(WTObjectContext& context, const QString& name, WTClient* client) {
+    auto* project = WTProject::insertNewObject(&context);
+    project->setName(name);
+    project->setClient(client);
+    return project;
+  }
+  static WTTask* task(WTObjectContext& context, WTProject* project, const QString& name) {
+    auto* task = WTTask::insertNewObject(&context);
+    task->setName(name);
+    task->setProject(project);
+    return task;
+  }
+
+  // What the store file holds now: "PROJECT/TASK" of each running entry, sorted, and the number of entries.
+  struct Stored {
+    QStringList running;
+    qsizetype times = 0;
+  };
+  Stored stored() const {
+    Stored result;
+    auto store = WTStore::openReadOnly(here.storePath());
+    EXPECT_TRUE(store);
+    if (!store) return result;
+    WTObjectContext context;
+    EXPECT_TRUE(context.attachStore(std::move(store.value())));
+    const QList<WTTime*> times = context.fetch<WTTime>();
+    result.times = times.size();
+    for (const WTTime* time : times) {
+      if (time->running()) result.running.append(time->task()->project()->name() + "/" + time->task()->name());
+    }
+    result.running.sort();
+    return result;
+  }
+
+  // A desktop copy on this installation, offscreen, once it answers on its socket.
+  std::unique_ptr<QProcess> startDesktop() const {
+    std::unique_ptr<QProcess> desktop = here.launch({}, {{"QT_QPA_PLATFORM", "offscreen"}});
+    EXPECT_TRUE(desktop->waitForStarted());
+    const WTSingleInstance probe(here.runtimeFolder() + "/tessal.socket");
+    QElapsedTimer waited;
+    waited.start();
+    while (!probe.notifyRunningInstance(1000, false) && waited.elapsed() < 30000) QThread::msleep(20);
+    EXPECT_EQ(desktop->state(), QProcess::Running) << desktop->readAllStandardError().toStdString();
+    return desktop;
+  }
+
+  Installation here;
+};
+
+TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
+  Outcome run = here.tessal({"status"});
+  EXPECT_EQ(run.code, 1) << "nothing runs";
+  EXPECT_EQ(run.out, "No timer is running\n");
+
+  run = here.tessal({"start", "design"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("2 tasks are named “design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"))
+      << run.err.toStdString();
+  EXPECT_EQ(stored().times, 1) << "an ambiguous name starts nothing";
+
+  run = here.tessal({"start", "design", "--project", "ATLAS"});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(run.out, "Started Atlas › Design\n");
+  run = here.tessal({"start", "Design", "--client", "acme"});
+  EXPECT_EQ(run.code, 0);
+  EXPECT_EQ(run.out, "Atlas › Design is running already\n");
+  run = here.tessal({"start", kQuoted.toUpper()});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(stored().running, QStringList({"Atlas/" + kQuoted, "Atlas/Design"}));
+  EXPECT_EQ(stored().times, 3);
+
+  run = here.tessal({"status"});
+  EXPECT_EQ(run.code, 0);
+  EXPECT_EQ(run.out.count('\n'), 3) << run.out.toStdString();
+  EXPECT_TRUE(run.out.contains("Atlas › " + kQuoted + "  00:0"));
+  EXPECT_TRUE(run.out.contains("\nTotal  00:0"));
+  run = here.tessal({"status", "--json"});
+  const QJsonObject status = QJsonDocument::fromJson(run.out.toUtf8()).object();
+  ASSERT_EQ(status["running"].toArray().size(), 2) << run.out.toStdString();
+  EXPECT_EQ(status["running"][0]["client"].toString(), "Acme");
+  EXPECT_EQ(status["running"][0]["task"].toString(), "Design") << "oldest first";
+  EXPECT_TRUE(status["minutes"].isDouble());
+
+  run = here.tessal({"stop", kQuoted});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_TRUE(run.out.startsWith("Stopped Atlas › " + kQuoted + "  ")) << run.out.toStdString();
+  EXPECT_EQ(stored().running, QStringList({"Atlas/Design"}));
+  run = here.tessal({"stop", "review"});
+  EXPECT_EQ(run.out, "Hermes › Review is not running\n");
+  run = here.tessal({"stop"});
+  EXPECT_EQ(run.code, 0);
+  EXPECT_TRUE(run.out.startsWith("Stopped Atlas › Design")) << run.out.toStdString();
+  EXPECT_EQ(stored().running, QStringList());
+  EXPECT_EQ(here.tessal({"status"}).code, 1);
+  EXPECT_EQ(here.tessal({"stop"}).out, "No timer is running\n");
+
+  // The entries wait in the sync journal, as the desktop copy's own changes do.
+  QFile journal(here.journalPath());
+  ASSERT_TRUE(journal.open(QIODevice::ReadOnly));
+  const QJsonObject inserted = QJsonDocument::fromJson(journal.readAll()).object()["track"].toObject()["i"].toObject();
+  EXPECT_EQ(inserted.size(), 2);
+}
+
+TEST_F(TrackCommand, StartingStopsTheOtherTimersWhenTheSettingSaysSo) {
+  here.setSetting("WTStopsOtherTimes", "YES");
+  ASSERT_EQ(here.tessal({"start", "Review"}).code, 0);
+  const Outcome run = here.tessal({"start", "Design", "--project", "Hermes"});
+  EXPECT_EQ(run.code, 0);
+  EXPECT_TRUE(run.out.startsWith("Stopped Hermes › Review  00:0")) << run.out.toStdString();
+  EXPECT_TRUE(run.out.endsWith("Started Hermes › Design\n"));
+  EXPECT_EQ(stored().running, QStringList({"Hermes/Design"}));
+}
+
+TEST_F(TrackCommand, TwoStartsAtTheSameMomentActAsOneAfterTheOther) {
+  // Each writer reads, decides and saves: two at once would both find the task idle and start it twice,
+  // or each stop only the timers it saw. One writer at a time makes the second see the first's change.
+  here.setSetting("WTStopsOtherTimes", "YES");
+  for (int round = 0; round < 3; ++round) {
+    std::unique_ptr<QProcess> first = here.launch({"start", "Review"});
+    std::unique_ptr<QProcess> second = here.launch({"start", "Review"});
+    std::unique_ptr<QProcess> other = here.launch({"start", kQuoted});
+    EXPECT_EQ(Installation::finish(*first).code, 0);
+    EXPECT_EQ(Installation::finish(*second).code, 0);
+    EXPECT_EQ(Installation::finish(*other).code, 0);
+    const Stored now = stored();
+    EXPECT_EQ(now.running.size(), 1) << "round " << round << ": " << now.running.join(", ").toStdString();
+    ASSERT_EQ(here.tessal({"stop"}).code, 0);
+  }
+}
+
+TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
+  std::unique_ptr<QProcess> desktop = startDesktop();
+  Outcome run = here.tessal({"start", "Review"});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(run.out, "Started Hermes › Review\n");
+  // Saved by the desktop copy before it answered, so a reader sees it at once.
+  EXPECT_EQ(stored().running, QStringList({"Hermes/Review"}));
+  EXPECT_EQ(here.tessal({"status"}).code, 0);
+
+  std::unique_ptr<QProcess> first = here.launch({"start", "design", "--project", "atlas"});
+  std::unique_ptr<QProcess> second = here.launch({"start", kQuoted});
+  EXPECT_EQ(Installation::finish(*first).code, 0);
+  EXPECT_EQ(Installation::finish(*second).code, 0);
+  EXPECT_EQ(stored().running, QStringList({"Atlas/" + kQuoted, "Atlas/Design", "Hermes/Review"}));
+
+  // Stopping finds the entries the desktop copy started: it, not the command, holds them.
+  run = here.tessal({"stop"});
+  EXPECT_EQ(run.code, 0);
+  EXPECT_EQ(run.out.count("Stopped"), 3) << run.out.toStdString();
+  EXPECT_EQ(stored().running, QStringList());
+  EXPECT_EQ(here.tessal({"start", "nothing"}).code, 1);
+  EXPECT_EQ(desktop->state(), QProcess::Running);
+  desktop->kill();
+  desktop->waitForFinished();
+
+  // With the desktop copy gone, the commands change the store themselves again.
+  EXPECT_EQ(here.tessal({"start", "Review"}).code, 0);
+  EXPECT_EQ(stored().running, QStringList({"Hermes/Review"}));
+}
+
+TEST_F(TrackCommand, RefusesArgumentsItDoesNotUnderstandChangingNothing) {
+  for (const QStringList& arguments : {QStringList{"start"}, {"start", "Design", "Review"}, {"start", "Review", "--bogus"},
+                                       {"stop", "--project", "Atlas"}, {"status", "Design"}, {"log", "--range", "soon"},
+                                       {"start", "Review", "--project", "a", "--project", "b"}}) {
+    const Outcome run = here.tessal(arguments);
+    EXPECT_EQ(run.code, 2) << arguments.join(' ').toStdString();
+    EXPECT_TRUE(run.err.contains("usage: tessal " + arguments.first())) << run.err.toStdString();
+  }
+  EXPECT_EQ(stored().times, 1);
+}
+
+TEST_F(TrackCommand, LogsTheEntriesOfARangeWithTheirTotals) {
+  const QMap<QString, QString> berlin = {{"TZ", "Europe/Berlin"}, {"LANG", "C.UTF-8"}};
+  Outcome run = here.tessal({"log", "--range", "2026-03-03..2026-03-03"}, berlin);
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(run.out.toStdString(),
+            "2026-03-03  09:00–10:15  Hermes › Review  01:15  125.00\n"
+            "Total: 1 entry  01:15  125.00\n");
+  run = here.tessal({"log", "--range", "2026-03-04..2026-03-05", "--project", "hermes"}, berlin);
+  EXPECT_EQ(run.out.toStdString(), "Total: 0 entries  00:00  0.00\n");
+  run = here.tessal({"log", "--project", "nowhere"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("no project is named “nowhere”")) << run.err.toStdString();
+}
+
+TEST(TrackCommandWithoutStore, SaysThereIsNoDataAndCreatesNone) {
+  Installation here;
+  for (const QStringList& arguments : {QStringList{"start", "Design"}, {"stop"}, {"status"}}) {
+    const Outcome run = here.tessal(arguments);
+    EXPECT_EQ(run.code, 1);
+    EXPECT_TRUE(run.err.contains("There is no data file at")) << run.err.toStdString();
+  }
+  EXPECT_FALSE(QFileInfo::exists(QFileInfo(here.storePath()).path()));
+}
+
+}  // namespace
