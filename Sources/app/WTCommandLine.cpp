@@ -76,7 +76,7 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
 }
 
 constexpr char kUsage[] =
-    "usage: tessal [start|stop|status|log|report|export|template|sync] [ARGS...]   (tessal --help tells more)\n";
+    "usage: tessal [start|stop|status|log|list|report|export|template|sync] [ARGS...]   (tessal --help tells more)\n";
 
 constexpr char kHelp[] =
     "Tessal tracks working time and bills it.\n"
@@ -91,6 +91,8 @@ constexpr char kHelp[] =
     "                                                none runs\n"
     "  tessal log [--range RANGE] [--project NAME]   the time entries of a range (today by default) and its\n"
     "                                                totals\n"
+    "  tessal list tasks|projects|clients [--project NAME] [--client NAME]\n"
+    "                                                the names there are, one a line\n"
     "  tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n"
     "                                                a report as HTML on stdout, or in FILE as .html, .pdf or .csv\n"
     "                                                (modes: 0 tasks, 1 items, 2 days, 3 months)\n"
@@ -149,6 +151,7 @@ std::optional<int> runCommandLine(int argc, char** argv) {
     return 0;
   }
   static const QStringList commands = {QStringLiteral("report"), QStringLiteral("export"), QStringLiteral("log"),
+                                       QStringLiteral("list"),
                                        QStringLiteral("template"), QStringLiteral("sync")};
   if (!commands.contains(command) && !WTTimerCommands::isTimerCommand(command)) {
     if (desktopArgumentsValid(argc, argv)) return std::nullopt;
@@ -171,12 +174,14 @@ std::optional<int> runCommandLine(int argc, char** argv) {
   app->setApplicationName(QStringLiteral("Tessal"));
   app->setOrganizationName(QStringLiteral("Tessal"));
   QTextStream out(stdout), err(stderr);
-  if (WTTimerCommands::isTimerCommand(command) || command == QLatin1String("log")) {
+  if (WTTimerCommands::isTimerCommand(command) || command == QLatin1String("log") ||
+      command == QLatin1String("list")) {
     // Their output is for people and scripts: the journal's and the store's diary stays out of it.
     QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
   }
   if (WTTimerCommands::isTimerCommand(command)) return runTrackCommand(command, arguments, out, err);
   if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);
+  if (command == QLatin1String("list")) return runListCommand(arguments, out, err);
   if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
   if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
   if (command == QLatin1String("template")) return runTemplateCommand(arguments, out, err);

@@ -5,6 +5,7 @@
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
 #include "WTApplication.h"
+#include "WTClient.h"
 #include "WTCSVExport.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -111,6 +112,58 @@ int runTrackCommand(const QString& command, const QStringList& arguments, QTextS
   std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
   if (!snapshot) return 1;
   return print(WTTimerCommands::run(snapshot->context(), command, arguments), out, err);
+}
+
+int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
+  constexpr char kUsage[] = "usage: tessal list tasks|projects|clients [--project NAME] [--client NAME]\n";
+  QCommandLineParser parser;
+  parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
+  parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
+  parser.addOption(QCommandLineOption(QStringLiteral("client"), QString(), QStringLiteral("name")));
+  static const QStringList kinds = {QStringLiteral("tasks"), QStringLiteral("projects"), QStringLiteral("clients")};
+  QString problem;
+  if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments))
+    problem = parser.errorText();
+  else if (parser.positionalArguments().size() != 1 || !kinds.contains(parser.positionalArguments().first()))
+    problem = QStringLiteral("name what to list: tasks, projects or clients");
+  if (!problem.isEmpty()) {
+    err << "tessal: " << problem << '\n' << kUsage;
+    err.flush();
+    return 2;
+  }
+  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
+  if (!snapshot) return 1;
+  const QString kind = parser.positionalArguments().first();
+  const bool byProject = parser.isSet(QStringLiteral("project"));
+  const bool byClient = parser.isSet(QStringLiteral("client"));
+  auto named = [](const WTObject* object, const QString& name) {
+    return object && object->name().compare(name, Qt::CaseInsensitive) == 0;
+  };
+  auto projectPasses = [&](const WTProject* project) {
+    return (!byProject || named(project, parser.value(QStringLiteral("project")))) &&
+           (!byClient || (project && named(project->client(), parser.value(QStringLiteral("client")))));
+  };
+  QStringList names;
+  const WTObjectContext& context = snapshot->context();
+  if (kind == QLatin1String("tasks")) {
+    for (const WTTask* task : context.fetch<WTTask>())
+      if (projectPasses(task->project())) names.append(task->name());
+  } else if (kind == QLatin1String("projects")) {
+    for (const WTProject* project : context.fetch<WTProject>())
+      if (projectPasses(project)) names.append(project->name());
+  } else {
+    for (const WTClient* client : context.fetch<WTClient>()) names.append(client->name());
+  }
+  names.removeAll(QString());
+  std::sort(names.begin(), names.end(), [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+  names.erase(std::unique(names.begin(), names.end()), names.end());
+  for (const QString& name : names) {
+    // One name a line: a line break inside a name would read as two.
+    QString line = name;
+    out << line.replace(u'\n', u' ') << '\n';
+  }
+  out.flush();
+  return 0;
 }
 
 int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {

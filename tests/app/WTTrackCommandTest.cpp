@@ -233,6 +233,16 @@ TEST_F(TrackCommand, LogsTheEntriesOfARangeWithTheirTotals) {
   EXPECT_TRUE(run.err.contains("no project is named “nowhere”")) << run.err.toStdString();
 }
 
+TEST_F(TrackCommand, ListsEachNameOnceForPickersAndCompletion) {
+  const QMap<QString, QString> c = {{"LANG", "C.UTF-8"}};
+  EXPECT_EQ(here.tessal({"list", "tasks"}, c).out.toStdString(), "Build \"it\" now\nDesign\nReview\n");
+  EXPECT_EQ(here.tessal({"list", "tasks", "--project", "HERMES"}, c).out.toStdString(), "Design\nReview\n");
+  EXPECT_EQ(here.tessal({"list", "tasks", "--client", "acme"}, c).out.toStdString(), "Build \"it\" now\nDesign\n");
+  EXPECT_EQ(here.tessal({"list", "projects", "--client", "Acme"}, c).out.toStdString(), "Atlas\n");
+  EXPECT_EQ(here.tessal({"list", "clients"}, c).out.toStdString(), "Acme\n");
+  EXPECT_EQ(here.tessal({"list", "notes"}).code, 2);
+}
+
 TEST(TrackCommandWithoutStore, SaysThereIsNoDataAndCreatesNone) {
   Installation here;
   for (const QStringList& arguments : {QStringList{"start", "Design"}, {"stop"}, {"status"}}) {
