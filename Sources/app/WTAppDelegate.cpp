@@ -5,6 +5,7 @@
 #include "WTAlertPresenter.h"
 #include "WTObject.h"
 #include "WTObjectContext.h"
+#include "WTStopwatchUpdater.h"
 #include "WTStore.h"
 
 #include <QDir>
@@ -17,6 +18,7 @@ WTAppDelegate::WTAppDelegate(UserDefaults* defaults, WTAlertPresenter* presenter
     : QObject(parent), defaults_(defaults), presenter_(presenter) {}
 
 WTAppDelegate::~WTAppDelegate() {
+  stopwatchUpdater_.reset();
   syncManager_.reset();
   if (WTObjectContext::defaultContext() == context_.get()) WTObjectContext::setDefaultContext(nullptr);
 }
@@ -64,6 +66,18 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   });
   syncManager_->enableSync();
   return context_.get();
+}
+
+WTStopwatchUpdater* WTAppDelegate::startStopwatchUpdater(WTIdleSource* idle, WTTrackingAlertPresenter* presenter,
+                                                         WTSleepMonitor* sleep, WTLauncherEntry* launcherEntry) {
+  if (stopwatchUpdater_) return stopwatchUpdater_.get();
+  WTObjectContext* context = managedObjectContext();
+  stopwatchUpdater_ = std::make_unique<WTStopwatchUpdater>(context, defaults_, idle, presenter);
+  if (sleep) stopwatchUpdater_->setSleepMonitor(sleep);
+  stopwatchUpdater_->setLauncherEntry(launcherEntry);
+  stopwatchUpdater_->setSaveCallback([this] { return saveChanges(); });
+  stopwatchUpdater_->start();
+  return stopwatchUpdater_.get();
 }
 
 void WTAppDelegate::managedObjectContextObjectsDidChange() {
@@ -116,6 +130,8 @@ QString WTAppDelegate::syncNetworkRequestsPassword(RZSyncNetwork*) {
 
 WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
   if (!context_) return TerminateReply::TerminateNow;
+  // Asked first, so that the answer (stopped entries, their end dates) is part of the last save.
+  if (stopwatchUpdater_) stopwatchUpdater_->applicationWillTerminate();
   if (commitEditing_ && !commitEditing_()) return TerminateReply::TerminateCancel;
   if (!context_->hasChanges()) return TerminateReply::TerminateNow;
   const Result<void> saved = context_->save();
@@ -126,4 +142,9 @@ WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
 
 void WTAppDelegate::applicationWillTerminate() {
   if (syncManager_) syncManager_->disableSync();
+}
+
+void WTAppDelegate::sessionWillEnd() {
+  if (stopwatchUpdater_) stopwatchUpdater_->sessionWillEnd();
+  saveChanges();
 }

@@ -13,6 +13,11 @@ class RZSyncErrorPresenter;
 class RZSyncManager;
 class UserDefaults;
 class WTAlertPresenter;
+class WTIdleSource;
+class WTLauncherEntry;
+class WTSleepMonitor;
+class WTStopwatchUpdater;
+class WTTrackingAlertPresenter;
 class WTObject;
 class WTObjectContext;
 
@@ -42,6 +47,13 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // Where sync errors are shown (not owned); the log until set. Applies to a manager made later too.
   void setSyncErrorPresenter(RZSyncErrorPresenter* presenter);
 
+  // The five-second ticker over the context (made with it if need be), started with the desktop's parts:
+  // where idle time comes from, who asks about idle time and quitting, sleep and the launcher entry. Any
+  // part may be null. Once only; later calls return the same ticker. The commands never make one.
+  WTStopwatchUpdater* startStopwatchUpdater(WTIdleSource* idle, WTTrackingAlertPresenter* presenter,
+                                            WTSleepMonitor* sleep, WTLauncherEntry* launcherEntry);
+  WTStopwatchUpdater* stopwatchUpdater() const { return stopwatchUpdater_.get(); }
+
   // Saves when there are changes; a failure is shown (unless there is no store at all, which was
   // reported when opening) and the changes stay for the next attempt. Logs "Saved" either way.
   void saveAction();
@@ -61,9 +73,12 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   QString syncNetworkRequestsPassword(RZSyncNetwork* network) override;
 
   enum class TerminateReply { TerminateNow, TerminateCancel };
-  // Commits editing, saves, and on a failed save asks whether to quit anyway.
+  // Asks about running timers (the ticker's quit prompt), commits editing, saves, and on a failed save
+  // asks whether to quit anyway.
   TerminateReply applicationShouldTerminate();
   void applicationWillTerminate();
+  // The desktop session is ending: nothing may be asked; running timers are saved running.
+  void sessionWillEnd();
 
   // Runs before quitting and before each safe save that has something to save, to commit an edit in
   // progress without ending it; false refuses.
@@ -81,6 +96,8 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   std::unique_ptr<WTObjectContext> context_;
   // After the context: the manager detaches its journal from the context when it goes.
   std::unique_ptr<RZSyncManager> syncManager_;
+  // Before the context goes: it observes the context's records.
+  std::unique_ptr<WTStopwatchUpdater> stopwatchUpdater_;
   std::function<bool()> commitEditing_;
   bool displayArchived_ = false;
 };

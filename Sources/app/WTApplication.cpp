@@ -4,7 +4,14 @@
 #include "WTAppDelegate.h"
 #include "WTDialogAlertPresenter.h"
 #include "WTImages.h"
+#include "WTDialogTrackingAlertPresenter.h"
+#include "WTIdleSourceChain.h"
+#include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
+#include "WTSleepMonitor.h"
+#include "WTStopwatchUpdater.h"
+
+#include <QDBusConnection>
 
 WTApplication::WTApplication(int& argc, char** argv)
     : QApplication(argc, argv),
@@ -18,6 +25,8 @@ WTApplication::WTApplication(int& argc, char** argv)
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
   delegate_->setSyncErrorPresenter(presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);
+  // Logging out asks nothing: running timers are saved as they are and go on running next time.
+  connect(this, &QGuiApplication::commitDataRequest, delegate_.get(), &WTAppDelegate::sessionWillEnd);
 }
 
 WTApplication::~WTApplication() {
@@ -43,7 +52,19 @@ QMainWindow* WTApplication::mainWindow() {
 }
 
 void WTApplication::applicationDidFinishLaunching() {
-  mainWindowController()->bringToFront();
+  WTMainWindowController* window = mainWindowController();
+  window->bringToFront();
+  if (delegate_->stopwatchUpdater()) return;
+  idleSource_ = makeDesktopIdleSource(QDBusConnection::sessionBus());
+  trackingPresenter_ = std::make_unique<WTDialogTrackingAlertPresenter>(window);
+  sleepMonitor_ = std::make_unique<WTSleepMonitor>(QDBusConnection::systemBus());
+  launcherEntry_ = std::make_unique<WTLauncherEntry>(QDBusConnection::sessionBus());
+  WTStopwatchUpdater* updater = delegate_->startStopwatchUpdater(idleSource_.get(), trackingPresenter_.get(),
+                                                                 sleepMonitor_.get(), launcherEntry_.get());
+  // The running time shows in the title, where every desktop's task switcher shows it too.
+  auto showRunningTime = [window, updater] { window->setWindowTitle(updater->windowTitle(QStringLiteral("Tessal"))); };
+  connect(updater, &WTStopwatchUpdater::badgeDidChange, window, showRunningTime);
+  showRunningTime();
 }
 
 bool WTApplication::applicationShouldHandleReopen(bool) {

@@ -8,7 +8,11 @@ class QMainWindow;
 class UserDefaults;
 class WTAppDelegate;
 class WTDialogAlertPresenter;
+class WTIdleSource;
+class WTLauncherEntry;
 class WTMainWindowController;
+class WTSleepMonitor;
+class WTTrackingAlertPresenter;
 
 // The application object: registers the defaults of the user's settings, owns the delegate and the
 // main window, and routes quitting through the delegate so that nothing unsaved is lost.
@@ -27,7 +31,8 @@ class WTApplication : public QApplication {
   WTMainWindowController* mainWindowController();
   QMainWindow* mainWindow();
 
-  // Launch: brings the main window forward, which opens the store through the delegate.
+  // Launch: brings the main window forward, which opens the store through the delegate, and starts the
+  // ticker with this desktop's idle time, sleep notices and launcher entry.
   void applicationDidFinishLaunching();
   // Re-open (another launch while running): brings the main window forward; always handled.
   bool applicationShouldHandleReopen(bool hasVisibleWindows);
@@ -35,6 +40,11 @@ class WTApplication : public QApplication {
  private:
   std::unique_ptr<UserDefaults> defaults_;
   std::unique_ptr<WTDialogAlertPresenter> presenter_;
+  // The ticker's desktop parts; the delegate's ticker uses them, and goes first.
+  std::unique_ptr<WTIdleSource> idleSource_;
+  std::unique_ptr<WTTrackingAlertPresenter> trackingPresenter_;
+  std::unique_ptr<WTSleepMonitor> sleepMonitor_;
+  std::unique_ptr<WTLauncherEntry> launcherEntry_;
   std::unique_ptr<WTAppDelegate> delegate_;
   std::unique_ptr<WTMainWindowController> mainWindowController_;
 };

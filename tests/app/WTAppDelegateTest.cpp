@@ -11,7 +11,11 @@
 #include "WTObjectListModel.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTStopwatchUpdater.h"
+#include "WTStore.h"
 #include "WTTask.h"
+#include "WTTime.h"
+#include "WTTrackingAlert.h"
 
 #include <gtest/gtest.h>
 
@@ -192,4 +196,59 @@ TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) 
 
   delegate->applicationWillTerminate();
   EXPECT_FALSE(sync->syncEnabled());
+}
+
+namespace {
+
+// Answers the ticker's questions with one button and counts them.
+class AnsweringPresenter final : public WTTrackingAlertPresenter {
+ public:
+  explicit AnsweringPresenter(WTTrackingAlertAnswer answer) : answer_(answer) {}
+  WTTrackingAlertAnswer runAlert(const WTTrackingAlert& alert) override {
+    titles << alert.messageText;
+    return answer_;
+  }
+  QStringList titles;
+
+ private:
+  WTTrackingAlertAnswer answer_;
+};
+
+// Whether the one time entry of the store file runs, as a later start of the application would find it.
+std::optional<bool> storedEntryRuns(const QString& path) {
+  auto store = WTStore::openReadOnly(path);
+  if (!store) return std::nullopt;
+  WTObjectContext context;
+  if (!context.attachStore(std::move(store.value()))) return std::nullopt;
+  const QList<WTTime*> times = context.fetch<WTTime>();
+  if (times.size() != 1) return std::nullopt;
+  return times.first()->running();
+}
+
+}  // namespace
+
+TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRunning) {
+  for (const auto answer : {WTTrackingAlertAnswer::Default, WTTrackingAlertAnswer::Alternate}) {
+    QDir(home.filePath("data")).removeRecursively();
+    AnsweringPresenter asking(answer);
+    auto delegate = makeDelegate();
+    auto* task = WTTask::insertNewObject(delegate->managedObjectContext());
+    delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
+    task->toggleTimer();
+    EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
+    EXPECT_EQ(asking.titles, QStringList{"Running Timer"});
+    // "Stop" ends the entry in the last save; "Keep running" saves it running.
+    EXPECT_EQ(storedEntryRuns(delegate->storePath()), answer == WTTrackingAlertAnswer::Alternate);
+  }
+
+  QDir(home.filePath("data")).removeRecursively();
+  AnsweringPresenter asking(WTTrackingAlertAnswer::Default);
+  auto delegate = makeDelegate();
+  delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
+  EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
+  EXPECT_TRUE(asking.titles.isEmpty()) << "nothing runs, nothing to ask";
+  WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
+  delegate->sessionWillEnd();
+  EXPECT_TRUE(asking.titles.isEmpty()) << "a session that ends cannot wait for an answer";
+  EXPECT_EQ(storedEntryRuns(delegate->storePath()), true);
 }
