@@ -127,6 +127,7 @@ WTObject* WTObjectContext::insertNewObject(WTEntity entity) {
   registerObject(object, true);
   inserted_.insert(object);
   turnInserted_.append(object);
+  turnAnnounced_.insert(object);
   undo_.registerUndo([this, object] { removeFromGraph(object); });
   object->awakeFromInsert();
   scheduleProcessing();
@@ -155,6 +156,7 @@ void WTObjectContext::reinsertObject(WTObject* object) {
     inserted_.insert(object);
   }
   turnInserted_.append(object);
+  turnAnnounced_.insert(object);
   undo_.registerUndo([this, object] { removeFromGraph(object); });
   scheduleProcessing();
 }
@@ -271,8 +273,10 @@ void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int old
 
 void WTObjectContext::markChanged(WTObject* object, const QString& key) {
   if (!object->changedKeys_.contains(key)) object->changedKeys_.append(key);
-  if (object->registered_ && !inserted_.count(object) && updated_.insert(object).second) {
-    turnUpdated_.append(object);
+  if (object->registered_) {
+    if (!inserted_.count(object)) updated_.insert(object);
+    // Each turn announces what changed in it, whatever earlier turns since the last save announced.
+    if (turnAnnounced_.insert(object).second) turnUpdated_.append(object);
   }
   scheduleProcessing();
 }
@@ -404,6 +408,7 @@ void WTObjectContext::processPendingChanges() {
   const QList<WTObject*> inserted = std::exchange(turnInserted_, {});
   const QList<WTObject*> updated = std::exchange(turnUpdated_, {});
   const QList<WTObject*> deleted = std::exchange(turnDeleted_, {});
+  turnAnnounced_.clear();
   emit objectsDidChange(inserted, updated, deleted);
 }
 

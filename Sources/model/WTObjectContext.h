@@ -156,6 +156,8 @@ class WTObjectContext : public QObject {
   std::unordered_set<WTObject*> inserted_, updated_, deleted_;
   // Since the last processPendingChanges.
   QList<WTObject*> turnInserted_, turnUpdated_, turnDeleted_;
+  // What turnInserted_ and turnUpdated_ hold, to announce each record once per turn.
+  std::unordered_set<WTObject*> turnAnnounced_;
   bool processingScheduled_ = false;
 
   struct ObserverEntry {

@@ -258,6 +258,28 @@ TEST_F(WTObjectContextTest, ChangesAreAnnouncedOncePerTurn) {
   EXPECT_EQ(spy.count(), 1);
 }
 
+TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItEvenBeforeASave) {
+  // A list that follows the store learns of a change only here: a record changed in one turn and again in
+  // a later one, with no save between them, must be announced both times.
+  QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
+  WTTask* task = makeTask();
+  QCoreApplication::processEvents();
+  ASSERT_EQ(spy.count(), 1);
+  task->setName("inserted, then changed in a later turn");
+  QCoreApplication::processEvents();
+  ASSERT_EQ(spy.count(), 2);
+  EXPECT_EQ(spy[1][1].value<QList<WTObject*>>(), QList<WTObject*>{task});
+
+  ASSERT_TRUE(context->save());
+  task->setName("changed after a save");
+  QCoreApplication::processEvents();
+  task->setName("and changed again");
+  QCoreApplication::processEvents();
+  ASSERT_EQ(spy.count(), 4);
+  EXPECT_EQ(spy[3][1].value<QList<WTObject*>>(), QList<WTObject*>{task});
+  EXPECT_TRUE(context->hasChanges());
+}
+
 TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   WTTask* task = makeTask();
   auto* expense = makeItem<WTExpense>(task, berlin(2026, 1, 1));
