@@ -9,6 +9,7 @@
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
 #include "WTSleepMonitor.h"
+#include "WTStatusBarController.h"
 #include "WTStopwatchUpdater.h"
 
 #include <QDBusConnection>
@@ -30,6 +31,7 @@ WTApplication::WTApplication(int& argc, char** argv)
 }
 
 WTApplication::~WTApplication() {
+  statusBarController_.reset();
   mainWindowController_.reset();
   delegate_.reset();
 }
@@ -62,9 +64,29 @@ void WTApplication::applicationDidFinishLaunching() {
   WTStopwatchUpdater* updater = delegate_->startStopwatchUpdater(idleSource_.get(), trackingPresenter_.get(),
                                                                  sleepMonitor_.get(), launcherEntry_.get());
   // The running time shows in the title, where every desktop's task switcher shows it too.
-  auto showRunningTime = [window, updater] { window->setWindowTitle(updater->windowTitle(QStringLiteral("Tessal"))); };
+  auto showRunningTime = [window, updater] {
+    window->setWindowTitle(updater->windowTitle(QStringLiteral("Tessal")));
+    window->setRunningTime(updater->badgeLabel());
+  };
   connect(updater, &WTStopwatchUpdater::badgeDidChange, window, showRunningTime);
   showRunningTime();
+
+  statusBarController_ = std::make_unique<WTStatusBarController>(delegate_->managedObjectContext(), updater);
+  linkStatusBar(*statusBarController_, *window);
+  statusBarController_->activateStatusMenu();
+}
+
+void WTApplication::linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window) {
+  connect(&statusBar, &WTStatusBarController::showMainWindowRequested, &window, &WTMainWindowController::bringToFront);
+  connect(&statusBar, &WTStatusBarController::quitRequested, &window, &WTMainWindowController::quit);
+  connect(&window, &WTMainWindowController::runningTimeButtonClicked, &statusBar,
+          &WTStatusBarController::statusBarClicked);
+  auto followTray = [&window](bool available) {
+    window.setHidesOnClose(available);
+    window.setRunningTimeButtonVisible(!available);
+  };
+  connect(&statusBar, &WTStatusBarController::trayAvailabilityChanged, &window, followTray);
+  followTray(statusBar.isShowingIcon());
 }
 
 bool WTApplication::applicationShouldHandleReopen(bool) {

@@ -12,6 +12,7 @@ class WTIdleSource;
 class WTLauncherEntry;
 class WTMainWindowController;
 class WTSleepMonitor;
+class WTStatusBarController;
 class WTTrackingAlertPresenter;
 
 // The application object: registers the defaults of the user's settings, owns the delegate and the
@@ -37,6 +38,13 @@ class WTApplication : public QApplication {
   // Re-open (another launch while running): brings the main window forward; always handled.
   bool applicationShouldHandleReopen(bool hasVisibleWindows);
 
+  // Makes the window follow the tray: with one, closing the window leaves Tessal in the tray; without,
+  // the toolbar's running-time button opens the tray's list. Both ways lead to the window and to Quit.
+  static void linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window);
+
+  // The tray's icon and list; made at launch.
+  WTStatusBarController* statusBarController() const { return statusBarController_.get(); }
+
  private:
   std::unique_ptr<UserDefaults> defaults_;
   std::unique_ptr<WTDialogAlertPresenter> presenter_;
@@ -47,4 +55,5 @@ class WTApplication : public QApplication {
   std::unique_ptr<WTLauncherEntry> launcherEntry_;
   std::unique_ptr<WTAppDelegate> delegate_;
   std::unique_ptr<WTMainWindowController> mainWindowController_;
+  std::unique_ptr<WTStatusBarController> statusBarController_;
 };

@@ -25,6 +25,7 @@
 #include <QScreen>
 #include <QStyle>
 #include <QToolBar>
+#include <QToolButton>
 #include <QVBoxLayout>
 
 WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget* parent)
@@ -165,6 +166,18 @@ void WTMainWindowController::buildActions() {
   toolbar_->addWidget(spacer);
   toolbar_->addAction(archive);
   toolbar_->addAction(report);
+  runningTimeButton_ = new QToolButton(toolbar_);
+  runningTimeButton_->setObjectName(QStringLiteral("runningTime"));
+  runningTimeButton_->setIcon(WTImages::icon(QStringLiteral("StopWatch")));
+  runningTimeButton_->setToolButtonStyle(Qt::ToolButtonTextUnderIcon);
+  runningTimeButton_->setToolTip(tr("Running timers and recent tasks"));
+  connect(runningTimeButton_, &QToolButton::clicked, this, [this] {
+    emit runningTimeButtonClicked(
+        QRect(runningTimeButton_->mapToGlobal(QPoint(0, 0)), runningTimeButton_->size()));
+  });
+  runningTimeItem_ = toolbar_->addWidget(runningTimeButton_);
+  runningTimeItem_->setVisible(false);
+  setRunningTime(QString());
 
   QMenu* file = menuBar()->addMenu(tr("&File"));
   file->addAction(add);
@@ -175,7 +188,7 @@ void WTMainWindowController::buildActions() {
                                           &WTMainWindowController::exportData);
   exportAction->setObjectName(QStringLiteral("export"));
   file->addSeparator();
-  file->addAction(tr("&Quit"), QKeySequence::Quit, this, &QWidget::close);
+  file->addAction(tr("&Quit"), QKeySequence::Quit, this, &WTMainWindowController::quit);
 
   QMenu* edit = menuBar()->addMenu(tr("&Edit"));
   QAction* undo = edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
@@ -416,7 +429,29 @@ void WTMainWindowController::saveWindowGeometry() {
     defaults->setValue(QString::fromLatin1(kGeometryKey), QString::fromLatin1(saveGeometry().toBase64()));
 }
 
+void WTMainWindowController::quit() {
+  quitting_ = true;
+  const bool closed = isVisible() ? close() : (delegate_.applicationShouldTerminate() ==
+                                               WTAppDelegate::TerminateReply::TerminateNow);
+  quitting_ = false;
+  if (closed) QApplication::quit();
+}
+
+void WTMainWindowController::setRunningTimeButtonVisible(bool visible) {
+  runningTimeItem_->setVisible(visible);
+}
+
+void WTMainWindowController::setRunningTime(const QString& label) {
+  runningTimeButton_->setText(label.isEmpty() ? tr("Timers") : label);
+}
+
 void WTMainWindowController::closeEvent(QCloseEvent* event) {
+  if (hidesOnClose_ && !quitting_) {
+    // Tessal goes on in the tray; the window comes back from there.
+    saveWindowGeometry();
+    event->accept();
+    return;
+  }
   if (delegate_.applicationShouldTerminate() == WTAppDelegate::TerminateReply::TerminateCancel) {
     event->ignore();
     return;

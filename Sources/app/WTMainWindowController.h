@@ -10,6 +10,7 @@
 class QAction;
 class QActionGroup;
 class QToolBar;
+class QToolButton;
 class UserDefaults;
 class WTAppDelegate;
 class WTClientsViewController;
@@ -75,11 +76,26 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   // Brings the window forward and makes it active (launch and re-open).
   void bringToFront();
 
+  // File › Quit: asks what the delegate asks at quitting, then quits (unless cancelled).
+  void quit();
+  // With a tray to come back from, closing the window only hides it and Tessal keeps running there;
+  // without, closing it quits.
+  void setHidesOnClose(bool hides) { hidesOnClose_ = hides; }
+  bool hidesOnClose() const { return hidesOnClose_; }
+  // Where the desktop has no tray, a toolbar button shows the running time and opens the tray's list.
+  void setRunningTimeButtonVisible(bool visible);
+  void setRunningTime(const QString& label);
+  QToolButton* runningTimeButton() const { return runningTimeButton_; }
+
   WTProjectsViewController* projectsViewController() const { return projectsViewController_; }
   WTClientsViewController* clientsViewController() const { return clientsViewController_; }
   WTNavigationController* projectsNavigationController() const { return projectsNavigationController_; }
   WTNavigationController* clientsNavigationController() const { return clientsNavigationController_; }
   QWidget* contentView() const { return contentView_; }
+
+ signals:
+  // The running-time button was clicked; `anchor` is its place on the screen.
+  void runningTimeButtonClicked(const QRect& anchor);
 
  protected:
   void closeEvent(QCloseEvent* event) override;
@@ -103,6 +119,10 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTNavigationController* projectsNavigationController_ = nullptr;
   WTNavigationController* clientsNavigationController_ = nullptr;
   QToolBar* toolbar_ = nullptr;
+  QToolButton* runningTimeButton_ = nullptr;
+  QAction* runningTimeItem_ = nullptr;
+  bool hidesOnClose_ = false;
+  bool quitting_ = false;
   QActionGroup* stackGroup_ = nullptr;
   QList<QAction*> actions_;
   QTimer validation_;

@@ -11,7 +11,10 @@
 #include "WTObjectListModel.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTStatusBarController.h"
+#include "WTStatusBarPopup.h"
 #include "WTStopwatchUpdater.h"
+#include <QToolButton>
 #include "WTStore.h"
 #include "WTTask.h"
 #include "WTTime.h"
@@ -251,4 +254,34 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
   delegate->sessionWillEnd();
   EXPECT_TRUE(asking.titles.isEmpty()) << "a session that ends cannot wait for an answer";
   EXPECT_EQ(storedEntryRuns(delegate->storePath()), true);
+}
+
+TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOneTheToolbarOffersTheList) {
+  AnsweringPresenter asking(WTTrackingAlertAnswer::Default);
+  auto delegate = makeDelegate();
+  WTMainWindowController window(*delegate);
+  WTStopwatchUpdater* updater = delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
+  WTStatusBarController statusBar(delegate->managedObjectContext(), updater);
+  WTApplication::linkStatusBar(statusBar, window);
+  window.show();
+  WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
+  QCoreApplication::processEvents();
+
+  // No tray here (offscreen): the toolbar's button shows the running time and opens the tray's list.
+  ASSERT_FALSE(statusBar.isShowingIcon());
+  EXPECT_TRUE(window.runningTimeButton()->isVisible());
+  window.runningTimeButton()->click();
+  EXPECT_TRUE(statusBar.popup()->isVisible());
+  EXPECT_EQ(statusBar.popup()->rowCount(), 2) << "the new task and the first run's default task";
+  statusBar.popup()->close();
+
+  // A tray turns up: closing the window only hides it; nothing is asked and nothing quits.
+  emit statusBar.trayAvailabilityChanged(true);
+  QCoreApplication::processEvents();  // the toolbar lays its items out afresh
+  EXPECT_FALSE(window.runningTimeButton()->isVisible());
+  EXPECT_TRUE(window.close());
+  EXPECT_FALSE(window.isVisible());
+  EXPECT_TRUE(asking.titles.isEmpty());
+  emit statusBar.showMainWindowRequested();
+  EXPECT_TRUE(window.isVisible());
 }

@@ -1,0 +1,130 @@
+#include "WTStatusBarPopup.h"
+
+#include "RZLimitedArrayController.h"
+#include "WTImages.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <QGuiApplication>
+#include <QHBoxLayout>
+#include <QLabel>
+#include <QPushButton>
+#include <QScreen>
+#include <QToolButton>
+#include <QVBoxLayout>
+
+namespace {
+
+constexpr int kImageSize = 24;
+
+}  // namespace
+
+WTStatusBarPopup::WTStatusBarPopup(RZLimitedArrayController* tasks, QWidget* parent)
+    : QFrame(parent, Qt::Popup | Qt::FramelessWindowHint), tasks_(tasks) {
+  setObjectName(QStringLiteral("statusBarPopup"));
+  setWindowTitle(tr("Tessal — Recent Tasks"));
+  setFrameShape(QFrame::StyledPanel);
+  setAttribute(Qt::WA_DeleteOnClose, false);
+  auto* layout = new QVBoxLayout(this);
+  layout->setContentsMargins(8, 8, 8, 8);
+  layout->setSpacing(6);
+  rows_ = new QVBoxLayout;
+  rows_->setSpacing(2);
+  layout->addLayout(rows_);
+  emptyHint_ = new QLabel(tr("No tasks yet"), this);
+  emptyHint_->setEnabled(false);
+  layout->addWidget(emptyHint_);
+  auto* show = new QPushButton(tr("Show Tessal"), this);
+  show->setObjectName(QStringLiteral("showMainWindow"));
+  connect(show, &QPushButton::clicked, this, [this] {
+    close();
+    emit showMainWindowRequested();
+  });
+  layout->addWidget(show, 0, Qt::AlignRight);
+  connect(tasks_, &RZLimitedArrayController::arrangedObjectsDidChange, this, [this] {
+    // An empty list has nothing to offer: the popup goes, as a menu with no items would.
+    if (tasks_->arrangedObjects().isEmpty() && isVisible()) {
+      close();
+      return;
+    }
+    rebuildRows();
+  });
+}
+
+int WTStatusBarPopup::rowCount() const {
+  return rows_->count();
+}
+
+void WTStatusBarPopup::popUp(const QRect& anchor) {
+  tasks_->setActive(true);
+  rebuildRows();
+  adjustSize();
+  const QScreen* screen = QGuiApplication::screenAt(anchor.center());
+  if (!screen) screen = QGuiApplication::primaryScreen();
+  const QRect available = screen ? screen->availableGeometry() : QRect(anchor.topLeft(), size());
+  QPoint position(anchor.left(), anchor.bottom() + 1);
+  if (position.y() + height() > available.bottom()) position.setY(anchor.top() - height());
+  position.setX(std::clamp(position.x(), available.left(), std::max(available.left(), available.right() - width())));
+  position.setY(std::clamp(position.y(), available.top(), std::max(available.top(), available.bottom() - height())));
+  move(position);
+  show();
+  raise();
+  activateWindow();
+  // The keyboard works the list at once: Tab moves between the buttons, Space presses one.
+  if (QLayoutItem* first = rows_->itemAt(0)) {
+    if (auto* button = first->widget()->findChild<QToolButton*>(QStringLiteral("timerButton")))
+      button->setFocus(Qt::PopupFocusReason);
+  }
+}
+
+void WTStatusBarPopup::showEvent(QShowEvent* event) {
+  tasks_->setActive(true);
+  QFrame::showEvent(event);
+}
+
+void WTStatusBarPopup::hideEvent(QHideEvent* event) {
+  tasks_->setActive(false);
+  QFrame::hideEvent(event);
+}
+
+void WTStatusBarPopup::rebuildRows() {
+  // Rows are a handful of widgets: made afresh after each change rather than kept in step one by one.
+  // The old ones go later, since the button that was clicked may still be on the stack.
+  while (QLayoutItem* item = rows_->takeAt(0)) {
+    if (QWidget* row = item->widget()) {
+      row->hide();
+      row->deleteLater();
+    }
+    delete item;
+  }
+  const QList<WTTask*>& tasks = tasks_->arrangedObjects();
+  emptyHint_->setVisible(tasks.isEmpty());
+  for (WTTask* task : tasks) {
+    auto* row = new QWidget(this);
+    row->setObjectName(QStringLiteral("taskRow"));
+    auto* layout = new QHBoxLayout(row);
+    layout->setContentsMargins(2, 2, 2, 2);
+    auto* image = new QLabel(row);
+    image->setPixmap(WTImages::pixmap(task->tableImage(), QSize(kImageSize, kImageSize), devicePixelRatioF()));
+    layout->addWidget(image);
+    const QString project = task->project() ? task->project()->name() : QString();
+    auto* title = new QLabel(row);
+    title->setObjectName(QStringLiteral("taskTitle"));
+    title->setTextFormat(Qt::PlainText);
+    title->setText(project.isEmpty() ? task->name() : QStringLiteral("%1\n%2").arg(task->name(), project));
+    title->setMinimumWidth(160);
+    layout->addWidget(title, 1);
+    auto* button = new QToolButton(row);
+    button->setObjectName(QStringLiteral("timerButton"));
+    button->setToolButtonStyle(Qt::ToolButtonTextBesideIcon);
+    button->setIcon(WTImages::icon(task->timerButtonImage()));
+    button->setText(task->buttonTitle());
+    button->setAutoRaise(true);
+    // Records live as long as their context (deleted ones too, for undo), and the rows are made afresh
+    // after every change, so the task behind a button is always there.
+    connect(button, &QToolButton::clicked, this, [task] { task->toggleTimer(); });
+    layout->addWidget(button);
+    rows_->addWidget(row);
+  }
+  if (isVisible()) adjustSize();
+}
