@@ -11,7 +11,7 @@ packages=(
   libgtest-dev libgmock-dev libbenchmark-dev
   libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk
   sqlite3 python3 python3-jinja2
-  xvfb xauth xdotool imagemagick dbus-x11 fonts-dejavu-core
+  xvfb xauth xdotool trayer imagemagick dbus-x11 fonts-dejavu-core
   dpkg-dev file appstream desktop-file-utils systemd poppler-utils
 )
 missing=()

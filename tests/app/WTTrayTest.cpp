@@ -1,0 +1,141 @@
+// Tessal's tray icon in a real tray: an X server (Xvfb), a tray host (trayer) and the real desktop copy,
+// driven as a user would, with the pointer and the keyboard.
+#include "CommandLineInstallation.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <gtest/gtest.h>
+
+#include <QDir>
+#include <QElapsedTimer>
+#include <QStandardPaths>
+#include <QThread>
+
+#include <functional>
+#include <optional>
+
+namespace {
+
+using commandtest::Installation;
+
+struct Geometry {
+  int x = 0, y = 0, width = 0, height = 0;
+};
+
+// Polls `probe` every 50 ms for up to `ms`.
+bool waitFor(const std::function<bool()>& probe, int ms = 20000) {
+  QElapsedTimer waited;
+  waited.start();
+  while (!probe()) {
+    if (waited.elapsed() > ms) return false;
+    QThread::msleep(50);
+  }
+  return true;
+}
+
+class TrayTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    for (const char* tool : {"Xvfb", "trayer", "xdotool"})
+      if (QStandardPaths::findExecutable(tool).isEmpty()) GTEST_SKIP() << tool << " is not installed";
+    // A display number nobody uses.
+    for (int number = 100 + int(QCoreApplication::applicationPid() % 400); number < 1000; ++number) {
+      if (!QFile::exists(QStringLiteral("/tmp/.X11-unix/X%1").arg(number)) &&
+          !QFile::exists(QStringLiteral("/tmp/.X%1-lock").arg(number))) {
+        display = QStringLiteral(":%1").arg(number);
+        break;
+      }
+    }
+    xvfb.start("Xvfb", {display, "-screen", "0", "1280x800x24", "-nolisten", "tcp"});
+    ASSERT_TRUE(waitFor([&] { return QFile::exists("/tmp/.X11-unix/X" + display.mid(1)); })) << "Xvfb did not start";
+  }
+  void TearDown() override {
+    if (tessal) {
+      tessal->kill();
+      tessal->waitForFinished();
+    }
+    for (QProcess* process : {&tray, &xvfb}) {
+      process->kill();
+      process->waitForFinished();
+    }
+  }
+
+  QProcessEnvironment x11() const {
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    environment.insert("DISPLAY", display);
+    return environment;
+  }
+  // Runs xdotool on the test's display; its output.
+  QString xdotool(const QStringList& arguments) const {
+    QProcess process;
+    process.setProcessEnvironment(x11());
+    process.start("xdotool", arguments);
+    process.waitForFinished(10000);
+    return QString::fromUtf8(process.readAllStandardOutput()).trimmed();
+  }
+  // The first visible window of the desktop copy whose name matches `pattern` and that `fits`.
+  std::optional<Geometry> window(const QString& pattern,
+                                 const std::function<bool(const Geometry&)>& fits = [](const Geometry&) { return true; }) const {
+    const QString ids =
+        xdotool({"search", "--onlyvisible", "--pid", QString::number(tessal->processId()), "--name", pattern});
+    for (const QString& id : ids.split('\n', Qt::SkipEmptyParts)) {
+      Geometry geometry;
+      for (const QString& line : xdotool({"getwindowgeometry", "--shell", id}).split('\n')) {
+        const QString value = line.section('=', 1);
+        if (line.startsWith("X=")) geometry.x = value.toInt();
+        if (line.startsWith("Y=")) geometry.y = value.toInt();
+        if (line.startsWith("WIDTH=")) geometry.width = value.toInt();
+        if (line.startsWith("HEIGHT=")) geometry.height = value.toInt();
+      }
+      if (fits(geometry)) return geometry;
+    }
+    return std::nullopt;
+  }
+
+  Installation here;
+  QString display;
+  QProcess xvfb, tray;
+  std::unique_ptr<QProcess> tessal;
+};
+
+}  // namespace
+
+TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboard) {
+  {
+    std::unique_ptr<WTObjectContext> context = here.openStore();
+    for (int n = 0; n < 10; ++n) {
+      auto* task = WTTask::insertNewObject(context.get());
+      task->setName(QStringLiteral("T%1").arg(n));
+      if (n == 3) task->toggleTimer();
+    }
+    ASSERT_TRUE(context->save());
+  }
+  tray.setProcessEnvironment(x11());
+  tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
+  ASSERT_TRUE(tray.waitForStarted());
+  QThread::msleep(300);  // the tray claims its selection before Tessal looks for one
+  tessal = here.launch({}, {{"DISPLAY", display}, {"QT_QPA_PLATFORM", "xcb"}});
+  ASSERT_TRUE(tessal->waitForStarted());
+
+  // The icon is a small window of Tessal's inside the tray's strip at the top right.
+  std::optional<Geometry> icon;
+  // (The main window is called Tessal too, until the first tick adds the running time.)
+  auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
+  ASSERT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); })) << "no icon in the tray";
+  EXPECT_LE(icon->y + icon->height, 28);
+  EXPECT_GE(icon->x, 1280 - 28 * 2);
+
+  // A click opens the list below the icon, inside the screen.
+  xdotool({"mousemove", QString::number(icon->x + icon->width / 2), QString::number(icon->y + icon->height / 2),
+           "click", "1"});
+  std::optional<Geometry> list;
+  ASSERT_TRUE(waitFor([&] { return (list = window("Recent Tasks")).has_value(); })) << "the list did not open";
+  EXPECT_GE(list->y, icon->y + icon->height - 1);
+  EXPECT_LE(list->x + list->width, 1280);
+  EXPECT_GE(list->height, 5 * 24) << "five rows";
+
+  // The running task is the first row and its button has the focus: Space stops it, and the desktop copy
+  // saves that within a second.
+  xdotool({"key", "space"});
+  EXPECT_TRUE(waitFor([&] { return here.tessal({"status"}).code == 1; }, 5000)) << "the timer still runs";
+}
