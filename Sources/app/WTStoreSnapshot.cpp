@@ -28,7 +28,8 @@ std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore
 Result<std::unique_ptr<WTStoreSnapshot>> WTStoreSnapshot::open(const QString& path,
                                                                std::unique_ptr<UserDefaults> defaults,
                                                                WTStore::Records which) {
-  Result<std::unique_ptr<WTStore>> store = WTStore::openReadOnly(path);
+  // Reading cannot leave damage to show in a failed save later: the header's check is enough.
+  Result<std::unique_ptr<WTStore>> store = WTStore::openReadOnly(path, WTStore::Check::Header);
   if (!store) return store.error();
   std::unique_ptr<WTStoreSnapshot> snapshot(new WTStoreSnapshot);
   snapshot->defaults_ = std::move(defaults);

@@ -59,7 +59,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     // The read-only opening says what is missing in the words every command uses.
     return failure(err, WTStore::openReadOnly(storePath).error().message);
   }
-  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath);
+  // A few records change and a failed save is reported at once: no need to read the whole file first.
+  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
   if (!store) return failure(err, store.error().message);
   UserDefaults defaults;
   WTApplication::registerDefaults(defaults);

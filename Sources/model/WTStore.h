@@ -19,7 +19,10 @@ struct sqlite3_stmt;
 // newer version is refused without being changed in any way.
 class WTStore {
  public:
-  static constexpr int kSchemaVersion = 1;
+  static constexpr int kSchemaVersion = 2;
+  // The oldest version whose rows read as this version's do (later ones only added indexes): a reader
+  // that may not migrate still reads it.
+  static constexpr int kOldestReadableVersion = 1;
 
   enum ErrorCode {
     OpenFailed = 1,
@@ -31,14 +34,20 @@ class WTStore {
     Damaged = 7
   };
 
+  // How much of an existing file is checked for damage before it is accepted. Opening a store to work in
+  // checks all of it: damage anywhere would otherwise only show in a failed save, after the user's work.
+  // A command that reads or changes a few records, and reports a failed save at once, checks the header.
+  enum class Check { WholeFile, Header };
+
   // Opens the store at `path`, creating the file (not its folder) when missing. The error's message
   // names the file and says what is wrong, ready to show to the user. `vfs` names the SQLite VFS to
   // use; none for the default (tests pass one that injects faults).
-  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr);
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr,
+                                               Check check = Check::WholeFile);
   // Opens an existing store for reading only, beside a process that may be writing it: nothing is
   // created, migrated or changed, and save() fails. A file that holds no records yet reads as empty; one
-  // written by an older version that still needs migrating is refused (the application updates it).
-  static Result<std::unique_ptr<WTStore>> openReadOnly(const QString& path);
+  // written by a version older than kOldestReadableVersion is refused (the application updates it).
+  static Result<std::unique_ptr<WTStore>> openReadOnly(const QString& path, Check check = Check::WholeFile);
   ~WTStore();
 
   WTStore(const WTStore&) = delete;
@@ -63,7 +72,7 @@ class WTStore {
 
  private:
   WTStore(QString path, sqlite3* db);
-  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly);
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly, Check check);
   Result<void> prepareStatements();
   Error writeError(int code) const;
 

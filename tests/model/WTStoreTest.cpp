@@ -206,11 +206,11 @@ TEST_F(WTStoreTest, EveryFieldSurvivesTheFileExactly) {
   expectSameRecords(loadAll(*store), records);
 }
 
-TEST_F(WTStoreTest, ANewFileIsAVersionOneStoreInWalMode) {
+TEST_F(WTStoreTest, ANewFileIsACurrentStoreInWalMode) {
   ASSERT_TRUE(open());
   EXPECT_FALSE(sideFilesExist());  // closing folds the log back into the file
   RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("1"));
+  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("2"));
   EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
   EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("0"));
 }
@@ -320,6 +320,15 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBack) {
   flat.completed = true;
   expected[flat.uuid] = flat;
 
+  // A reader that may not migrate reads it as it is, and leaves it so.
+  const QByteArray before = fileBytes(path());
+  {
+    auto reader = WTStore::openReadOnly(path());
+    ASSERT_TRUE(reader) << reader.error().message.toStdString();
+    expectSameRecords(loadAll(*reader.value()), expected);
+  }
+  EXPECT_EQ(fileBytes(path()), before);
+
   auto store = open();
   ASSERT_TRUE(store);
   expectSameRecords(loadAll(*store), expected);
@@ -327,8 +336,33 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBack) {
   store.reset();
   RawDatabase raw(path());
   EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("1"));
+  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("2"));
   EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("5"));
+  EXPECT_EQ(raw.text("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name LIKE 'records_%'"),
+            QStringLiteral("2"));
+}
+
+TEST_F(WTStoreTest, TimersReadTheOwnersAndTheRunningEntriesOnly) {
+  Records records = sampleRecords();
+  WTStoreRecord running = record(QStringLiteral("R@WTTime"), QStringLiteral("WTTime"));
+  running.taskUuid = QStringLiteral("T1@WTTask");
+  running.startDate = Date::fromSeconds(1700000000);
+  running.running = true;
+  records[running.uuid] = running;
+  makeStore(records);
+  Records expected;
+  for (const auto& [uuid, stored] : records) {
+    if (stored.entity == QLatin1String("WTClient") || stored.entity == QLatin1String("WTProject") ||
+        stored.entity == QLatin1String("WTTask") || stored.running)
+      expected[uuid] = stored;
+  }
+  ASSERT_GT(expected.size(), 1u);
+  ASSERT_LT(expected.size(), records.size());
+  auto store = open();
+  ASSERT_TRUE(store);
+  Records loaded;
+  ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { loaded[r.uuid] = r; }, WTStore::Records::Timers).ok());
+  expectSameRecords(loaded, expected);
 }
 
 TEST_F(WTStoreTest, AnEmptyFileBecomesAStore) {
