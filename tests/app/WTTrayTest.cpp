@@ -139,3 +139,21 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
   xdotool({"key", "space"});
   EXPECT_TRUE(waitFor([&] { return here.tessal({"status"}).code == 1; }, 5000)) << "the timer still runs";
 }
+
+TEST_F(TrayTest, ATrayThatAppearsLaterGetsTheIconAtTheNextTick) {
+  here.openStore();  // an empty store: the first run makes its default task
+  tessal = here.launch({}, {{"DISPLAY", display}, {"QT_QPA_PLATFORM", "xcb"}});
+  ASSERT_TRUE(tessal->waitForStarted());
+  auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
+  ASSERT_TRUE(waitFor([&] { return window("^Tessal", [](const Geometry& g) { return g.width > 64; }).has_value(); }))
+      << "the main window did not open";
+  EXPECT_FALSE(window("^Tessal$", iconSized).has_value());
+
+  // As when a desktop's tray extension loads after the applications of the session.
+  tray.setProcessEnvironment(x11());
+  tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
+  ASSERT_TRUE(tray.waitForStarted());
+  std::optional<Geometry> icon;
+  EXPECT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); }, 12000))
+      << "no icon within two ticks of the tray's arrival";
+}
