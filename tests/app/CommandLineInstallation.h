@@ -54,6 +54,12 @@ class Installation {
   // inherits.
   std::unique_ptr<QProcess> launch(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
     auto process = std::make_unique<QProcess>();
+    process->setProcessEnvironment(environment(extra));
+    process->start(QString::fromUtf8(TESSAL_EXE), arguments);
+    return process;
+  }
+  // What a process of this installation runs with: its folders, no display; `extra` added or replacing.
+  QProcessEnvironment environment(const QMap<QString, QString>& extra = {}) const {
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
     environment.insert("XDG_DATA_HOME", home_.filePath("data"));
     environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
@@ -62,9 +68,7 @@ class Installation {
     for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
     for (auto variable = extra.begin(); variable != extra.end(); ++variable)
       environment.insert(variable.key(), variable.value());
-    process->setProcessEnvironment(environment);
-    process->start(QString::fromUtf8(TESSAL_EXE), arguments);
-    return process;
+    return environment;
   }
   // Runs `tessal` with `arguments` to its end.
   Outcome tessal(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
