@@ -25,6 +25,13 @@ systemd-analyze verify --man=no /usr/lib/systemd/system/tessal-sync-server.servi
 status=0
 QT_QPA_PLATFORM=offscreen XDG_RUNTIME_DIR=/tmp timeout 3 tessal >/dev/null 2>&1 || status=$?
 [ "$status" -eq 124 ] || { echo "the desktop application ended with $status within 3 s"; exit 1; }
+# Its first run made "Default Task": the commands work it from the shell, and bash completes its name.
+env -u DISPLAY -u WAYLAND_DISPLAY XDG_RUNTIME_DIR=/tmp tessal start "default task"
+env -u DISPLAY -u WAYLAND_DISPLAY XDG_RUNTIME_DIR=/tmp tessal status
+env -u DISPLAY -u WAYLAND_DISPLAY XDG_RUNTIME_DIR=/tmp tessal stop
+completed=$(bash -c 'source /usr/share/bash-completion/completions/tessal; COMP_WORDS=(tessal start Def);
+  COMP_CWORD=2; _tessal; printf "%s" "${COMPREPLY[*]}"')
+[ "$completed" = 'Default\ Task' ] || { echo "bash completed 'tessal start Def' as '$completed'"; exit 1; }
 apt-get remove -y -qq tessal >/dev/null
 snapshot >/tmp/after
 left=$(comm -13 /tmp/before /tmp/after | grep -i tessal || true)
