@@ -46,21 +46,30 @@ class BashCompletion : public ::testing::Test {
     task(atlas, "Build \"it\" now");
     task(atlas, "Design");
     task(beacon, "Build pipeline");
+    task(beacon, "Fix: it's late");
     ASSERT_TRUE(context->save());
   }
 
   // What completing the last of `words` (after "tessal") offers, one a line, in order.
   QStringList complete(const QStringList& words) const {
+    return completeAsBash("tessal " + words.join(' '), words, words.last());
+  }
+  // The same for the typed `line` as bash hands it over: cut into `words` (also at '=' and ':', quotes
+  // kept), and `replaced`, the end of the last word readline puts the completion in place of (after a
+  // quote still open, without the quote).
+  QStringList completeAsBash(const QString& line, const QStringList& words, const QString& replaced) const {
     QProcess bash;
     QProcessEnvironment environment = here.environment();
     environment.insert("PATH", here.path("bin") + ":" + environment.value("PATH"));
     bash.setProcessEnvironment(environment);
-    bash.start("bash", QStringList{"--norc", "--noprofile", "-c",
-                                   "source \"$1\"; shift; COMP_WORDS=(tessal \"$@\"); COMP_CWORD=$#; "
-                                   "COMP_LINE=\"${COMP_WORDS[*]}\"; COMP_POINT=${#COMP_LINE}; _tessal; "
-                                   "printf '%s\\n' \"${COMPREPLY[@]}\"",
-                                   "bash", kCompletion} +
-                           words);
+    bash.start("bash",
+               QStringList{"--norc", "--noprofile", "-c",
+                           "source \"$1\"; COMP_LINE=$2; COMP_POINT=${#COMP_LINE}; replaced=$3; shift 3; "
+                           "COMP_WORDS=(tessal \"$@\"); COMP_CWORD=$#; "
+                           "_tessal tessal \"$replaced\" \"${COMP_WORDS[COMP_CWORD - 1]}\"; "
+                           "printf '%s\\n' \"${COMPREPLY[@]}\"",
+                           "bash", kCompletion, line, replaced} +
+                   words);
     EXPECT_TRUE(bash.waitForFinished(30000));
     const QString errors = QString::fromUtf8(bash.readAllStandardError());
     EXPECT_TRUE(errors.isEmpty()) << errors.toStdString();
@@ -77,7 +86,8 @@ class BashCompletion : public ::testing::Test {
 TEST_F(BashCompletion, OffersCommandsOptionsAndValues) {
   makeStore();
   EXPECT_EQ(complete({"st"}), QStringList({"start", "status", "stop"}));
-  EXPECT_EQ(complete({"report", "--"}), QStringList({"--client", "--mode", "--out", "--project", "--template"}));
+  EXPECT_EQ(complete({"report", "--"}),
+            QStringList({"--client", "--mode", "--out", "--project", "--template"}));
   EXPECT_EQ(complete({"export", "--range", "last-"}), QStringList({"last-month", "last-week", "last-year"}));
   EXPECT_EQ(complete({"report", "--mode", ""}), QStringList({"0", "1", "2", "3"}));
   EXPECT_EQ(complete({"list", "p"}), QStringList({"projects"}));
@@ -93,6 +103,27 @@ TEST_F(BashCompletion, NamesComeQuotedAndNarrowedByTheOptionsAlreadyTyped) {
   EXPECT_EQ(complete({"start", "Design", ""}), QStringList()) << "one task a command";
   EXPECT_EQ(complete({"report", "--client", "A"}), QStringList({"Acme\\ Corp"}));
   EXPECT_EQ(complete({"report", "--client", "Other", "--project", ""}), QStringList({"Beacon"}));
+}
+
+// Readline puts a completion in place of its own part of the word only: after an open quote, after
+// "--option=" or after a colon. What it puts there must finish the word so that it reads as the name.
+TEST_F(BashCompletion, FinishesWordsBegunInQuotesAfterAnEqualsSignOrAColon) {
+  makeStore();
+  EXPECT_EQ(completeAsBash("tessal start \"Bu", {"start", "\"Bu"}, "Bu"),
+            QStringList({"Build \\\"it\\\" now", "Build pipeline"}))
+      << "inside double quotes only \\ \" $ ` are escaped";
+  EXPECT_EQ(completeAsBash("tessal start 'Fix: it", {"start", "'Fix: it"}, "Fix: it"),
+            QStringList({"Fix: it'\\''s late"}));
+  EXPECT_EQ(completeAsBash("tessal start Fix:", {"start", "Fix", ":"}, ""), QStringList({"\\ it\\'s\\ late"}))
+      << "\"Fix:\" stays on the line";
+  EXPECT_EQ(
+      completeAsBash("tessal start --project=beacon B", {"start", "--project", "=", "beacon", "B"}, "B"),
+      QStringList({"Build\\ pipeline"}));
+  EXPECT_EQ(completeAsBash("tessal report --client=Other --project=",
+                           {"report", "--client", "=", "Other", "--project", "="}, ""),
+            QStringList({"Beacon"}));
+  EXPECT_EQ(completeAsBash("tessal export --range=this-", {"export", "--range", "=", "this-"}, "this-"),
+            QStringList({"this-month", "this-week", "this-year"}));
 }
 
 TEST_F(BashCompletion, WithoutAStoreOffersNoNamesAndSaysNothing) {
