@@ -116,6 +116,13 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
       return false;
     return true;
   });
+  // "PROJECT › TASK", the way status and `list tasks --qualified` name a task, names it too, unless a task
+  // is called that.
+  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
+  const bool anyNamed = std::any_of(candidates.begin(), candidates.end(),
+                                    [&](const WTTask* task) { return sameName(task->name(), name); });
+  if (!anyNamed && separator > 0 && projectName.isNull())
+    return task(context, name.mid(separator + 3), name.left(separator), clientName);
   QString kinds = QStringLiteral("tasks");
   if (!projectName.isNull()) kinds += QStringLiteral(" of projects named %1").arg(quoted(projectName));
   if (!clientName.isNull())

@@ -41,7 +41,7 @@ namespace WTNamedRecords {
 Result<WTProject*> project(const WTObjectContext& context, const QString& name);
 Result<WTClient*> client(const WTObjectContext& context, const QString& name);
 // The task named `name` among those of projects named `projectName` and of clients named `clientName`;
-// a null filter lets every task through.
+// a null filter lets every task through. "PROJECT › TASK" (label()) names a task too.
 Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName = {},
                      const QString& clientName = {});
 

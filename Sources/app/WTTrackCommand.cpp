@@ -116,11 +116,13 @@ int runTrackCommand(const QString& command, const QStringList& arguments, QTextS
 }
 
 int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
-  constexpr char kUsage[] = "usage: tessal list tasks|projects|clients [--project NAME] [--client NAME]\n";
+  constexpr char kUsage[] =
+      "usage: tessal list tasks|projects|clients [--project NAME] [--client NAME] [--qualified]\n";
   QCommandLineParser parser;
   parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
   parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
   parser.addOption(QCommandLineOption(QStringLiteral("client"), QString(), QStringLiteral("name")));
+  parser.addOption(QCommandLineOption(QStringLiteral("qualified")));
   static const QStringList kinds = {QStringLiteral("tasks"), QStringLiteral("projects"), QStringLiteral("clients")};
   QString problem;
   if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments))
@@ -147,8 +149,10 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
   QStringList names;
   const WTObjectContext& context = snapshot->context();
   if (kind == QLatin1String("tasks")) {
+    // Qualified, every task has a name of its own that start and stop take back: what a picker needs.
+    const bool qualified = parser.isSet(QStringLiteral("qualified"));
     for (const WTTask* task : context.fetch<WTTask>())
-      if (projectPasses(task->project())) names.append(task->name());
+      if (projectPasses(task->project())) names.append(qualified ? WTNamedRecords::label(*task) : task->name());
   } else if (kind == QLatin1String("projects")) {
     for (const WTProject* project : context.fetch<WTProject>())
       if (projectPasses(project)) names.append(project->name());

@@ -241,6 +241,13 @@ TEST_F(TrackCommand, ListsEachNameOnceForPickersAndCompletion) {
   EXPECT_EQ(here.tessal({"list", "projects", "--client", "Acme"}, c).out.toStdString(), "Atlas\n");
   EXPECT_EQ(here.tessal({"list", "clients"}, c).out.toStdString(), "Acme\n");
   EXPECT_EQ(here.tessal({"list", "notes"}).code, 2);
+
+  // A picker offers every task once under a name of its own, and start takes that name back.
+  EXPECT_EQ(here.tessal({"list", "tasks", "--qualified"}, c).out.toStdString(),
+            "Atlas › Build \"it\" now\nAtlas › Design\nHermes › Design\nHermes › Review\n");
+  const Outcome started = here.tessal({"start", "hermes › design"});
+  EXPECT_EQ(started.code, 0) << started.err.toStdString();
+  EXPECT_EQ(stored().running, QStringList({"Hermes/Design"}));
 }
 
 TEST(TrackCommandWithoutStore, SaysThereIsNoDataAndCreatesNone) {
