@@ -1,0 +1,279 @@
+#include "WTPreferencesWindowController.h"
+
+#include "MoneyFormat.h"
+#include "RZSyncManager.h"
+#include "UserDefaults.h"
+#include "WTImages.h"
+#include "WTPasswordStore.h"
+#include "WTRateField.h"
+
+#include <QCheckBox>
+#include <QDesktopServices>
+#include <QDialogButtonBox>
+#include <QFormLayout>
+#include <QGroupBox>
+#include <QHBoxLayout>
+#include <QLabel>
+#include <QLineEdit>
+#include <QPushButton>
+#include <QSpinBox>
+#include <QVBoxLayout>
+
+namespace {
+
+const QString kSyncUser = QStringLiteral("WTSyncUser");
+const QString kSyncServer = QStringLiteral("WTSyncServer");
+const QString kShouldIdle = QStringLiteral("WTShouldIdle");
+const QString kIdleTime = QStringLiteral("WTIdleTime");
+const QString kStopsOtherTimes = QStringLiteral("WTStopsOtherTimes");
+const QString kDefaultRate = QStringLiteral("WTDefaultRate");
+constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
+// What the idle check uses when no usable number of minutes is set.
+constexpr int kIdleMinutesWhenUnset = 5;
+constexpr QSize kLightSize(16, 16);
+
+void markRefused(QLineEdit* field, bool refused, const QString& reason) {
+  field->setProperty("refused", refused);
+  field->setStyleSheet(refused ? QStringLiteral("QLineEdit { border: 2px solid #d03030; }") : QString());
+  field->setToolTip(refused ? reason : QString());
+}
+
+}  // namespace
+
+WTPreferencesWindowController::WTPreferencesWindowController(UserDefaults* defaults,
+                                                             RZSyncManager* syncManager,
+                                                             WTPasswordStore* passwords, QWidget* parent)
+    : QDialog(parent), defaults_(defaults), syncManager_(syncManager), passwords_(passwords) {
+  Q_ASSERT(defaults);
+  Q_ASSERT(passwords);
+  setObjectName(QStringLiteral("PreferencesWindow"));
+  setWindowTitle(tr("Preferences"));
+  setModal(false);
+  buildInterface();
+  loadValues();
+  if (syncManager_)
+    connect(syncManager_, &RZSyncManager::syncStatusDidChange, this,
+            &WTPreferencesWindowController::refreshStatusImageView);
+  refreshStatusImageView();
+}
+
+WTPreferencesWindowController::~WTPreferencesWindowController() = default;
+
+void WTPreferencesWindowController::buildInterface() {
+  auto* layout = new QVBoxLayout(this);
+
+  // The account.
+  auto* account = new QGroupBox(tr("Sync account"), this);
+  auto* accountForm = new QFormLayout(account);
+  serverField_ = new QLineEdit(account);
+  serverField_->setObjectName(QStringLiteral("serverField"));
+  serverField_->setPlaceholderText(tr("sync.example.org"));
+  emailTextField_ = new QLineEdit(account);
+  emailTextField_->setObjectName(QStringLiteral("emailTextField"));
+  emailTextField_->setPlaceholderText(tr("you@example.org"));
+  passwordTextField_ = new QLineEdit(account);
+  passwordTextField_->setObjectName(QStringLiteral("passwordTextField"));
+  passwordTextField_->setEchoMode(QLineEdit::Password);
+  accountForm->addRow(tr("Server:"), serverField_);
+  accountForm->addRow(tr("E-mail:"), emailTextField_);
+  accountForm->addRow(tr("Password:"), passwordTextField_);
+
+  auto* actions = new QHBoxLayout;
+  statusImageView_ = new QLabel(account);
+  statusImageView_->setObjectName(QStringLiteral("statusImageView"));
+  statusImageView_->setFixedSize(kLightSize);
+  startSyncButton_ = new QPushButton(tr("Start Sync"), account);
+  startSyncButton_->setObjectName(QStringLiteral("startSyncButton"));
+  signUpButton_ = new QPushButton(tr("Sign Up…"), account);
+  signUpButton_->setObjectName(QStringLiteral("signUpButton"));
+  actions->addWidget(statusImageView_);
+  actions->addWidget(startSyncButton_);
+  actions->addStretch(1);
+  actions->addWidget(signUpButton_);
+  accountForm->addRow(actions);
+  layout->addWidget(account);
+
+  // Timers.
+  auto* timers = new QGroupBox(tr("Timers"), this);
+  auto* timersLayout = new QVBoxLayout(timers);
+  auto* idleRow = new QHBoxLayout;
+  shouldIdleCheckBox_ = new QCheckBox(tr("Ask what to do with idle time after"), timers);
+  shouldIdleCheckBox_->setObjectName(QStringLiteral("shouldIdleCheckBox"));
+  idleTimeSpinBox_ = new QSpinBox(timers);
+  idleTimeSpinBox_->setObjectName(QStringLiteral("idleTimeSpinBox"));
+  idleTimeSpinBox_->setRange(1, 24 * 60);
+  // Stored when the user is done with the number, not at each digit typed.
+  idleTimeSpinBox_->setKeyboardTracking(false);
+  idleTimeSpinBox_->setAccessibleName(tr("Idle minutes"));
+  auto* minutes = new QLabel(tr("minutes"), timers);
+  idleRow->addWidget(shouldIdleCheckBox_);
+  idleRow->addWidget(idleTimeSpinBox_);
+  idleRow->addWidget(minutes);
+  idleRow->addStretch(1);
+  timersLayout->addLayout(idleRow);
+  stopsOtherTimesCheckBox_ = new QCheckBox(tr("Starting a timer stops the other running timers"), timers);
+  stopsOtherTimesCheckBox_->setObjectName(QStringLiteral("stopsOtherTimesCheckBox"));
+  timersLayout->addWidget(stopsOtherTimesCheckBox_);
+  layout->addWidget(timers);
+
+  // Rates.
+  auto* rates = new QGroupBox(tr("Rates"), this);
+  auto* ratesForm = new QFormLayout(rates);
+  defaultRateField_ = new QLineEdit(rates);
+  defaultRateField_->setObjectName(QStringLiteral("defaultRateField"));
+  defaultRateField_->setAlignment(Qt::AlignRight);
+  defaultRateField_->setPlaceholderText(tr("Built-in rates"));
+  ratesForm->addRow(tr("Default hourly rate:"), defaultRateField_);
+  layout->addWidget(rates);
+
+  auto* buttons = new QDialogButtonBox(QDialogButtonBox::Close, this);
+  buttons->button(QDialogButtonBox::Close)->setObjectName(QStringLiteral("closeButton"));
+  layout->addWidget(buttons);
+
+  // Return in a text field ends its editing; only in the password field does it also start syncing.
+  for (QPushButton* button : findChildren<QPushButton*>()) {
+    button->setAutoDefault(false);
+    button->setDefault(false);
+  }
+
+  connect(buttons, &QDialogButtonBox::rejected, this, &QDialog::reject);
+  connect(startSyncButton_, &QPushButton::clicked, this, &WTPreferencesWindowController::startSync);
+  connect(passwordTextField_, &QLineEdit::returnPressed, this, &WTPreferencesWindowController::startSync);
+  connect(signUpButton_, &QPushButton::clicked, this, &WTPreferencesWindowController::signUp);
+  connect(serverField_, &QLineEdit::editingFinished, this, &WTPreferencesWindowController::commitServer);
+  connect(serverField_, &QLineEdit::textEdited, this, [this] {
+    markRefused(serverField_, false, {});
+    updateSignUpButton();
+  });
+  connect(shouldIdleCheckBox_, &QCheckBox::toggled, this, [this](bool on) {
+    defaults_->setValue(kShouldIdle, on);
+    idleTimeSpinBox_->setEnabled(on);
+  });
+  connect(idleTimeSpinBox_, &QSpinBox::valueChanged, this,
+          [this](int value) { defaults_->setValue(kIdleTime, value); });
+  connect(stopsOtherTimesCheckBox_, &QCheckBox::toggled, this,
+          [this](bool on) { defaults_->setValue(kStopsOtherTimes, on); });
+  connect(defaultRateField_, &QLineEdit::editingFinished, this,
+          &WTPreferencesWindowController::commitDefaultRate);
+  connect(defaultRateField_, &QLineEdit::textEdited, this,
+          [this] { WTRateField::setRefused(defaultRateField_, false); });
+}
+
+void WTPreferencesWindowController::loadValues() {
+  // The account shows only when it is complete.
+  const QString password = passwords_->password();
+  if (defaults_->hasStoredValue(kSyncUser) && !password.isEmpty()) {
+    emailTextField_->setText(defaults_->stringForKey(kSyncUser));
+    passwordTextField_->setText(password);
+  }
+  serverField_->setText(defaults_->stringForKey(kSyncServer));
+  updateSignUpButton();
+
+  const QSignalBlocker idleBlocker(shouldIdleCheckBox_);
+  const QSignalBlocker minutesBlocker(idleTimeSpinBox_);
+  const QSignalBlocker stopsBlocker(stopsOtherTimesCheckBox_);
+  shouldIdleCheckBox_->setChecked(defaults_->boolForKey(kShouldIdle));
+  idleTimeSpinBox_->setEnabled(shouldIdleCheckBox_->isChecked());
+  const qint64 minutes = defaults_->integerForKey(kIdleTime);
+  idleTimeSpinBox_->setValue(minutes > 0 ? int(std::min<qint64>(minutes, idleTimeSpinBox_->maximum()))
+                                         : kIdleMinutesWhenUnset);
+  stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(kStopsOtherTimes));
+  const std::optional<Decimal> rate = defaults_->decimalForKey(kDefaultRate);
+  defaultRateField_->setText(rate ? MoneyFormat::format(*rate) : QString());
+}
+
+void WTPreferencesWindowController::showWindow() {
+  refreshStatusImageView();
+  show();
+  raise();
+  activateWindow();
+}
+
+void WTPreferencesWindowController::refreshStatusImageView() {
+  QString name = QStringLiteral("blue");
+  QString meaning = tr("No sync account");
+  if (syncManager_ && syncManager_->syncNetwork()->hasCredentials()) {
+    if (syncManager_->syncEnabled()) {
+      name = QStringLiteral("green");
+      meaning = tr("Syncing");
+    } else {
+      name = QStringLiteral("red");
+      meaning = tr("Syncing is off");
+    }
+  }
+  statusImageName_ = name;
+  statusImageView_->setProperty("imageName", name);
+  statusImageView_->setPixmap(WTImages::pixmap(name, kLightSize, devicePixelRatioF()));
+  statusImageView_->setToolTip(meaning);
+  statusImageView_->setAccessibleName(meaning);
+}
+
+void WTPreferencesWindowController::startSync() {
+  commitServer();
+  const QString user = emailTextField_->text();
+  const QString password = passwordTextField_->text();
+  if (user.isEmpty() || password.isEmpty()) return;
+  defaults_->setValue(kSyncUser, user);
+  passwords_->setPassword(password);
+  // Announces the change of status, which lights the light; without a manager nobody would.
+  if (syncManager_)
+    syncManager_->enableSync();
+  else
+    refreshStatusImageView();
+}
+
+QUrl WTPreferencesWindowController::signUpURL(const QString& server) {
+  QUrl url = RZSyncManager::endpointURL(server);
+  if (!url.isValid()) return {};
+  QString path = url.path();
+  path.chop(qsizetype(qstrlen(RZSyncManager::kEndpointPath)));
+  url.setPath(path + QLatin1String(kSignUpPath));
+  return url;
+}
+
+bool WTPreferencesWindowController::signUp() {
+  commitServer();
+  const QUrl url = signUpURL(serverField_->text());
+  if (!url.isValid()) return false;
+  return QDesktopServices::openUrl(url);
+}
+
+void WTPreferencesWindowController::updateSignUpButton() {
+  const bool usable = signUpURL(serverField_->text()).isValid();
+  signUpButton_->setEnabled(usable);
+  signUpButton_->setToolTip(usable ? tr("Open the server's sign-up page in your browser")
+                                   : tr("Enter the sync server's address first"));
+}
+
+void WTPreferencesWindowController::commitServer() {
+  const QString text = serverField_->text().trimmed();
+  const bool usable = text.isEmpty() || RZSyncManager::endpointURL(text).isValid();
+  markRefused(serverField_, !usable,
+              tr("Not a server address: type a host name such as sync.example.org, perhaps with a port, "
+                 "or an http or https address"));
+  updateSignUpButton();
+  if (!usable || text == defaults_->stringForKey(kSyncServer)) return;
+  if (text.isEmpty())
+    defaults_->removeValue(kSyncServer);
+  else
+    defaults_->setValue(kSyncServer, text);
+}
+
+void WTPreferencesWindowController::commitDefaultRate() {
+  const WTRateField::Parsed parsed = WTRateField::parse(defaultRateField_->text());
+  WTRateField::setRefused(defaultRateField_, !parsed.valid);
+  if (!parsed.valid) return;
+  const std::optional<Decimal> stored = defaults_->decimalForKey(kDefaultRate);
+  if (parsed.rate == stored && defaults_->hasStoredValue(kDefaultRate) == parsed.rate.has_value()) return;
+  if (parsed.rate)
+    defaults_->setValue(kDefaultRate, QVariant::fromValue(*parsed.rate));
+  else
+    defaults_->removeValue(kDefaultRate);
+}
+
+void WTPreferencesWindowController::hideEvent(QHideEvent* event) {
+  // Closing the window ends the editing of the field in hand.
+  commitServer();
+  commitDefaultRate();
+  QDialog::hideEvent(event);
+}

@@ -1,0 +1,90 @@
+#pragma once
+
+#include <QDialog>
+#include <QPointer>
+#include <QString>
+#include <QUrl>
+
+class QCheckBox;
+class QLabel;
+class QLineEdit;
+class QPushButton;
+class QSpinBox;
+class RZSyncManager;
+class UserDefaults;
+class WTPasswordStore;
+
+// The preferences window: the sync account (e-mail address and password), the button that starts
+// syncing, the sync status as a light and the way to an account on the server's sign-up page; then the
+// server's address, idle handling, whether starting a timer stops the others, and the default hourly
+// rate.
+//
+// The account is stored only by "Start Sync"; the other settings are stored as they are edited (a text
+// field when editing ends, or when the window closes). One window per application, not modal: make it
+// once and call showWindow() each time the user asks for it.
+class WTPreferencesWindowController : public QDialog {
+  Q_OBJECT
+ public:
+  // None is owned; all must outlive the window. `syncManager` may be null (syncing not set up): the
+  // light then stays blue and "Start Sync" only stores the account.
+  WTPreferencesWindowController(UserDefaults* defaults, RZSyncManager* syncManager,
+                                WTPasswordStore* passwords, QWidget* parent = nullptr);
+  ~WTPreferencesWindowController() override;
+
+  // Shows the window, brought to the front.
+  void showWindow();
+
+  // The light: "green" when there is an account and syncing is on, "red" when there is an account and
+  // syncing is off, "blue" without an account (the sync client's own test: user and password not blank).
+  void refreshStatusImageView();
+  QString statusImageName() const { return statusImageName_; }
+
+  // With both fields filled in: stores the e-mail address under "WTSyncUser" and the password in the
+  // password store, then switches syncing on. Otherwise does nothing.
+  void startSync();
+  // Opens the server's sign-up page in the user's browser; false when no valid server is set.
+  bool signUp();
+
+  // The sign-up page on a server given as RZSyncManager::endpointURL takes it; invalid for an
+  // unusable address.
+  static QUrl signUpURL(const QString& server);
+
+  QLineEdit* emailTextField() const { return emailTextField_; }
+  QLineEdit* passwordTextField() const { return passwordTextField_; }
+  QLabel* statusImageView() const { return statusImageView_; }
+  QPushButton* startSyncButton() const { return startSyncButton_; }
+  QPushButton* signUpButton() const { return signUpButton_; }
+  QLineEdit* serverField() const { return serverField_; }
+  QCheckBox* shouldIdleCheckBox() const { return shouldIdleCheckBox_; }
+  QSpinBox* idleTimeSpinBox() const { return idleTimeSpinBox_; }
+  QCheckBox* stopsOtherTimesCheckBox() const { return stopsOtherTimesCheckBox_; }
+  QLineEdit* defaultRateField() const { return defaultRateField_; }
+
+ protected:
+  void hideEvent(QHideEvent* event) override;
+
+ private:
+  void buildInterface();
+  void loadValues();
+  // Stores the text fields' values when they are acceptable; a refused one is marked and not stored.
+  void commitServer();
+  void commitDefaultRate();
+  void updateSignUpButton();
+
+  UserDefaults* defaults_;
+  QPointer<RZSyncManager> syncManager_;
+  WTPasswordStore* passwords_;
+  QString statusImageName_;
+
+  QLineEdit* emailTextField_ = nullptr;
+  QLineEdit* passwordTextField_ = nullptr;
+  QLabel* statusImageView_ = nullptr;
+  QLabel* statusLabel_ = nullptr;
+  QPushButton* startSyncButton_ = nullptr;
+  QPushButton* signUpButton_ = nullptr;
+  QLineEdit* serverField_ = nullptr;
+  QCheckBox* shouldIdleCheckBox_ = nullptr;
+  QSpinBox* idleTimeSpinBox_ = nullptr;
+  QCheckBox* stopsOtherTimesCheckBox_ = nullptr;
+  QLineEdit* defaultRateField_ = nullptr;
+};
