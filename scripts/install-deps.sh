@@ -9,9 +9,9 @@ packages=(
   g++ cmake ninja-build pkg-config
   qt6-base-dev qt6-svg-dev libgl-dev libxcb-screensaver0-dev libwayland-dev wayland-protocols libicu-dev libsqlite3-dev nlohmann-json3-dev
   libgtest-dev libgmock-dev libbenchmark-dev
-  libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk qtkeychain-qt6-dev
+  libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk qtkeychain-qt6-dev libsecret-1-0
   sqlite3 python3 python3-jinja2
-  xvfb xauth xdotool trayer imagemagick dbus-x11 fonts-dejavu-core
+  xvfb xauth xdotool trayer gnome-keyring imagemagick dbus-x11 fonts-dejavu-core
   dpkg-dev file appstream desktop-file-utils systemd poppler-utils
 )
 missing=()

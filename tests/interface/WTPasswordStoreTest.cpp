@@ -5,7 +5,11 @@
 
 #include <gtest/gtest.h>
 
+#include <QCoreApplication>
 #include <QFile>
+#include <QLibrary>
+#include <QProcess>
+#include <QStandardPaths>
 #include <QTemporaryDir>
 
 #include <sys/stat.h>
@@ -162,10 +166,28 @@ TEST_F(WTPasswordStoreTest, RemovingThePasswordClearsKeychainAndFile) {
   EXPECT_TRUE(keychain.entries.isEmpty());
 }
 
-// The real adapter on a machine without a session bus (the tests run without one): the desktop has no
-// secret service, which must read as Unavailable (not "no such entry"), so the store falls back.
-TEST_F(WTPasswordStoreTest, WithoutASessionBusTheSecretServiceIsUnavailableAndTheFileIsUsed) {
-  ASSERT_TRUE(qEnvironmentVariableIsEmpty("DBUS_SESSION_BUS_ADDRESS"));
+// Points the session bus somewhere nobody listens while it lives: without an address, GLib and libdbus
+// would start a bus of their own, or on a desktop find the developer's, keyring and all.
+class DeadSessionBus {
+ public:
+  explicit DeadSessionBus(const QString& folder) : previous_(qgetenv("DBUS_SESSION_BUS_ADDRESS")) {
+    qputenv("DBUS_SESSION_BUS_ADDRESS", "unix:path=" + QFile::encodeName(folder) + "/no-bus");
+  }
+  ~DeadSessionBus() {
+    if (previous_.isEmpty())
+      qunsetenv("DBUS_SESSION_BUS_ADDRESS");
+    else
+      qputenv("DBUS_SESSION_BUS_ADDRESS", previous_);
+  }
+
+ private:
+  QByteArray previous_;
+};
+
+// The real adapter where no secret service answers: that must read as Unavailable (not "no such
+// entry"), so the store falls back to the file.
+TEST_F(WTPasswordStoreTest, WithoutASecretServiceTheRealKeychainIsUnavailableAndTheFileIsUsed) {
+  DeadSessionBus bus(dir.path());
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
   const Result<QString> read = secrets.readPassword(QStringLiteral("sync-password"));
   ASSERT_FALSE(read.ok());
@@ -177,6 +199,70 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheSecretServiceIsUnavailableAndTh
   EXPECT_EQ(fileMode(), 0600);
   WTPasswordStore again(defaults.get(), std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 10000));
   EXPECT_EQ(again.password(), kPassword);
+}
+
+// A real keyring: gnome-keyring on a session bus of its own, made for this test and gone after it. The
+// test runs itself again inside that session (the test main keeps every test off the session bus, so
+// the child is handed the address under another name).
+TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
+  const QByteArray childBus = qgetenv("TESSAL_TEST_KEYRING_BUS");
+  if (childBus.isEmpty()) {
+    const QString runSession = QStandardPaths::findExecutable(QStringLiteral("dbus-run-session"));
+    const QString keyring = QStandardPaths::findExecutable(QStringLiteral("gnome-keyring-daemon"));
+    if (runSession.isEmpty() || keyring.isEmpty() || !QLibrary(QStringLiteral("secret-1"), 0).load())
+      GTEST_SKIP() << "needs dbus-run-session, gnome-keyring-daemon and libsecret";
+    QProcess child;
+    child.setProcessChannelMode(QProcess::MergedChannels);
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    // The keyring's files go to this test's folder.
+    environment.insert(QStringLiteral("XDG_DATA_HOME"), dir.filePath(QStringLiteral("keyring-data")));
+    environment.remove(QStringLiteral("DISPLAY"));
+    environment.remove(QStringLiteral("WAYLAND_DISPLAY"));
+    child.setProcessEnvironment(environment);
+    const QString script = QStringLiteral(
+        "printf %s throwaway | gnome-keyring-daemon --unlock --components=secrets >/dev/null || exit 3\n"
+        "TESSAL_TEST_KEYRING_BUS=\"$DBUS_SESSION_BUS_ADDRESS\" exec \"$0\" "
+        "--gtest_filter=WTPasswordStoreTest.APasswordMakesARoundTripThroughARealKeyring");
+    child.start(runSession, {QStringLiteral("--"), QStringLiteral("sh"), QStringLiteral("-c"), script,
+                             QCoreApplication::applicationFilePath()});
+    ASSERT_TRUE(child.waitForFinished(60000));
+    const QString output = QString::fromLocal8Bit(child.readAll());
+    ASSERT_EQ(child.exitCode(), 0) << output.toStdString();
+    // The child really ran the round trip, not a skip.
+    EXPECT_TRUE(output.contains(QStringLiteral("[  PASSED  ] 1 test"))) << output.toStdString();
+    EXPECT_FALSE(output.contains(QStringLiteral("SKIPPED"))) << output.toStdString();
+    return;
+  }
+
+  qputenv("DBUS_SESSION_BUS_ADDRESS", childBus);
+  WTQtKeychain secrets(QStringLiteral("Tessal test"), 20000);
+  const Result<QString> none = secrets.readPassword(QStringLiteral("sync-password"));
+  ASSERT_FALSE(none.ok());
+  EXPECT_EQ(none.error().code, WTKeychain::EntryNotFound) << none.error().message.toStdString();
+
+  // Through the store: into the keyring, never into the file, and read back by a store of its own.
+  defaults->setValue(QStringLiteral("WTSyncPassword"), kPassword);
+  {
+    WTPasswordStore store(defaults.get(),
+                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 20000));
+    ASSERT_TRUE(store.migrate());
+  }
+  EXPECT_FALSE(fileBytes().contains("horse"));
+  const Result<QString> moved = secrets.readPassword(QStringLiteral("sync-password"));
+  ASSERT_TRUE(moved.ok()) << moved.error().message.toStdString();
+  EXPECT_EQ(moved.value(), kPassword);
+
+  WTPasswordStore store(defaults.get(), std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 20000));
+  EXPECT_EQ(store.password(), kPassword);
+  EXPECT_EQ(store.location(), WTPasswordStore::Location::Keychain);
+  EXPECT_EQ(store.setPassword(QStringLiteral("battery staple")), WTPasswordStore::Location::Keychain);
+  EXPECT_FALSE(fileBytes().contains("staple"));
+  EXPECT_EQ(secrets.readPassword(QStringLiteral("sync-password")).value(), QStringLiteral("battery staple"));
+
+  store.removePassword();
+  const Result<QString> removed = secrets.readPassword(QStringLiteral("sync-password"));
+  ASSERT_FALSE(removed.ok());
+  EXPECT_EQ(removed.error().code, WTKeychain::EntryNotFound);
 }
 
 }  // namespace
