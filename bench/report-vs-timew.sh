@@ -6,11 +6,11 @@
 #
 #   bench/report-vs-timew.sh [BUILD_DIR] [RUNS]
 # BUILD_DIR (default build-tests) holds the targets tessal and tessal_make_report_store; RUNS (default
-# 15) runs of each, interleaved, after one warm-up run each. Needs timewarrior (apt-get install timewarrior).
+# 20) runs of each, interleaved, after one warm-up run each. Needs timewarrior (apt-get install timewarrior).
 set -euo pipefail
 cd "$(dirname "$0")/.."
 build=${1:-build-tests}
-runs=${2:-15}
+runs=${2:-20}
 tessal=$build/Sources/app/tessal
 maker=$build/bench/tessal_make_report_store
 for program in "$tessal" "$maker"; do [ -x "$program" ] || { echo "no $program: build it first" >&2; exit 1; }; done
