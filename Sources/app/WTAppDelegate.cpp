@@ -1,6 +1,8 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "WTKeychain.h"
+#include "WTPasswordStore.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTObject.h"
@@ -124,8 +126,13 @@ QString WTAppDelegate::syncNetworkRequestsUser(RZSyncNetwork*) {
   return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncUser")) : QString();
 }
 
+WTPasswordStore* WTAppDelegate::passwordStore() {
+  if (!passwordStore_) passwordStore_ = std::make_unique<WTPasswordStore>(defaults_);
+  return passwordStore_.get();
+}
+
 QString WTAppDelegate::syncNetworkRequestsPassword(RZSyncNetwork*) {
-  return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncPassword")) : QString();
+  return defaults_ ? passwordStore()->password() : QString();
 }
 
 WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {

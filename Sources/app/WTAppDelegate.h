@@ -13,6 +13,7 @@ class RZSyncErrorPresenter;
 class RZSyncManager;
 class UserDefaults;
 class WTAlertPresenter;
+class WTPasswordStore;
 class WTIdleSource;
 class WTLauncherEntry;
 class WTSleepMonitor;
@@ -68,7 +69,10 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   std::function<bool(const WTObject*)> archivedPredicate() const;
   void toggleArchived();
 
-  // The sync account: the user defaults "WTSyncUser" and "WTSyncPassword".
+  // The sync account's password, kept in the desktop's secret service (made on first use).
+  WTPasswordStore* passwordStore();
+
+  // The sync account: the user default "WTSyncUser" and the password store's password.
   QString syncNetworkRequestsUser(RZSyncNetwork* network) override;
   QString syncNetworkRequestsPassword(RZSyncNetwork* network) override;
 
@@ -99,5 +103,6 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // Before the context goes: it observes the context's records.
   std::unique_ptr<WTStopwatchUpdater> stopwatchUpdater_;
   std::function<bool()> commitEditing_;
+  std::unique_ptr<WTPasswordStore> passwordStore_;
   bool displayArchived_ = false;
 };

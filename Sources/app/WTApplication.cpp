@@ -8,6 +8,7 @@
 #include "WTIdleSourceChain.h"
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
+#include "WTPasswordStore.h"
 #include "WTSleepMonitor.h"
 #include "WTStatusBarController.h"
 #include "WTStopwatchUpdater.h"
@@ -26,6 +27,8 @@ WTApplication::WTApplication(int& argc, char** argv)
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
   delegate_->setSyncErrorPresenter(presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);
+  // A password an earlier version kept in the settings file moves into the desktop's secret service.
+  delegate_->passwordStore()->migrate();
   // Logging out asks nothing: running timers are saved as they are and go on running next time.
   connect(this, &QGuiApplication::commitDataRequest, delegate_.get(), &WTAppDelegate::sessionWillEnd);
 }

@@ -13,6 +13,7 @@
 #include "WTObject.h"
 #include "WTObjectContext.h"
 #include "WTObjectListModel.h"
+#include "WTPreferencesWindowController.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
 #include "WTTask.h"
@@ -206,6 +207,12 @@ void WTMainWindowController::buildActions() {
     delegate_.managedObjectContext()->undoManager().redo();
   });
   redo->setObjectName(QStringLiteral("redo"));
+  edit->addSeparator();
+  // Ctrl+, as desktops spell it; Qt's standard Preferences key differs from one desktop to the next.
+  QAction* preferences = edit->addAction(tr("Pr&eferences…"), QKeySequence(Qt::CTRL | Qt::Key_Comma), this,
+                                         &WTMainWindowController::showPreferences);
+  preferences->setObjectName(QStringLiteral("preferences"));
+  preferences->setMenuRole(QAction::PreferencesRole);
   connect(edit, &QMenu::aboutToShow, this, [this, undo, redo] {
     WTUndoManager& manager = delegate_.managedObjectContext()->undoManager();
     undo->setEnabled(manager.canUndo());
@@ -427,6 +434,16 @@ void WTMainWindowController::restoreWindowGeometry() {
 void WTMainWindowController::saveWindowGeometry() {
   if (UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults())
     defaults->setValue(QString::fromLatin1(kGeometryKey), QString::fromLatin1(saveGeometry().toBase64()));
+}
+
+WTPreferencesWindowController* WTMainWindowController::showPreferences() {
+  if (!preferences_) {
+    WTObjectContext* context = delegate_.managedObjectContext();  // makes the sync manager too
+    preferences_ = new WTPreferencesWindowController(context->userDefaults(), delegate_.syncManager(),
+                                                     delegate_.passwordStore(), this);
+  }
+  preferences_->showWindow();
+  return preferences_;
 }
 
 void WTMainWindowController::quit() {

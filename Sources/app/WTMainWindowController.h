@@ -16,6 +16,7 @@ class WTAppDelegate;
 class WTClientsViewController;
 class WTExportController;
 class WTNavigationController;
+class WTPreferencesWindowController;
 class WTProject;
 class WTProjectsViewController;
 
@@ -76,6 +77,9 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   // Brings the window forward and makes it active (launch and re-open).
   void bringToFront();
 
+  // Edit › Preferences… (Ctrl+,): the one preferences window, made on first use, brought forward.
+  WTPreferencesWindowController* showPreferences();
+
   // File › Quit: asks what the delegate asks at quitting, then quits (unless cancelled).
   void quit();
   // With a tray to come back from, closing the window only hides it and Tessal keeps running there;
@@ -122,6 +126,7 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   QToolButton* runningTimeButton_ = nullptr;
   QAction* runningTimeItem_ = nullptr;
   bool hidesOnClose_ = false;
+  WTPreferencesWindowController* preferences_ = nullptr;  // a child window, made on first use
   bool quitting_ = false;
   QActionGroup* stackGroup_ = nullptr;
   QList<QAction*> actions_;

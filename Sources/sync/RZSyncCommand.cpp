@@ -22,13 +22,14 @@ int runSyncCommand(RZSyncManager& manager, const QStringList& arguments, QTextSt
   RZSyncNetwork& network = *manager.syncNetwork();
   const QUrl endpoint = manager.configuredEndpoint();
   if (!endpoint.isValid()) {
-    err << "No sync server is set: store its address under the user default \"WTSyncServer\".\n";
+    err << "No sync server is set: enter its address in Tessal's Preferences (Edit › Preferences…), or "
+           "without a desktop under \"WTSyncServer\" in the settings file.\n";
     err.flush();
     return 1;
   }
   if (!network.hasCredentials()) {
-    err << "No sync account is set: store it under the user defaults \"WTSyncUser\" and "
-           "\"WTSyncPassword\".\n";
+    err << "No sync account is set: enter it in Tessal's Preferences (Edit › Preferences…), or without a "
+           "desktop under \"WTSyncUser\" and \"WTSyncPassword\" in the settings file.\n";
     err.flush();
     return 1;
   }

@@ -11,7 +11,9 @@
 #include "WTObjectListModel.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTPreferencesWindowController.h"
 #include "WTStatusBarController.h"
+#include <QAction>
 #include "WTStatusBarPopup.h"
 #include "WTStopwatchUpdater.h"
 #include <QToolButton>
@@ -284,4 +286,21 @@ TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOne
   EXPECT_TRUE(asking.titles.isEmpty());
   emit statusBar.showMainWindowRequested();
   EXPECT_TRUE(window.isVisible());
+}
+
+TEST_F(WTAppDelegateTest, CtrlCommaOpensTheOnePreferencesWindowOverTheAccountsPassword) {
+  auto delegate = makeDelegate();
+  WTMainWindowController window(*delegate);
+  window.show();
+  QAction* preferences = window.findChild<QAction*>(QStringLiteral("preferences"));
+  ASSERT_NE(preferences, nullptr);
+  EXPECT_EQ(preferences->shortcut(), QKeySequence(Qt::CTRL | Qt::Key_Comma));
+  preferences->trigger();
+  WTPreferencesWindowController* opened = window.findChild<WTPreferencesWindowController*>();
+  ASSERT_NE(opened, nullptr);
+  EXPECT_TRUE(opened->isVisible());
+  opened->close();
+  preferences->trigger();
+  EXPECT_EQ(window.findChildren<WTPreferencesWindowController*>().size(), 1);
+  EXPECT_TRUE(opened->isVisible());
 }
