@@ -31,11 +31,11 @@ QString WTAppDelegate::applicationSupportFolder() {
   return base + QStringLiteral("/Tessal2");
 }
 
-QString WTAppDelegate::storePath() const {
+QString WTAppDelegate::storePath() {
   return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
 }
 
-QString WTAppDelegate::syncJournalPath() const {
+QString WTAppDelegate::syncJournalPath() {
   const QFileInfo store(storePath());
   return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
 }

@@ -35,9 +35,9 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
 
   // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
   static QString applicationSupportFolder();
-  QString storePath() const;
+  static QString storePath();
   // The store's path with the extension "sync": where the change journal lives.
-  QString syncJournalPath() const;
+  static QString syncJournalPath();
 
   // The context, made with the store on first use. A store that cannot be opened is reported once;
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.

@@ -52,7 +52,7 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   }
   // A start or stop from the shell changes the store by itself only while it holds the writer lock.
   QDir().mkpath(WTAppDelegate::applicationSupportFolder());
-  WTStoreWriterLock writerLock(WTAppDelegate::applicationSupportFolder() + QStringLiteral("/Tessal.sqlite"));
+  WTStoreWriterLock writerLock(WTAppDelegate::storePath());
   if (!writerLock.lock(10000)) {
     err << "The data file is busy (" << writerLock.filePath() << " is held); try again.\n";
     err.flush();

@@ -9,14 +9,10 @@
 
 #include <algorithm>
 
-QString WTStoreSnapshot::storePath() {
-  return WTAppDelegate::applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
-}
-
 std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which) {
   auto defaults = std::make_unique<UserDefaults>();
   WTApplication::registerDefaults(*defaults);
-  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(storePath(), std::move(defaults), which);
+  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(WTAppDelegate::storePath(), std::move(defaults), which);
   if (!snapshot) {
     err << "tessal: " << snapshot.error().message << '\n';
     err.flush();

@@ -22,8 +22,6 @@ class WTStoreSnapshot {
   // Reads the store at `path` with `defaults` (taken over).
   static Result<std::unique_ptr<WTStoreSnapshot>> open(const QString& path, std::unique_ptr<UserDefaults> defaults,
                                                        WTStore::Records which = WTStore::Records::All);
-  // The user's store file.
-  static QString storePath();
   ~WTStoreSnapshot();
 
   WTObjectContext& context() { return *context_; }

@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
+#include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTCSVExport.h"
@@ -45,11 +46,6 @@ int failure(QTextStream& err, const QString& message) {
   return 1;
 }
 
-QString journalPath(const QString& storePath) {
-  const QFileInfo store(storePath);
-  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
-}
-
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
 // Only the records timers need are read; what changes is saved and written to the sync journal, as the
 // desktop copy would have done, so that the next sync sends it.
@@ -67,7 +63,7 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   WTObjectContext context(&defaults);
   const Result<void> loaded = context.attachStore(std::move(store.value()), WTStore::Records::Timers);
   if (!loaded) return failure(err, loaded.error().message);
-  const QString journalFile = journalPath(storePath);
+  const QString journalFile = WTAppDelegate::syncJournalPath();
   RZSyncTrack journal(journalFile);
   context.setChangeJournal(&journal);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
@@ -84,7 +80,7 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
 }
 
 int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
-  const QString storePath = WTStoreSnapshot::storePath();
+  const QString storePath = WTAppDelegate::storePath();
   WTStoreWriterLock lock(storePath);
   const WTSingleInstance desktop;
   const QDeadlineTimer deadline(kWriterWaitMs);
