@@ -57,7 +57,13 @@ WTPreferencesWindowController::WTPreferencesWindowController(UserDefaults* defau
   refreshStatusImageView();
 }
 
-WTPreferencesWindowController::~WTPreferencesWindowController() = default;
+WTPreferencesWindowController::~WTPreferencesWindowController() {
+  // Hiding ends the edit in the focused field, which stores it. That has to happen while this object is
+  // still whole: left to QDialog's destructor, the field's editingFinished would reach a half-destroyed one.
+  hide();
+  for (QObject* child : findChildren<QObject*>())
+    disconnect(child, nullptr, this, nullptr);
+}
 
 void WTPreferencesWindowController::buildInterface() {
   auto* layout = new QVBoxLayout(this);

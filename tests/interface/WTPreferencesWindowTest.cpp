@@ -281,6 +281,11 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldRefusesWhatIsNoAddress) {
   window->serverField()->clear();
   QTest::keyClick(window->serverField(), Qt::Key_Return);
   EXPECT_FALSE(defaults->hasStoredValue(QStringLiteral("WTSyncServer")));
+
+  // An address typed but not confirmed is kept when the window goes away with the application.
+  type(window->serverField(), QStringLiteral("sync.example.com"));
+  window.reset();
+  EXPECT_EQ(defaults->stringForKey(QStringLiteral("WTSyncServer")), "sync.example.com");
 }
 
 TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
