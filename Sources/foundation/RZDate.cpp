@@ -13,6 +13,7 @@
 #include <cmath>
 #include <limits>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -103,11 +104,89 @@ int clampedSum(int a, long long b) {
   return int(std::clamp<long long>(sum, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
 }
 
+// The stretch between the zone's transitions that holds an instant, with its one offset from GMT in
+// milliseconds. Durations and day groups ask for it once or twice per item, so stretches once found are
+// remembered and later questions about them are answered without ICU.
+State::OffsetSpan spanAt(UDate ms) {
+  auto& spans = state().offsetSpans;
+  auto after = std::upper_bound(spans.begin(), spans.end(), ms,
+                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; });
+  if (after != spans.begin() && ms < std::prev(after)->to) return *std::prev(after);
+
+  constexpr double kForever = std::numeric_limits<double>::infinity();
+  const icu::TimeZone& zone = calendar().getTimeZone();
+  int32_t raw = 0, dst = 0;
+  UErrorCode status = U_ZERO_ERROR;
+  zone.getOffset(ms, false, raw, dst, status);
+  // Unknown bounds make a stretch of this instant alone, so nothing else is ever answered from it.
+  if (U_FAILURE(status)) return {ms, ms, 0};
+  const auto* basic = dynamic_cast<const icu::BasicTimeZone*>(&zone);
+  if (!basic) return {ms, ms, raw + dst};
+  icu::TimeZoneTransition previous, next;
+  const UDate from = basic->getPreviousTransition(ms, true, previous) ? previous.getTime() : -kForever;
+  const UDate to = basic->getNextTransition(ms, false, next) ? next.getTime() : kForever;
+  const State::OffsetSpan span{from, to, raw + dst};
+  if (spans.size() >= 512) spans.clear();
+  spans.insert(std::upper_bound(spans.begin(), spans.end(), from,
+                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; }),
+               span);
+  return span;
+}
+
+int32_t offsetAt(UDate ms) {
+  return spanAt(ms).offset;
+}
+
+constexpr double kDayMs = 86400000.0;
+
+// Days since 1970-01-01 of a date in the proleptic Gregorian calendar, and back (Howard Hinnant's
+// algorithms). ICU's calendar is Julian before October 1582, so only later dates may take this way.
+long long daysFromCivil(long long y, int m, int d) {
+  y -= m <= 2;
+  const long long era = (y >= 0 ? y : y - 399) / 400;
+  const long long yoe = y - era * 400;
+  const long long doy = (153 * (m + (m > 2 ? -3 : 9)) + 2) / 5 + d - 1;
+  const long long doe = yoe * 365 + yoe / 4 - yoe / 100 + doy;
+  return era * 146097 + doe - 719468;
+}
+
+void civilFromDays(long long z, Fields& f) {
+  z += 719468;
+  const long long era = (z >= 0 ? z : z - 146096) / 146097;
+  const long long doe = z - era * 146097;
+  const long long yoe = (doe - doe / 1460 + doe / 36524 - doe / 146096) / 365;
+  const long long doy = doe - (365 * yoe + yoe / 4 - yoe / 100);
+  const long long mp = (5 * doy + 2) / 153;
+  f.day = int(doy - (153 * mp + 2) / 5 + 1);
+  f.month = int(mp < 10 ? mp + 3 : mp - 9);
+  f.year = int(yoe + era * 400 + (f.month <= 2));
+}
+
+// Local wall-clock instants (milliseconds as if the zone were GMT) that the arithmetic above reads as ICU
+// does: from 1583 to the end of 9999.
+const double kArithmeticFrom = double(daysFromCivil(1583, 1, 1)) * kDayMs;
+const double kArithmeticTo = double(daysFromCivil(10000, 1, 1)) * kDayMs;
+
+bool fieldsByArithmetic(UDate ms, Fields& f) {
+  const double local = ms + offsetAt(ms);
+  if (!(local >= kArithmeticFrom && local < kArithmeticTo)) return false;
+  const double days = std::floor(local / kDayMs);
+  civilFromDays((long long)days, f);
+  const long long msOfDay = (long long)(local - days * kDayMs);
+  f.hour = int(msOfDay / 3600000);
+  f.minute = int(msOfDay / 60000 % 60);
+  f.second = int(msOfDay / 1000 % 60);
+  // 1970-01-01 was a Thursday, weekday 5 when Sunday is 1.
+  f.weekday = int((((long long)days + 4) % 7 + 7) % 7) + 1;
+  return true;
+}
+
 Fields fieldsOf(UDate ms) {
+  Fields f;
+  if (fieldsByArithmetic(ms, f)) return f;
   icu::GregorianCalendar& cal = calendar();
   UErrorCode status = U_ZERO_ERROR;
   cal.setTime(ms, status);
-  Fields f;
   // The extended year runs on through 0 and below, so years before the common era round-trip.
   f.year = cal.get(UCAL_EXTENDED_YEAR, status);
   f.month = cal.get(UCAL_MONTH, status) + 1;
@@ -118,6 +197,19 @@ Fields fieldsOf(UDate ms) {
   f.weekday = cal.get(UCAL_DAY_OF_WEEK, status);  // UCAL_SUNDAY is 1 in every locale
   if (U_FAILURE(status)) qWarning("ICU calendar fields: %s", u_errorName(status));
   return f;
+}
+
+// The first instant of the local day `daysBefore` days before the one holding `ms`, when the zone keeps
+// one offset from then to the end of that day of `ms`: the days are then whole, and their midnights are
+// where ICU puts them. None near a transition, which the calendar then resolves.
+std::optional<UDate> dayStartByArithmetic(UDate ms, int daysBefore = 0) {
+  const State::OffsetSpan span = spanAt(ms);
+  const double local = ms + span.offset;
+  if (!(local >= kArithmeticFrom && local < kArithmeticTo)) return std::nullopt;
+  const double dayStart = ms - (local - std::floor(local / kDayMs) * kDayMs);
+  const double start = dayStart - daysBefore * kDayMs;
+  if (start < span.from || dayStart + kDayMs > span.to) return std::nullopt;
+  return start;
 }
 
 Fields fieldsOf(Date date) {
@@ -178,6 +270,11 @@ Date midnight(Date date) {
   const UDate ms = toUDate(date);
   State& s = state();
   if (ms >= s.dayStart && ms < s.nextDayStart) return fromUDate(s.dayStart);
+  if (const std::optional<UDate> start = dayStartByArithmetic(ms)) {
+    s.dayStart = *start;
+    s.nextDayStart = *start + kDayMs;
+    return fromUDate(*start);
+  }
 
   const Fields f = fieldsOf(ms);
   const UDate start = build(f.year, f.month, f.day);
@@ -214,6 +311,7 @@ Date lastWeek(Date date) {
 
 Date beginOfMonth(Date date) {
   const Fields f = fieldsOf(date);
+  if (const std::optional<UDate> start = dayStartByArithmetic(toUDate(date), f.day - 1)) return fromUDate(*start);
   return fromUDate(build(f.year, f.month, 1));
 }
 
@@ -247,38 +345,6 @@ Date beginOfLastYear(Date date) {
   return fromUDate(build(clampedSum(f.year, -1), 1, 1));
 }
 
-namespace {
-
-// The zone's offset from GMT at an instant, in milliseconds. Durations ask for it twice per time entry,
-// so the stretch between the surrounding transitions is remembered and later questions about it are
-// answered without ICU.
-int32_t offsetAt(UDate ms) {
-  auto& spans = state().offsetSpans;
-  auto after = std::upper_bound(spans.begin(), spans.end(), ms,
-                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; });
-  if (after != spans.begin() && ms < std::prev(after)->to) return std::prev(after)->offset;
-
-  const icu::TimeZone& zone = calendar().getTimeZone();
-  int32_t raw = 0, dst = 0;
-  UErrorCode status = U_ZERO_ERROR;
-  zone.getOffset(ms, false, raw, dst, status);
-  if (U_FAILURE(status)) return 0;
-  const auto* basic = dynamic_cast<const icu::BasicTimeZone*>(&zone);
-  if (!basic) return raw + dst;
-  icu::TimeZoneTransition previous, next;
-  const UDate from = basic->getPreviousTransition(ms, true, previous)
-                         ? previous.getTime()
-                         : -std::numeric_limits<double>::infinity();
-  const UDate to =
-      basic->getNextTransition(ms, false, next) ? next.getTime() : std::numeric_limits<double>::infinity();
-  if (spans.size() >= 512) spans.clear();
-  spans.insert(std::upper_bound(spans.begin(), spans.end(), from,
-                                [](UDate value, const State::OffsetSpan& span) { return value < span.from; }),
-               {from, to, raw + dst});
-  return raw + dst;
-}
-
-}  // namespace
 
 Date beginOfMinute(Date date) {
   // Dropping the seconds of the local wall clock is subtracting them from the instant, so no calendar

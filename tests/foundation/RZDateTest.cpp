@@ -6,7 +6,9 @@
 #include <QDateTime>
 #include <QTimeZone>
 
+#include <unicode/gregocal.h>
 #include <unicode/locid.h>
+#include <unicode/smpdtfmt.h>
 #include <unicode/timezone.h>
 
 #include <algorithm>
@@ -316,6 +318,87 @@ INSTANTIATE_TEST_SUITE_P(Zones, RZDateInZone,
                            std::replace(name.begin(), name.end(), '/', '_');
                            return name;
                          });
+
+// Fields, midnights and month starts are worked out without the calendar away from transitions; over
+// random instants of five centuries (and the calendar's first Gregorian years and the last of 9999) they
+// must be exactly what ICU's own calendar says, in zones with odd offsets and days that were skipped.
+TEST(RZDateZone, ArithmeticAgreesWithTheCalendar) {
+  DateEnvironment environment;
+  std::mt19937_64 random(7);
+  for (const char* zoneId : {"UTC", "Asia/Kathmandu", "Pacific/Apia", "America/Sao_Paulo", "Europe/Dublin",
+                             "America/St_Johns", "Australia/Lord_Howe"}) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(zoneId)));
+    UErrorCode status = U_ZERO_ERROR;
+    icu::GregorianCalendar calendar(
+        icu::TimeZone::createTimeZone(icu::UnicodeString::fromUTF8(zoneId)), status);
+    ASSERT_TRUE(U_SUCCESS(status));
+    calendar.setLenient(true);
+    auto startOf = [&](int year, int month, int day) {
+      calendar.clear();
+      calendar.set(UCAL_EXTENDED_YEAR, year);
+      calendar.set(UCAL_MONTH, month - 1);
+      calendar.set(UCAL_DATE, day);
+      return Date::fromSeconds(calendar.getTime(status) / 1000.0);
+    };
+    std::vector<double> seconds;
+    std::uniform_real_distribution<double> centuries(-14e9, 4.2e9);  // about 1526 to 2103
+    for (int i = 0; i < 3000; ++i) seconds.push_back(std::floor(centuries(random)));
+    for (double edge : {-12212553600.0, -12219292800.0, 253402300799.0, 253402214400.0, 1325239200.0})
+      for (int hour = -30; hour <= 30; ++hour) seconds.push_back(edge + hour * 3600.0 + 59);
+    for (double s : seconds) {
+      const Date date = Date::fromSeconds(s);
+      calendar.setTime(s * 1000.0, status);
+      const int year = calendar.get(UCAL_EXTENDED_YEAR, status), month = calendar.get(UCAL_MONTH, status) + 1,
+                day = calendar.get(UCAL_DATE, status);
+      RZDate::DateComponents c;
+      RZDate::assignFlags(date, RZDate::AllFields, c);
+      const auto where = [&] { return std::string(zoneId) + " at " + std::to_string(qint64(s)); };
+      ASSERT_EQ(c.year, year) << where();
+      ASSERT_EQ(c.month, month) << where();
+      ASSERT_EQ(c.day, day) << where();
+      ASSERT_EQ(c.hour, calendar.get(UCAL_HOUR_OF_DAY, status)) << where();
+      ASSERT_EQ(c.minute, calendar.get(UCAL_MINUTE, status)) << where();
+      ASSERT_EQ(c.second, calendar.get(UCAL_SECOND, status)) << where();
+      const int weekday = calendar.get(UCAL_DAY_OF_WEEK, status);
+      ASSERT_EQ(RZDate::beginOfWeek(date), startOf(year, month, day + 1 - weekday)) << where();
+      ASSERT_EQ(RZDate::midnight(date), startOf(year, month, day)) << where();
+      ASSERT_EQ(RZDate::beginOfMonth(date), startOf(year, month, 1)) << where();
+      ASSERT_TRUE(U_SUCCESS(status));
+    }
+  }
+}
+
+// Numeric patterns are written without ICU's formatter; what they give must be what the formatter gives,
+// in any zone, for every year the calendar arithmetic covers and outside it, and a locale writing other
+// digits must still get its own.
+TEST(RZDateFormat, NumericPatternsAreWrittenAsTheFormatterWritesThem) {
+  DateEnvironment environment;
+  setLocale("en_US");
+  std::mt19937_64 random(11);
+  std::uniform_real_distribution<double> instants(-15e9, 254e9);  // about 1494 to 10018
+  for (const char* zoneId : {"UTC", "Asia/Kathmandu", "America/Sao_Paulo", "Pacific/Apia"}) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(zoneId)));
+    for (const char* pattern : {"yyyy-MM-dd HH:mm", "y/M/d H:m:s", "dd.MM.yy", "yyyy-MM", "MMMM yyyy"}) {
+      UErrorCode status = U_ZERO_ERROR;
+      icu::SimpleDateFormat format(icu::UnicodeString::fromUTF8(pattern), icu::Locale("en_US"), status);
+      ASSERT_TRUE(U_SUCCESS(status));
+      format.adoptTimeZone(icu::TimeZone::createTimeZone(icu::UnicodeString::fromUTF8(zoneId)));
+      for (int i = 0; i < 500; ++i) {
+        const double seconds = std::floor(instants(random));
+        icu::UnicodeString expected;
+        format.format(seconds * 1000.0, expected);
+        ASSERT_EQ(RZDate::stringWithPattern(Date::fromSeconds(seconds), QString::fromUtf8(pattern)),
+                  QString(reinterpret_cast<const QChar*>(expected.getBuffer()), expected.length()))
+            << zoneId << ' ' << pattern << " at " << qint64(seconds);
+      }
+    }
+  }
+  // A pattern first used under a locale with its own digits.
+  setLocale("ar_EG");
+  ASSERT_TRUE(RZDate::setDefaultTimeZone("UTC"));
+  EXPECT_EQ(RZDate::stringWithPattern(utc(2024, 5, 14, 9, 30), QStringLiteral("yyyy/MM/dd HH.mm")),
+            QString::fromUtf8("\u0662\u0660\u0662\u0664/\u0660\u0665/\u0661\u0664 \u0660\u0669.\u0663\u0660"));
+}
 
 // ---------------------------------------------------------------------------------------------------
 // Days with a transition. Expected instants are written in UTC from the zones' rules:
