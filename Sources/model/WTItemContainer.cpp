@@ -1,6 +1,7 @@
 #include "WTItemContainer.h"
 
 #include <QMetaMethod>
+#include <QSet>
 
 #include "RZDate.h"
 #include "WTItem.h"
@@ -159,6 +160,18 @@ void WTItemContainer::stopObserving() {
   observers_.clear();
 }
 
+QString WTItemContainer::itemNames() const {
+  QStringList names;
+  QSet<QString> seen;
+  for (const WTItem* item : items_) {
+    const QString name = item->name().trimmed();
+    if (name.isEmpty() || seen.contains(name)) continue;
+    seen.insert(name);
+    names.append(name);
+  }
+  return names.join(QStringLiteral("; "));
+}
+
 QVariant WTItemContainer::valueForKey(const QString& key) const {
   if (key == QLatin1String("items") || key == QLatin1String("children")) {
     QVariantList list;
@@ -172,6 +185,11 @@ QVariant WTItemContainer::valueForKey(const QString& key) const {
   if (key == QLatin1String("duration")) return duration();
   if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
   if (key == QLatin1String("title")) return title();
+  if (key == QLatin1String("itemNames")) {
+    // None rather than an empty text, which a template's condition would take for a value.
+    const QString names = itemNames();
+    return names.isEmpty() ? QVariant() : QVariant(names);
+  }
   if (key == QLatin1String("uuid")) return uuid();
   if (key == QLatin1String("isLeaf")) return false;
   return {};

@@ -48,6 +48,9 @@ class WTItemContainer : public QObject, public KeyValueCoding {
 
   bool isEqual(const WTItemContainer& other) const;
   // The short date, or "Pending" (translated) without a date.
+  // The names its items carry, each once, in the items' order, joined by "; " (for a report's line of a
+  // day or a month); empty when none of them has a name.
+  QString itemNames() const;
   QString title() const;
   // {"date": date or null, "task": the task's uuid}.
   QVariantMap uuid() const;

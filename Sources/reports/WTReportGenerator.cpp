@@ -10,6 +10,7 @@
 #include "WTItemContainer.h"
 #include "WTProject.h"
 #include "WTReportFilters.h"
+#include "WTReportLevelMarker.h"
 #include "WTTask.h"
 
 #include <QDir>
@@ -137,6 +138,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.loadFilter(std::make_shared<WTReportFilters>());
   engine.loadFilter(std::make_shared<WTHTMLFilter>());
   engine.loadFilter(std::make_shared<WTItemKindFilter>());
+  engine.loadMarker(std::make_shared<WTReportLevelMarker>(&engine, mode_));
   QString html;
   try {
     html = path ? engine.processTemplateInFileAtPath(*path, variables())

@@ -263,6 +263,49 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
   EXPECT_TRUE(months.contains(QStringLiteral("1 entry<"))) << months.toStdString();
 }
 
+// A "level" part is read at its levels only; elsewhere it is jumped over unread, which an "if" cannot
+// do: the end of an empty loop switches output back on inside a false "if", never inside a skipped part.
+TEST_F(ReportTest, LevelPartsAreReadOnlyAtTheirLevels) {
+  const QString text = QStringLiteral(
+      "{% for project in projects %}[{% level 1 %}one{% /level %}{% level 2 3 %}two-three"
+      "{% level 3 %}+three{% /level %}{% /level %}]{% /for %}"
+      "{% if mode == 9 %}{% for x in nothing %}{% /for %}<if>{% /if %}"
+      "{% level 9 %}{% for x in nothing %}{% /for %}<level>{% /level %}|end");
+  const QString expected[] = {
+      QStringLiteral("[][]<if>|end"),
+      QStringLiteral("[one][one]<if>|end"),
+      QStringLiteral("[two-three][two-three]<if>|end"),
+      QStringLiteral("[two-three+three][two-three+three]<if>|end"),
+  };
+  WTReportGenerator generator(projects(), 0);
+  for (int mode = 0; mode <= 3; ++mode) {
+    generator.setMode(mode);
+    const WTReport report = generator.renderText(text);
+    EXPECT_TRUE(report.errors.empty()) << mode;
+    EXPECT_EQ(report.html, expected[mode]) << mode;
+  }
+  // A part that would be an error if read is no error where it is skipped; one left open hides the rest.
+  generator.setMode(1);
+  EXPECT_TRUE(generator.renderText(QStringLiteral("a{% level 2 %}{% /for %}{% /level %}b")).errors.empty());
+  EXPECT_FALSE(generator.renderText(QStringLiteral("a{% level 1 %}{% /for %}{% /level %}b")).errors.empty());
+  EXPECT_EQ(generator.renderText(QStringLiteral("a{% level 2 %}b{{ mode }}")).html, QStringLiteral("a"));
+  EXPECT_EQ(generator.renderText(QStringLiteral("a{% level x %}b{% /level %}c")).html, QStringLiteral("ac"));
+}
+
+TEST_F(ReportTest, DayLinesNameTheirItemsOnceOrCountThem) {
+  WTReportGenerator generator(projects(), 2);
+  const WTReport report = generator.renderText(QStringLiteral(
+      "{% for project in projects %}{% for task in project.tasks %}{% for day in task.dailyItems %}"
+      "{{ day.date | date_format: \"MM-dd\" }}={% if day.itemNames %}{{ day.itemNames }}{% else %}"
+      "#{{ day.items.@count }}{% /if %};{% /for %}{% /for %}{% /for %}"));
+  EXPECT_TRUE(report.errors.empty());
+  // Two entries on 3 March; the open to-do and the note have no value and are no day's items.
+  EXPECT_TRUE(report.html.contains(QStringLiteral("03-03=Review; Kick \"off\";"))) << report.html.toStdString();
+  EXPECT_TRUE(report.html.contains(QStringLiteral("03-06=Setup;"))) << report.html.toStdString();
+  EXPECT_TRUE(report.html.contains(QStringLiteral("02-10=Sketch;"))) << report.html.toStdString();
+  EXPECT_FALSE(report.html.contains(QStringLiteral("Open question")));
+}
+
 TEST_F(ReportTest, BuiltInTemplateShowsNamesWithMarkupCharactersAsTyped) {
   client->setName(QStringLiteral("Smith & <Co>"));
   design->setName(QStringLiteral("a<b"));
