@@ -7,12 +7,14 @@
 #include "WTReportGenerator.h"
 #include "WTReportPDF.h"
 #include "WTStoreSnapshot.h"
+#include "WTTask.h"
 
 #include <QCommandLineParser>
 #include <QFileInfo>
 #include <QTextDocument>
 
 #include <algorithm>
+#include <optional>
 
 namespace {
 
@@ -63,6 +65,59 @@ QList<WTProject*> sortedByName(QList<WTProject*> projects) {
   return projects;
 }
 
+// The projects a report is made of (one named project, or a named client's), with the context they
+// were read into.
+struct ReportedProjects {
+  std::unique_ptr<WTStoreSnapshot> snapshot;
+  QList<WTProject*> projects;
+  QString title;
+};
+
+Result<ReportedProjects> namedProjects(std::unique_ptr<WTStoreSnapshot> snapshot, bool byProject,
+                                       const QString& name) {
+  ReportedProjects named;
+  if (byProject) {
+    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), name);
+    if (!project) return project.error();
+    named.projects = {project.value()};
+    named.title = project.value()->name();
+  } else {
+    const Result<WTClient*> client = WTNamedRecords::client(snapshot->context(), name);
+    if (!client) return client.error();
+    named.projects = sortedByName(client.value()->projects());
+    named.title = client.value()->name();
+  }
+  named.snapshot = std::move(snapshot);
+  return named;
+}
+
+// Reads the named projects with their items and no other items: the names are looked up among the owners
+// first, then the store is read again for those projects' tasks alone. A large store's other items would
+// take longer to read than the report takes to make. Errors are written to `err`.
+std::optional<ReportedProjects> readNamedProjects(QTextStream& err, bool byProject, const QString& name) {
+  std::unique_ptr<WTStoreSnapshot> owners = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks);
+  if (!owners) return std::nullopt;
+  Result<ReportedProjects> found = namedProjects(std::move(owners), byProject, name);
+  if (!found) {
+    failure(err, found.error().message);
+    return std::nullopt;
+  }
+  QStringList tasks;
+  for (const WTProject* project : found.value().projects) {
+    for (const WTTask* task : project->tasks()) tasks.append(task->uuid());
+  }
+  found.value().snapshot.reset();
+  std::unique_ptr<WTStoreSnapshot> scoped = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks, tasks);
+  if (!scoped) return std::nullopt;
+  // Looked up again in what was read: the desktop copy may have renamed something in between.
+  Result<ReportedProjects> read = namedProjects(std::move(scoped), byProject, name);
+  if (!read) {
+    failure(err, read.error().message);
+    return std::nullopt;
+  }
+  return std::move(read.value());
+}
+
 }  // namespace
 
 bool reportCommandWritesPDF(const QStringList& arguments) {
@@ -100,21 +155,11 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   if (!templatePath.isEmpty() && !QFileInfo(templatePath).isFile())
     return usage(err, kReportUsage, QStringLiteral("%1: no such file").arg(templatePath));
 
-  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err);
-  if (!snapshot) return 1;
-  QList<WTProject*> projects;
-  QString title;
-  if (byProject) {
-    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), parser.value(QStringLiteral("project")));
-    if (!project) return failure(err, project.error().message);
-    projects = {project.value()};
-    title = project.value()->name();
-  } else {
-    const Result<WTClient*> client = WTNamedRecords::client(snapshot->context(), parser.value(QStringLiteral("client")));
-    if (!client) return failure(err, client.error().message);
-    projects = sortedByName(client.value()->projects());
-    title = client.value()->name();
-  }
+  const std::optional<ReportedProjects> named = readNamedProjects(
+      err, byProject, parser.value(byProject ? QStringLiteral("project") : QStringLiteral("client")));
+  if (!named) return 1;
+  const QList<WTProject*>& projects = named->projects;
+  const QString& title = named->title;
 
   Result<void> written = Result<void>::success();
   if (format == ReportFormat::CSV) {

@@ -9,10 +9,11 @@
 
 #include <algorithm>
 
-std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which) {
+std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which,
+                                                       const QStringList& tasks) {
   auto defaults = std::make_unique<UserDefaults>();
   WTApplication::registerDefaults(*defaults);
-  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(WTAppDelegate::storePath(), std::move(defaults), which);
+  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(WTAppDelegate::storePath(), std::move(defaults), which, tasks);
   if (!snapshot) {
     err << "tessal: " << snapshot.error().message << '\n';
     err.flush();
@@ -23,14 +24,15 @@ std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore
 
 Result<std::unique_ptr<WTStoreSnapshot>> WTStoreSnapshot::open(const QString& path,
                                                                std::unique_ptr<UserDefaults> defaults,
-                                                               WTStore::Records which) {
+                                                               WTStore::Records which,
+                                                               const QStringList& tasks) {
   // Reading cannot leave damage to show in a failed save later: the header's check is enough.
   Result<std::unique_ptr<WTStore>> store = WTStore::openReadOnly(path, WTStore::Check::Header);
   if (!store) return store.error();
   std::unique_ptr<WTStoreSnapshot> snapshot(new WTStoreSnapshot);
   snapshot->defaults_ = std::move(defaults);
   snapshot->context_ = std::make_unique<WTObjectContext>(snapshot->defaults_.get());
-  const Result<void> loaded = snapshot->context_->attachStore(std::move(store.value()), which);
+  const Result<void> loaded = snapshot->context_->attachStore(std::move(store.value()), which, tasks);
   if (!loaded) return loaded.error();
   WTObjectContext::setDefaultContext(snapshot->context_.get());
   return snapshot;

@@ -18,10 +18,13 @@ class WTTask;
 class WTStoreSnapshot {
  public:
   // Reads the user's store; on failure writes why to `err` as "tessal: MESSAGE" and gives none.
-  static std::unique_ptr<WTStoreSnapshot> open(QTextStream& err, WTStore::Records which = WTStore::Records::All);
+  // `tasks` as WTStore::loadAll takes them.
+  static std::unique_ptr<WTStoreSnapshot> open(QTextStream& err, WTStore::Records which = WTStore::Records::All,
+                                               const QStringList& tasks = {});
   // Reads the store at `path` with `defaults` (taken over).
   static Result<std::unique_ptr<WTStoreSnapshot>> open(const QString& path, std::unique_ptr<UserDefaults> defaults,
-                                                       WTStore::Records which = WTStore::Records::All);
+                                                       WTStore::Records which = WTStore::Records::All,
+                                                       const QStringList& tasks = {});
   ~WTStoreSnapshot();
 
   WTObjectContext& context() { return *context_; }

@@ -342,7 +342,8 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
   return attachStore(std::move(store), WTStore::Records::All);
 }
 
-Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStore::Records which) {
+Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStore::Records which,
+                                          const QStringList& tasks) {
   Q_ASSERT(count() == 0 && !store_);
   struct Link {
     WTObject* object;
@@ -367,7 +368,7 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStor
     if (ownerUuid.isEmpty()) return;
     (*entity == WTEntity::Task ? taskLinks : links)
         .push_back({object, std::move(ownerUuid), record.position});
-  }, which);
+  }, which, tasks);
   if (loaded) {
     // Tasks join their projects in stored order.
     std::stable_sort(taskLinks.begin(), taskLinks.end(),

@@ -47,7 +47,7 @@ class WTObjectContext : public QObject {
   // the timer records sees no other items: it may start and stop timers and save, but must not delete
   // records (their unloaded items would be left behind in the file) nor answer totals.
   Result<void> attachStore(std::unique_ptr<WTStore> store);
-  Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which);
+  Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which, const QStringList& tasks = {});
   bool hasStore() const { return store_ != nullptr; }
   WTStore* store() const { return store_.get(); }
 

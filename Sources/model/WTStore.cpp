@@ -4,6 +4,8 @@
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
+#include <QJsonArray>
+#include <QJsonDocument>
 
 #include <sqlite3.h>
 
@@ -60,6 +62,10 @@ constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
 constexpr char kSelectTimerRecordsSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
                                           " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_RUNNING
                                           " AND NOT " WT_STORE_OWNERS;
+// The task uuids arrive as one JSON array, so a single prepared statement serves any number of them.
+constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
+                                          " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE taskUuid IN"
+                                          " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
 constexpr char kReplaceSql[] =
     "INSERT OR REPLACE INTO records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
@@ -79,6 +85,11 @@ int addTimerIndexes(sqlite3* db) {
 
 #undef WT_STORE_OWNERS
 #undef WT_STORE_RUNNING
+
+// Schema version 3: the items by their task, so a report of a few projects reads their items alone.
+int addItemIndex(sqlite3* db) {
+  return sqlite3_exec(db, "CREATE INDEX records_items ON records(taskUuid);", nullptr, nullptr, nullptr);
+}
 
 // Schema version 1. Money is the decimal's text (exact, with its exponent), dates are seconds since 1970,
 // colours "#aarrggbb"; NULL stands for "none" and is kept apart from an empty text. No index on the
@@ -115,7 +126,7 @@ static_assert(kApplicationId == 1416852332);
 // kMigrations[n] takes a file from version n to n + 1. A new schema version appends its step here and
 // raises WTStore::kSchemaVersion; every step runs inside the one migration transaction.
 using Migration = int (*)(sqlite3*);
-constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes};
+constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex};
 static_assert(std::size(kMigrations) == WTStore::kSchemaVersion);
 
 // What went wrong, in words for the user, for SQLite's result code.
@@ -322,7 +333,8 @@ int stepOnce(sqlite3_stmt* statement) {
 WTStore::WTStore(QString path, sqlite3* db) : path_(std::move(path)), db_(db) {}
 
 WTStore::~WTStore() {
-  for (sqlite3_stmt* statement : {begin_, commit_, rollback_, replace_, remove_, selectAll_, selectTimerRecords_})
+  for (sqlite3_stmt* statement :
+       {begin_, commit_, rollback_, replace_, remove_, selectAll_, selectTimerRecords_, selectItemsOfTasks_})
     sqlite3_finalize(statement);
   sqlite3_close(db_);
 }
@@ -447,9 +459,22 @@ Error WTStore::writeError(int code) const {
   return {WriteFailed, tr("Changes could not be saved to the data file “%1”: %2.").arg(path_, reason(code))};
 }
 
-Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which) {
-  sqlite3_stmt* const s = which == Records::All ? selectAll_ : selectTimerRecords_;
-  if (!s) return {};  // a file opened for reading before anything was ever written to it
+Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which,
+                              const QStringList& tasks) {
+  if (!selectAll_) return {};  // a file opened for reading before anything was ever written to it
+  sqlite3_stmt* s = which == Records::All ? selectAll_ : selectTimerRecords_;
+  QByteArray taskList;
+  if (which == Records::ItemsOfTasks) {
+    if (!selectItemsOfTasks_) {
+      const int code = sqlite3_prepare_v3(db_, kSelectItemsOfTasksSql, -1, SQLITE_PREPARE_PERSISTENT,
+                                          &selectItemsOfTasks_, nullptr);
+      if (code != SQLITE_OK)
+        return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
+    }
+    s = selectItemsOfTasks_;
+    taskList = QJsonDocument(QJsonArray::fromStringList(tasks)).toJson(QJsonDocument::Compact);
+    sqlite3_bind_text(s, 1, taskList.constData(), int(taskList.size()), SQLITE_STATIC);
+  }
   WTStoreRecord record;
   int code;
   while ((code = sqlite3_step(s)) == SQLITE_ROW) {
@@ -481,6 +506,7 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, 
     sink(std::move(record));
   }
   sqlite3_reset(s);
+  sqlite3_clear_bindings(s);
   if (code == SQLITE_DONE) return {};
   if (isDamage(code))
     return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};

@@ -19,7 +19,7 @@ struct sqlite3_stmt;
 // newer version is refused without being changed in any way.
 class WTStore {
  public:
-  static constexpr int kSchemaVersion = 2;
+  static constexpr int kSchemaVersion = 3;
   // The oldest version whose rows read as this version's do (later ones only added indexes): a reader
   // that may not migrate still reads it.
   static constexpr int kOldestReadableVersion = 1;
@@ -59,12 +59,17 @@ class WTStore {
     All,
     // The clients, projects and tasks, and of the items only the running time entries: all that starting
     // and stopping timers needs, read in a fraction of the time a large store takes to read whole.
-    Timers
+    Timers,
+    // The clients, projects and tasks, and the items of the tasks named in the load (none when it names
+    // none): what a report or an export of some projects needs.
+    ItemsOfTasks
   };
 
   // Reads every record (or those `which` names), handing each to `sink` in no particular order. The sink
   // may move out of the record it is given.
-  Result<void> loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which = Records::All);
+  // `tasks` are the uuids of the tasks whose items Records::ItemsOfTasks reads; other loads ignore them.
+  Result<void> loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which = Records::All,
+                       const QStringList& tasks = {});
 
   // Writes the given records (inserted or replaced whole) and removes the deleted ones, all in one
   // transaction: after a failure nothing of this save is in the file and the store stays usable.
@@ -85,4 +90,5 @@ class WTStore {
   sqlite3_stmt* remove_ = nullptr;
   sqlite3_stmt* selectAll_ = nullptr;
   sqlite3_stmt* selectTimerRecords_ = nullptr;
+  sqlite3_stmt* selectItemsOfTasks_ = nullptr;  // prepared on first use
 };

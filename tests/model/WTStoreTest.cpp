@@ -2,6 +2,8 @@
 #include "WTStore.h"
 
 #include <gtest/gtest.h>
+
+#include <QSet>
 #include <sqlite3.h>
 
 #include <QDir>
@@ -210,7 +212,7 @@ TEST_F(WTStoreTest, ANewFileIsACurrentStoreInWalMode) {
   ASSERT_TRUE(open());
   EXPECT_FALSE(sideFilesExist());  // closing folds the log back into the file
   RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("2"));
+  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("3"));
   EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
   EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("0"));
 }
@@ -336,10 +338,10 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBack) {
   store.reset();
   RawDatabase raw(path());
   EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("2"));
+  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("3"));
   EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("5"));
   EXPECT_EQ(raw.text("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name LIKE 'records_%'"),
-            QStringLiteral("2"));
+            QStringLiteral("3"));
 }
 
 TEST_F(WTStoreTest, TimersReadTheOwnersAndTheRunningEntriesOnly) {
@@ -363,6 +365,42 @@ TEST_F(WTStoreTest, TimersReadTheOwnersAndTheRunningEntriesOnly) {
   Records loaded;
   ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { loaded[r.uuid] = r; }, WTStore::Records::Timers).ok());
   expectSameRecords(loaded, expected);
+}
+
+TEST_F(WTStoreTest, ItemsOfTasksReadTheOwnersAndThoseTasksItemsOnly) {
+  Records records = sampleRecords();
+  // Tasks whose uuids hold what JSON must escape still find their items.
+  for (const QString& task : {QStringLiteral("T\"quoted\\@WTTask"), QStringLiteral("T9@WTTask")}) {
+    WTStoreRecord owner = record(task, QStringLiteral("WTTask"));
+    records[task] = owner;
+    WTStoreRecord item = record(task + QStringLiteral("-item@WTNote"), QStringLiteral("WTNote"));
+    item.taskUuid = task;
+    records[item.uuid] = item;
+  }
+  makeStore(records);
+  QSet<QString> tasks;
+  for (const auto& [uuid, stored] : records) {
+    if (stored.entity == QLatin1String("WTTask") && uuid != QLatin1String("T9@WTTask")) tasks.insert(uuid);
+  }
+  auto store = open();
+  ASSERT_TRUE(store);
+  for (const QStringList& chosen : {QStringList(tasks.begin(), tasks.end()), QStringList()}) {
+    Records expected;
+    for (const auto& [uuid, stored] : records) {
+      const bool owner = stored.entity == QLatin1String("WTClient") || stored.entity == QLatin1String("WTProject") ||
+                         stored.entity == QLatin1String("WTTask");
+      if (owner || chosen.contains(stored.taskUuid)) expected[uuid] = stored;
+    }
+    Records loaded;
+    ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { loaded[r.uuid] = r; }, WTStore::Records::ItemsOfTasks, chosen).ok());
+    expectSameRecords(loaded, expected);
+    // The statement is used again: the next load's tasks replace this one's.
+  }
+  Records items;
+  ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { items[r.uuid] = r; }, WTStore::Records::ItemsOfTasks,
+                             {QStringLiteral("T\"quoted\\@WTTask")}).ok());
+  EXPECT_EQ(items.count(QStringLiteral("T\"quoted\\@WTTask-item@WTNote")), 1u);
+  EXPECT_EQ(items.count(QStringLiteral("T9@WTTask-item@WTNote")), 0u);
 }
 
 TEST_F(WTStoreTest, AnEmptyFileBecomesAStore) {
