@@ -314,7 +314,7 @@ TEST_F(ReportTest, BuiltInTemplateShowsNamesWithMarkupCharactersAsTyped) {
   EXPECT_TRUE(report.errors.empty());
   EXPECT_TRUE(report.html.contains(QStringLiteral("<h1>Smith &amp; &lt;Co&gt;</h1>")))
       << report.html.toStdString();
-  EXPECT_TRUE(report.html.contains(QStringLiteral("<td>a&lt;b</td>")));
+  EXPECT_TRUE(report.html.contains(QStringLiteral(">a&lt;b</td>"))) << report.html.toStdString();
   EXPECT_FALSE(report.html.contains(QStringLiteral("<Co>")));
   EXPECT_EQ(generator.renderText(QStringLiteral("[{{ missing | html }}]")).html, QStringLiteral("[]"));
 }
@@ -341,6 +341,7 @@ TEST_F(ReportTest, BuiltInTemplateRendersSparseRecordsWithoutErrorsOrStrayRows) 
       EXPECT_EQ(report.html.count(QStringLiteral("class=\"subtotal\"")), chosen.size());
       EXPECT_EQ(report.html.count(QStringLiteral("<h2>")), chosen.size());
       EXPECT_EQ(report.html.count(QStringLiteral("class=\"total\"")), 1);
+      EXPECT_EQ(report.html.count(QStringLiteral("<table")), report.html.count(QStringLiteral("</table>")));
       if (mode == 0) {
         EXPECT_FALSE(report.html.contains(QStringLiteral("class=\"item\""))) << report.html.toStdString();
       }
