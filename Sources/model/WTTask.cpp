@@ -115,8 +115,37 @@ QList<WTItem*> WTTask::filteredItems(const QStringList& entityNames) const {
   return result;
 }
 
+namespace {
+
+bool isValuable(const WTItem* item) {
+  const WTEntity entity = item->entity();
+  return entity == WTEntity::Time || entity == WTEntity::Flat || entity == WTEntity::Expense;
+}
+
+}  // namespace
+
 QList<WTItem*> WTTask::valuableItems() const {
-  return filteredItems({QStringLiteral("WTTime"), QStringLiteral("WTFlat"), QStringLiteral("WTExpense")});
+  QList<WTItem*> result;
+  for (WTItem* item : items_) {
+    if (isValuable(item)) result.append(item);
+  }
+  return result;
+}
+
+std::optional<Date> WTTask::firstItemDate() const {
+  std::optional<Date> first;
+  for (const WTItem* item : items_) {
+    if (isValuable(item) && item->startDate() && (!first || *item->startDate() < *first)) first = item->startDate();
+  }
+  return first;
+}
+
+std::optional<Date> WTTask::lastItemDate() const {
+  std::optional<Date> last;
+  for (const WTItem* item : items_) {
+    if (isValuable(item) && item->startDate() && (!last || *item->startDate() > *last)) last = item->startDate();
+  }
+  return last;
 }
 
 WTItemContainerList WTTask::dailyItems() const {
@@ -268,6 +297,10 @@ QVariant WTTask::valueForKey(const QString& key) const {
   }
   if (key == QLatin1String("pendingToDos")) return records(pendingToDos());
   if (key == QLatin1String("valuableItems")) return records(valuableItems());
+  if (key == QLatin1String("firstItemDate") || key == QLatin1String("lastItemDate")) {
+    const std::optional<Date> date = key.at(0) == u'f' ? firstItemDate() : lastItemDate();
+    return date ? QVariant::fromValue(*date) : QVariant();
+  }
   if (key == QLatin1String("itemsWithoutPendingToDos")) return records(itemsWithoutPendingToDos());
   // Groups are made afresh on each read; the task keeps the last list of each key alive so the records
   // handed out stay valid while a template walks them.

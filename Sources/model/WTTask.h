@@ -48,6 +48,10 @@ class WTTask final : public WTObject {
   QList<WTItem*> itemsWithoutPendingToDos() const;
   QList<WTItem*> filteredItems(const QStringList& entityNames) const;
   QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses
+  // The start dates of the oldest and the newest of the valuable items that have one: the period a report
+  // of the task covers, found without listing the items.
+  std::optional<Date> firstItemDate() const;
+  std::optional<Date> lastItemDate() const;
   WTItemContainerList dailyItems() const;
   WTItemContainerList monthlyItems() const;
 

@@ -127,6 +127,10 @@ TEST_F(ReportTest, TaskAnswersItsItemListsAndGroupTotalsByKey) {
   ASSERT_EQ(children.size(), 5);
   EXPECT_FALSE(KeyPath::valueForKeyPath(children[0], u"date").isValid());
   EXPECT_EQ(KeyPath::valueForKeyPath(children[0], u"items.@count").toInt(), 1);
+  // The period of the valuable items: the later note and open to-do do not extend it.
+  EXPECT_EQ(at(design, "firstItemDate").value<Date>(), berlin(2024, 2, 10, 10));
+  EXPECT_EQ(at(design, "lastItemDate").value<Date>(), berlin(2024, 3, 4, 8));
+  EXPECT_FALSE(at(makeTask(web, QStringLiteral("Empty")), "firstItemDate").isValid());
 }
 
 TEST_F(ReportTest, VariablesFollowProjectsAndMode) {
