@@ -1,7 +1,9 @@
 #include "MoneyFormat.h"
 
 #include <QLocale>
+#include <QVarLengthArray>
 
+#include <unicode/dcfmtsym.h>
 #include <unicode/decimfmt.h>
 #include <unicode/locid.h>
 
@@ -9,22 +11,97 @@
 
 namespace MoneyFormat {
 
-QString format(const Decimal& amount) {
-  static std::unique_ptr<icu::DecimalFormat> formatter = [] {
-    UErrorCode status = U_ZERO_ERROR;
-    auto made = std::make_unique<icu::DecimalFormat>(
-        icu::UnicodeString(u"#,##0.00"), icu::DecimalFormatSymbols(icu::Locale::getDefault(), status),
-        status);
-    made->setRoundingMode(icu::DecimalFormat::kRoundHalfUp);
-    return U_SUCCESS(status) ? std::move(made) : nullptr;
-  }();
-  const QByteArray digits = amount.toString().toLatin1();
-  if (!formatter) return QString::fromLatin1(digits);
-  icu::UnicodeString text;
-  UErrorCode status = U_ZERO_ERROR;
-  formatter->format(icu::StringPiece(digits.constData(), int32_t(digits.size())), text, nullptr, status);
-  if (U_FAILURE(status)) return QString::fromLatin1(digits);
+namespace {
+
+QString fromUnicode(const icu::UnicodeString& text) {
   return QString(reinterpret_cast<const QChar*>(text.getBuffer()), text.length());
+}
+
+// "#,##0.00" in one locale. Amounts that are not negative, in a locale writing Latin digits, are written
+// from the decimal's own digits with the locale's two signs: a report writes one amount per row, and
+// ICU's formatter costs more than the rest of the row. Everything else goes through ICU.
+class Formatter {
+ public:
+  explicit Formatter(const icu::Locale& locale) {
+    UErrorCode status = U_ZERO_ERROR;
+    const icu::DecimalFormatSymbols symbols(locale, status);
+    if (U_FAILURE(status)) return;
+    format_ = std::make_unique<icu::DecimalFormat>(icu::UnicodeString(u"#,##0.00"), symbols, status);
+    if (U_FAILURE(status)) {
+      format_.reset();
+      return;
+    }
+    format_->setRoundingMode(icu::DecimalFormat::kRoundHalfUp);
+    latinDigits_ = symbols.getConstDigitSymbol(0) == icu::UnicodeString(u"0");
+    decimalSign_ = fromUnicode(symbols.getSymbol(icu::DecimalFormatSymbols::kDecimalSeparatorSymbol));
+    groupingSign_ = fromUnicode(symbols.getSymbol(icu::DecimalFormatSymbols::kGroupingSeparatorSymbol));
+    minimumGrouping_ = std::max(1, int(format_->getMinimumGroupingDigits()));
+  }
+
+  QString format(const Decimal& amount) const {
+    const QString plain = amount.toString();
+    if (!format_) return plain;
+    if (latinDigits_ && !amount.isNegative()) return writeDirectly(plain);
+    const QByteArray digits = plain.toLatin1();
+    icu::UnicodeString text;
+    UErrorCode status = U_ZERO_ERROR;
+    format_->format(icu::StringPiece(digits.constData(), int32_t(digits.size())), text, nullptr, status);
+    return U_FAILURE(status) ? plain : fromUnicode(text);
+  }
+
+ private:
+  // `plain` is the decimal's text: digits, at most one point, no sign, no exponent.
+  QString writeDirectly(const QString& plain) const {
+    const qsizetype point = plain.indexOf(u'.');
+    const qsizetype wholeLength = point < 0 ? plain.size() : point;
+    // The whole digits and two places, with room for a carry in front.
+    QVarLengthArray<char, 48> digits(wholeLength + 3);
+    digits[0] = '0';
+    for (qsizetype i = 0; i < wholeLength; ++i) digits[1 + i] = char(plain[i].unicode());
+    for (qsizetype place = 0; place < 2; ++place) {
+      const qsizetype at = point + 1 + place;
+      digits[1 + wholeLength + place] = point >= 0 && at < plain.size() ? char(plain[at].unicode()) : '0';
+    }
+    const qsizetype third = point + 3;
+    if (point >= 0 && third < plain.size() && plain[third] >= u'5') {
+      qsizetype i = digits.size() - 1;
+      for (; digits[i] == '9'; --i) digits[i] = '0';
+      ++digits[i];
+    }
+    // Leading zeros go, but one digit always stays before the point.
+    qsizetype first = 0;
+    while (first < digits.size() - 3 && digits[first] == '0') ++first;
+    const qsizetype whole = digits.size() - 2 - first;
+    QString text;
+    text.reserve(whole + whole / 3 * groupingSign_.size() + decimalSign_.size() + 2);
+    const bool grouped = whole >= 3 + minimumGrouping_;
+    for (qsizetype i = 0; i < whole; ++i) {
+      if (grouped && i > 0 && (whole - i) % 3 == 0) text += groupingSign_;
+      text += QLatin1Char(digits[first + i]);
+    }
+    text += decimalSign_;
+    text += QLatin1Char(digits[digits.size() - 2]);
+    text += QLatin1Char(digits[digits.size() - 1]);
+    return text;
+  }
+
+  std::unique_ptr<icu::DecimalFormat> format_;
+  bool latinDigits_ = false;
+  QString decimalSign_;
+  QString groupingSign_;
+  int minimumGrouping_ = 1;
+};
+
+}  // namespace
+
+QString format(const Decimal& amount) {
+  // Made once, in the locale of the first use.
+  static const Formatter formatter(icu::Locale::getDefault());
+  return formatter.format(amount);
+}
+
+QString format(const Decimal& amount, const icu::Locale& locale) {
+  return Formatter(locale).format(amount);
 }
 
 std::optional<Decimal> parse(const QString& typed) {
