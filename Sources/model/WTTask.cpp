@@ -129,6 +129,11 @@ QList<WTItem*> WTTask::valuableItems() const {
   for (WTItem* item : items_) {
     if (isValuable(item)) result.append(item);
   }
+  // Newest first, as the day and month groups are, so a report reads the same at every level; items
+  // without a date last.
+  std::stable_sort(result.begin(), result.end(), [](const WTItem* a, const WTItem* b) {
+    return a->startDate() && (!b->startDate() || *a->startDate() > *b->startDate());
+  });
   return result;
 }
 

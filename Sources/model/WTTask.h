@@ -47,7 +47,7 @@ class WTTask final : public WTObject {
   QList<WTItem*> pendingToDos() const;  // open to-dos, newest first
   QList<WTItem*> itemsWithoutPendingToDos() const;
   QList<WTItem*> filteredItems(const QStringList& entityNames) const;
-  QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses
+  QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses, newest first
   // The start dates of the oldest and the newest of the valuable items that have one: the period a report
   // of the task covers, found without listing the items.
   std::optional<Date> firstItemDate() const;

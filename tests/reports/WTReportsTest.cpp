@@ -110,6 +110,9 @@ QVariant at(WTObject* object, const char* keyPath) {
 TEST_F(ReportTest, TaskAnswersItsItemListsAndGroupTotalsByKey) {
   EXPECT_EQ(at(design, "itemsWithoutPendingToDos.@count").toInt(), 5);
   EXPECT_EQ(at(design, "valuableItems.@count").toInt(), 4);
+  // Newest first whatever order they were made in (Sketch, the oldest, was made after the March entries).
+  EXPECT_EQ(at(design, "valuableItems.name").toStringList(),
+            QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
   // Days newest first: 4 March (expense), 3 March (two entries), 10 February.
   const QVariantList days = at(design, "dailyItems").toList();
   ASSERT_EQ(days.size(), 3);
