@@ -205,13 +205,18 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
   if (!predicate) return usage(err, kExportUsage, predicate.error().message);
 
-  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err);
-  if (!snapshot) return 1;
+  // One project's entries need only that project's items read.
+  std::optional<ReportedProjects> named;
+  std::unique_ptr<WTStoreSnapshot> snapshot;
   const WTProject* project = nullptr;
   if (parser.isSet(QStringLiteral("project"))) {
-    const Result<WTProject*> named = WTNamedRecords::project(snapshot->context(), parser.value(QStringLiteral("project")));
-    if (!named) return failure(err, named.error().message);
-    project = named.value();
+    named = readNamedProjects(err, true, parser.value(QStringLiteral("project")));
+    if (!named) return 1;
+    snapshot = std::move(named->snapshot);
+    project = named->projects.first();
+  } else {
+    snapshot = WTStoreSnapshot::open(err);
+    if (!snapshot) return 1;
   }
   const QString outPath = parser.value(QStringLiteral("out"));
   if (outPath.isEmpty()) {
