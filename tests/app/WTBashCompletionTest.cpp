@@ -103,6 +103,9 @@ TEST_F(BashCompletion, NamesComeQuotedAndNarrowedByTheOptionsAlreadyTyped) {
   EXPECT_EQ(complete({"start", "Design", ""}), QStringList()) << "one task a command";
   EXPECT_EQ(complete({"report", "--client", "A"}), QStringList({"Acme\\ Corp"}));
   EXPECT_EQ(complete({"report", "--client", "Other", "--project", ""}), QStringList({"Beacon"}));
+  // Names are matched in any case, as tessal itself matches them, and come back as they are spelt.
+  EXPECT_EQ(complete({"start", "build\\ p"}), QStringList({"Build\\ pipeline"}));
+  EXPECT_EQ(complete({"report", "--client", "ACME"}), QStringList({"Acme\\ Corp"}));
 }
 
 // Readline puts a completion in place of its own part of the word only: after an open quote, after
@@ -122,6 +125,10 @@ TEST_F(BashCompletion, FinishesWordsBegunInQuotesAfterAnEqualsSignOrAColon) {
   EXPECT_EQ(completeAsBash("tessal report --client=Other --project=",
                            {"report", "--client", "=", "Other", "--project", "="}, ""),
             QStringList({"Beacon"}));
+  EXPECT_EQ(completeAsBash("tessal start fix:", {"start", "fix", ":"}, ""), QStringList({"\\ it\\'s\\ late"}))
+      << "\"fix:\" stays as typed; tessal reads it in any case";
+  EXPECT_EQ(completeAsBash("tessal start \"bu", {"start", "\"bu"}, "bu"),
+            QStringList({"Build \\\"it\\\" now", "Build pipeline"}));
   EXPECT_EQ(completeAsBash("tessal export --range=this-", {"export", "--range", "=", "this-"}, "this-"),
             QStringList({"this-month", "this-week", "this-year"}));
 }
