@@ -1,5 +1,6 @@
 #include "WTObjectContext.h"
 
+#include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
@@ -36,7 +37,31 @@ QString inverseKey(WTEntity entity) {
 }  // namespace
 
 WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent)
-    : QObject(parent), defaults_(defaults) {}
+    : QObject(parent), defaults_(defaults) {
+  if (defaults_) {
+    connect(defaults_, &UserDefaults::valueChanged, this, [this](const QString& key) {
+      if (key == QLatin1String("WTDefaultRate")) defaultRateDidChange();
+    });
+  }
+}
+
+void WTObjectContext::defaultRateDidChange() {
+  // Clients take the default; projects and tasks only when nothing above them gives a rate.
+  const auto& clients = objects_[static_cast<int>(WTEntity::Client)];
+  const auto& projects = objects_[static_cast<int>(WTEntity::Project)];
+  const auto& tasks = objects_[static_cast<int>(WTEntity::Task)];
+  const std::vector<WTObject*> readers = [&] {
+    std::vector<WTObject*> found(clients.begin(), clients.end());
+    for (WTObject* project : projects) {
+      if (!static_cast<WTProject*>(project)->client()) found.push_back(project);
+    }
+    for (WTObject* task : tasks) {
+      if (!static_cast<WTTask*>(task)->project()) found.push_back(task);
+    }
+    return found;
+  }();
+  for (WTObject* reader : readers) announce(reader, QStringLiteral("rate"));
+}
 
 WTObjectContext::~WTObjectContext() {
   if (gDefaultContext == this) gDefaultContext = nullptr;

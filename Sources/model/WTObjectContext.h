@@ -135,6 +135,9 @@ class WTObjectContext : public QObject {
   void notifyObservers(WTObject* object, const QString& key);
   void announceClosure(WTObject* object, const QString& key,
                        std::vector<std::pair<WTObject*, QString>>& seen);
+  // The user's default rate is where every inherited rate begins: the records that read it announce a
+  // new rate, and the costs below them follow.
+  void defaultRateDidChange();
   void uuidChanged(WTObject* object, const QString& oldUuid);
   // Puts the items loaded from the store into the identity map, once.
   void indexItems() const;

@@ -149,6 +149,20 @@ TEST_F(WTRatesTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   endTurn();
   EXPECT_TRUE(repainted());
   EXPECT_EQ(costShown(tuesdayRow), "10.00");
+
+  // Without a rate of their own anywhere above, the rows show the user's default rate, and a new one in
+  // the preferences shows at once.
+  acme->setRate(std::nullopt);
+  design->setRate(std::nullopt);
+  defaults->setValue(QStringLiteral("WTDefaultRate"), QVariant::fromValue(Decimal(120)));
+  endTurn();
+  spy.clear();
+  EXPECT_EQ(costShown(mondayRow.parent()), "60.00");
+  defaults->setValue(QStringLiteral("WTDefaultRate"), QVariant::fromValue(Decimal(60)));
+  endTurn();
+  EXPECT_TRUE(repainted());
+  EXPECT_EQ(costShown(mondayRow.parent()), "30.00");
+  EXPECT_EQ(totals()->text().right(5), "60.00");
 }
 
 TEST_F(WTRatesTest, ATaskRowsMenuSetsItsRateAndKeepsTheSheetOpenOnAMistake) {
