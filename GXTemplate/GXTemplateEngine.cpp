@@ -369,7 +369,7 @@ void GXTemplateEngine::reportError(const QString& message, int code, bool contin
 }
 
 void GXTemplateEngine::reportBlockBoundaryStarted(bool started) {
-  if (!delegate_ || openBlocksStack_.empty()) return;
+  if (!delegate_ || openBlocksStack_.empty() || !delegate_->observesBlocks()) return;
   // A copy: the delegate may call back into the engine.
   const GXBlockInfo top = openBlocksStack_.back();
   if (started) {

@@ -18,6 +18,9 @@ struct GXTemplateError {
 class GXTemplateEngineDelegate {
  public:
   virtual ~GXTemplateEngineDelegate() = default;
+  // Whether the two block calls below are wanted. A delegate that has no use for them says no, and the
+  // engine spares each block's opening and closing the copy of its block info that the calls need.
+  virtual bool observesBlocks() const { return true; }
   // A block was opened; `blockInfo` is the new innermost block.
   virtual void templateEngineBlockStarted(GXTemplateEngine* engine, const GXBlockInfo& blockInfo) {
     (void)engine;

@@ -22,6 +22,7 @@ const QString kCommand = QStringLiteral("tessal template");
 class ErrorPrinter : public GXTemplateEngineDelegate {
  public:
   explicit ErrorPrinter(QTextStream& err) : err_(err) {}
+  bool observesBlocks() const override { return false; }
   void templateEngineEncounteredError(GXTemplateEngine*, const GXTemplateError& error, bool) override {
     err_ << "error " << error.code << ": " << error.localizedDescription << '\n';
     err_.flush();

@@ -27,6 +27,7 @@ namespace {
 class ErrorCollector : public GXTemplateEngineDelegate {
  public:
   ErrorCollector(std::vector<WTReportTemplateError>& errors, bool logs) : errors_(errors), logs_(logs) {}
+  bool observesBlocks() const override { return false; }
   void templateEngineEncounteredError(GXTemplateEngine* engine, const GXTemplateError& error, bool) override {
     if (logs_) qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
     const QString& contents = engine->templateContents();
