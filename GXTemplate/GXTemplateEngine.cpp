@@ -122,6 +122,7 @@ GXTemplateEngine::~GXTemplateEngine() = default;
 void GXTemplateEngine::addEntriesFromDictionary(const QVariantMap& entries) {
   for (auto it = entries.cbegin(); it != entries.cend(); ++it) globals_.insert(it.key(), it.value());
   ++rootKeysVersion_;
+  ++valuesVersion_;
 }
 
 void GXTemplateEngine::loadMarker(std::shared_ptr<GXTemplateMarker> marker) {
@@ -151,7 +152,9 @@ QString GXTemplateEngine::processTemplateInFileAtPath(const QString& path, const
 GXTemplateEngine::VariableName& GXTemplateEngine::nameOf(const QString& variable) {
   auto it = names_.find(variable);
   if (it != names_.end()) return it->second;
-  return names_.emplace(variable, VariableName{variable.split(u'.'), 0}).first->second;
+  VariableName name;
+  name.components = variable.split(u'.');
+  return names_.emplace(variable, std::move(name)).first->second;
 }
 
 QVariantMap* GXTemplateEngine::rootFor(VariableName& name, const QVariant** entry) {
@@ -179,6 +182,16 @@ QVariant GXTemplateEngine::lookUp(const QString& variable, Place* place) {
 }
 
 QVariant GXTemplateEngine::lookUp(VariableName& name, const QString& variable, Place* place) {
+  // Only plain reads are remembered: a caller asking for the place may go on to change the value.
+  if (place) return resolve(name, variable, place);
+  if (name.memoVersion != valuesVersion_) {
+    name.memo = resolve(name, variable, nullptr);
+    name.memoVersion = valuesVersion_;
+  }
+  return name.memo;
+}
+
+QVariant GXTemplateEngine::resolve(VariableName& name, const QString& variable, Place* place) {
   const QStringList& components = name.components;
   const QString& first = components.first();
   const QVariant* entry = nullptr;
@@ -281,6 +294,7 @@ QVariant GXTemplateEngine::valueForVariable(const QString& variable, QVariant* p
 
 void GXTemplateEngine::assign(const Place& place, const QVariant& value) {
   if (!place.root || !place.navigable) return;
+  ++valuesVersion_;
   if (place.root == &templateVariables_ || place.root == &globals_) ++rootKeysVersion_;
   const bool remove = GXTemplateValue::isNil(value);
   auto storeIn = [&](QVariant& container) {
@@ -332,6 +346,7 @@ void GXTemplateEngine::assign(const Place& place, const QVariant& value) {
 }
 
 void GXTemplateEngine::setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame) {
+  ++valuesVersion_;
   if (!forceCurrentStackFrame && !variable.isNull()) {
     // A plain name (loop variables, "currentLoop") replaces the value where it is found.
     VariableName& name = nameOf(variable);
@@ -401,6 +416,7 @@ QString GXTemplateEngine::processTemplate(const QString& templateText, const QVa
   templateContents_ = templateText;
   templateLength_ = templateText.size();
   templateVariables_ = variables;  // values, not references: the caller's variables stay as they are
+  ++valuesVersion_;
   ++rootKeysVersion_;
   remainingRange_ = {0, std::uint64_t(templateLength_)};
   literal_ = false;
@@ -562,6 +578,8 @@ QString GXTemplateEngine::processTemplate(const QString& templateText, const QVa
         }
         reportBlockBoundaryStarted(false);
         if (!openBlocksStack_.empty()) {
+          // Only a frame that held values changes what a name reads (an opened one starts empty).
+          if (!openBlocksStack_.back().vars.isEmpty()) ++valuesVersion_;
           openBlocksStack_.pop_back();
           openBlockHandlers_.pop_back();
         }

@@ -72,6 +72,7 @@ class GXTemplateEngine {
   void setObject(const QVariant& object, const QString& key) {
     globals_.insert(key, object);
     ++rootKeysVersion_;
+    ++valuesVersion_;
   }
   void addEntriesFromDictionary(const QVariantMap& entries);
   QVariant objectForKey(const QString& key) const { return globals_.value(key); }
@@ -118,6 +119,7 @@ class GXTemplateEngine {
 
   QVariant lookUp(const QString& variable, Place* place);
   QVariant lookUp(VariableName& name, const QString& variable, Place* place);
+  QVariant resolve(VariableName& name, const QString& variable, Place* place);
   void assign(const Place& place, const QVariant& value);
   VariableName& nameOf(const QString& variable);
   // The frame whose entry for the name's first component is found first, and that entry; null if none.
@@ -156,7 +158,13 @@ class GXTemplateEngine {
   struct VariableName {
     QStringList components;
     quint64 absentFromRootsVersion = 0;
+    // The value last read, good while valuesVersion_ is memoVersion: a row that tests a value with "if"
+    // and then writes it reads it once.
+    quint64 memoVersion = 0;
+    QVariant memo;
   };
+  // Moves on whenever a variable may have changed: a value set, a block opened or closed, a run begun.
+  quint64 valuesVersion_ = 1;
   std::unordered_map<QString, VariableName, GXTemplateValue::StringHash> names_;
   quint64 rootKeysVersion_ = 1;
   // What the engine looked up for each match of the current run, found again by the match's address (the

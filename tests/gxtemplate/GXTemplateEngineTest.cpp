@@ -372,6 +372,35 @@ TEST_F(EngineVariableTest, NewVariablesGoToTheInnermostFrameUnderTheirWholeName)
   EXPECT_EQ(engine.templateVariables().value(QStringLiteral("a.b")), QVariant(QStringLiteral("5")));
 }
 
+// A counter standing for a record whose answer could differ from one reading to the next.
+class Counter : public KeyValueCoding {
+ public:
+  QVariant valueForKey(const QString&) const override { return ++readings_; }
+
+ private:
+  mutable int readings_ = 0;
+};
+
+// A name read again is not looked up again until a variable may have changed: a value set, a loop going
+// round, a block with values of its own closing, a new run. Every reading after such a change is fresh.
+TEST_F(EngineVariableTest, ANameIsReadAgainOnlyAfterAVariableMayHaveChanged) {
+  const Counter counter;
+  const QVariantMap vars{{"c", KeyPath::variantFromObject(&counter)},
+                         {"items", QStringList{"a", "b"}},
+                         {"title", QStringLiteral("A")}};
+  EXPECT_EQ(render(QStringLiteral("{{ c.n }}{% if c.n %}{{ c.n }}{% /if %}|{% set x 1 %}{{ c.n }}"), vars),
+            QStringLiteral("11|2"));
+  EXPECT_EQ(render(QStringLiteral("{{ c.n }}"), vars), QStringLiteral("3"));
+  EXPECT_EQ(render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"), vars),
+            QStringLiteral("aabb"));
+  EXPECT_EQ(render(QStringLiteral("{{ title }}{% set title B %}{{ title }}"), vars), QStringLiteral("AB"));
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")), QStringLiteral("A[]"));
+  engine.setObject(QStringLiteral("G"), QStringLiteral("g"));
+  EXPECT_EQ(render(QStringLiteral("{{ g }}")), QStringLiteral("G"));
+  engine.setObject(QStringLiteral("H"), QStringLiteral("g"));
+  EXPECT_EQ(render(QStringLiteral("{{ g }}")), QStringLiteral("H"));
+}
+
 TEST_F(EngineVariableTest, LookupAnswersWhereAValueLives) {
   render(QString(),
          {{"client", QVariantMap{{"name", QStringLiteral("Bar")}}}, {"letters", QStringList{"a", "b"}}});
