@@ -21,7 +21,9 @@
 // through its matcher, hands each marker to the handler registered under the marker's name, keeps the
 // stack of open blocks with their variable frames, resolves variables by key path, applies filters and
 // reports errors and block boundaries to its delegate. Main thread only; reusable: globals, markers and
-// filters persist across runs, everything else is reset by each run.
+// filters persist across runs, everything else is reset by each run. A name read again before any
+// variable may have changed (a value set, a loop going round, a block with values closing, a new run)
+// gives what it gave before: records are not asked twice for the same key path in a row.
 //
 // Errors (domain "GXTemplateEngineErrorDomain"): 0 a marker both began and ended a block, 1 a block ended
 // that is not open (processing stops), 2 unknown marker, 3 unknown variable, 4 a block without end markers,
