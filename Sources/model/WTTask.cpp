@@ -52,17 +52,41 @@ void WTTask::setRate(const std::optional<Decimal>& rate) {
   if (project_) project_->costDidChange();
 }
 
+namespace {
+
+WTTask::TotalsMemo* gTotalsMemo = nullptr;
+
+}  // namespace
+
+WTTask::TotalsMemo::TotalsMemo() : previous_(gTotalsMemo) {
+  gTotalsMemo = this;
+}
+
+WTTask::TotalsMemo::~TotalsMemo() {
+  gTotalsMemo = previous_;
+}
+
 int WTTask::duration() const {
+  if (gTotalsMemo) {
+    if (const auto known = gTotalsMemo->durations_.constFind(this); known != gTotalsMemo->durations_.cend())
+      return *known;
+  }
   int total = 0;
   for (const WTItem* item : items_) total += item->duration();
+  if (gTotalsMemo) gTotalsMemo->durations_.insert(this, total);
   return total;
 }
 
 Decimal WTTask::cost() const {
+  if (gTotalsMemo) {
+    if (const auto known = gTotalsMemo->costs_.constFind(this); known != gTotalsMemo->costs_.cend())
+      return *known;
+  }
   // Every item bills at the task's rate: read it once for all of them.
   const Decimal rate = inheritedRate();
   Decimal total;
   for (const WTItem* item : items_) total += item->costAtRate(rate);
+  if (gTotalsMemo) gTotalsMemo->costs_.insert(this, total);
   return total;
 }
 

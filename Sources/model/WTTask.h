@@ -3,6 +3,7 @@
 #include "Date.h"
 #include "WTObject.h"
 
+#include <QHash>
 #include <QSet>
 
 #include <memory>
@@ -38,6 +39,24 @@ class WTTask final : public WTObject {
 
   int duration() const;
   Decimal cost() const;
+
+  // While one lives, each task's duration and cost are worked out once and then remembered. For a
+  // report, which reads every task's totals again for its project's subtotal and for the grand total, and
+  // during which nothing changes: whoever makes one must change no record while it lives. Main thread.
+  class TotalsMemo {
+   public:
+    TotalsMemo();
+    ~TotalsMemo();
+    TotalsMemo(const TotalsMemo&) = delete;
+    TotalsMemo& operator=(const TotalsMemo&) = delete;
+
+   private:
+    friend class WTTask;
+    TotalsMemo* previous_;
+    QHash<const WTTask*, int> durations_;
+    QHash<const WTTask*, Decimal> costs_;
+  };
+
   // Announce the change upward: task, then project, then client.
   void durationDidChange();
   void costDidChange();

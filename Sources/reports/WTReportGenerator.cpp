@@ -141,6 +141,8 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.loadFilter(std::make_shared<WTItemKindFilter>());
   engine.loadMarker(std::make_shared<WTReportLevelMarker>(&engine, mode_));
   QString html;
+  // Every task's totals are read again for its project's subtotal and the grand total.
+  const WTTask::TotalsMemo totals;
   try {
     html = path ? engine.processTemplateInFileAtPath(*path, variables())
                 : engine.processTemplate(*text, variables());

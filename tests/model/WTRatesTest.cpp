@@ -153,6 +153,21 @@ TEST_F(WTRatesTest, SumsRunUpFromItemsToClients) {
   auto* empty = WTClient::insertNewObject(context.get());
   EXPECT_EQ(empty->duration(), 0);
   EXPECT_TRUE(empty->cost().isZero());
+
+  // A report's memo of task totals holds while it lives, nested ones included, and not a moment longer.
+  auto* later = makeTime(a1, start.addingSeconds(3600), start.addingSeconds(3600 + 15 * 60));
+  {
+    const WTTask::TotalsMemo memo;
+    EXPECT_EQ(client->cost(), dec("180.01"));
+    {
+      const WTTask::TotalsMemo inner;
+      EXPECT_EQ(a1->duration(), 45);
+    }
+    EXPECT_EQ(a1->duration(), 45);
+  }
+  later->setEndDate(start.addingSeconds(3600 + 45 * 60));
+  EXPECT_EQ(a1->duration(), 75);
+  EXPECT_EQ(client->cost(), dec("240.01"));
 }
 
 TEST_F(WTRatesTest, AFlatFeeChangeReachesObserversThreeLevelsUp) {
