@@ -206,11 +206,10 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   if (!predicate) return usage(err, kExportUsage, predicate.error().message);
 
   // One project's entries need only that project's items read.
-  std::optional<ReportedProjects> named;
   std::unique_ptr<WTStoreSnapshot> snapshot;
   const WTProject* project = nullptr;
   if (parser.isSet(QStringLiteral("project"))) {
-    named = readNamedProjects(err, true, parser.value(QStringLiteral("project")));
+    std::optional<ReportedProjects> named = readNamedProjects(err, true, parser.value(QStringLiteral("project")));
     if (!named) return 1;
     snapshot = std::move(named->snapshot);
     project = named->projects.first();
