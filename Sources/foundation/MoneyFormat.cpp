@@ -35,7 +35,6 @@ class Formatter {
     latinDigits_ = symbols.getConstDigitSymbol(0) == icu::UnicodeString(u"0");
     decimalSign_ = fromUnicode(symbols.getSymbol(icu::DecimalFormatSymbols::kDecimalSeparatorSymbol));
     groupingSign_ = fromUnicode(symbols.getSymbol(icu::DecimalFormatSymbols::kGroupingSeparatorSymbol));
-    minimumGrouping_ = std::max(1, int(format_->getMinimumGroupingDigits()));
   }
 
   QString format(const Decimal& amount) const {
@@ -74,9 +73,8 @@ class Formatter {
     const qsizetype whole = digits.size() - 2 - first;
     QString text;
     text.reserve(whole + whole / 3 * groupingSign_.size() + decimalSign_.size() + 2);
-    const bool grouped = whole >= 3 + minimumGrouping_;
     for (qsizetype i = 0; i < whole; ++i) {
-      if (grouped && i > 0 && (whole - i) % 3 == 0) text += groupingSign_;
+      if (i > 0 && (whole - i) % 3 == 0) text += groupingSign_;
       text += QLatin1Char(digits[first + i]);
     }
     text += decimalSign_;
@@ -89,7 +87,6 @@ class Formatter {
   bool latinDigits_ = false;
   QString decimalSign_;
   QString groupingSign_;
-  int minimumGrouping_ = 1;
 };
 
 }  // namespace
