@@ -1,53 +1,28 @@
 #include "WTReportCommand.h"
 
 #include "WTCSVExport.h"
-#include "WTClient.h"
+#include "WTCommandArguments.h"
 #include "WTProject.h"
 #include "WTRangePredicate.h"
 #include "WTReportGenerator.h"
 #include "WTReportPDF.h"
 #include "WTStoreSnapshot.h"
-#include "WTTask.h"
 
 #include <QCommandLineParser>
 #include <QFileInfo>
 #include <QTextDocument>
 
-#include <algorithm>
 #include <optional>
 
 namespace {
 
+using WTCommandArguments::failure;
+using WTCommandArguments::parse;
+using WTCommandArguments::usage;
+
 constexpr char kReportUsage[] =
     "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n";
 constexpr char kExportUsage[] = "usage: tessal export [--range RANGE] [--project NAME] [--out FILE.csv]\n";
-
-int usage(QTextStream& err, const char* text, const QString& problem) {
-  if (!problem.isEmpty()) err << "tessal: " << problem << '\n';
-  err << text;
-  err.flush();
-  return 2;
-}
-
-int failure(QTextStream& err, const QString& message) {
-  err << "tessal: " << message << '\n';
-  err.flush();
-  return 1;
-}
-
-// Parses `arguments` (those after the command's name) for options that each take one value; nothing
-// else is allowed. Gives the problem, or an empty text.
-QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options) {
-  for (const QString& name : options) parser.addOption(QCommandLineOption(name, QString(), QStringLiteral("value")));
-  parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
-  if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments)) return parser.errorText();
-  if (!parser.positionalArguments().isEmpty())
-    return QStringLiteral("unexpected argument '%1'").arg(parser.positionalArguments().first());
-  for (const QString& name : options) {
-    if (parser.values(name).size() > 1) return QStringLiteral("--%1 given more than once").arg(name);
-  }
-  return {};
-}
 
 enum class ReportFormat { HTML, PDF, CSV, Unknown };
 
@@ -57,65 +32,6 @@ ReportFormat formatOf(const QString& path) {
   if (suffix == QLatin1String("pdf")) return ReportFormat::PDF;
   if (suffix == QLatin1String("csv")) return ReportFormat::CSV;
   return ReportFormat::Unknown;
-}
-
-QList<WTProject*> sortedByName(QList<WTProject*> projects) {
-  std::sort(projects.begin(), projects.end(),
-            [](const WTProject* a, const WTProject* b) { return a->name().localeAwareCompare(b->name()) < 0; });
-  return projects;
-}
-
-// The projects a report is made of (one named project, or a named client's), with the context they
-// were read into.
-struct ReportedProjects {
-  std::unique_ptr<WTStoreSnapshot> snapshot;
-  QList<WTProject*> projects;
-  QString title;
-};
-
-Result<ReportedProjects> namedProjects(std::unique_ptr<WTStoreSnapshot> snapshot, bool byProject,
-                                       const QString& name) {
-  ReportedProjects named;
-  if (byProject) {
-    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), name);
-    if (!project) return project.error();
-    named.projects = {project.value()};
-    named.title = project.value()->name();
-  } else {
-    const Result<WTClient*> client = WTNamedRecords::client(snapshot->context(), name);
-    if (!client) return client.error();
-    named.projects = sortedByName(client.value()->projects());
-    named.title = client.value()->name();
-  }
-  named.snapshot = std::move(snapshot);
-  return named;
-}
-
-// Reads the named projects with their items and no other items: the names are looked up among the owners
-// first, then the store is read again for those projects' tasks alone. A large store's other items would
-// take longer to read than the report takes to make. Errors are written to `err`.
-std::optional<ReportedProjects> readNamedProjects(QTextStream& err, bool byProject, const QString& name) {
-  std::unique_ptr<WTStoreSnapshot> owners = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks);
-  if (!owners) return std::nullopt;
-  Result<ReportedProjects> found = namedProjects(std::move(owners), byProject, name);
-  if (!found) {
-    failure(err, found.error().message);
-    return std::nullopt;
-  }
-  QStringList tasks;
-  for (const WTProject* project : found.value().projects) {
-    for (const WTTask* task : project->tasks()) tasks.append(task->uuid());
-  }
-  found.value().snapshot.reset();
-  std::unique_ptr<WTStoreSnapshot> scoped = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks, tasks);
-  if (!scoped) return std::nullopt;
-  // Looked up again in what was read: the desktop copy may have renamed something in between.
-  Result<ReportedProjects> read = namedProjects(std::move(scoped), byProject, name);
-  if (!read) {
-    failure(err, read.error().message);
-    return std::nullopt;
-  }
-  return std::move(read.value());
 }
 
 }  // namespace
@@ -155,8 +71,9 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   if (!templatePath.isEmpty() && !QFileInfo(templatePath).isFile())
     return usage(err, kReportUsage, QStringLiteral("%1: no such file").arg(templatePath));
 
-  const std::optional<ReportedProjects> named = readNamedProjects(
-      err, byProject, parser.value(byProject ? QStringLiteral("project") : QStringLiteral("client")));
+  const std::optional<WTNamedProjects> named =
+      byProject ? WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")))
+                : WTNamedProjects::read(err, WTNamedProjects::Client, parser.value(QStringLiteral("client")));
   if (!named) return 1;
   const QList<WTProject*>& projects = named->projects;
   const QString& title = named->title;
@@ -209,7 +126,8 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   std::unique_ptr<WTStoreSnapshot> snapshot;
   const WTProject* project = nullptr;
   if (parser.isSet(QStringLiteral("project"))) {
-    std::optional<ReportedProjects> named = readNamedProjects(err, true, parser.value(QStringLiteral("project")));
+    std::optional<WTNamedProjects> named =
+        WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")));
     if (!named) return 1;
     snapshot = std::move(named->snapshot);
     project = named->projects.first();

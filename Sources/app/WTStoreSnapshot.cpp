@@ -3,6 +3,7 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
+#include "WTCommandArguments.h"
 #include "WTProject.h"
 #include "WTStore.h"
 #include "WTTask.h"
@@ -15,8 +16,7 @@ std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore
   WTApplication::registerDefaults(*defaults);
   Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(WTAppDelegate::storePath(), std::move(defaults), which, tasks);
   if (!snapshot) {
-    err << "tessal: " << snapshot.error().message << '\n';
-    err.flush();
+    WTCommandArguments::failure(err, snapshot.error().message);
     return nullptr;
   }
   return std::move(snapshot.value());
@@ -40,6 +40,55 @@ Result<std::unique_ptr<WTStoreSnapshot>> WTStoreSnapshot::open(const QString& pa
 
 WTStoreSnapshot::~WTStoreSnapshot() {
   if (WTObjectContext::defaultContext() == context_.get()) WTObjectContext::setDefaultContext(nullptr);
+}
+
+namespace {
+
+Result<WTNamedProjects> namedIn(std::unique_ptr<WTStoreSnapshot> snapshot, WTNamedProjects::Kind kind,
+                                const QString& name) {
+  WTNamedProjects named;
+  if (kind == WTNamedProjects::Project) {
+    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), name);
+    if (!project) return project.error();
+    named.projects = {project.value()};
+    named.title = project.value()->name();
+  } else {
+    const Result<WTClient*> client = WTNamedRecords::client(snapshot->context(), name);
+    if (!client) return client.error();
+    named.projects = client.value()->projects();
+    std::sort(named.projects.begin(), named.projects.end(), [](const WTProject* a, const WTProject* b) {
+      return a->name().localeAwareCompare(b->name()) < 0;
+    });
+    named.title = client.value()->name();
+  }
+  named.snapshot = std::move(snapshot);
+  return named;
+}
+
+}  // namespace
+
+std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind, const QString& name) {
+  std::unique_ptr<WTStoreSnapshot> owners = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks);
+  if (!owners) return std::nullopt;
+  Result<WTNamedProjects> found = namedIn(std::move(owners), kind, name);
+  if (!found) {
+    WTCommandArguments::failure(err, found.error().message);
+    return std::nullopt;
+  }
+  QStringList tasks;
+  for (const WTProject* project : found.value().projects) {
+    for (const WTTask* task : project->tasks()) tasks.append(task->uuid());
+  }
+  found.value().snapshot.reset();
+  std::unique_ptr<WTStoreSnapshot> scoped = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks, tasks);
+  if (!scoped) return std::nullopt;
+  // Looked up again in what was read: the desktop copy may have renamed something in between.
+  Result<WTNamedProjects> read = namedIn(std::move(scoped), kind, name);
+  if (!read) {
+    WTCommandArguments::failure(err, read.error().message);
+    return std::nullopt;
+  }
+  return std::move(read.value());
 }
 
 namespace WTNamedRecords {

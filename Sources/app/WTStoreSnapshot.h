@@ -8,6 +8,7 @@
 #include <QTextStream>
 
 #include <memory>
+#include <optional>
 
 class WTClient;
 class WTProject;
@@ -33,6 +34,19 @@ class WTStoreSnapshot {
   WTStoreSnapshot() = default;
   std::unique_ptr<UserDefaults> defaults_;
   std::unique_ptr<WTObjectContext> context_;
+};
+
+// The projects a command names, one project or a client's (sorted by name), read with their own items
+// and no others: the name is looked up among the owners first, then the store is read again for those
+// projects' tasks alone. A large store's other items would take longer to read than the command takes.
+struct WTNamedProjects {
+  enum Kind { Project, Client };
+  // On failure writes why to `err` as "tessal: MESSAGE" and gives none.
+  static std::optional<WTNamedProjects> read(QTextStream& err, Kind kind, const QString& name);
+
+  std::unique_ptr<WTStoreSnapshot> snapshot;
+  QList<WTProject*> projects;
+  QString title;  // the project's or the client's name
 };
 
 // Finding the one record a command names: names compare without regard to case. No match, or more than

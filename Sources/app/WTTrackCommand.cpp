@@ -7,6 +7,7 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
+#include "WTCommandArguments.h"
 #include "WTCSVExport.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -40,11 +41,7 @@ int print(const WTCommandOutcome& outcome, QTextStream& out, QTextStream& err) {
   return outcome.status;
 }
 
-int failure(QTextStream& err, const QString& message) {
-  err << "tessal: " << message << '\n';
-  err.flush();
-  return 1;
-}
+using WTCommandArguments::failure;
 
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
 // Only the records timers need are read; what changes is saved and written to the sync journal, as the
@@ -125,11 +122,7 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     problem = parser.errorText();
   else if (parser.positionalArguments().size() != 1 || !kinds.contains(parser.positionalArguments().first()))
     problem = QStringLiteral("name what to list: tasks, projects or clients");
-  if (!problem.isEmpty()) {
-    err << "tessal: " << problem << '\n' << kUsage;
-    err.flush();
-    return 2;
-  }
+  if (!problem.isEmpty()) return WTCommandArguments::usage(err, kUsage, problem);
   std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
   if (!snapshot) return 1;
   const QString kind = parser.positionalArguments().first();
@@ -170,32 +163,25 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
 int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   constexpr char kUsage[] = "usage: tessal log [--range RANGE] [--project NAME]\n";
   QCommandLineParser parser;
-  parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
-  parser.addOption(QCommandLineOption(QStringLiteral("range"), QString(), QStringLiteral("range")));
-  parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
-  QString problem;
-  if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments))
-    problem = parser.errorText();
-  else if (!parser.positionalArguments().isEmpty())
-    problem = QStringLiteral("unexpected argument '%1'").arg(parser.positionalArguments().first());
+  QString problem = WTCommandArguments::parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project")});
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("today");
   const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
   if (problem.isEmpty() && !predicate) problem = predicate.error().message;
-  if (!problem.isEmpty()) {
-    err << "tessal: " << problem << '\n' << kUsage;
-    err.flush();
-    return 2;
-  }
+  if (!problem.isEmpty()) return WTCommandArguments::usage(err, kUsage, problem);
 
-  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err);
-  if (!snapshot) return 1;
+  // One project's entries need only that project's items read.
+  std::unique_ptr<WTStoreSnapshot> snapshot;
   const WTProject* project = nullptr;
   if (parser.isSet(QStringLiteral("project"))) {
-    const Result<WTProject*> named =
-        WTNamedRecords::project(snapshot->context(), parser.value(QStringLiteral("project")));
-    if (!named) return failure(err, named.error().message);
-    project = named.value();
+    std::optional<WTNamedProjects> named =
+        WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")));
+    if (!named) return 1;
+    snapshot = std::move(named->snapshot);
+    project = named->projects.first();
+  } else {
+    snapshot = WTStoreSnapshot::open(err);
+    if (!snapshot) return 1;
   }
   QList<WTTime*> times = WTCSVExport::timesMatching(snapshot->context(), predicate.value(), project);
   std::sort(times.begin(), times.end(), [](const WTTime* a, const WTTime* b) {

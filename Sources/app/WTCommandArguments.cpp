@@ -1,0 +1,30 @@
+#include "WTCommandArguments.h"
+
+namespace WTCommandArguments {
+
+int usage(QTextStream& err, const char* usageLine, const QString& problem) {
+  if (!problem.isEmpty()) err << "tessal: " << problem << '\n';
+  err << usageLine;
+  err.flush();
+  return 2;
+}
+
+int failure(QTextStream& err, const QString& message) {
+  err << "tessal: " << message << '\n';
+  err.flush();
+  return 1;
+}
+
+QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options) {
+  for (const QString& name : options) parser.addOption(QCommandLineOption(name, QString(), QStringLiteral("value")));
+  parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
+  if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments)) return parser.errorText();
+  if (!parser.positionalArguments().isEmpty())
+    return QStringLiteral("unexpected argument '%1'").arg(parser.positionalArguments().first());
+  for (const QString& name : options) {
+    if (parser.values(name).size() > 1) return QStringLiteral("--%1 given more than once").arg(name);
+  }
+  return {};
+}
+
+}  // namespace WTCommandArguments

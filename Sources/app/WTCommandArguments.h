@@ -1,0 +1,20 @@
+#pragma once
+
+#include <QCommandLineParser>
+#include <QString>
+#include <QStringList>
+#include <QTextStream>
+
+// What the commands share in reading their arguments and saying what went wrong, in one voice:
+// "tessal: PROBLEM" on stderr.
+namespace WTCommandArguments {
+
+// Writes the problem (when there is one) and the usage line; gives exit status 2.
+int usage(QTextStream& err, const char* usageLine, const QString& problem);
+// Writes the message; gives exit status 1.
+int failure(QTextStream& err, const QString& message);
+// Parses `arguments` (those after the command's name) for options that each take one value, given at
+// most once; nothing else is allowed. Gives the problem, or an empty text.
+QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options);
+
+}  // namespace WTCommandArguments
