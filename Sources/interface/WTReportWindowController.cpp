@@ -1,14 +1,18 @@
 #include "WTReportWindowController.h"
 
+#include "UserDefaults.h"
 #include "WTCSVExport.h"
 #include "WTClient.h"
+#include "WTItem.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTReportPDF.h"
 #include "WTSaveLocation.h"
+#include "WTTask.h"
 
 #include <QButtonGroup>
 #include <QDesktopServices>
+#include <QEvent>
 #include <QFileInfo>
 #include <QFileSystemWatcher>
 #include <QHBoxLayout>
@@ -25,6 +29,9 @@
 #include <QUrl>
 #include <QVBoxLayout>
 
+#include <algorithm>
+#include <utility>
+
 WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWidget* parent)
     : QWidget(parent, Qt::Window), context_(context), chooseSaveLocation_(askForSaveLocation) {
   setObjectName(QStringLiteral("reportWindow"));
@@ -37,7 +44,16 @@ WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWi
       client_ = nullptr;
       close();
     });
-    connect(context, &WTObjectContext::didSave, this, &WTReportWindowController::refreshWebContent);
+    connect(context, &WTObjectContext::objectsDidChange, this, &WTReportWindowController::objectsDidChange);
+    if (UserDefaults* defaults = context->userDefaults()) {
+      // A new default rate changes costs without changing a record, so no save follows it.
+      connect(defaults, &UserDefaults::valueChanged, this, [this](const QString& key) {
+        if (key == QLatin1String("WTDefaultRate")) refreshWhenSeen();
+      });
+    }
+    connect(context, &WTObjectContext::didSave, this, [this] {
+      if (std::exchange(changedSinceRender_, false)) refreshWhenSeen();
+    });
   }
 }
 
@@ -172,6 +188,74 @@ QList<WTProject*> WTReportWindowController::liveProjects() const {
   return projects;
 }
 
+namespace {
+
+const WTObject* ownerOf(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Client:
+      return nullptr;
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->client();
+    case WTEntity::Task:
+      return static_cast<const WTTask*>(object)->project();
+    default:
+      return static_cast<const WTItem*>(object)->task();
+  }
+}
+
+}  // namespace
+
+bool WTReportWindowController::concernsReport(const WTObject* object) const {
+  // A change reaches the report through the owner chain: an item's task, a task's project. Moves and
+  // deletions mark the old owner changed as well, so what leaves the report is seen through the owner it
+  // left, and a project joining or leaving a client marks the client.
+  const QList<WTProject*> projects = client_ ? client_->projects() : projects_;
+  if (object->entity() == WTEntity::Client) {
+    // A template may show a project's client; a client's other projects are none of the report's.
+    return object == client_ || std::any_of(projects.begin(), projects.end(), [object](const WTProject* project) {
+             return project->client() == object;
+           });
+  }
+  for (const WTObject* level = object; level; level = ownerOf(level)) {
+    if (level->entity() == WTEntity::Project) return projects.contains(level);
+  }
+  return false;
+}
+
+void WTReportWindowController::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
+                                                const QList<WTObject*>& deleted) {
+  if (changedSinceRender_) return;
+  for (const QList<WTObject*>* list : {&updated, &inserted, &deleted}) {
+    for (const WTObject* object : *list) {
+      if (concernsReport(object)) {
+        changedSinceRender_ = true;
+        return;
+      }
+    }
+  }
+}
+
+void WTReportWindowController::refreshWhenSeen() {
+  if (isVisible() && !isMinimized()) {
+    refreshWebContent();
+  } else {
+    renderWhenSeen_ = true;
+  }
+}
+
+void WTReportWindowController::showEvent(QShowEvent* event) {
+  QWidget::showEvent(event);
+  if (std::exchange(renderWhenSeen_, false)) refreshWebContent();
+}
+
+void WTReportWindowController::changeEvent(QEvent* event) {
+  QWidget::changeEvent(event);
+  if (event->type() == QEvent::WindowStateChange && !isMinimized() && isVisible() &&
+      std::exchange(renderWhenSeen_, false)) {
+    refreshWebContent();
+  }
+}
+
 int WTReportWindowController::mode() const {
   return segments_->checkedId();
 }
@@ -192,6 +276,7 @@ QString WTReportWindowController::windowTitleForProjects() const {
 
 void WTReportWindowController::refreshWebContent() {
   if (!context_) return;
+  renderWhenSeen_ = false;
   generator_.setProjects(liveProjects());
   generator_.setMode(mode());
   const WTReport report = generator_.render();
@@ -241,9 +326,7 @@ void WTReportWindowController::watchUserTemplate() {
   const QString folder = QFileInfo(path).absolutePath();
   if (!templateWatcher_) {
     templateWatcher_ = new QFileSystemWatcher(this);
-    auto changed = [this] {
-      if (isVisible()) refreshWebContent();
-    };
+    auto changed = [this] { refreshWhenSeen(); };
     connect(templateWatcher_, &QFileSystemWatcher::fileChanged, this, changed);
     connect(templateWatcher_, &QFileSystemWatcher::directoryChanged, this, [this, path, changed] {
       if (QFileInfo::exists(path) && !templateWatcher_->files().contains(path)) changed();

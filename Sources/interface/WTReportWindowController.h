@@ -16,6 +16,7 @@ class QPagedPaintDevice;
 class QTextBrowser;
 class QTextDocument;
 class WTClient;
+class WTObject;
 class WTObjectContext;
 class WTProject;
 
@@ -23,8 +24,10 @@ class WTProject;
 // at one of four levels of detail (whole tasks, every item with a value, items by day, items by month),
 // saved as HTML or PDF, printed, or exported as the report's own CSV.
 //
-// The report follows the data: every save of the store renders it again, keeping the place the reader
-// scrolled to, and so does a change to the user's own template file. Template errors are logged and the
+// The report follows the data: a save of the store that changed something the report shows renders it
+// again, keeping the place the reader scrolled to, and so do a new default rate and a change to the user's
+// own template file. A window nobody can see renders when it is seen again: a long report takes seconds
+// to lay out, and changes elsewhere must not stall the application for it. Template errors are logged and the
 // first of them is named, with its line, in a bar above the report until the next render.
 class WTReportWindowController : public QWidget {
   Q_OBJECT
@@ -80,7 +83,17 @@ class WTReportWindowController : public QWidget {
   // After each render.
   void reportRendered();
 
+ protected:
+  void showEvent(QShowEvent* event) override;
+  void changeEvent(QEvent* event) override;
+
  private:
+  void objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
+                        const QList<WTObject*>& deleted);
+  // Whether a change to `object` may change what the report shows.
+  bool concernsReport(const WTObject* object) const;
+  // Renders now when the window can be seen, or else once it is.
+  void refreshWhenSeen();
   void buildInterface();
   QList<WTProject*> liveProjects() const;
   void showTemplateErrors(const WTReport& report);
@@ -100,4 +113,6 @@ class WTReportWindowController : public QWidget {
   QLabel* errorBar_ = nullptr;
   QFileSystemWatcher* templateWatcher_ = nullptr;
   WTSaveLocationChooser chooseSaveLocation_;
+  bool changedSinceRender_ = false;  // something the report shows changed and awaits the save
+  bool renderWhenSeen_ = false;      // a render waits for the window to be seen
 };

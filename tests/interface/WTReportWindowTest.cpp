@@ -168,9 +168,60 @@ TEST_F(ReportWindowTest, TheReportFollowsSavesKeepingItsPlaceAndLeavingDeletedPr
   EXPECT_EQ(window->projects(), QList<WTProject*>{web});
 }
 
+// A long report takes seconds to lay out again: it must do so for what it shows, and only once seen.
+TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportWaitsUntilSeen) {
+  useUserTemplate(QStringLiteral("{% for project in projects %}[{{ project.name }} {{ project.duration }} "
+                                 "{{ project.cost }}]{% /for %}"));
+  auto* elsewhere = WTProject::insertNewObject(context.get());
+  elsewhere->setName(QStringLiteral("Elsewhere"));
+  WTTask* chores = makeTask(elsewhere, QStringLiteral("Chores"));
+  ASSERT_TRUE(context->save().ok());
+  openReport({web});
+  int renders = 0;
+  QObject::connect(window.get(), &WTReportWindowController::reportRendered, [&] { ++renders; });
+
+  makeTime(chores, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 10));
+  backend->setName(QStringLiteral("Server"));
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_EQ(renders, 0) << "changes outside the report";
+
+  // An entry moved out of the report is seen through the task it left.
+  WTItem* kickOff = design->items().first();
+  kickOff->setTask(chores);
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_EQ(renders, 1);
+  EXPECT_TRUE(window->html().contains("[Website 60 ")) << window->html().toStdString();
+
+  client->setName(QStringLiteral("Acme Ltd"));  // a template may show project.client.name
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_EQ(renders, 2);
+
+  window->hide();
+  kickOff->setTask(design);
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_EQ(renders, 2) << "hidden";
+  window->show();
+  EXPECT_EQ(renders, 3);
+  EXPECT_TRUE(window->html().contains("[Website 150 ")) << window->html().toStdString();
+  window->show();
+  EXPECT_EQ(renders, 3) << "shown again with nothing new";
+
+  // Costs follow a new default rate, which changes no record and so saves nothing. Design has a rate of
+  // its own, so give the project a task without one.
+  WTTask* copy = makeTask(web, QStringLiteral("Copy"));
+  makeTime(copy, berlin(2024, 3, 6, 9), berlin(2024, 3, 6, 10));
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_EQ(renders, 4);
+  defaults->setValue(QStringLiteral("WTDefaultRate"), QStringLiteral("100"));
+  QCoreApplication::processEvents();
+  EXPECT_EQ(renders, 5);
+  EXPECT_TRUE(window->html().contains("[Website 210 250")) << window->html().toStdString();
+}
+
 TEST_F(ReportWindowTest, AClientReportCoversExactlyItsProjectsIncludingOnesAddedLater) {
   useUserTemplate(QStringLiteral("{% for project in projects %}[{{ project.name }}]{% /for %}"));
   window = std::make_unique<WTReportWindowController>(context.get());
+  window->show();
   window->setClient(client);
   EXPECT_EQ(window->projects().size(), 2);
   auto* other = WTProject::insertNewObject(context.get());
