@@ -14,6 +14,12 @@ class WTChangeJournal {
   virtual void insertValues(const QVariantMap& values, const QString& uuid) = 0;
   virtual void updateValues(const QVariantMap& values, const QString& uuid) = 0;
   virtual void deleteObjectWithId(const QString& uuid) = 0;
+  // Whether the other devices hold `uuid` as deleted for good, so that nothing sent under it again would
+  // reach them: a record coming back (by undo or redo) must come back under a new identity.
+  virtual bool isRetired(const QString& uuid) const {
+    Q_UNUSED(uuid);
+    return false;
+  }
 };
 
 // The journal in force while no sync is set up: it records nothing.

@@ -11,7 +11,11 @@ WTObject::WTObject(WTEntity entity, WTObjectContext* context) : context_(context
 WTObject::~WTObject() = default;
 
 void WTObject::awakeFromInsert() {
-  // A process-wide unique text, "@" and the entity name: the entity can be read back from the identity.
+  assignNewIdentity();
+}
+
+void WTObject::assignNewIdentity() {
+  // The entity can be read back from the identity.
   const QString unique = QUuid::createUuid().toString(QUuid::WithoutBraces).toUpper();
   setUuid(unique + u'@' + entityName());
 }

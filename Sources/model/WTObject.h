@@ -53,6 +53,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   QString uuid() const override { return uuid_; }
   // Identity changes are for the sync only, when it takes over a record under a known identity.
   void setUuid(const QString& uuid);
+  // A new, process-wide unique identity: the text of a random UUID, "@" and the entity name.
+  void assignNewIdentity();
 
   QString name() const { return name_; }
   void setName(const QString& name);

@@ -315,6 +315,12 @@ Result<void> WTObjectContext::save() {
   if (!hasChanges()) return {};
   if (!store_) return Error{1, tr("There is no data file to save to.")};
 
+  // A record brought back (by undo or redo) after its deletion reached the other devices comes back as a
+  // new record: they would drop anything sent under the old identity, and with it whatever is filed
+  // under the record later. Renamed first, so that every record naming it is written with the new name.
+  for (WTObject* object : inserted_) {
+    if (journal_->isRetired(object->uuid_)) object->assignNewIdentity();
+  }
   std::vector<WTObject*> written(inserted_.begin(), inserted_.end());
   written.insert(written.end(), updated_.begin(), updated_.end());
   // A row or a journal entry without identity could never be matched again: refuse before writing.

@@ -272,5 +272,8 @@ void RZSyncTrack::removeSentChanges(const QVariantMap& sent) {
       }
     }
   }
-  for (const QVariant& uuid : sent.value(kDeleted).toList()) deleted_.removeAll(uuid.toString());
+  for (const QVariant& uuid : sent.value(kDeleted).toList()) {
+    deleted_.removeAll(uuid.toString());
+    retired_.insert(uuid.toString());
+  }
 }

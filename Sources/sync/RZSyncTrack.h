@@ -4,6 +4,7 @@
 #include "WTChangeJournal.h"
 
 #include <QMap>
+#include <QSet>
 #include <QString>
 #include <QStringList>
 #include <QVariant>
@@ -53,6 +54,9 @@ class RZSyncTrack final : public WTChangeJournal {
   // Logs "DELETE(%@)" and adds the uuid to "x" (once); an empty uuid is ignored. Entries under "i" and
   // "u" stay: the server receives both.
   void deleteObjectWithId(const QString& uuid) override;
+  // The deletions the server confirmed while this journal was in memory: the server keeps a deletion for
+  // good and drops everything sent later under the identity.
+  bool isRetired(const QString& uuid) const override { return retired_.contains(uuid); }
 
   bool hasChanges() const { return !inserted_.isEmpty() || !updated_.isEmpty() || !deleted_.isEmpty(); }
   qint64 iteration() const { return iteration_; }
@@ -76,7 +80,7 @@ class RZSyncTrack final : public WTChangeJournal {
   void forget(const QString& uuid);
 
   // Forgets what a confirmed save sent (`sent` is the dictionary() of that request): each value that is
-  // still the same as sent, and each deletion sent. Values changed since stay pending; what remains
+  // still the same as sent, and each deletion sent, whose identity is retired from then on. Values changed since stay pending; what remains
   // of a confirmed insertion moves to "u", since the server now has the record.
   void removeSentChanges(const QVariantMap& sent);
 
@@ -88,4 +92,5 @@ class RZSyncTrack final : public WTChangeJournal {
   Entries inserted_;
   Entries updated_;
   QStringList deleted_;
+  QSet<QString> retired_;
 };

@@ -7,6 +7,7 @@
 #include "WTItem.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
@@ -139,4 +140,95 @@ TEST(RZSyncUndoAcrossSaves, AnotherDeviceFollowsUndoAfterTheSave) {
   left = snapshot(*a.context), right = snapshot(*b.context);
   EXPECT_TRUE(left == right) << snapshotDifference(left, right);
   EXPECT_EQ(b.context->count(), 2);  // the project and task the records were filed under
+}
+
+// The server keeps a deletion for good and drops whatever later names the deleted identity. A task whose
+// deletion reached it and that the user then brings back with undo must still reach every device, with
+// its entries and with the time tracked on it afterwards, which the server would otherwise delete with
+// the task it is filed under, here as well.
+TEST(RZSyncUndoAcrossSaves, UndoingADeletionTheServerHeldBringsTheRecordsBackEverywhere) {
+  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  SyncServerProcess server;
+  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
+  ASSERT_TRUE(server.start());
+  SyncClient a(server.address(), "undo@example.org", "undo across saves");
+  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+
+  auto* project = a.context->insertNewObject<WTProject>();
+  project->setName(QStringLiteral("Atlas"));
+  auto* task = a.context->insertNewObject<WTTask>();
+  task->setName(QStringLiteral("Design"));
+  task->setProject(project);
+  auto* before = a.context->insertNewObject<WTTime>();
+  before->setName(QStringLiteral("before"));
+  before->setTask(task);
+  a.context->processPendingChanges();
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  ASSERT_EQ(b.context->count(), 3);
+
+  a.context->deleteObject(task);
+  a.context->processPendingChanges();
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  ASSERT_EQ(b.context->count(), 1) << "the deletion reached the other device";
+
+  undoOrRedo(*a.context, 1, true);
+  a.save();
+  auto* after = a.context->insertNewObject<WTTime>();
+  after->setName(QStringLiteral("after"));
+  after->setTask(task);
+  a.context->processPendingChanges();
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  a.reopen();
+  b.reopen();
+
+  for (SyncClient* device : {&a, &b}) {
+    const QList<WTTask*> tasks = device->context->fetch<WTTask>();
+    ASSERT_EQ(tasks.size(), 1) << (device == &a ? "here" : "there");
+    EXPECT_EQ(tasks.first()->name(), "Design");
+    ASSERT_NE(tasks.first()->project(), nullptr);
+    EXPECT_EQ(tasks.first()->project()->name(), "Atlas");
+    QStringList entries;
+    for (const WTItem* item : tasks.first()->items()) entries.append(item->name());
+    entries.sort();
+    EXPECT_EQ(entries, QStringList({"after", "before"})) << (device == &a ? "here" : "there");
+  }
+  const auto left = snapshot(*a.context), right = snapshot(*b.context);
+  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+}
+
+// Redo of an insertion whose undo reached the server is the same case the other way round.
+TEST(RZSyncUndoAcrossSaves, RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
+  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+  SyncServerProcess server;
+  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
+  ASSERT_TRUE(server.start());
+  SyncClient a(server.address(), "undo@example.org", "undo across saves");
+  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+
+  auto* project = a.context->insertNewObject<WTProject>();
+  project->setName(QStringLiteral("Atlas"));
+  a.context->processPendingChanges();
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  undoOrRedo(*a.context, 1, true);
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  ASSERT_EQ(b.context->count(), 0);
+
+  undoOrRedo(*a.context, 1, false);
+  a.save();
+  ASSERT_EQ(sync(a), 0);
+  ASSERT_EQ(sync(b), 0);
+  const QList<WTProject*> there = b.context->fetch<WTProject>();
+  ASSERT_EQ(there.size(), 1);
+  EXPECT_EQ(there.first()->name(), "Atlas");
+  EXPECT_EQ(there.first()->uuid(), project->uuid());
+  EXPECT_EQ(a.context->count(), 1);
 }
