@@ -6,6 +6,7 @@
 #include "WTItem.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
+#include "WTReportDocumentBuilder.h"
 #include "WTReportPDF.h"
 #include "WTSaveLocation.h"
 #include "WTTask.h"
@@ -148,6 +149,8 @@ void WTReportWindowController::buildInterface() {
 
   webView_ = new QTextBrowser(this);
   webView_->setObjectName(QStringLiteral("reportView"));
+  documentBuilder_ = new WTReportDocumentBuilder(this);
+  connect(documentBuilder_, &WTReportDocumentBuilder::documentReady, this, &WTReportWindowController::showDocument);
   webView_->setOpenExternalLinks(true);
   webView_->setFrameShape(QFrame::NoFrame);
   layout->addWidget(webView_, 1);
@@ -189,6 +192,23 @@ QList<WTProject*> WTReportWindowController::liveProjects() const {
 }
 
 namespace {
+
+// Reports longer than this (in characters of HTML; some 25 ms of reading) are read into their document on
+// another thread.
+constexpr qsizetype kReadAtOnce = 64 * 1024;
+
+// Changes what `view` shows and puts the reader back where they were: a save while reading must not
+// throw them back to the top.
+template <class Change>
+void keepingThePlace(QTextBrowser* view, Change change) {
+  QScrollBar* vertical = view->verticalScrollBar();
+  QScrollBar* horizontal = view->horizontalScrollBar();
+  const int top = vertical->value();
+  const int left = horizontal->value();
+  change();
+  vertical->setValue(top);
+  horizontal->setValue(left);
+}
 
 const WTObject* ownerOf(const WTObject* object) {
   switch (object->entity()) {
@@ -281,20 +301,33 @@ void WTReportWindowController::refreshWebContent() {
   generator_.setMode(mode());
   const WTReport report = generator_.render();
   html_ = report.html;
-
-  // The reader stays where they were: a save while reading must not throw them back to the top.
-  QScrollBar* vertical = webView_->verticalScrollBar();
-  QScrollBar* horizontal = webView_->horizontalScrollBar();
-  const int top = vertical->value();
-  const int left = horizontal->value();
-  webView_->setHtml(html_);
-  vertical->setValue(top);
-  horizontal->setValue(left);
-
   showTemplateErrors(report);
   setWindowTitle(windowTitleForProjects());
   watchUserTemplate();
   emit reportRendered();
+
+  if (html_.size() > kReadAtOnce) {
+    documentBuilder_->build(html_, *webView_->document());
+    return;
+  }
+  documentBuilder_->cancel();  // a long report still being read is older than this one
+  keepingThePlace(webView_, [this] { webView_->setHtml(html_); });
+  emit reportShown();
+}
+
+void WTReportWindowController::showDocument(QTextDocument* document) {
+  keepingThePlace(webView_, [this, document] {
+    const QPointer<QTextDocument> previous = webView_->document();
+    document->setParent(webView_);
+    webView_->setDocument(document);
+    // The view deletes a replaced document only when it is the view's own child.
+    if (previous && previous->parent() == webView_) delete previous.data();
+  });
+  emit reportShown();
+}
+
+bool WTReportWindowController::isBuildingDocument() const {
+  return documentBuilder_->isBuilding();
 }
 
 void WTReportWindowController::showTemplateErrors(const WTReport& report) {

@@ -16,6 +16,7 @@ class QPagedPaintDevice;
 class QTextBrowser;
 class QTextDocument;
 class WTClient;
+class WTReportDocumentBuilder;
 class WTObject;
 class WTObjectContext;
 class WTProject;
@@ -26,9 +27,10 @@ class WTProject;
 //
 // The report follows the data: a save of the store that changed something the report shows renders it
 // again, keeping the place the reader scrolled to, and so do a new default rate and a change to the user's
-// own template file. A window nobody can see renders when it is seen again: a long report takes seconds
-// to lay out, and changes elsewhere must not stall the application for it. Template errors are logged and the
-// first of them is named, with its line, in a bar above the report until the next render.
+// own template file. A window nobody can see renders when it is seen again, and a long report is read
+// into its document on another thread (WTReportDocumentBuilder): a year of entries takes seconds to show,
+// and the application must not stall for that. Template errors are logged and the first of them is named,
+// with its line, in a bar above the report until the next render.
 class WTReportWindowController : public QWidget {
   Q_OBJECT
  public:
@@ -53,6 +55,8 @@ class WTReportWindowController : public QWidget {
 
   // Renders again and shows the result, keeping the scroll position.
   void refreshWebContent();
+  // Whether a long report is still being read into a document for the view.
+  bool isBuildingDocument() const;
 
   QString html() const { return html_; }
   QTextBrowser* webView() const { return webView_; }
@@ -82,6 +86,9 @@ class WTReportWindowController : public QWidget {
  signals:
   // After each render.
   void reportRendered();
+  // Once the view shows the newest render: at once for a short report, while a long one is read into a
+  // document away from the window's thread (the view shows the previous one meanwhile).
+  void reportShown();
 
  protected:
   void showEvent(QShowEvent* event) override;
@@ -94,6 +101,8 @@ class WTReportWindowController : public QWidget {
   bool concernsReport(const WTObject* object) const;
   // Renders now when the window can be seen, or else once it is.
   void refreshWhenSeen();
+  // Puts `document` in the view in the previous one's place, keeping the reader's place.
+  void showDocument(QTextDocument* document);
   void buildInterface();
   QList<WTProject*> liveProjects() const;
   void showTemplateErrors(const WTReport& report);
@@ -109,6 +118,7 @@ class WTReportWindowController : public QWidget {
   WTReportGenerator generator_;
   QString html_;
   QTextBrowser* webView_ = nullptr;
+  WTReportDocumentBuilder* documentBuilder_ = nullptr;
   QButtonGroup* segments_ = nullptr;
   QLabel* errorBar_ = nullptr;
   QFileSystemWatcher* templateWatcher_ = nullptr;

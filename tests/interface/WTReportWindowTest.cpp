@@ -16,8 +16,11 @@
 #include <QLabel>
 #include <QProcess>
 #include <QScrollBar>
+#include <QPointer>
 #include <QStandardPaths>
+#include <QTest>
 #include <QTextBrowser>
+#include <QTextDocument>
 
 namespace {
 
@@ -216,6 +219,54 @@ TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportW
   QCoreApplication::processEvents();
   EXPECT_EQ(renders, 5);
   EXPECT_TRUE(window->html().contains("[Website 210 250")) << window->html().toStdString();
+}
+
+// A long report is read into its document on another thread, so the window's thread never stalls for it;
+// only the newest render reaches the view, and the reader keeps their place.
+TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKeepingThePlace) {
+  const QString longTemplate = QStringLiteral(
+      "{% for project in projects %}<h1>{{ project.name }} {{ project.duration }} mode {{ mode }}</h1>"
+      "{% /for %}{% for 1 to 4000 %}<p>line {{ currentLoop.currentIndex }} of a long report</p>{% /for %}");
+  useUserTemplate(longTemplate);
+  openReport({web});
+  int shown = 0;
+  QObject::connect(window.get(), &WTReportWindowController::reportShown, [&] { ++shown; });
+  EXPECT_TRUE(window->isBuildingDocument());
+  EXPECT_FALSE(window->webView()->toPlainText().contains("line 3999"));
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !window->isBuildingDocument(); }, 20000));
+  EXPECT_EQ(shown, 1);
+  EXPECT_TRUE(window->webView()->toPlainText().contains("Website 150 mode 0"));
+  EXPECT_TRUE(window->webView()->toPlainText().contains("line 3999"));
+
+  QScrollBar* scroll = window->webView()->verticalScrollBar();
+  scroll->setValue(scroll->maximum() / 2);
+  const int place = scroll->value();
+  ASSERT_GT(place, 1000);
+  const QPointer<QTextDocument> first = window->webView()->document();
+  makeTime(design, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 9, 30));
+  ASSERT_TRUE(context->save().ok());
+  EXPECT_TRUE(window->isBuildingDocument());
+  EXPECT_EQ(scroll->value(), place) << "the previous report stays while the new one is read";
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !window->isBuildingDocument(); }, 20000));
+  EXPECT_EQ(shown, 2);
+  EXPECT_TRUE(window->webView()->toPlainText().contains("Website 180 mode 0"));
+  EXPECT_EQ(scroll->value(), place);
+  EXPECT_TRUE(first.isNull()) << "a replaced document is deleted";
+
+  // Two renders in a row: only the second is shown.
+  window->setMode(1);
+  window->setMode(2);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !window->isBuildingDocument(); }, 20000));
+  EXPECT_EQ(shown, 3);
+  EXPECT_TRUE(window->webView()->toPlainText().contains("mode 2"));
+
+  // A short render while a long one is being read: the long one never replaces it.
+  window->setMode(3);
+  useUserTemplate(QStringLiteral("<p>short, mode {{ mode }}</p>"));
+  window->refreshWebContent();
+  EXPECT_EQ(window->webView()->toPlainText().trimmed(), "short, mode 3");
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !window->isBuildingDocument(); }, 20000));
+  EXPECT_EQ(window->webView()->toPlainText().trimmed(), "short, mode 3");
 }
 
 TEST_F(ReportWindowTest, AClientReportCoversExactlyItsProjectsIncludingOnesAddedLater) {
