@@ -11,6 +11,8 @@
 
 #include <gtest/gtest.h>
 
+#include <memory>
+
 using synctest::snapshot;
 using synctest::snapshotDifference;
 using synctest::SyncClient;
@@ -97,15 +99,26 @@ TEST(RZSyncUndoAcrossSaves, TheJournalFileNamesWhatUndoAndRedoDid) {
   }
 }
 
+// Two devices of one account on the real server.
+class RZSyncUndoAcrossSavesWithServer : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+    ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
+    ASSERT_TRUE(server.start());
+    first = std::make_unique<SyncClient>(server.address(), "undo@example.org", "undo across saves");
+    second = std::make_unique<SyncClient>(server.address(), "undo@example.org", "undo across saves");
+  }
+
+  SyncServerProcess server;
+  std::unique_ptr<SyncClient> first, second;
+};
+
 // With the real server: undo and redo saved between two polls leave the other device as it was; an undo
 // that reaches the server takes the records from the other device too, for good, across restarts.
-TEST(RZSyncUndoAcrossSaves, AnotherDeviceFollowsUndoAfterTheSave) {
-  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-  SyncServerProcess server;
-  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
-  ASSERT_TRUE(server.start());
-  SyncClient a(server.address(), "undo@example.org", "undo across saves");
-  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
+  SyncClient& a = *first;
+  SyncClient& b = *second;
 
   const QStringList made = makeOneOfEach(*a.context);
   a.save();
@@ -146,13 +159,9 @@ TEST(RZSyncUndoAcrossSaves, AnotherDeviceFollowsUndoAfterTheSave) {
 // deletion reached it and that the user then brings back with undo must still reach every device, with
 // its entries and with the time tracked on it afterwards, which the server would otherwise delete with
 // the task it is filed under, here as well.
-TEST(RZSyncUndoAcrossSaves, UndoingADeletionTheServerHeldBringsTheRecordsBackEverywhere) {
-  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-  SyncServerProcess server;
-  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
-  ASSERT_TRUE(server.start());
-  SyncClient a(server.address(), "undo@example.org", "undo across saves");
-  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+TEST_F(RZSyncUndoAcrossSavesWithServer, UndoingADeletionTheServerHeldBringsTheRecordsBackEverywhere) {
+  SyncClient& a = *first;
+  SyncClient& b = *second;
 
   auto* project = a.context->insertNewObject<WTProject>();
   project->setName(QStringLiteral("Atlas"));
@@ -203,13 +212,9 @@ TEST(RZSyncUndoAcrossSaves, UndoingADeletionTheServerHeldBringsTheRecordsBackEve
 }
 
 // Redo of an insertion whose undo reached the server is the same case the other way round.
-TEST(RZSyncUndoAcrossSaves, RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
-  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-  SyncServerProcess server;
-  ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
-  ASSERT_TRUE(server.start());
-  SyncClient a(server.address(), "undo@example.org", "undo across saves");
-  SyncClient b(server.address(), "undo@example.org", "undo across saves");
+TEST_F(RZSyncUndoAcrossSavesWithServer, RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
+  SyncClient& a = *first;
+  SyncClient& b = *second;
 
   auto* project = a.context->insertNewObject<WTProject>();
   project->setName(QStringLiteral("Atlas"));
