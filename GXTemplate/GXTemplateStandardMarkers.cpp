@@ -92,10 +92,15 @@ QStringList GXTemplateStandardMarkers::markers() const {
 }
 
 std::optional<QStringList> GXTemplateStandardMarkers::endMarkersForMarker(const QString& marker) const {
-  if (marker == QLatin1String("for")) return QStringList{QStringLiteral("/for")};
-  if (marker == QLatin1String("section")) return QStringList{QStringLiteral("/section")};
-  if (marker == QLatin1String("if")) return QStringList{QStringLiteral("/if"), QStringLiteral("else")};
-  if (marker == QLatin1String("comment")) return QStringList{QStringLiteral("/comment")};
+  // Every block of a run asks: the lists are shared, not made each time.
+  static const QStringList forEnds{QStringLiteral("/for")};
+  static const QStringList sectionEnds{QStringLiteral("/section")};
+  static const QStringList ifEnds{QStringLiteral("/if"), QStringLiteral("else")};
+  static const QStringList commentEnds{QStringLiteral("/comment")};
+  if (marker == QLatin1String("for")) return forEnds;
+  if (marker == QLatin1String("section")) return sectionEnds;
+  if (marker == QLatin1String("if")) return ifEnds;
+  if (marker == QLatin1String("comment")) return commentEnds;
   return std::nullopt;
 }
 

@@ -103,8 +103,9 @@ std::shared_ptr<const GXTemplateMatch> ICUTemplateMatcher::firstMarkerWithinRang
   }
   // The search is not bounded by the range's end, so what it finds from a position is the same for every
   // range starting there; only the check against the end differs.
-  auto it = found_.find(range.location);
-  if (it == found_.end()) {
+  // Looked up without detaching: the table is only ever written below.
+  auto it = found_.constFind(range.location);
+  if (it == found_.cend()) {
     Found found;
     std::uint64_t from = range.location;
     while (from < possibleStart_.size() && !possibleStart_[from]) ++from;

@@ -449,10 +449,22 @@ std::optional<Parts> parse(const Char* text, qsizetype size) {
 // Writes the coefficient's digits to the end of buffer; returns where they start.
 char* writeDigits(u128 value, char* end) {
   char* p = end;
+  // A 128-bit division is a library call, a 64-bit one an instruction: a wide coefficient (a cost at
+  // full precision has 38 digits) is cut into runs of nineteen digits, each written in 64 bits.
+  constexpr std::uint64_t kRun = 10'000'000'000'000'000'000ULL;
+  while (value > std::numeric_limits<std::uint64_t>::max()) {
+    auto run = static_cast<std::uint64_t>(value % kRun);
+    value /= kRun;
+    for (int digit = 0; digit < 19; ++digit) {
+      *--p = char('0' + int(run % 10));
+      run /= 10;
+    }
+  }
+  auto narrow = static_cast<std::uint64_t>(value);
   do {
-    *--p = char('0' + int(value % 10));
-    value /= 10;
-  } while (value != 0);
+    *--p = char('0' + int(narrow % 10));
+    narrow /= 10;
+  } while (narrow != 0);
   return p;
 }
 

@@ -71,16 +71,17 @@ class Formatter {
     qsizetype first = 0;
     while (first < digits.size() - 3 && digits[first] == '0') ++first;
     const qsizetype whole = digits.size() - 2 - first;
-    QString text;
+    // Written into a buffer and made a string once: a character at a time, a string costs a call each.
+    QVarLengthArray<QChar, 64> text;
     text.reserve(whole + whole / 3 * groupingSign_.size() + decimalSign_.size() + 2);
     for (qsizetype i = 0; i < whole; ++i) {
-      if (i > 0 && (whole - i) % 3 == 0) text += groupingSign_;
-      text += QLatin1Char(digits[first + i]);
+      if (i > 0 && (whole - i) % 3 == 0) text.append(groupingSign_.constData(), groupingSign_.size());
+      text.append(QLatin1Char(digits[first + i]));
     }
-    text += decimalSign_;
-    text += QLatin1Char(digits[digits.size() - 2]);
-    text += QLatin1Char(digits[digits.size() - 1]);
-    return text;
+    text.append(decimalSign_.constData(), decimalSign_.size());
+    text.append(QLatin1Char(digits[digits.size() - 2]));
+    text.append(QLatin1Char(digits[digits.size() - 1]));
+    return QString(text.constData(), text.size());
   }
 
   std::unique_ptr<icu::DecimalFormat> format_;

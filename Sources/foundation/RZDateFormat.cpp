@@ -1,5 +1,7 @@
 #include "RZDate.h"
 
+#include <QVarLengthArray>
+
 #include <unicode/numsys.h>
 #include <unicode/smpdtfmt.h>
 #include <unicode/timezone.h>
@@ -46,11 +48,11 @@ class NumericPattern {
     DateComponents f;
     assignFlags(date, AllFields, f);
     if (f.year < 1583 || f.year > 9999) return std::nullopt;
-    QString text;
-    text.reserve(20);
+    // Written into a buffer and made a string once: a character at a time, a string costs a call each.
+    QVarLengthArray<char16_t, 32> text;
     for (const Part& part : parts_) {
       if (part.count == 0) {
-        text.append(QChar(part.symbol));
+        text.append(part.symbol);
         continue;
       }
       int value = 0;
@@ -67,7 +69,7 @@ class NumericPattern {
       }
       appendNumber(text, value, width);
     }
-    return text;
+    return QString(reinterpret_cast<const QChar*>(text.constData()), text.size());
   }
 
  private:
@@ -76,7 +78,7 @@ class NumericPattern {
     int count;        // letters in a row; 0 for a character written as it is
   };
 
-  static void appendNumber(QString& text, int value, int width) {
+  static void appendNumber(QVarLengthArray<char16_t, 32>& text, int value, int width) {
     char digits[12];
     int n = 0;
     do {
@@ -84,7 +86,7 @@ class NumericPattern {
       value /= 10;
     } while (value > 0);
     for (int pad = n; pad < width; ++pad) text.append(u'0');
-    while (n > 0) text.append(QChar(digits[--n]));
+    while (n > 0) text.append(char16_t(digits[--n]));
   }
 
   std::vector<Part> parts_;
