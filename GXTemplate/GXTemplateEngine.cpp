@@ -375,6 +375,17 @@ void GXTemplateEngine::setValue(const QVariant& value, const QString& variable, 
   }
 }
 
+QVariant* GXTemplateEngine::variableInInnermostBlock(const QString& name) {
+  if (openBlocksStack_.empty() || name.isNull()) return nullptr;
+  VariableName& variable = nameOf(name);
+  if (variable.components.size() != 1) return nullptr;
+  const QVariant* entry = nullptr;
+  QVariantMap& frame = openBlocksStack_.back().vars;
+  if (rootFor(variable, &entry) != &frame) return nullptr;
+  ++valuesVersion_;
+  return &frame[name];
+}
+
 void GXTemplateEngine::reportError(const QString& message, int code, bool continuing) {
   if (!delegate_) return;
   QString text = QCoreApplication::translate("GXTemplateEngine", message.toUtf8().constData());

@@ -99,6 +99,10 @@ class GXTemplateEngine {
   // Stores a value: where the variable already lives (unless forced), else in the innermost block's frame
   // (or the run's variables when no block is open) under the whole dotted name.
   void setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame);
+  // For the handler of the innermost block, to change one of its frame's values in place (a loop's next
+  // round): the value of the plain `name` when that frame is where setValue would store it, else null.
+  // The caller must leave a value there (nil would be removed by setValue).
+  QVariant* variableInInnermostBlock(const QString& name);
   QVariant resolveVariable(const QString& variable) { return valueForVariable(variable); }
   // A copy of the run's variables.
   QVariantMap templateVariables() const { return templateVariables_; }

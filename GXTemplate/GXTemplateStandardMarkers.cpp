@@ -337,7 +337,13 @@ void GXTemplateStandardMarkers::endForMarker(bool& blockEnded, bool& outputEnabl
     blockEnded = true;
     return;
   }
-  QVariantMap currentLoop = currentBlockInfo->vars.value(kCurrentLoop).toMap();
+  // Read where it is: a copy would make the change below copy the whole map.
+  static const QVariantMap kNoLoop;
+  const auto loopEntry = currentBlockInfo->vars.constFind(kCurrentLoop);
+  const QVariantMap& currentLoop =
+      loopEntry != currentBlockInfo->vars.cend() && loopEntry->typeId() == QMetaType::QVariantMap
+          ? *static_cast<const QVariantMap*>(loopEntry->constData())
+          : kNoLoop;
   const bool reversed = currentLoop.value(kReversed).toBool();
   const qint64 currentIndex = GXTemplateValue::intValue(currentLoop.value(kCurrentIndex));
   QVariant nextItem;
@@ -361,9 +367,23 @@ void GXTemplateStandardMarkers::endForMarker(bool& blockEnded, bool& outputEnabl
     return;
   }
   nextRange = record.remainingRange;
-  currentLoop.insert(kCurrentIndex, clampToInt(reversed ? currentIndex - 1 : currentIndex + 1));
-  QVariantMap variables{{kCurrentLoop, currentLoop}};
-  if (record.hasEnumerator) variables.insert(record.enumeratorVariable, nextItem);
+  const int nextIndex = clampToInt(reversed ? currentIndex - 1 : currentIndex + 1);
+  // The next round changes the loop's own frame in place, as storing the two values would, without
+  // making a new "currentLoop" map and a map of new variables for every round.
+  const bool enumerates = record.hasEnumerator;
+  if (engine_ && &currentLoop != &kNoLoop && (!enumerates || !GXTemplateValue::isNil(nextItem))) {
+    QVariant* loopValue = engine_->variableInInnermostBlock(kCurrentLoop);
+    QVariant* itemValue = enumerates ? engine_->variableInInnermostBlock(record.enumeratorVariable) : nullptr;
+    if (loopValue && loopValue->typeId() == QMetaType::QVariantMap && (!enumerates || itemValue)) {
+      static_cast<QVariantMap*>(loopValue->data())->insert(kCurrentIndex, nextIndex);
+      if (itemValue) *itemValue = nextItem;
+      return;
+    }
+  }
+  QVariantMap loop = currentLoop;
+  loop.insert(kCurrentIndex, nextIndex);
+  QVariantMap variables{{kCurrentLoop, loop}};
+  if (enumerates) variables.insert(record.enumeratorVariable, nextItem);
   newVariables = std::move(variables);
 }
 
