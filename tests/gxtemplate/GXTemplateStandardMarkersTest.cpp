@@ -61,6 +61,31 @@ TEST_F(LoopTest, CollectionsGiveTheLoopVariableAndIndex) {
             QStringLiteral("abc"));
 }
 
+// Each round stores the loop variable and the index where a variable of that name lives: the loop's own
+// frame as a rule (changed in place), but a run variable of the same name shadows the frame from the
+// first round on and takes the later rounds' values.
+TEST_F(LoopTest, EachRoundStoresWhereTheNameLives) {
+  const QVariantMap vars{{"item", QStringLiteral("ROOT")},
+                         {"list", QVariantList{1, 2, 3}},
+                         {"names", QStringList{"a", "b"}},
+                         {"holes", QVariantList{1, QVariant(), 3}}};
+  EXPECT_EQ(render(QStringLiteral("{% for item in list %}[{{ item }}]{% /for %} after {{ item }}"), vars),
+            QStringLiteral("[ROOT][2][3] after 3"));
+  // An inner loop of the same name has a frame of its own.
+  EXPECT_EQ(render(QStringLiteral("{% for x in list %}{% for x in names %}{{ x }}{% /for %}{{ x }}{% /for %}"),
+                   vars),
+            QStringLiteral("ab1ab2ab3"));
+  // A missing element leaves the name unset for its round; the index goes on.
+  EXPECT_EQ(render(QStringLiteral("{% for x in holes %}{{ currentLoop.currentIndex }}{% if x %}{{ x }}{% /if %};"
+                                  "{% /for %}"),
+                   vars),
+            QStringLiteral("01;1;23;"));
+  // A value set in the body lasts only until the next round.
+  EXPECT_EQ(render(QStringLiteral("{% for x in list %}{% set x = 9 %}{{ x }}{% /for %}"), vars),
+            QStringLiteral("123"));
+  EXPECT_TRUE(delegate.errors.empty());
+}
+
 TEST_F(LoopTest, LoopVariablesEndWithTheirBlock) {
   EXPECT_EQ(render(QStringLiteral("{% for x in letters %}{% /for %}{{ x }}{{ currentLoop }}"), kLetters),
             QString());
