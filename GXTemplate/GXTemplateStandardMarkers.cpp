@@ -141,7 +141,14 @@ bool GXTemplateStandardMarkers::isNumericText(const QString& text, int* intValue
 
 bool GXTemplateStandardMarkers::isNumericArg(const QString& arg, const QVariant& resolved, int* intValue) {
   if (isNumericText(arg, intValue)) return true;
-  // Otherwise the text of the value it names, when that value has an integer value.
+  // Otherwise the text of the value it names, when that value has an integer value. An integer's text is
+  // always numeric and reads back as the integer (saturated), so none is written for it.
+  const int type = resolved.typeId();
+  if (!arg.isEmpty() && (VariantNumbers::isSignedInteger(type) || VariantNumbers::isUnsignedInteger(type) ||
+                         type == QMetaType::Bool)) {
+    if (intValue) *intValue = GXTemplateValue::intValue(resolved);
+    return true;
+  }
   if (!arg.isEmpty() && !GXTemplateValue::isNil(resolved) && GXTemplateValue::answersIntValue(resolved)) {
     return isNumericText(GXTemplateValue::description(resolved), intValue);
   }
@@ -389,14 +396,20 @@ void GXTemplateStandardMarkers::endForMarker(bool& blockEnded, bool& outputEnabl
 
 bool GXTemplateStandardMarkers::condition(const QStringList& args) {
   if (args.size() == 1) return argIsTrue(args[0]);
-  // Each side is resolved once; its truth, number and text all come from that one value.
+  const QString op = args[1].toLower();
+  const bool logical = op == QLatin1String("and") || op == QLatin1String("&&") || op == QLatin1String("or") ||
+                       op == QLatin1String("||");
+  const bool textual = op == QLatin1String("equalsstring") || op == QLatin1String("notequalsstring");
+  // Each side is resolved at most once, and only when the operator reads its value: a number written as
+  // a number is its own value for a comparison, whatever a variable of that name holds.
   struct Side {
     QVariant resolved;
     bool truth = false;
     int number = 0;
   };
-  auto sideOf = [this](const QString& arg) {
+  auto sideOf = [&](const QString& arg) {
     Side side;
+    if (!logical && !textual && isNumericText(arg, &side.number)) return side;
     side.resolved = engine_ ? engine_->resolveVariable(arg) : QVariant();
     side.truth = truthOf(side.resolved);
     // A side that is not numeric counts as 1 when it names a variable, else 0.
@@ -405,7 +418,6 @@ bool GXTemplateStandardMarkers::condition(const QStringList& args) {
     return side;
   };
   const Side left = sideOf(args[0]);
-  const QString op = args[1].toLower();
   const Side right = sideOf(args[2]);
 
   if (op == QLatin1String("and") || op == QLatin1String("&&")) return left.truth && right.truth;
@@ -418,7 +430,7 @@ bool GXTemplateStandardMarkers::condition(const QStringList& args) {
   if (op == QLatin1String("<=")) return left.number <= right.number;
   // Modulo by zero has no value; the condition is then false.
   if (op == QLatin1String("%")) return right.number != 0 && qint64(left.number) % qint64(right.number) > 0;
-  if (op == QLatin1String("equalsstring") || op == QLatin1String("notequalsstring")) {
+  if (textual) {
     auto text = [](const QString& arg, const Side& side) {
       return GXTemplateValue::isNil(side.resolved) ? arg : GXTemplateValue::description(side.resolved);
     };
