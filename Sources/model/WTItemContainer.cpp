@@ -41,13 +41,30 @@ std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPa
   struct Keyed {
     QVariant value;
     WTItem* item;
+    double seconds;  // of a date value
   };
   std::vector<Keyed> keyed;
   keyed.reserve(items.size());
-  for (WTItem* item : items) keyed.push_back({groupValue(item, keyPath), item});
+  // Days and months, the groups of reports and of the outline, are dates or none: those are ordered by
+  // their seconds, not through the general order of values, which costs many times more per comparison.
+  const QMetaType dateType = QMetaType::fromType<Date>();
+  bool datesOnly = true;
+  for (WTItem* item : items) {
+    QVariant value = groupValue(item, keyPath);
+    const bool dated = value.metaType() == dateType;
+    datesOnly = datesOnly && (dated || !value.isValid());
+    const double seconds = dated ? static_cast<const Date*>(value.constData())->secondsSince1970() : 0.0;
+    keyed.push_back({std::move(value), item, seconds});
+  }
+  const auto compare = [datesOnly](const Keyed& a, const Keyed& b) {
+    if (!datesOnly) return KeyPath::compareValues(a.value, b.value);
+    const bool aDated = a.value.isValid(), bDated = b.value.isValid();
+    if (aDated != bDated) return aDated ? 1 : -1;  // none orders below every date
+    return a.seconds < b.seconds ? -1 : (a.seconds > b.seconds ? 1 : 0);
+  };
   // Groups by value, newest first; inside a group the newest item first.
-  std::stable_sort(keyed.begin(), keyed.end(), [](const Keyed& a, const Keyed& b) {
-    const int order = KeyPath::compareValues(a.value, b.value);
+  std::stable_sort(keyed.begin(), keyed.end(), [&compare](const Keyed& a, const Keyed& b) {
+    const int order = compare(a, b);
     if (order != 0) return order > 0;
     return a.item->startDate() > b.item->startDate();
   });
@@ -55,9 +72,7 @@ std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPa
   for (size_t begin = 0; begin < keyed.size();) {
     size_t end = begin;
     QList<WTItem*> group;
-    while (end < keyed.size() && KeyPath::compareValues(keyed[end].value, keyed[begin].value) == 0) {
-      group.append(keyed[end++].item);
-    }
+    while (end < keyed.size() && compare(keyed[end], keyed[begin]) == 0) group.append(keyed[end++].item);
     WTItem* last = group.last();
     containers.push_back(
         std::make_shared<WTItemContainer>(std::move(group), last->startDate(), last->task()));

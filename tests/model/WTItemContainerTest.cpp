@@ -36,6 +36,37 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
   EXPECT_TRUE(empty->children().empty());
 }
 
+// Days and months are grouped by their dates, items without a date in one group after every day; any
+// other key groups by its values in their general order, greatest first.
+TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirValues) {
+  WTTask* task = makeTask();
+  WTTime* second = makeTime(task, berlin(2026, 4, 2, 9), berlin(2026, 4, 2, 10));
+  auto* undatedFee = makeItem<WTFlat>(task, berlin(2026, 4, 1));
+  undatedFee->setStartDate(std::nullopt);
+  WTTime* first = makeTime(task, berlin(2026, 4, 1, 9), berlin(2026, 4, 1, 10));
+  auto* undatedExpense = makeItem<WTExpense>(task, berlin(2026, 4, 1));
+  undatedExpense->setStartDate(std::nullopt);
+  WTTime* laterFirst = makeTime(task, berlin(2026, 4, 1, 15), berlin(2026, 4, 1, 16));
+  const QList<WTItem*> items{second, undatedFee, first, undatedExpense, laterFirst};
+
+  const auto days = WTItemContainer::containersByKeyPath(QStringLiteral("startDate.midnight"), items);
+  ASSERT_EQ(days.size(), 3u);
+  EXPECT_EQ(days[0]->items(), QList<WTItem*>{second});
+  EXPECT_EQ(days[1]->items(), (QList<WTItem*>{laterFirst, first}));
+  EXPECT_EQ(days[2]->items(), (QList<WTItem*>{undatedFee, undatedExpense}));
+  EXPECT_FALSE(days[2]->date().has_value());
+  EXPECT_EQ(WTItemContainer::containersByKeyPath(QStringLiteral("startDate.beginOfMonth"), items).size(), 2u);
+
+  second->setName(QStringLiteral("b"));
+  first->setName(QStringLiteral("a"));
+  laterFirst->setName(QStringLiteral("b"));
+  const auto named =
+      WTItemContainer::containersByKeyPath(QStringLiteral("name"), QList<WTItem*>{second, first, laterFirst});
+  ASSERT_EQ(named.size(), 2u);
+  EXPECT_EQ(named[0]->items(), (QList<WTItem*>{second, laterFirst}));  // newest first within a group
+  EXPECT_EQ(named[1]->items(), QList<WTItem*>{first});
+}
+
 TEST_F(WTItemContainerTest, GroupsFollowTheLocalDayAcrossADaylightSavingChange) {
   WTTask* task = makeTask();
   // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
