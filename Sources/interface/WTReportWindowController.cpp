@@ -149,11 +149,11 @@ void WTReportWindowController::buildInterface() {
 
   webView_ = new QTextBrowser(this);
   webView_->setObjectName(QStringLiteral("reportView"));
-  documentBuilder_ = new WTReportDocumentBuilder(this);
-  connect(documentBuilder_, &WTReportDocumentBuilder::documentReady, this, &WTReportWindowController::showDocument);
   webView_->setOpenExternalLinks(true);
   webView_->setFrameShape(QFrame::NoFrame);
   layout->addWidget(webView_, 1);
+  documentBuilder_ = new WTReportDocumentBuilder(this);
+  connect(documentBuilder_, &WTReportDocumentBuilder::documentReady, this, &WTReportWindowController::showDocument);
 
   setWindowTitle(tr("Report"));
   auto* closeShortcut = new QShortcut(QKeySequence::Close, this);

@@ -16,10 +16,10 @@ class QPagedPaintDevice;
 class QTextBrowser;
 class QTextDocument;
 class WTClient;
-class WTReportDocumentBuilder;
 class WTObject;
 class WTObjectContext;
 class WTProject;
+class WTReportDocumentBuilder;
 
 // The report of a set of projects, as the client would receive it: the report template rendered to HTML
 // at one of four levels of detail (whole tasks, every item with a value, items by day, items by month),
