@@ -14,12 +14,12 @@
 
 #include <benchmark/benchmark.h>
 
+#include <QtCore/qtestsupport_core.h>
 #include <QApplication>
 #include <QElapsedTimer>
 #include <QMainWindow>
-#include <QTimer>
-#include <QtCore/qtestsupport_core.h>
 #include <QTemporaryDir>
+#include <QTimer>
 
 #include <algorithm>
 #include <memory>
@@ -124,16 +124,16 @@ void BM_RefreshLargeOpenReport(benchmark::State& state) {
   window.setProjects({data.project});
   window.setMode(1);
   const auto settle = [&] {
-    if (!QTest::qWaitFor([&] { return !window.isBuildingDocument(); }, 60000)) state.SkipWithError("never shown");
+    if (!QTest::qWaitFor([&] { return !window.isBuildingDocument(); }, 60000))
+      state.SkipWithError("never shown");
   };
   settle();
   QElapsedTimer sinceTick;
   qint64 longestStall = 0;
   QTimer ticker;
   ticker.setInterval(1);
-  QObject::connect(&ticker, &QTimer::timeout, [&] {
-    longestStall = std::max(longestStall, sinceTick.restart());
-  });
+  QObject::connect(&ticker, &QTimer::timeout,
+                   [&] { longestStall = std::max(longestStall, sinceTick.restart()); });
   for (auto _ : state) {
     sinceTick.start();
     ticker.start();

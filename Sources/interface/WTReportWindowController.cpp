@@ -153,7 +153,8 @@ void WTReportWindowController::buildInterface() {
   webView_->setFrameShape(QFrame::NoFrame);
   layout->addWidget(webView_, 1);
   documentBuilder_ = new WTReportDocumentBuilder(this);
-  connect(documentBuilder_, &WTReportDocumentBuilder::documentReady, this, &WTReportWindowController::showDocument);
+  connect(documentBuilder_, &WTReportDocumentBuilder::documentReady, this,
+          &WTReportWindowController::showDocument);
 
   setWindowTitle(tr("Report"));
   auto* closeShortcut = new QShortcut(QKeySequence::Close, this);
@@ -232,9 +233,9 @@ bool WTReportWindowController::concernsReport(const WTObject* object) const {
   const QList<WTProject*> projects = client_ ? client_->projects() : projects_;
   if (object->entity() == WTEntity::Client) {
     // A template may show a project's client; a client's other projects are none of the report's.
-    return object == client_ || std::any_of(projects.begin(), projects.end(), [object](const WTProject* project) {
-             return project->client() == object;
-           });
+    return object == client_ ||
+           std::any_of(projects.begin(), projects.end(),
+                       [object](const WTProject* project) { return project->client() == object; });
   }
   for (const WTObject* level = object; level; level = ownerOf(level)) {
     if (level->entity() == WTEntity::Project) return projects.contains(level);
@@ -242,7 +243,8 @@ bool WTReportWindowController::concernsReport(const WTObject* object) const {
   return false;
 }
 
-void WTReportWindowController::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
+void WTReportWindowController::objectsDidChange(const QList<WTObject*>& inserted,
+                                                const QList<WTObject*>& updated,
                                                 const QList<WTObject*>& deleted) {
   if (changedSinceRender_) return;
   for (const QList<WTObject*>* list : {&updated, &inserted, &deleted}) {

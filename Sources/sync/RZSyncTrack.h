@@ -80,8 +80,9 @@ class RZSyncTrack final : public WTChangeJournal {
   void forget(const QString& uuid);
 
   // Forgets what a confirmed save sent (`sent` is the dictionary() of that request): each value that is
-  // still the same as sent, and each deletion sent, whose identity is retired from then on. Values changed since stay pending; what remains
-  // of a confirmed insertion moves to "u", since the server now has the record.
+  // still the same as sent, and each deletion sent, whose identity is retired from then on. Values changed
+  // since stay pending; what remains of a confirmed insertion moves to "u", since the server now has the
+  // record.
   void removeSentChanges(const QVariantMap& sent);
 
  private:

@@ -72,14 +72,16 @@ TEST_F(LoopTest, EachRoundStoresWhereTheNameLives) {
   EXPECT_EQ(render(QStringLiteral("{% for item in list %}[{{ item }}]{% /for %} after {{ item }}"), vars),
             QStringLiteral("[ROOT][2][3] after 3"));
   // An inner loop of the same name has a frame of its own.
-  EXPECT_EQ(render(QStringLiteral("{% for x in list %}{% for x in names %}{{ x }}{% /for %}{{ x }}{% /for %}"),
-                   vars),
-            QStringLiteral("ab1ab2ab3"));
+  EXPECT_EQ(
+      render(QStringLiteral("{% for x in list %}{% for x in names %}{{ x }}{% /for %}{{ x }}{% /for %}"),
+             vars),
+      QStringLiteral("ab1ab2ab3"));
   // A missing element leaves the name unset for its round; the index goes on.
-  EXPECT_EQ(render(QStringLiteral("{% for x in holes %}{{ currentLoop.currentIndex }}{% if x %}{{ x }}{% /if %};"
-                                  "{% /for %}"),
-                   vars),
-            QStringLiteral("01;1;23;"));
+  EXPECT_EQ(
+      render(QStringLiteral("{% for x in holes %}{{ currentLoop.currentIndex }}{% if x %}{{ x }}{% /if %};"
+                            "{% /for %}"),
+             vars),
+      QStringLiteral("01;1;23;"));
   // A value set in the body lasts only until the next round.
   EXPECT_EQ(render(QStringLiteral("{% for x in list %}{% set x = 9 %}{{ x }}{% /for %}"), vars),
             QStringLiteral("123"));

@@ -14,9 +14,9 @@
 #include <QDir>
 #include <QFile>
 #include <QLabel>
+#include <QPointer>
 #include <QProcess>
 #include <QScrollBar>
-#include <QPointer>
 #include <QStandardPaths>
 #include <QTest>
 #include <QTextBrowser>
@@ -173,8 +173,9 @@ TEST_F(ReportWindowTest, TheReportFollowsSavesKeepingItsPlaceAndLeavingDeletedPr
 
 // A long report takes seconds to lay out again: it must do so for what it shows, and only once seen.
 TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportWaitsUntilSeen) {
-  useUserTemplate(QStringLiteral("{% for project in projects %}[{{ project.name }} {{ project.duration }} "
-                                 "{{ project.cost }}]{% /for %}"));
+  useUserTemplate(
+      QStringLiteral("{% for project in projects %}[{{ project.name }} {{ project.duration }} "
+                     "{{ project.cost }}]{% /for %}"));
   auto* elsewhere = WTProject::insertNewObject(context.get());
   elsewhere->setName(QStringLiteral("Elsewhere"));
   WTTask* chores = makeTask(elsewhere, QStringLiteral("Chores"));

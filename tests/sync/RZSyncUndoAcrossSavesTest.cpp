@@ -212,7 +212,8 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, UndoingADeletionTheServerHeldBringsTheRe
 }
 
 // Redo of an insertion whose undo reached the server is the same case the other way round.
-TEST_F(RZSyncUndoAcrossSavesWithServer, RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
+TEST_F(RZSyncUndoAcrossSavesWithServer,
+       RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
   SyncClient& a = *first;
   SyncClient& b = *second;
 
