@@ -123,25 +123,17 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   if (!predicate) return usage(err, kExportUsage, predicate.error().message);
 
   // One project's entries need only that project's items read.
-  std::unique_ptr<WTStoreSnapshot> snapshot;
-  const WTProject* project = nullptr;
-  if (parser.isSet(QStringLiteral("project"))) {
-    std::optional<WTNamedProjects> named =
-        WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")));
-    if (!named) return 1;
-    snapshot = std::move(named->snapshot);
-    project = named->projects.first();
-  } else {
-    snapshot = WTStoreSnapshot::open(err);
-    if (!snapshot) return 1;
-  }
+  const std::optional<WTProjectScope> scope = WTProjectScope::read(err, parser);
+  if (!scope) return 1;
+  WTObjectContext& context = scope->snapshot->context();
+  const WTProject* project = scope->project;
   const QString outPath = parser.value(QStringLiteral("out"));
   if (outPath.isEmpty()) {
-    out << WTCSVExport::timesCSV(WTCSVExport::timesMatching(snapshot->context(), predicate.value(), project));
+    out << WTCSVExport::timesCSV(WTCSVExport::timesMatching(context, predicate.value(), project));
     out.flush();
     return 0;
   }
-  const Result<int> exported = WTCSVExport::exportTimes(snapshot->context(), predicate.value(), project, outPath);
+  const Result<int> exported = WTCSVExport::exportTimes(context, predicate.value(), project, outPath);
   if (!exported) return failure(err, exported.error().message);
   return 0;
 }

@@ -8,6 +8,8 @@
 #include "WTStore.h"
 #include "WTTask.h"
 
+#include <QCommandLineParser>
+
 #include <algorithm>
 
 std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which,
@@ -89,6 +91,21 @@ std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind
     return std::nullopt;
   }
   return std::move(read.value());
+}
+
+std::optional<WTProjectScope> WTProjectScope::read(QTextStream& err, const QCommandLineParser& options) {
+  WTProjectScope scope;
+  if (options.isSet(QStringLiteral("project"))) {
+    std::optional<WTNamedProjects> named =
+        WTNamedProjects::read(err, WTNamedProjects::Project, options.value(QStringLiteral("project")));
+    if (!named) return std::nullopt;
+    scope.snapshot = std::move(named->snapshot);
+    scope.project = named->projects.first();
+  } else {
+    scope.snapshot = WTStoreSnapshot::open(err);
+    if (!scope.snapshot) return std::nullopt;
+  }
+  return scope;
 }
 
 namespace WTNamedRecords {

@@ -10,6 +10,7 @@
 #include <memory>
 #include <optional>
 
+class QCommandLineParser;
 class WTClient;
 class WTProject;
 class WTTask;
@@ -47,6 +48,16 @@ struct WTNamedProjects {
   std::unique_ptr<WTStoreSnapshot> snapshot;
   QList<WTProject*> projects;
   QString title;  // the project's or the client's name
+};
+
+// What a command reads when its "--project NAME" option narrows it: that project with its own items
+// alone, or without the option the whole store (`project` null).
+struct WTProjectScope {
+  // On failure writes why to `err` as "tessal: MESSAGE" and gives none.
+  static std::optional<WTProjectScope> read(QTextStream& err, const QCommandLineParser& options);
+
+  std::unique_ptr<WTStoreSnapshot> snapshot;
+  const WTProject* project = nullptr;
 };
 
 // Finding the one record a command names: names compare without regard to case. No match, or more than

@@ -171,19 +171,11 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, kUsage, problem);
 
   // One project's entries need only that project's items read.
-  std::unique_ptr<WTStoreSnapshot> snapshot;
-  const WTProject* project = nullptr;
-  if (parser.isSet(QStringLiteral("project"))) {
-    std::optional<WTNamedProjects> named =
-        WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")));
-    if (!named) return 1;
-    snapshot = std::move(named->snapshot);
-    project = named->projects.first();
-  } else {
-    snapshot = WTStoreSnapshot::open(err);
-    if (!snapshot) return 1;
-  }
-  QList<WTTime*> times = WTCSVExport::timesMatching(snapshot->context(), predicate.value(), project);
+  const std::optional<WTProjectScope> scope = WTProjectScope::read(err, parser);
+  if (!scope) return 1;
+  WTObjectContext& context = scope->snapshot->context();
+  const WTProject* project = scope->project;
+  QList<WTTime*> times = WTCSVExport::timesMatching(context, predicate.value(), project);
   std::sort(times.begin(), times.end(), [](const WTTime* a, const WTTime* b) {
     return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
   });
