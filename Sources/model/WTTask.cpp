@@ -12,6 +12,7 @@
 #include <QCoreApplication>
 
 #include <algorithm>
+#include <functional>
 
 WT_ENTITY_CLASS_IMPL(WTTask)
 
@@ -161,20 +162,27 @@ QList<WTItem*> WTTask::valuableItems() const {
   return result;
 }
 
-std::optional<Date> WTTask::firstItemDate() const {
-  std::optional<Date> first;
-  for (const WTItem* item : items_) {
-    if (isValuable(item) && item->startDate() && (!first || *item->startDate() < *first)) first = item->startDate();
+namespace {
+
+// The date of the valuable items that comes first by `earlier`, or none when none has a date.
+template <class Order>
+std::optional<Date> extremeItemDate(const QList<WTItem*>& items, Order earlier) {
+  std::optional<Date> found;
+  for (const WTItem* item : items) {
+    if (isValuable(item) && item->startDate() && (!found || earlier(*item->startDate(), *found)))
+      found = item->startDate();
   }
-  return first;
+  return found;
+}
+
+}  // namespace
+
+std::optional<Date> WTTask::firstItemDate() const {
+  return extremeItemDate(items_, std::less<Date>());
 }
 
 std::optional<Date> WTTask::lastItemDate() const {
-  std::optional<Date> last;
-  for (const WTItem* item : items_) {
-    if (isValuable(item) && item->startDate() && (!last || *item->startDate() > *last)) last = item->startDate();
-  }
-  return last;
+  return extremeItemDate(items_, std::greater<Date>());
 }
 
 WTItemContainerList WTTask::dailyItems() const {
