@@ -1,12 +1,13 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
-#include "WTKeychain.h"
-#include "WTPasswordStore.h"
+#include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
+#include "WTKeychain.h"
 #include "WTObject.h"
 #include "WTObjectContext.h"
+#include "WTPasswordStore.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStore.h"
 
@@ -91,7 +92,7 @@ void WTAppDelegate::saveAction() {
   if (!context_ || !context_->hasChanges()) return;
   const Result<void> saved = context_->save();
   if (!saved && context_->hasStore()) presenter_->presentError(saved.error().message);
-  qInfo("Saved");
+  qCDebug(lcStore, "Saved");
 }
 
 bool WTAppDelegate::saveChanges(Error* error) {
@@ -102,7 +103,7 @@ bool WTAppDelegate::saveChanges(Error* error) {
   if (commitEditing_) commitEditing_();
   const Result<void> saved = context->save();
   if (saved) return true;
-  qWarning("ERROR: %s", qUtf8Printable(saved.error().message));
+  qCWarning(lcStore, "ERROR: %s", qUtf8Printable(saved.error().message));
   if (error) *error = saved.error();
   return false;
 }

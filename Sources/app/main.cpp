@@ -1,6 +1,7 @@
+#include "TessalLogging.h"
+#include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTCommandLine.h"
-#include "WTAppDelegate.h"
 #include "WTSingleInstance.h"
 #include "WTStoreWriterLock.h"
 #include "WTTimerCommands.h"
@@ -23,7 +24,8 @@ int main(int argc, char** argv) {
   QDir().mkpath(WTAppDelegate::applicationSupportFolder());
   WTStoreWriterLock writerLock(delegate.storePath());
   if (!writerLock.lock(10000))
-    qWarning("Could not take %s; another process may be changing the store", qPrintable(writerLock.filePath()));
+    qCWarning(lcStore, "Could not take %s; another process may be changing the store",
+              qPrintable(writerLock.filePath()));
   instance.setRequestHandler([&delegate](const QJsonObject& request) {
     WTCommandOutcome outcome = WTTimerCommands::answer(*delegate.managedObjectContext(), request);
     Error error;

@@ -1,4 +1,5 @@
 #include "RZDate.h"
+#include "TessalLogging.h"
 
 #include <QtGlobal>
 
@@ -83,7 +84,7 @@ icu::GregorianCalendar& calendar() {
     UErrorCode status = U_ZERO_ERROR;
     // Default zone and locale; the locale only sets the first weekday, which nothing here uses.
     s.calendar = std::make_unique<icu::GregorianCalendar>(status);
-    if (U_FAILURE(status)) qWarning("ICU calendar: %s", u_errorName(status));
+    if (U_FAILURE(status)) qCWarning(lcFoundation, "ICU calendar: %s", u_errorName(status));
     s.calendar->setLenient(true);
   }
   return *s.calendar;
@@ -195,7 +196,7 @@ Fields fieldsOf(UDate ms) {
   f.minute = cal.get(UCAL_MINUTE, status);
   f.second = cal.get(UCAL_SECOND, status);
   f.weekday = cal.get(UCAL_DAY_OF_WEEK, status);  // UCAL_SUNDAY is 1 in every locale
-  if (U_FAILURE(status)) qWarning("ICU calendar fields: %s", u_errorName(status));
+  if (U_FAILURE(status)) qCWarning(lcFoundation, "ICU calendar fields: %s", u_errorName(status));
   return f;
 }
 

@@ -1,4 +1,5 @@
 #include "RZString.h"
+#include "TessalLogging.h"
 
 #include <QUrl>
 #include <QtGlobal>
@@ -129,7 +130,8 @@ void replaceAllOccurrenceOfString(QString& text, const QString& target, const QS
   if (target.isEmpty()) return;
   if (replacement.contains(target)) {
     Q_ASSERT_X(false, "NSMutableString(RZAddition)", "replacement contains the target: would never end");
-    qWarning("replaceAllOccurrenceOfString: replacement contains the target; text left unchanged");
+    qCWarning(lcFoundation,
+              "replaceAllOccurrenceOfString: replacement contains the target; text left unchanged");
     return;
   }
   // Searching from the start after every replacement lets a replacement join with its neighbours into a

@@ -1,4 +1,5 @@
 #include "WTSingleInstance.h"
+#include "TessalLogging.h"
 
 #include <QDeadlineTimer>
 #include <QDir>
@@ -54,7 +55,7 @@ bool WTSingleInstance::start(bool bringRunningCopyForward) {
   if (!server_->listen(path_)) {
     // Another copy may have won the race to listen a moment ago.
     if (notifyRunningInstance(2000, bringRunningCopyForward)) return false;
-    qWarning("Could not listen on %s: %s", qPrintable(path_), qPrintable(server_->errorString()));
+    qCWarning(lcApp, "Could not listen on %s: %s", qPrintable(path_), qPrintable(server_->errorString()));
     return true;  // run unguarded rather than not at all
   }
   connect(server_, &QLocalServer::newConnection, this, &WTSingleInstance::acceptConnections);

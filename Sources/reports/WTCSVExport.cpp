@@ -5,6 +5,7 @@
 #include "KeyPath.h"
 #include "MoneyFormat.h"
 #include "RZDate.h"
+#include "TessalLogging.h"
 #include "WTItem.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -146,7 +147,8 @@ Result<void> writeTextAtomically(const QString& path, const QString& text) {
 Result<int> exportTimes(const WTObjectContext& context, const WTItemPredicate& predicate,
                         const WTProject* project, const QString& path) {
   const QList<WTTime*> times = timesMatching(context, predicate, project);
-  qInfo("%s", qPrintable(QStringLiteral("Exporting %1 items to: %2").arg(times.size()).arg(path)));
+  qCDebug(lcExport, "%s",
+          qPrintable(QStringLiteral("Exporting %1 items to: %2").arg(times.size()).arg(path)));
   const Result<void> written = writeTextAtomically(path, timesCSV(times));
   if (!written) return written.error();
   return int(times.size());

@@ -3,11 +3,12 @@
 #include "GXTemplateEngine.h"
 #include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
+#include "TessalLogging.h"
 #include "WTClient.h"
 #include "WTHTMLFilter.h"
-#include "WTItemKindFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
+#include "WTItemKindFilter.h"
 #include "WTProject.h"
 #include "WTReportFilters.h"
 #include "WTReportLevelMarker.h"
@@ -29,7 +30,9 @@ class ErrorCollector : public GXTemplateEngineDelegate {
   ErrorCollector(std::vector<WTReportTemplateError>& errors, bool logs) : errors_(errors), logs_(logs) {}
   bool observesBlocks() const override { return false; }
   void templateEngineEncounteredError(GXTemplateEngine* engine, const GXTemplateError& error, bool) override {
-    if (logs_) qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
+    if (logs_)
+      qCWarning(lcReport, "%s",
+                qPrintable(QStringLiteral("Template error: %1").arg(error.localizedDescription)));
     const QString& contents = engine->templateContents();
     const GXRange remaining = engine->remainingRange();
     const qsizetype reached = std::clamp<qsizetype>(qsizetype(remaining.location), 0, contents.size());
@@ -149,7 +152,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   } catch (const std::exception& exception) {
     // A pattern the regex library refuses stops the run; it is the template's error like any other.
     const QString message = QString::fromUtf8(exception.what());
-    if (logsErrors_) qWarning("%s", qPrintable(QStringLiteral("Template error: %1").arg(message)));
+    if (logsErrors_) qCWarning(lcReport, "%s", qPrintable(QStringLiteral("Template error: %1").arg(message)));
     report.errors.push_back({-1, message, 0});
     html = QLatin1String("");
   }

@@ -1,11 +1,12 @@
 #include "RZSyncErrorPresenter.h"
+#include "TessalLogging.h"
 
 #include <QtDebug>
 
 void RZSyncLogErrorPresenter::presentSyncError(const QString& message) {
-  qWarning().noquote() << QStringLiteral("Sync Error: %1").arg(message);
+  qCWarning(lcSync).noquote() << QStringLiteral("Sync Error: %1").arg(message);
 }
 
 void RZSyncLogErrorPresenter::presentNetworkError(const QString& message) {
-  qWarning().noquote() << QStringLiteral("Sync failed: %1").arg(message);
+  qCWarning(lcSync).noquote() << QStringLiteral("Sync failed: %1").arg(message);
 }

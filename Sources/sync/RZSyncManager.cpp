@@ -5,6 +5,7 @@
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
 #include "RZSyncReply.h"
+#include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTItem.h"
@@ -157,7 +158,7 @@ void RZSyncManager::removeNotifications() {
 }
 
 void RZSyncManager::managedObjectContextDidSave() {
-  qDebug("--- did save ---");
+  qCDebug(lcSync, "--- did save ---");
   if (attached_) writeTrack(true);
   if (syncEnabled_) rescheduleTimer(intervals_.afterSaveMs);
 }
@@ -165,7 +166,8 @@ void RZSyncManager::managedObjectContextDidSave() {
 void RZSyncManager::writeTrack(bool logFailure) {
   const Result<void> written = track_->writeToFile(trackFilePath_);
   if (!written && logFailure)
-    qWarning().noquote() << QStringLiteral("Error writing JSON Data - %1").arg(written.error().message);
+    qCWarning(lcSync).noquote()
+        << QStringLiteral("Error writing JSON Data - %1").arg(written.error().message);
 }
 
 void RZSyncManager::sync() {
@@ -206,9 +208,9 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const 
   const Result<RZSyncReply> parsed = RZSyncReply::fromJSON(object);
   if (!parsed) {
     if (object.typeId() != QMetaType::QVariantMap || !object.toMap().contains(QStringLiteral("iteration")))
-      qWarning("Iteration not received");
+      qCWarning(lcSync, "Iteration not received");
     // Nothing of it is taken: the journal keeps its iteration and changes, and the poll is retried.
-    qWarning().noquote() << parsed.error().message;
+    qCWarning(lcSync).noquote() << parsed.error().message;
     return syncNetworkDidFailWithError(network, parsed.error().message);
   }
   const RZSyncReply& reply = parsed.value();
@@ -228,7 +230,7 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const 
     // it; without one (below 1), keep the journal for the next poll, which fetches what was missing.
     const qint64 base = reply.iteration.value_or(0);
     if (base < 1) {
-      qInfo("Head iteration problem");
+      qCDebug(lcSync, "Head iteration problem");
     } else {
       post(track_->dictionary(), kSave, base);
     }
@@ -254,7 +256,7 @@ void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
   // Local edits are journaled before the server's changes arrive.
   const Result<void> saved = saveHandler_ ? saveHandler_() : context_->save();
   if (!saved) {
-    qWarning().noquote() << saved.error().message;
+    qCWarning(lcSync).noquote() << saved.error().message;
     return;
   }
 
@@ -272,7 +274,7 @@ void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
   context_->setChangeJournal(track_.get());
   attached_ = true;
   if (!mergedSave) {
-    qWarning().noquote() << mergedSave.error().message;
+    qCWarning(lcSync).noquote() << mergedSave.error().message;
     return;
   }
   // Caught up with this head now, whatever becomes of the save below: a refused or lost save must not
@@ -357,11 +359,11 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QStrin
       const QVariant merged = mergedValue(object, value.key(), value.value(), pending, &skip);
       if (skip) continue;
       if (!object->setValue(value.key(), merged)) {
-        qDebug().noquote() << QStringLiteral("Sync: %1 takes no value %2 for %3")
-                                  .arg(uuid,
-                                       QString::fromUtf8(
-                                           RZSyncJSON::write(value.value(), RZSyncJSON::Style::Compact)),
-                                       value.key());
+        qCDebug(lcSync).noquote() << QStringLiteral("Sync: %1 takes no value %2 for %3")
+                                         .arg(uuid,
+                                              QString::fromUtf8(RZSyncJSON::write(
+                                                  value.value(), RZSyncJSON::Style::Compact)),
+                                              value.key());
       }
     }
     if (!local.isEmpty() || track_->entries(section).contains(uuid)) track_->setEntry(section, uuid, local);

@@ -1,6 +1,7 @@
 #include "RZSyncNetwork.h"
 
 #include "RZSyncJSON.h"
+#include "TessalLogging.h"
 
 #include <QNetworkAccessManager>
 #include <QNetworkReply>
@@ -34,7 +35,7 @@ bool RZSyncNetwork::hasCredentials() {
 void RZSyncNetwork::postJSONObject(const QVariant& data, const QString& action, qint64 iteration) {
   Q_ASSERT_X(networkAction_ == Idle, "RZSyncNetwork", "line 41: a request is already in flight");
   if (networkAction_ != Idle) {
-    qWarning("RZSyncNetwork: a request is already in flight; the new one is refused");
+    qCWarning(lcSync, "RZSyncNetwork: a request is already in flight; the new one is refused");
     return;
   }
   // QString::trimmed drops white space and line breaks alike.
@@ -91,7 +92,7 @@ void RZSyncNetwork::refuseOversizedReply() {
   responseData_.clear();
   networkAction_ = Idle;
   const QString error = QStringLiteral("The server's reply is larger than %1 bytes.").arg(maxReplyBytes_);
-  qWarning().noquote() << error;
+  qCWarning(lcSync).noquote() << error;
   if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
 }
 
@@ -108,7 +109,7 @@ void RZSyncNetwork::replyFinished() {
   const bool answered = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).isValid();
   if (reply->error() != QNetworkReply::NoError && !answered) {
     const QString error = reply->errorString();
-    qWarning().noquote() << QStringLiteral("Connection failed: %1").arg(error);
+    qCWarning(lcSync).noquote() << QStringLiteral("Connection failed: %1").arg(error);
     responseData_.clear();
     if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
     return;
@@ -123,7 +124,7 @@ void RZSyncNetwork::replyFinished() {
         QStringLiteral("The server answered HTTP %1, a redirect to %2, which is not followed.")
             .arg(status)
             .arg(target.isEmpty() ? QStringLiteral("nowhere") : target);
-    qWarning().noquote() << error;
+    qCWarning(lcSync).noquote() << error;
     if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
     return;
   }

@@ -3,6 +3,7 @@
 #include "Date.h"
 #include "KeyPath.h"
 #include "RZSyncJSON.h"
+#include "TessalLogging.h"
 #include "WTObject.h"
 
 #include <QColor>
@@ -110,12 +111,12 @@ void RZSyncTrack::load(const QString& path) {
     return;
   }
 
-  qWarning().noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
+  qCWarning(lcSync).noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
   // Whatever the file holds may be someone's unsent work: keep it where a person can find it.
   QString aside = path + QStringLiteral(".corrupt");
   for (int n = 2; QFileInfo::exists(aside); ++n) aside = path + QStringLiteral(".corrupt.%1").arg(n);
   if (!QFile::rename(path, aside)) {
-    qWarning().noquote() << QStringLiteral("Could not move the unreadable journal %1 aside").arg(path);
+    qCWarning(lcSync).noquote() << QStringLiteral("Could not move the unreadable journal %1 aside").arg(path);
   }
 }
 
@@ -214,15 +215,15 @@ void RZSyncTrack::insertValues(const QVariantMap& values, const QString& uuid) {
   for (auto it = values.begin(); it != values.end(); ++it)
     if (std::optional<QVariant> transformed = transformedValue(it.value()))
       logged.insert(it.key(), *transformed);
-  qInfo().noquote() << QStringLiteral("INSERT(%1) %2")
-                           .arg(uuid,
-                                QString::fromUtf8(RZSyncJSON::write(logged, RZSyncJSON::Style::Compact)));
+  qCDebug(lcSync).noquote() << QStringLiteral("INSERT(%1) %2")
+                                   .arg(uuid, QString::fromUtf8(
+                                                  RZSyncJSON::write(logged, RZSyncJSON::Style::Compact)));
   updateValues(values, uuid, Section::Inserted);
 }
 
 void RZSyncTrack::deleteObjectWithId(const QString& uuid) {
   if (uuid.isEmpty()) return;
-  qInfo().noquote() << QStringLiteral("DELETE(%1)").arg(uuid);
+  qCDebug(lcSync).noquote() << QStringLiteral("DELETE(%1)").arg(uuid);
   if (!deleted_.contains(uuid)) deleted_.append(uuid);
 }
 

@@ -2,6 +2,7 @@
 
 #include "DurationText.h"
 #include "KeyPath.h"
+#include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTIdleSource.h"
 #include "WTLauncherEntry.h"
@@ -154,7 +155,7 @@ void WTStopwatchUpdater::updateBadge() {
 }
 
 void WTStopwatchUpdater::receiveSleepNote(const QString& name) {
-  qInfo().noquote() << QStringLiteral("receiveSleepNote: %1").arg(name);
+  qCDebug(lcTracking).noquote() << QStringLiteral("receiveSleepNote: %1").arg(name);
   timer_.stop();
   tickDue_.reset();
   scheduledAt_.reset();
@@ -162,7 +163,7 @@ void WTStopwatchUpdater::receiveSleepNote(const QString& name) {
 }
 
 void WTStopwatchUpdater::receiveWakeNote(const QString& name) {
-  qInfo().noquote() << QStringLiteral("receiveSleepNote: %1").arg(name);
+  qCDebug(lcTracking).noquote() << QStringLiteral("receiveSleepNote: %1").arg(name);
   update();
 }
 

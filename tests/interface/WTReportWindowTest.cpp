@@ -450,7 +450,7 @@ TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndCustomCoversItsE
 }
 
 TEST_F(RangeAndExportTest, TheExportWritesTheRangeOfTheChosenProjects) {
-  LogCapture log;
+  LogCapture log(QStringLiteral("tessal.export.debug=true"));
   WTProject* selected = nullptr;
   WTExportController exporter(context.get(), [&] { return selected; });
   exporter.rangeButton()->selectTag(WTRangePredicate::ThisMonth);

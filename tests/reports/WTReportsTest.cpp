@@ -208,7 +208,7 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   auto* task = makeTask(alpha, QStringLiteral("Zeta"));
   makeTime(task, berlin(2024, 3, 1, 8), berlin(2024, 3, 1, 8, 45))->setName(QStringLiteral("Early"));
   const QString path = dir.filePath(QStringLiteral("times.csv"));
-  LogCapture log;
+  LogCapture log(QStringLiteral("tessal.export.debug=true"));
   const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
   ASSERT_TRUE(written.ok()) << written.error().message.toStdString();
   EXPECT_EQ(written.value(), 4);

@@ -1,7 +1,9 @@
 #pragma once
 
 // Collects the log lines written while it lives (and still lets them through to the previous handler,
-// debug lines excepted).
+// debug lines excepted). Given logging rules ("tessal.sync.debug=true"), it turns those categories on
+// for its life; without, it sees what a user's stderr would.
+#include <QLoggingCategory>
 #include <QString>
 #include <QStringList>
 #include <QtGlobal>
@@ -10,7 +12,8 @@
 
 class LogCapture {
  public:
-  LogCapture() {
+  explicit LogCapture(const QString& rules = {}) : rules_(rules) {
+    if (!rules_.isEmpty()) QLoggingCategory::setFilterRules(rules_);
     current() = this;
     previous_ =
         qInstallMessageHandler([](QtMsgType type, const QMessageLogContext& context, const QString& text) {
@@ -21,6 +24,7 @@ class LogCapture {
   ~LogCapture() {
     qInstallMessageHandler(previous_);
     current() = nullptr;
+    if (!rules_.isEmpty()) QLoggingCategory::setFilterRules(QString());
   }
   bool contains(const QString& text) const {
     return std::any_of(lines.begin(), lines.end(), [&](const QString& line) { return line.contains(text); });
@@ -36,5 +40,6 @@ class LogCapture {
     static LogCapture* capture = nullptr;
     return capture;
   }
+  QString rules_;
   QtMessageHandler previous_ = nullptr;
 };

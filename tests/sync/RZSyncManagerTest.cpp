@@ -345,7 +345,7 @@ TEST_F(RZSyncManagerTest, CodeFourWithoutIterationKeepsTheJournalForTheNextPoll)
   client.save();
   server.handler = [&](const HttpRequest&) { return errorReply("Poll head first", 4, 0); };
   const qsizetype before = server.requests.size();
-  LogCapture log;
+  LogCapture log(QStringLiteral("tessal.sync.debug=true"));
   ASSERT_TRUE(client.syncOnce());
   EXPECT_TRUE(log.contains("Head iteration problem"));
   EXPECT_EQ(server.requests.size(), before + 1);  // the poll itself; nothing is resent

@@ -231,9 +231,15 @@ TEST(RZSyncTrackSections, DeletionKeepsPendingValuesAndRewritingUndeletes) {
   EXPECT_FALSE(track.hasChanges());
 }
 
-TEST(RZSyncTrackSections, LogLines) {
-  LogCapture log;
+// Every change is logged for a developer who asks, and for nobody else.
+TEST(RZSyncTrackSections, LogLinesOnlyWhenAskedFor) {
   RZSyncTrack track;
+  {
+    LogCapture quiet;
+    track.insertValues({{"name", "Quiet"}}, "Q@WTTask");
+    EXPECT_TRUE(quiet.lines.isEmpty()) << quiet.lines.join('\n').toStdString();
+  }
+  LogCapture log(QStringLiteral("tessal.sync.debug=true"));
   track.insertValues({{"name", "Design"}}, "A@WTTask");
   track.deleteObjectWithId("A@WTTask");
   EXPECT_TRUE(log.contains(QStringLiteral("INSERT(A@WTTask) {\"name\":\"Design\"}")))

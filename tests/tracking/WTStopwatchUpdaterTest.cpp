@@ -299,7 +299,7 @@ TEST_F(TrackingTest, SleepStopsTheTickerAndWakingOffersTheTimeAsleepAsIdle) {
   WTTime* time = startTimer(task, clockNow.addingSeconds(-1800));
   updater->start();
   const int before = ticks;
-  LogCapture log;
+  LogCapture log(QStringLiteral("tessal.tracking.debug=true"));
 
   updater->receiveSleepNote(QStringLiteral("PrepareForSleep(true)"));
   EXPECT_FALSE(updater->isTicking());
