@@ -42,6 +42,8 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
     EXPECT_TRUE(delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
     EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
+    // Made with the store, not by the window: a command that makes the store gets it too.
+    EXPECT_EQ(delegate->managedObjectContext()->fetch<WTProject>().size(), 1);
     WTMainWindowController window(*delegate);
     EXPECT_TRUE(QFile::exists(delegate->storePath()));
     const QList<WTProject*> projects = window.fetchProjects();
