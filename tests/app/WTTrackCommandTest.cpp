@@ -206,6 +206,8 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   run = here.tessal({"add", "Review", "10:15-11:00", "--date", "2026-03-05"}, auckland);
   EXPECT_EQ(run.code, 0) << run.err.toStdString();
   EXPECT_EQ(run.out, "Added Hermes › Review  2026-03-05 10:15–11:00  00:45\n");
+  EXPECT_TRUE(here.tessal({"log", "--range", "2026-03-05..2026-03-05"}, auckland)
+                  .out.startsWith("2026-03-05  10:15–11:00"));
   run = here.tessal({"add", "Review", "10:45-11:30", "--date", "2026-03-05"}, auckland);
   EXPECT_EQ(run.code, 1);
   EXPECT_TRUE(run.err.contains("overlaps the entry 2026-03-05 10:15–11:00 of Hermes › Review"))
