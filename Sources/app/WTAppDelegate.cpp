@@ -8,8 +8,10 @@
 #include "WTObject.h"
 #include "WTObjectContext.h"
 #include "WTPasswordStore.h"
+#include "WTProject.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStore.h"
+#include "WTTask.h"
 
 #include <QDir>
 #include <QFileInfo>
@@ -48,10 +50,13 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
 
   context_ = std::make_unique<WTObjectContext>(defaults_);
   WTObjectContext::setDefaultContext(context_.get());
+  const bool storeIsNew = !QFileInfo::exists(storePath());
+  bool fill = false;
   Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath());
   if (store) {
     Result<void> loaded = context_->attachStore(std::move(store.value()));
     if (!loaded) presenter_->presentError(loaded.error().message);
+    fill = loaded && storeIsNew;
   } else {
     presenter_->presentError(store.error().message);
   }
@@ -67,8 +72,20 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
     if (saveChanges(&error)) return {};
     return error;
   });
+  // Filled once the journal listens, so that the first project reaches the account like any other.
+  if (fill) fillNewStore(*context_);
   syncManager_->enableSync();
   return context_.get();
+}
+
+void WTAppDelegate::fillNewStore(WTObjectContext& context) {
+  const UserDefaults* defaults = context.userDefaults();
+  if (defaults && !defaults->stringForKey(QStringLiteral("WTSyncUser")).isEmpty()) return;
+  auto* project = WTProject::insertNewObject(&context);
+  project->setName(QStringLiteral("Default Project"));
+  auto* task = WTTask::insertNewObject(&context);
+  task->setName(QStringLiteral("Default Task"));
+  task->setProject(project);
 }
 
 WTStopwatchUpdater* WTAppDelegate::startStopwatchUpdater(WTIdleSource* idle, WTTrackingAlertPresenter* presenter,

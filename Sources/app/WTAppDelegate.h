@@ -41,7 +41,13 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
 
   // The context, made with the store on first use. A store that cannot be opened is reported once;
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.
+  // A store file made here gets its first project (fillNewStore).
   WTObjectContext* managedObjectContext();
+  // What a store file gets when it is made, by the desktop copy or by a command: "Default Project" with
+  // "Default Task", for the first day's work. Not when this installation syncs (a "WTSyncUser" is set):
+  // its projects come from the account, which would otherwise gain a first project from every device
+  // set up. A store that exists is never filled, so the user's own emptying it sticks. Saves nothing.
+  static void fillNewStore(WTObjectContext& context);
   bool hasContext() const { return context_ != nullptr; }
   // Made with the context, over syncJournalPath(), with syncing switched on; null before that.
   RZSyncManager* syncManager() const { return syncManager_.get(); }

@@ -76,17 +76,24 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
 }
 
 constexpr char kUsage[] =
-    "usage: tessal [start|stop|status|log|list|report|export|template|sync] [ARGS...]   (tessal --help tells more)\n";
+    "usage: tessal [start|stop|add|status|log|list|report|export|template|sync] [ARGS...]\n"
+    "       (tessal --help tells more)\n";
 
 constexpr char kHelp[] =
     "Tessal tracks working time and bills it.\n"
     "\n"
     "usage:\n"
     "  tessal                                        start the desktop application (or bring it forward)\n"
-    "  tessal start TASK [--project NAME] [--client NAME]\n"
-    "                                                start the task's timer (names match without regard to case)\n"
+    "  tessal start TASK [--project NAME] [--client NAME] [--create]\n"
+    "                                                start the task's timer (names match without regard\n"
+    "                                                to case; --create makes a missing task, project and\n"
+    "                                                client)\n"
     "  tessal stop [TASK] [--project NAME] [--client NAME]\n"
     "                                                stop every running timer, or the task's\n"
+    "  tessal add TASK (DURATION | START-END) [--date DAY] [--note TEXT] [--project NAME]\n"
+    "             [--client NAME] [--create]         add a finished time entry: 0:45 ends now, 09:00-10:30\n"
+    "                                                is on DAY (today, yesterday or YYYY-MM-DD; today by\n"
+    "                                                default)\n"
     "  tessal status [--json]                        the running timers and their total; exit status 1 when\n"
     "                                                none runs\n"
     "  tessal log [--range RANGE] [--project NAME]   the time entries of a range (today by default) and its\n"
@@ -108,7 +115,7 @@ constexpr char kHelp[] =
     "  tessal --help                                 show this text\n"
     "  tessal --version                              show the version\n"
     "\n"
-    "While the desktop application runs, start and stop are carried out by it.\n"
+    "While the desktop application runs, start, stop and add are carried out by it.\n"
     "The desktop application also takes Qt's own options (-platform NAME, -style NAME, -session ID, ...).\n"
     "Data: $XDG_DATA_HOME/Tessal2/Tessal.sqlite; settings: $XDG_CONFIG_HOME/Tessal/Tessal.conf.\n";
 

@@ -67,9 +67,8 @@ WTMainWindowController::WTMainWindowController(WTAppDelegate& delegate, QWidget*
   connect(&validation_, &QTimer::timeout, this, &WTMainWindowController::validateToolbarItems);
   buildActions();
 
-  // As the window loads: first-run data, both roots pushed, the projects shown.
-  populate();
-  // The lists show what the first run made from the first paint on, not a turn later.
+  // As the window loads: both roots pushed, the projects shown. The lists show what a new store was
+  // filled with (WTAppDelegate::fillNewStore) from the first paint on, not a turn later.
   projectsViewController_->arrayController()->rearrangeObjects();
   setSelectedToolbarItemIdentifier(QStringLiteral("projects"));
   projectsNavigationController_->pushViewController(projectsViewController_);
@@ -272,17 +271,6 @@ WTExportController* WTMainWindowController::exportData() {
 
 QList<WTProject*> WTMainWindowController::fetchProjects() const {
   return WTProject::fetchByPredicate({}, delegate_.managedObjectContext());
-}
-
-void WTMainWindowController::populate() {
-  WTObjectContext* context = delegate_.managedObjectContext();
-  // Without a store there is nothing to fill: what was made could never be kept.
-  if (!context->hasStore() || !fetchProjects().isEmpty()) return;
-  auto* project = WTProject::insertNewObject(context);
-  project->setName(QStringLiteral("Default Project"));
-  auto* task = WTTask::insertNewObject(context);
-  task->setName(QStringLiteral("Default Task"));
-  task->setProject(project);
 }
 
 WTNavigationController* WTMainWindowController::currentNavigationController() const {

@@ -41,8 +41,6 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
 
   // The projects of the store (none when it could not be opened).
   QList<WTProject*> fetchProjects() const;
-  // On the first run, with an empty store, makes "Default Project" with "Default Task". Saves nothing.
-  void populate();
 
   // WTNavigationHost: the stack on screen, and switching stacks (nothing when already shown).
   WTNavigationController* currentNavigationController() const override;

@@ -197,6 +197,83 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
   });
 }
 
+Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name, const QString& projectName,
+                                  const QString& clientName, QStringList& made) {
+  const Result<WTTask*> found = task(context, name, projectName, clientName);
+  if (found) return found;
+  auto passes = [&](const WTProject* project, const QString& wantedProject) {
+    return project && (wantedProject.isNull() || sameName(project->name(), wantedProject)) &&
+           (clientName.isNull() || (project->client() && sameName(project->client()->name(), clientName)));
+  };
+  auto carried = [&](const QString& taskName, const QString& wantedProject) {
+    const QList<WTTask*> tasks = context.fetch<WTTask>([&](const WTTask* task) {
+      return sameName(task->name(), taskName) &&
+             ((wantedProject.isNull() && clientName.isNull()) || passes(task->project(), wantedProject));
+    });
+    return !tasks.isEmpty();
+  };
+  QString taskName = name;
+  QString wantedProject = projectName;
+  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
+  if (projectName.isNull() && separator > 0 && !carried(name, {})) {
+    taskName = name.mid(separator + 3);
+    wantedProject = name.left(separator);
+  }
+  // Tasks of that name there are, only not one alone: which one is meant stays the user's to say.
+  if (carried(taskName, wantedProject)) return found.error();
+
+  WTClient* client = nullptr;
+  if (!clientName.isNull()) {
+    const QList<WTClient*> clients =
+        context.fetch<WTClient>([&](const WTClient* client) { return sameName(client->name(), clientName); });
+    if (clients.size() > 1) return WTNamedRecords::client(context, clientName).error();
+    if (clients.isEmpty()) {
+      client = WTClient::insertNewObject(&context);
+      client->setName(clientName);
+      made.append(QStringLiteral("client %1").arg(clientName));
+    } else {
+      client = clients.first();
+    }
+  }
+  QList<WTProject*> projects = context.fetch<WTProject>([&](const WTProject* project) {
+    return passes(project, wantedProject) && (!client || project->client() == client);
+  });
+  WTProject* project = nullptr;
+  if (projects.size() == 1) {
+    project = projects.first();
+  } else if (!wantedProject.isNull() && projects.isEmpty()) {
+    project = WTProject::insertNewObject(&context);
+    project->setName(wantedProject);
+    project->setClient(client);
+    made.append(QStringLiteral("project %1").arg(wantedProject));
+  } else if (!wantedProject.isNull()) {
+    return named<WTProject>(projects, wantedProject, "project", QStringLiteral("projects"), describeProject)
+        .error();
+  } else {
+    QStringList names;
+    for (const WTProject* candidate : projects) names.append(describeProject(candidate));
+    std::sort(names.begin(), names.end(),
+              [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+    if (names.size() > kNamesShown) {
+      const qsizetype more = names.size() - kNamesShown;
+      names.resize(kNamesShown);
+      names.append(QStringLiteral("and %1 more").arg(more));
+    }
+    return Error{
+        1, projects.isEmpty()
+               ? QStringLiteral("no task is named %1 and there is no project to make it in; name one with "
+                                "--project")
+                     .arg(quoted(taskName))
+               : QStringLiteral("no task is named %1; name the project to make it in with --project: %2")
+                     .arg(quoted(taskName), names.join(QStringLiteral(", ")))};
+  }
+  auto* created = WTTask::insertNewObject(&context);
+  created->setName(taskName);
+  created->setProject(project);
+  made.append(QStringLiteral("task %1").arg(label(*created)));
+  return created;
+}
+
 QString label(const WTTask& task) {
   const QString project = task.project() && !task.project()->name().isEmpty() ? task.project()->name()
                                                                                 : QStringLiteral("(untitled)");

@@ -71,6 +71,13 @@ Result<WTClient*> client(const WTObjectContext& context, const QString& name);
 Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName = {},
                      const QString& clientName = {});
 
+// As task(), but a name that no task of the filters carries makes a task of that name, in the project
+// `projectName` names (made, for the client `clientName` names, when missing; the client too), or without
+// one in the only project there is (of that client). "PROJECT › TASK" names the project too. A name that
+// is ambiguous stays an error. What was made is appended to `made`, one description each.
+Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name, const QString& projectName,
+                                  const QString& clientName, QStringList& made);
+
 // How the commands name a task: "PROJECT › TASK", "(untitled)" standing in for a missing name.
 QString label(const WTTask& task);
 

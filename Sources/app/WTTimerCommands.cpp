@@ -1,6 +1,7 @@
 #include "WTTimerCommands.h"
 
 #include "DurationText.h"
+#include "RZDate.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -11,6 +12,8 @@
 #include <QCommandLineParser>
 #include <QJsonArray>
 #include <QJsonDocument>
+#include <QRegularExpression>
+#include <QTimeZone>
 
 #include <algorithm>
 
@@ -19,11 +22,59 @@ namespace {
 const QString kStart = QStringLiteral("start");
 const QString kStop = QStringLiteral("stop");
 const QString kStatus = QStringLiteral("status");
+const QString kAdd = QStringLiteral("add");
 
 QString usageLine(const QString& command) {
-  if (command == kStart) return QStringLiteral("usage: tessal start TASK [--project NAME] [--client NAME]\n");
+  if (command == kStart)
+    return QStringLiteral("usage: tessal start TASK [--project NAME] [--client NAME] [--create]\n");
   if (command == kStop) return QStringLiteral("usage: tessal stop [TASK] [--project NAME] [--client NAME]\n");
+  if (command == kAdd)
+    return QStringLiteral(
+        "usage: tessal add TASK (DURATION | START-END) [--date DAY] [--note TEXT] [--project NAME]\n"
+        "                  [--client NAME] [--create]\n");
   return QStringLiteral("usage: tessal status [--json]\n");
+}
+
+// The time an added entry covers, as typed: a duration, or a start and an end on the day.
+struct Span {
+  int minutes = 0;  // a duration when the times are null
+  QTime start;
+  QTime end;
+};
+
+// "DURATION" ("45", "0:45", "1:30") or "START-END" ("09:00-10:30"); the problem when it is neither.
+std::optional<Span> parseSpan(const QString& text, QString& problem) {
+  static const QRegularExpression range(QStringLiteral("^(\\d{1,2}:\\d{2})-(\\d{1,2}:\\d{2})$"));
+  static const QRegularExpression duration(QStringLiteral("^\\d{1,4}(:\\d{1,2})?$"));
+  Span span;
+  if (const QRegularExpressionMatch match = range.match(text); match.hasMatch()) {
+    span.start = QTime::fromString(match.captured(1), u"H:mm");
+    span.end = QTime::fromString(match.captured(2), u"H:mm");
+    if (span.start.isValid() && span.end.isValid()) return span;
+  } else if (duration.match(text).hasMatch()) {
+    span.minutes = DurationText::minutesFromString(text);
+    if (span.minutes > 0) return span;
+    problem = QStringLiteral("a duration of no time adds nothing");
+    return std::nullopt;
+  }
+  problem =
+      QStringLiteral("'%1' is neither a duration (0:45) nor START-END in hours and minutes (09:00-10:30)")
+          .arg(text);
+  return std::nullopt;
+}
+
+// The day "--date" names, "today" when not given, as days back from today or as a date.
+struct Day {
+  int daysBack = 0;
+  QDate date;  // when given as one
+};
+
+std::optional<Day> parseDay(const QString& text) {
+  if (text.isNull() || text.compare(u"today", Qt::CaseInsensitive) == 0) return Day{};
+  if (text.compare(u"yesterday", Qt::CaseInsensitive) == 0) return Day{1, {}};
+  const QDate date = QDate::fromString(text, Qt::ISODate);
+  if (date.isValid() && text.size() == 10) return Day{0, date};
+  return std::nullopt;
 }
 
 // The parsed arguments of one of the commands, or the problem with them.
@@ -33,32 +84,44 @@ struct Arguments {
   QString project;
   QString client;
   bool json = false;
+  bool create = false;
+  // add
+  Span span;
+  Day day;
+  QString note;  // null when none was given
 };
 
 Arguments parse(const QString& command, const QStringList& arguments) {
   QCommandLineParser parser;
   parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
   const bool namesTasks = command != kStatus;
-  if (namesTasks) {
-    parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
-    parser.addOption(QCommandLineOption(QStringLiteral("client"), QString(), QStringLiteral("name")));
-  } else {
-    parser.addOption(QCommandLineOption(QStringLiteral("json")));
-  }
+  const bool adds = command == kAdd;
+  const QStringList valued = adds         ? QStringList{QStringLiteral("project"), QStringLiteral("client"),
+                                                QStringLiteral("date"), QStringLiteral("note")}
+                             : namesTasks ? QStringList{QStringLiteral("project"), QStringLiteral("client")}
+                                          : QStringList();
+  for (const QString& name : valued)
+    parser.addOption(QCommandLineOption(name, QString(), QStringLiteral("value")));
+  if (command == kStart || adds) parser.addOption(QCommandLineOption(QStringLiteral("create")));
+  if (!namesTasks) parser.addOption(QCommandLineOption(QStringLiteral("json")));
   Arguments parsed;
   if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments)) {
     parsed.problem = parser.errorText();
     return parsed;
   }
   const QStringList positional = parser.positionalArguments();
-  const qsizetype allowed = namesTasks ? 1 : 0;
+  const qsizetype allowed = adds ? 2 : namesTasks ? 1 : 0;
   if (positional.size() > allowed) {
     parsed.problem = QStringLiteral("unexpected argument '%1'").arg(positional.at(allowed));
   } else if (command == kStart && positional.isEmpty()) {
     parsed.problem = QStringLiteral("name the task to start");
-  } else if (namesTasks && (parser.values(QStringLiteral("project")).size() > 1 ||
-                            parser.values(QStringLiteral("client")).size() > 1)) {
-    parsed.problem = QStringLiteral("--project and --client may each be given once");
+  } else if (adds && positional.size() < 2) {
+    parsed.problem =
+        QStringLiteral("name the task and its time: a duration (0:45) or START-END (09:00-10:30)");
+  }
+  for (const QString& name : valued) {
+    if (parsed.problem.isEmpty() && parser.values(name).size() > 1)
+      parsed.problem = QStringLiteral("--%1 may be given once").arg(name);
   }
   if (!parsed.problem.isEmpty()) return parsed;
   if (!positional.isEmpty()) parsed.task = positional.first();
@@ -68,8 +131,19 @@ Arguments parse(const QString& command, const QStringList& arguments) {
     if (parser.isSet(QStringLiteral("client"))) parsed.client = parser.value(QStringLiteral("client"));
     if (parsed.task.isNull() && (!parsed.project.isNull() || !parsed.client.isNull()))
       parsed.problem = QStringLiteral("--project and --client narrow down a task: name one");
+    parsed.create = (command == kStart || adds) && parser.isSet(QStringLiteral("create"));
   } else {
     parsed.json = parser.isSet(QStringLiteral("json"));
+  }
+  if (adds && parsed.problem.isEmpty()) {
+    if (const std::optional<Span> span = parseSpan(positional.at(1), parsed.problem)) parsed.span = *span;
+    const QString day =
+        parser.isSet(QStringLiteral("date")) ? parser.value(QStringLiteral("date")) : QString();
+    if (const std::optional<Day> read = parseDay(day))
+      parsed.day = *read;
+    else if (parsed.problem.isEmpty())
+      parsed.problem = QStringLiteral("--date takes today, yesterday or YYYY-MM-DD, not '%1'").arg(day);
+    if (parser.isSet(QStringLiteral("note"))) parsed.note = parser.value(QStringLiteral("note"));
   }
   return parsed;
 }
@@ -87,15 +161,28 @@ QList<WTTime*> runningTimes(const WTObjectContext& context) {
   return running;
 }
 
+// The task the arguments name; with --create, made (with its project and client) when missing, which is
+// told in `out`.
+Result<WTTask*> namedTask(WTObjectContext& context, const Arguments& arguments, QString& out) {
+  if (!arguments.create)
+    return WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client);
+  QStringList made;
+  Result<WTTask*> task =
+      WTNamedRecords::taskMadeIfMissing(context, arguments.task, arguments.project, arguments.client, made);
+  for (const QString& line : made) out += QStringLiteral("Created %1\n").arg(line);
+  return task;
+}
+
 WTCommandOutcome start(WTObjectContext& context, const Arguments& arguments) {
-  const Result<WTTask*> found = WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client);
+  QString out;
+  const Result<WTTask*> found = namedTask(context, arguments, out);
   if (!found) return failure(found.error().message);
   WTTask* task = found.value();
-  if (task->running()) return {0, QStringLiteral("%1 is running already\n").arg(WTNamedRecords::label(*task)), {}};
+  if (task->running())
+    return {0, out + QStringLiteral("%1 is running already\n").arg(WTNamedRecords::label(*task)), {}};
   // What the timer button stops on the way ("WTStopsOtherTimes"), told as the stop command tells it.
   const QList<WTTime*> runningBefore = runningTimes(context);
   task->toggleTimer();
-  QString out;
   for (const WTTime* time : runningBefore) {
     if (!time->running())
       out += QStringLiteral("Stopped %1  %2\n")
@@ -122,6 +209,66 @@ WTCommandOutcome stop(WTObjectContext& context, const Arguments& arguments) {
   if (out.isEmpty())
     out = only ? QStringLiteral("%1 is not running\n").arg(WTNamedRecords::label(*only))
                : QStringLiteral("No timer is running\n");
+  return {0, out, {}};
+}
+
+QString timeOfDay(Date date, const QTimeZone& zone) {
+  return date.toQDateTime().toTimeZone(zone).toString(u"HH:mm");
+}
+
+// Adds a finished entry to a task, as typing one into the outline does. It must be over (nothing of it
+// after now), end no earlier than it starts, and share no time with the task's other entries. A duration
+// alone ends now, or on another day at the present time of day.
+WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const QTimeZone& zone) {
+  const Date now = Date::now();
+  const QDateTime here = now.toQDateTime().toTimeZone(zone);
+  const QDate day =
+      arguments.day.date.isValid() ? arguments.day.date : here.date().addDays(-arguments.day.daysBack);
+  Date start, end;
+  if (arguments.span.start.isValid()) {
+    start = Date::fromQDateTime(QDateTime(day, arguments.span.start, zone));
+    end = Date::fromQDateTime(QDateTime(day, arguments.span.end, zone));
+    if (end < start)
+      return failure(QStringLiteral("the entry would end (%1) before it starts (%2)")
+                         .arg(timeOfDay(end, zone), timeOfDay(start, zone)));
+  } else {
+    end = day == here.date()
+              ? RZDate::beginOfMinute(now)
+              : Date::fromQDateTime(QDateTime(day, QTime(here.time().hour(), here.time().minute()), zone));
+    start = end.addingSeconds(-60.0 * arguments.span.minutes);
+  }
+  const QString when = QStringLiteral("%1 %2–%3")
+                           .arg(start.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd"),
+                                timeOfDay(start, zone), timeOfDay(end, zone));
+  if (end > now) return failure(QStringLiteral("the entry %1 is not over yet; add it once it is").arg(when));
+
+  QString out;
+  const Result<WTTask*> found = namedTask(context, arguments, out);
+  if (!found) return failure(found.error().message);
+  WTTask* task = found.value();
+  QList<WTTime*> others = task->times();
+  std::sort(others.begin(), others.end(), [](const WTTime* a, const WTTime* b) {
+    return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
+  });
+  for (const WTTime* other : others) {
+    if (!other->startDate()) continue;
+    const Date otherStart = *other->startDate();
+    const Date otherEnd = other->running() ? now : other->endDate().value_or(otherStart);
+    if (otherStart < end && start < otherEnd) {
+      return failure(QStringLiteral("the entry %1 overlaps the entry %2 %3–%4 of %5")
+                         .arg(when, otherStart.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd"),
+                              timeOfDay(otherStart, zone),
+                              other->running() ? QStringLiteral("now") : timeOfDay(otherEnd, zone),
+                              WTNamedRecords::label(*task)));
+    }
+  }
+  auto* time = WTTime::insertNewObject(&context);
+  time->setTask(task);
+  time->setStartDate(start);
+  time->setEndDate(end);
+  if (!arguments.note.isNull()) time->setName(arguments.note);
+  out += QStringLiteral("Added %1  %2  %3\n")
+             .arg(WTNamedRecords::label(*task), when, DurationText::stringWithMinutes(time->duration()));
   return {0, out, {}};
 }
 
@@ -169,7 +316,7 @@ WTCommandOutcome WTCommandOutcome::fromJson(const QJsonObject& json) {
 namespace WTTimerCommands {
 
 bool changesData(const QString& command) {
-  return command == kStart || command == kStop;
+  return command == kStart || command == kStop || command == kAdd;
 }
 
 bool isTimerCommand(const QString& command) {
@@ -182,16 +329,33 @@ std::optional<WTCommandOutcome> checkArguments(const QString& command, const QSt
   return WTCommandOutcome{2, {}, QStringLiteral("tessal: %1\n%2").arg(parsed.problem, usageLine(command))};
 }
 
-WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments) {
+bool createsRecords(const QString& command, const QStringList& arguments) {
+  return changesData(command) && parse(command, arguments).create;
+}
+
+QString taskWithItems(const QString& command, const QStringList& arguments) {
+  return command == kAdd ? parse(command, arguments).task : QString();
+}
+
+WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments,
+                     const QTimeZone& zone) {
   const Arguments parsed = parse(command, arguments);
   Q_ASSERT(parsed.problem.isEmpty());
   if (command == kStart) return start(context, parsed);
   if (command == kStop) return stop(context, parsed);
+  if (command == kAdd) return add(context, parsed, zone);
   return status(context, parsed);
 }
 
+WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments) {
+  return run(context, command, arguments, QTimeZone::systemTimeZone());
+}
+
 QJsonObject request(const QString& command, const QStringList& arguments) {
-  return {{QStringLiteral("command"), command}, {QStringLiteral("arguments"), QJsonArray::fromStringList(arguments)}};
+  // Times of day are the shell's: its zone travels with them.
+  return {{QStringLiteral("command"), command},
+          {QStringLiteral("arguments"), QJsonArray::fromStringList(arguments)},
+          {QStringLiteral("zone"), QString::fromUtf8(QTimeZone::systemTimeZoneId())}};
 }
 
 WTCommandOutcome answer(WTObjectContext& context, const QJsonObject& request) {
@@ -200,9 +364,10 @@ WTCommandOutcome answer(WTObjectContext& context, const QJsonObject& request) {
   for (const QJsonValue& argument : request.value(QStringLiteral("arguments")).toArray())
     arguments.append(argument.toString());
   if (!changesData(command))
-    return {2, {}, QStringLiteral("tessal: the running Tessal carries out only start and stop\n")};
+    return {2, {}, QStringLiteral("tessal: the running Tessal carries out only start, stop and add\n")};
   if (std::optional<WTCommandOutcome> problem = checkArguments(command, arguments)) return *problem;
-  return run(context, command, arguments);
+  const QTimeZone zone(request.value(QStringLiteral("zone")).toString().toUtf8());
+  return run(context, command, arguments, zone.isValid() ? zone : QTimeZone::systemTimeZone());
 }
 
 }  // namespace WTTimerCommands

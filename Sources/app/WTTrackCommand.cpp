@@ -22,6 +22,7 @@
 
 #include <QCommandLineParser>
 #include <QDeadlineTimer>
+#include <QDir>
 #include <QFileInfo>
 #include <QThread>
 
@@ -43,26 +44,55 @@ int print(const WTCommandOutcome& outcome, QTextStream& out, QTextStream& err) {
 
 using WTCommandArguments::failure;
 
+// The uuids of the tasks named `name` (or, for "PROJECT › TASK", the part after the separator), read from
+// the clients, projects and tasks alone: the tasks whose items a command needs besides the running ones.
+Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
+  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
+  const QString last = separator > 0 ? name.mid(separator + 3) : name;
+  QStringList uuids;
+  const Result<void> read = store.loadAll(
+      [&](WTStoreRecord&& record) {
+        if (record.entity == QLatin1String("WTTask") &&
+            (record.name.compare(name, Qt::CaseInsensitive) == 0 ||
+             record.name.compare(last, Qt::CaseInsensitive) == 0))
+          uuids.append(record.uuid);
+      },
+      WTStore::Records::ItemsOfTasks);
+  if (!read) return read.error();
+  return uuids;
+}
+
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
-// Only the records timers need are read; what changes is saved and written to the sync journal, as the
-// desktop copy would have done, so that the next sync sends it.
+// Only the records the command needs are read; what changes is saved and written to the sync journal, as
+// the desktop copy would have done, so that the next sync sends it. A command that may make records makes
+// the store when there is none, filled as the desktop copy fills a store it makes.
 int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments, QTextStream& out,
                QTextStream& err) {
-  if (!QFileInfo::exists(storePath)) {
+  const bool storeIsNew = !QFileInfo::exists(storePath);
+  if (storeIsNew && !WTTimerCommands::createsRecords(command, arguments)) {
     // The read-only opening says what is missing in the words every command uses.
     return failure(err, WTStore::openReadOnly(storePath).error().message);
   }
   // A few records change and a failed save is reported at once: no need to read the whole file first.
   Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
   if (!store) return failure(err, store.error().message);
+  WTStore::Records which = WTStore::Records::Timers;
+  QStringList tasks;
+  if (const QString name = WTTimerCommands::taskWithItems(command, arguments); !name.isNull()) {
+    Result<QStringList> named = tasksNamed(*store.value(), name);
+    if (!named) return failure(err, named.error().message);
+    which = WTStore::Records::ItemsOfTasks;
+    tasks = named.value();
+  }
   UserDefaults defaults;
   WTApplication::registerDefaults(defaults);
   WTObjectContext context(&defaults);
-  const Result<void> loaded = context.attachStore(std::move(store.value()), WTStore::Records::Timers);
+  const Result<void> loaded = context.attachStore(std::move(store.value()), which, tasks);
   if (!loaded) return failure(err, loaded.error().message);
   const QString journalFile = WTAppDelegate::syncJournalPath();
   RZSyncTrack journal(journalFile);
   context.setChangeJournal(&journal);
+  if (storeIsNew) WTAppDelegate::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {
     const Result<void> saved = context.save();
@@ -78,6 +108,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
 
 int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
   const QString storePath = WTAppDelegate::storePath();
+  // The lock lives beside the store: a command that may make the store makes its folder first.
+  if (WTTimerCommands::createsRecords(command, arguments)) QDir().mkpath(QFileInfo(storePath).path());
   WTStoreWriterLock lock(storePath);
   const WTSingleInstance desktop;
   const QDeadlineTimer deadline(kWriterWaitMs);

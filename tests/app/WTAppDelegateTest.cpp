@@ -42,6 +42,8 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
     EXPECT_TRUE(delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
     EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
+    // Made with the store, not by the window: a command that makes the store gets it too.
+    EXPECT_EQ(delegate->managedObjectContext()->fetch<WTProject>().size(), 1);
     WTMainWindowController window(*delegate);
     EXPECT_TRUE(QFile::exists(delegate->storePath()));
     const QList<WTProject*> projects = window.fetchProjects();
@@ -118,7 +120,8 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
 
   auto other = std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
   delegate.reset();
-  ASSERT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(), 1);
+  ASSERT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(),
+            2);  // and the first project
 }
 
 // A save with nothing to save touches nothing the user is typing in; one with changes commits the edit in
@@ -148,7 +151,7 @@ TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressOnlyWhenThereIsSomething
   for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
     names << stored->name();
   names.sort();
-  EXPECT_EQ(names, QStringList({"another change", "typed, not yet committed"}));
+  EXPECT_EQ(names, QStringList({"Default Project", "another change", "typed, not yet committed"}));
 }
 
 TEST_F(WTAppDelegateTest, ArchivedRecordsAreHiddenUntilShown) {

@@ -91,6 +91,11 @@ TEST_F(BashCompletion, OffersCommandsOptionsAndValues) {
   EXPECT_EQ(complete({"export", "--range", "last-"}), QStringList({"last-month", "last-week", "last-year"}));
   EXPECT_EQ(complete({"report", "--mode", ""}), QStringList({"0", "1", "2", "3"}));
   EXPECT_EQ(complete({"list", "p"}), QStringList({"projects"}));
+  EXPECT_EQ(complete({"a"}), QStringList({"add"}));
+  EXPECT_EQ(complete({"add", "--"}), QStringList({"--client", "--create", "--date", "--note", "--project"}));
+  EXPECT_EQ(complete({"add", "--date", "y"}), QStringList({"yesterday"}));
+  EXPECT_EQ(complete({"add", "Design", "0:45", "--c"}), QStringList({"--client", "--create"}));
+  EXPECT_EQ(complete({"start", "--c"}), QStringList({"--client", "--create"}));
 }
 
 TEST_F(BashCompletion, NamesComeQuotedAndNarrowedByTheOptionsAlreadyTyped) {

@@ -37,6 +37,7 @@ TEST(WTCommandLine, HelpVersionAndBadArgumentsNeedNoDisplay) {
     EXPECT_EQ(help.code, 0) << flag << ": " << help.err.toStdString();
     EXPECT_TRUE(help.out.contains("tessal template TEMPLATE_FILE")) << help.out.toStdString();
     EXPECT_TRUE(help.out.contains("tessal sync")) << help.out.toStdString();
+    EXPECT_TRUE(help.out.contains("tessal add TASK (DURATION | START-END)")) << help.out.toStdString();
   }
   const Outcome version = here.tessal({"--version"});
   EXPECT_EQ(version.code, 0) << version.err.toStdString();
@@ -99,6 +100,8 @@ TEST(WTCommandLine, SyncBringsTwoInstallationsInStepThroughTheRealServer) {
   EXPECT_EQ(project->name(), "Made on the laptop");
   ASSERT_EQ(project->tasks().size(), 1);
   EXPECT_EQ(project->tasks()[0]->name(), "Its task");
+  // The store the command made for a synced installation got no first project of its own to send.
+  EXPECT_EQ(context->fetch<WTProject>().size(), 1);
 }
 
 }  // namespace

@@ -14,6 +14,7 @@
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
 #include "WTReportWindowController.h"
+#include "WTStore.h"
 #include "WTTask.h"
 
 #include <gtest/gtest.h>
@@ -21,6 +22,7 @@
 #include <QAbstractButton>
 #include <QAction>
 #include <QButtonGroup>
+#include <QDir>
 #include <QScreen>
 #include <QTemporaryDir>
 #include <QTest>
@@ -54,11 +56,16 @@ class WTMainWindowControllerTest : public AppTest {
 
 TEST_F(WTMainWindowControllerTest, AStoreWithAnyProjectEvenArchivedIsNotFilled) {
   {
-    WTObjectContext* context = delegate->managedObjectContext();
-    auto* project = WTProject::insertNewObject(context);
+    // A store made before: only a store made just now gets a first project.
+    ASSERT_TRUE(QDir().mkpath(WTAppDelegate::applicationSupportFolder()));
+    auto store = WTStore::open(WTAppDelegate::storePath());
+    ASSERT_TRUE(store);
+    WTObjectContext context;
+    ASSERT_TRUE(context.attachStore(std::move(store.value())));
+    auto* project = WTProject::insertNewObject(&context);
     project->setName("Old");
     project->setArchived(true);
-    ASSERT_TRUE(context->save());
+    ASSERT_TRUE(context.save());
   }
   open();
   const QList<WTProject*> projects = window->fetchProjects();

@@ -17,6 +17,7 @@
 #include <QTimeZone>
 
 #include <algorithm>
+#include <cmath>
 
 namespace {
 
@@ -199,6 +200,23 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   EXPECT_EQ(run.out.count("Stopped"), 3) << run.out.toStdString();
   EXPECT_EQ(stored().running, QStringList());
   EXPECT_EQ(here.tessal({"start", "nothing"}).code, 1);
+
+  // An added entry's times of day are the shell's, whatever zone the desktop copy runs in.
+  const QMap<QString, QString> auckland = {{"TZ", "Pacific/Auckland"}};
+  run = here.tessal({"add", "Review", "10:15-11:00", "--date", "2026-03-05"}, auckland);
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(run.out, "Added Hermes › Review  2026-03-05 10:15–11:00  00:45\n");
+  EXPECT_TRUE(here.tessal({"log", "--range", "2026-03-05..2026-03-05"}, auckland)
+                  .out.startsWith("2026-03-05  10:15–11:00"));
+  run = here.tessal({"add", "Review", "10:45-11:30", "--date", "2026-03-05"}, auckland);
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("overlaps the entry 2026-03-05 10:15–11:00 of Hermes › Review"))
+      << run.err.toStdString();
+  run = here.tessal({"add", "Plan", "0:20", "--project", "Hermes", "--create", "--date", "yesterday"});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_TRUE(run.out.startsWith("Created task Hermes › Plan\nAdded Hermes › Plan  "))
+      << run.out.toStdString();
+  EXPECT_EQ(stored().times, 6);
   EXPECT_EQ(desktop->state(), QProcess::Running);
   desktop->kill();
   desktop->waitForFinished();
@@ -209,14 +227,110 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
 }
 
 TEST_F(TrackCommand, RefusesArgumentsItDoesNotUnderstandChangingNothing) {
-  for (const QStringList& arguments : {QStringList{"start"}, {"start", "Design", "Review"}, {"start", "Review", "--bogus"},
-                                       {"stop", "--project", "Atlas"}, {"status", "Design"}, {"log", "--range", "soon"},
-                                       {"start", "Review", "--project", "a", "--project", "b"}}) {
+  for (const QStringList& arguments : {QStringList{"start"},
+                                       {"start", "Design", "Review"},
+                                       {"start", "Review", "--bogus"},
+                                       {"stop", "--project", "Atlas"},
+                                       {"status", "Design"},
+                                       {"log", "--range", "soon"},
+                                       {"start", "Review", "--project", "a", "--project", "b"},
+                                       {"stop", "--create"},
+                                       {"add", "Review"},
+                                       {"add", "Review", "soon"},
+                                       {"add", "Review", "0"},
+                                       {"add", "Review", "24:00-25:00"},
+                                       {"add", "Review", "0:45", "--date", "someday"},
+                                       {"add", "Review", "9:00-10:00", "--note", "a", "--note", "b"}}) {
     const Outcome run = here.tessal(arguments);
     EXPECT_EQ(run.code, 2) << arguments.join(' ').toStdString();
     EXPECT_TRUE(run.err.contains("usage: tessal " + arguments.first())) << run.err.toStdString();
   }
   EXPECT_EQ(stored().times, 1);
+}
+
+TEST_F(TrackCommand, AddsFinishedEntriesAndRefusesWhatCannotBe) {
+  // Review has 09:00–10:15 on 2026-03-03 (Berlin).
+  const QMap<QString, QString> berlin = {{"TZ", "Europe/Berlin"}};
+  const QString tomorrow = QDateTime::currentDateTime()
+                               .toTimeZone(QTimeZone("Europe/Berlin"))
+                               .date()
+                               .addDays(1)
+                               .toString(Qt::ISODate);
+  const struct {
+    QStringList arguments;
+    int code;
+    QString says;  // in stdout when it succeeds, else in stderr
+  } cases[] = {
+      {{"add", "review", "10:15-11:00", "--date", "2026-03-03", "--note", "Call"},
+       0,
+       "Added Hermes › Review  2026-03-03 10:15–11:00  00:45\n"},
+      {{"add", "Review", "8:30-9:01", "--date", "2026-03-03"},
+       1,
+       "the entry 2026-03-03 08:30–09:01 overlaps the entry 2026-03-03 09:00–10:15 of Hermes › Review"},
+      {{"add", "Review", "11:00-10:30", "--date", "2026-03-02"},
+       1,
+       "would end (10:30) before it starts (11:00)"},
+      {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
+      {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
+      {{"add", "Design", "0:30"}, 1, "2 tasks are named “Design”"},
+      {{"add", "Design", "45", "--project", "Atlas"}, 0, "Added Atlas › Design  "},
+      {{"add", "Design", "0:10", "--project", "Atlas"}, 1, "overlaps the entry "},
+  };
+  for (const auto& c : cases) {
+    const Outcome run = here.tessal(c.arguments, berlin);
+    EXPECT_EQ(run.code, c.code) << c.arguments.join(' ').toStdString() << ": " << run.err.toStdString();
+    EXPECT_TRUE((c.code == 0 ? run.out : run.err).contains(c.says))
+        << c.arguments.join(' ').toStdString() << ": " << run.out.toStdString() << run.err.toStdString();
+  }
+  // Exactly the two accepted entries were added: 45 minutes ending this minute, and the noted call.
+  auto store = WTStore::openReadOnly(here.storePath());
+  ASSERT_TRUE(store);
+  WTObjectContext context;
+  ASSERT_TRUE(context.attachStore(std::move(store.value())));
+  const QList<WTTime*> times = context.fetch<WTTime>();
+  ASSERT_EQ(times.size(), 3);
+  const QList<WTTime*> endingNow = context.fetch<WTTime>([](const WTTime* time) {
+    return time->task()->project()->name() == "Atlas" && time->duration() == 45 &&
+           std::abs(time->endDate()->timeIntervalSince(Date::now())) < 120;
+  });
+  EXPECT_EQ(endingNow.size(), 1);
+  EXPECT_EQ(context.fetch<WTTime>([](const WTTime* time) { return time->name() == "Call"; }).size(), 1);
+}
+
+TEST_F(TrackCommand, CreateMakesTheTaskAndWhatHoldsItWhenMissing) {
+  const struct {
+    QStringList arguments;
+    int code;
+    QString says;
+  } cases[] = {
+      {{"start", "Write"}, 1, "no task is named “Write”"},
+      {{"start", "Write", "--create"},
+       1,
+       "name the project to make it in with --project: “Atlas” (Acme), “Hermes”"},
+      {{"start", "Write", "--project", "Zeus", "--client", "Olymp", "--create"},
+       0,
+       "Created client Olymp\nCreated project Zeus\nCreated task Zeus › Write\nStarted Zeus › Write\n"},
+      {{"start", "write", "--project", "zeus", "--create"}, 0, "Zeus › Write is running already\n"},
+      {{"add", "Design", "0:10", "--date", "2026-03-04", "--project", "hermes", "--create"},
+       0,
+       "Added Hermes › Design  2026-03-04 "},
+      {{"add", "Atlas › Plan", "0:10", "--date", "2026-03-04", "--create"},
+       0,
+       "Created task Atlas › Plan\nAdded Atlas › Plan  "},
+      {{"start", "Design", "--create"}, 1, "2 tasks are named “Design”"},
+  };
+  for (const auto& c : cases) {
+    const Outcome run = here.tessal(c.arguments);
+    EXPECT_EQ(run.code, c.code) << c.arguments.join(' ').toStdString() << ": " << run.err.toStdString();
+    EXPECT_TRUE((c.code == 0 ? run.out : run.err).contains(c.says))
+        << c.arguments.join(' ').toStdString() << ": " << run.out.toStdString() << run.err.toStdString();
+  }
+  const QMap<QString, QString> c = {{"LANG", "C.UTF-8"}};
+  EXPECT_EQ(here.tessal({"list", "tasks", "--qualified"}, c).out.toStdString(),
+            "Atlas › Build \"it\" now\nAtlas › Design\nAtlas › Plan\nHermes › Design\nHermes › Review\nZeus "
+            "› Write\n");
+  EXPECT_EQ(here.tessal({"list", "projects", "--client", "olymp"}, c).out.toStdString(), "Zeus\n");
+  EXPECT_EQ(stored().running, QStringList({"Zeus/Write"}));
 }
 
 TEST_F(TrackCommand, LogsTheEntriesOfARangeWithTheirTotals) {
@@ -250,14 +364,33 @@ TEST_F(TrackCommand, ListsEachNameOnceForPickersAndCompletion) {
   EXPECT_EQ(stored().running, QStringList({"Hermes/Design"}));
 }
 
-TEST(TrackCommandWithoutStore, SaysThereIsNoDataAndCreatesNone) {
+TEST(TrackCommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   Installation here;
-  for (const QStringList& arguments : {QStringList{"start", "Design"}, {"stop"}, {"status"}}) {
+  for (const QStringList& arguments :
+       {QStringList{"start", "Design"}, {"stop"}, {"status"}, {"add", "Design", "0:30"}}) {
     const Outcome run = here.tessal(arguments);
     EXPECT_EQ(run.code, 1);
     EXPECT_TRUE(run.err.contains("There is no data file at")) << run.err.toStdString();
   }
   EXPECT_FALSE(QFileInfo::exists(QFileInfo(here.storePath()).path()));
+
+  // The shell alone starts a day's work: the store it makes has the first project, as the desktop's has.
+  Outcome run = here.tessal({"add", "Design", "0:30", "--create"});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(here.tessal({"list", "tasks", "--qualified"}).out.toStdString(),
+            "Default Project › Default Task\nDefault Project › Design\n");
+  EXPECT_EQ(here.tessal({"start", "Default Task"}).code, 0);
+
+  // An installation that syncs takes its projects from the account: a first project of its own would
+  // reach the account from every device set up.
+  Installation syncing;
+  syncing.setSetting("WTSyncUser", "shell@example.org");
+  run = syncing.tessal({"start", "Design", "--create"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_TRUE(run.err.contains("there is no project to make it in")) << run.err.toStdString();
+  run = syncing.tessal({"start", "Design", "--project", "Work", "--create"});
+  EXPECT_EQ(run.code, 0) << run.err.toStdString();
+  EXPECT_EQ(syncing.tessal({"list", "projects"}).out, "Work\n");
 }
 
 }  // namespace

@@ -141,7 +141,7 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
 }
 
 TEST_F(TrayTest, ATrayThatAppearsLaterGetsTheIconAtTheNextTick) {
-  here.openStore();  // an empty store: the first run makes its default task
+  // No store yet: the desktop copy makes it, with the first project's task.
   tessal = here.launch({}, {{"DISPLAY", display}, {"QT_QPA_PLATFORM", "xcb"}});
   ASSERT_TRUE(tessal->waitForStarted());
   auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };

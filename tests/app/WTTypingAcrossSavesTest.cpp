@@ -284,6 +284,8 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   defaults->setValue("WTSyncUser", "typist@example.org");
   defaults->setValue("WTSyncPassword", "a password");
   open();
+  // An installation that syncs starts without a first project: here is one for the laptop to rename.
+  WTProject::insertNewObject(delegate->managedObjectContext())->setName("Atlas");
   RZSyncManager* sync = delegate->syncManager();
   ASSERT_TRUE(sync);
   sync->setIntervals({50, 50, 50});
