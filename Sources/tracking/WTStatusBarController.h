@@ -1,5 +1,6 @@
 #pragma once
 
+#include <QDBusConnection>
 #include <QObject>
 #include <QPointer>
 
@@ -11,20 +12,27 @@ class QSystemTrayIcon;
 class RZLimitedArrayController;
 class WTObjectContext;
 class WTStatusBarPopup;
+class WTStatusNotifierItem;
 class WTStopwatchUpdater;
 
-// Tessal in the desktop's tray: the "StopWatch" icon, the running time as its tooltip after every tick,
-// and on a click the popup of the five most relevant tasks with their timer buttons. The icon's menu has
-// "Show Tessal" and "Quit".
+// Tessal in the desktop's tray: the "StopWatch" icon (its running variant while a timer runs), the running
+// time beside it and in its tooltip after every tick, and on a click the popup of the five most relevant
+// tasks with their timer buttons. The icon's menu has "Show Tessal", "Recent Tasks" and "Quit".
 //
-// The tray is the desktop's (a StatusNotifierItem host on KDE, or on GNOME with the AppIndicator extension;
-// an XEmbed tray elsewhere). Where there is none yet, the icon appears with the first tick after a host
-// does (extensions load late at login): the ticker's own wake-up asks, so there is no timer of its own.
+// Where the desktop has a StatusNotifierItem watcher (KDE; GNOME with the AppIndicator extension; the
+// Ayatana indicators of Ubuntu, Xfce and MATE) the item is our own WTStatusNotifierItem, which carries the
+// running time as its label; QSystemTrayIcon cannot. Elsewhere it is a QSystemTrayIcon in an XEmbed tray,
+// the running time in its tooltip only. Never both: the QSystemTrayIcon would speak StatusNotifierItem
+// itself where a watcher is. Where there is no tray yet, the icon appears with the first tick after a
+// host does (extensions load late at login): the ticker's own wake-up asks, so there is no timer of its
+// own.
 class WTStatusBarController : public QObject {
   Q_OBJECT
  public:
-  // Neither is owned; both must outlive the controller.
-  WTStatusBarController(WTObjectContext* context, WTStopwatchUpdater* updater, QObject* parent = nullptr);
+  // Neither is owned; both must outlive the controller. `bus` is where the StatusNotifierItem goes.
+  WTStatusBarController(WTObjectContext* context, WTStopwatchUpdater* updater,
+                        const QDBusConnection& bus = QDBusConnection::sessionBus(),
+                        QObject* parent = nullptr);
   ~WTStatusBarController() override;
 
   // Puts the icon into the tray when the desktop has one, now or later.
@@ -37,7 +45,9 @@ class WTStatusBarController : public QObject {
   void statusBarClicked(const QRect& anchor = QRect());
 
   WTStatusBarPopup* popup() const { return popup_; }
+  // The XEmbed icon, shown only where no StatusNotifierItem watcher took the item.
   QSystemTrayIcon* statusItem() const { return statusItem_; }
+  WTStatusNotifierItem* notifierItem() const { return notifierItem_; }
   RZLimitedArrayController* topTasksArrayController() const { return topTasks_.get(); }
 
  signals:
@@ -48,12 +58,14 @@ class WTStatusBarController : public QObject {
 
  private:
   void stopwatchDidUpdate();
+  void showRunningTime();
   void checkTray();
 
   WTStopwatchUpdater* updater_;
   std::unique_ptr<RZLimitedArrayController> topTasks_;
   WTStatusBarPopup* popup_ = nullptr;  // a window of its own, owned here
   QSystemTrayIcon* statusItem_ = nullptr;
+  WTStatusNotifierItem* notifierItem_ = nullptr;
   std::unique_ptr<QMenu> menu_;
   bool activated_ = false;
   bool showingIcon_ = false;

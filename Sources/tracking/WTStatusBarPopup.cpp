@@ -1,9 +1,11 @@
 #include "WTStatusBarPopup.h"
 
+#include "DurationText.h"
 #include "RZLimitedArrayController.h"
 #include "WTImages.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTTime.h"
 
 #include <QGuiApplication>
 #include <QHBoxLayout>
@@ -16,6 +18,16 @@
 namespace {
 
 constexpr int kImageSize = 24;
+
+// The minutes of a task's running timers, as the stopwatch counted them at its last tick; empty for a
+// task that does not run.
+QString elapsedText(const WTTask* task) {
+  const QList<WTTime*> running = task->runningTimes();
+  if (running.isEmpty()) return {};
+  qint64 minutes = 0;
+  for (const WTTime* time : running) minutes += time->duration();
+  return DurationText::stringWithMinutes(std::int32_t(std::clamp<qint64>(minutes, INT32_MIN, INT32_MAX)));
+}
 
 }  // namespace
 
@@ -87,6 +99,10 @@ void WTStatusBarPopup::hideEvent(QHideEvent* event) {
   QFrame::hideEvent(event);
 }
 
+void WTStatusBarPopup::updateElapsedTimes() {
+  for (const auto& [task, label] : std::as_const(elapsed_)) label->setText(elapsedText(task));
+}
+
 void WTStatusBarPopup::rebuildRows() {
   // Rows are a handful of widgets: made afresh after each change rather than kept in step one by one.
   // The old ones go later, since the button that was clicked may still be on the stack.
@@ -97,6 +113,7 @@ void WTStatusBarPopup::rebuildRows() {
     }
     delete item;
   }
+  elapsed_.clear();
   const QList<WTTask*>& tasks = tasks_->arrangedObjects();
   emptyHint_->setVisible(tasks.isEmpty());
   for (WTTask* task : tasks) {
@@ -114,6 +131,11 @@ void WTStatusBarPopup::rebuildRows() {
     title->setText(project.isEmpty() ? task->name() : QStringLiteral("%1\n%2").arg(task->name(), project));
     title->setMinimumWidth(160);
     layout->addWidget(title, 1);
+    auto* elapsed = new QLabel(elapsedText(task), row);
+    elapsed->setObjectName(QStringLiteral("taskElapsed"));
+    elapsed->setTextFormat(Qt::PlainText);
+    layout->addWidget(elapsed);
+    elapsed_.append({task, elapsed});
     auto* button = new QToolButton(row);
     button->setObjectName(QStringLiteral("timerButton"));
     button->setToolButtonStyle(Qt::ToolButtonTextBesideIcon);

@@ -1,14 +1,19 @@
 #pragma once
 
 #include <QFrame>
+#include <QList>
 #include <QPointer>
 
+#include <utility>
+
+class QLabel;
 class QVBoxLayout;
 class RZLimitedArrayController;
+class WTTask;
 
-// The tray's list: the limited controller's tasks, each with its image, name, project and timer button
-// ("Start"/"Stop"), and "Show Tessal" below. A frameless popup that closes on a click elsewhere, when
-// "Show Tessal" is chosen, or when the list becomes empty.
+// The tray's list: the limited controller's tasks, each with its image, name, project, the elapsed time of
+// its running timers and its timer button ("Start"/"Stop"), and "Show Tessal" below. A frameless popup that
+// closes on a click elsewhere, when "Show Tessal" is chosen, or when the list becomes empty.
 class WTStatusBarPopup : public QFrame {
   Q_OBJECT
  public:
@@ -20,6 +25,9 @@ class WTStatusBarPopup : public QFrame {
   void popUp(const QRect& anchor);
   // The rows on screen, for whoever drives the popup (tests, accessibility).
   int rowCount() const;
+  // Shows the running timers' minutes as they are now (after a tick); changes nothing else, so the
+  // focus and the keyboard stay where they are.
+  void updateElapsedTimes();
 
  signals:
   void showMainWindowRequested();
@@ -34,4 +42,6 @@ class WTStatusBarPopup : public QFrame {
   RZLimitedArrayController* tasks_;
   QVBoxLayout* rows_;
   QWidget* emptyHint_;
+  // Each row's task and the label of its elapsed time.
+  QList<std::pair<WTTask*, QLabel*>> elapsed_;
 };

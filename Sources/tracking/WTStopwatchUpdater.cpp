@@ -147,10 +147,15 @@ void WTStopwatchUpdater::updateBadge() {
   const QString label = times_.isEmpty() ? QString()
                                          : DurationText::stringWithMinutes(std::int32_t(std::clamp<qint64>(
                                                totalActiveDuration_, INT32_MIN, INT32_MAX)));
+  // The launcher's entry carries one piece of information, the number of running timers, and is sent
+  // only when that number changes: never for the minutes, and not at start with nothing running, since a
+  // launcher starts with no count.
+  if (launcherEntry_ && times_.size() != launcherCount_) {
+    launcherCount_ = times_.size();
+    launcherEntry_->update(launcherCount_);
+  }
   if (label == badgeLabel_) return;
-  const bool shownBefore = !badgeLabel_.isEmpty();
   badgeLabel_ = label;
-  if (launcherEntry_ && shownBefore != !label.isEmpty()) launcherEntry_->update();
   emit badgeDidChange(label);
 }
 

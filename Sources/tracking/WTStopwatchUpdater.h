@@ -109,6 +109,8 @@ class WTStopwatchUpdater : public QObject {
   bool alertOpen_ = false;
   qint64 totalActiveDuration_ = 0;
   QString badgeLabel_;
+  // The number of running timers the launcher's entry last showed.
+  qsizetype launcherCount_ = 0;
   // When the pending tick is due; a tick far later than this found an unannounced sleep.
   std::optional<Date> tickDue_;
   std::optional<Date> scheduledAt_;

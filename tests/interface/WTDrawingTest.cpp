@@ -204,8 +204,9 @@ TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
 }
 
 TEST(WTImagesTest, EveryNamedImageExists) {
-  for (const char* name : {"StopWatch", "play_32", "stop_32", "notepad_32", "notepad_clock_32", "folder_32",
-                           "folder_32_dis", "admin_2_32", "admin_2_32_dis", "tessal"}) {
+  for (const char* name :
+       {"StopWatch", "StopWatchRunning", "play_32", "stop_32", "notepad_32", "notepad_clock_32", "folder_32",
+        "folder_32_dis", "admin_2_32", "admin_2_32_dis", "tessal"}) {
     EXPECT_TRUE(WTImages::contains(name)) << name;
     const QPixmap pixmap = WTImages::pixmap(name, QSize(32, 32), 2.0);
     ASSERT_FALSE(pixmap.isNull()) << name;

@@ -1,10 +1,17 @@
 #include "FakeDesktopServices.h"
 #include "TrackingFixture.h"
+#include "WTDBusMenu.h"
 #include "WTIdleSource.h"
 #include "WTLauncherEntry.h"
 #include "WTSleepMonitor.h"
+#include "WTStatusBarController.h"
+#include "WTStatusBarPopup.h"
+#include "WTStatusNotifierItem.h"
+#include "WTTask.h"
+#include "WTTime.h"
 
 #include <QDBusConnectionInterface>
+#include <QDBusPendingCall>
 #include <QFile>
 #include <QProcess>
 #include <QSignalSpy>
@@ -109,6 +116,7 @@ class DesktopBusTest : public TrackingTest {
   QThread serviceThread;
   FakeMutterIdleMonitor mutter;
   FakeScreenSaver screenSaver;
+  FakeStatusNotifierWatcher watcher;
 };
 
 TEST_F(DesktopBusTest, IdleSecondsComeFromMutterFirstThenTheScreenSaver) {
@@ -207,30 +215,126 @@ TEST_F(DesktopBusTest, LogindPrepareForSleepStopsTheTickerAndWakeTicksAtOnce) {
   EXPECT_FALSE(withoutBus.isListening());
 }
 
-TEST_F(DesktopBusTest, LauncherEntryIsUpdatedWhenTheBadgeAppearsAndWhenItGoes) {
+TEST_F(DesktopBusTest, LauncherEntryCarriesTheNumberOfRunningTimersAndIsSentOnlyWhenItChanges) {
   QDBusConnection client = PrivateBus::instance().connect();
   LauncherListener listener;
   ASSERT_TRUE(client.connect(QString(), QString(), QStringLiteral("com.canonical.Unity.LauncherEntry"),
                              QStringLiteral("Update"), &listener, SLOT(update(QString, QVariantMap))));
   WTLauncherEntry entry(PrivateBus::instance().connect());
   updater->setLauncherEntry(&entry);
-  updater->start();
+  updater->start();  // nothing runs: nothing to say
   WTTask* task = makeTask();
   task->toggleTimer();
   settle();
   ASSERT_TRUE(waitFor([&] { return listener.uris.size() >= 1; }));
   EXPECT_EQ(listener.uris.front(), QStringLiteral("application://tessal.desktop"));
-  const QVariantMap shown = listener.properties.front();
-  EXPECT_EQ(shown.value(QStringLiteral("count-visible")), QVariant(false));
-  EXPECT_EQ(shown.value(QStringLiteral("progress-visible")), QVariant(false));
+  auto shown = [&](qsizetype index) {
+    const QVariantMap properties = listener.properties.value(index);
+    return std::make_pair(properties.value(QStringLiteral("count")).toLongLong(),
+                          properties.value(QStringLiteral("count-visible")).toBool());
+  };
+  EXPECT_EQ(shown(0), std::make_pair(1LL, true));
+  EXPECT_EQ(listener.properties.front().value(QStringLiteral("progress-visible")), QVariant(false));
 
   advance(75 * 60);
   updater->update();  // the minutes move: the title changes, the launcher needs nothing new
-  task->toggleTimer();
+  WTTask* other = makeTask();
+  other->toggleTimer();
   settle();
   ASSERT_TRUE(waitFor([&] { return listener.uris.size() >= 2; }));
-  EXPECT_EQ(listener.uris.size(), 2);
+  EXPECT_EQ(shown(1), std::make_pair(2LL, true));
+
+  task->toggleTimer();
+  other->toggleTimer();
+  settle();
+  ASSERT_TRUE(waitFor([&] { return listener.uris.size() >= 3; }));
+  EXPECT_EQ(shown(2), std::make_pair(0LL, false));
+  waitFor([&] { return listener.uris.size() >= 4; }, 100);
+  EXPECT_EQ(listener.uris.size(), 3);
   EXPECT_TRUE(updater->badgeLabel().isEmpty());
+}
+
+TEST_F(DesktopBusTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeAsItsLabel) {
+  QDBusConnection watcherBus = PrivateBus::instance().connect();
+  watcher.moveToThread(&serviceThread);
+  ASSERT_TRUE(watcherBus.registerObject(QStringLiteral("/StatusNotifierWatcher"), &watcher,
+                                        QDBusConnection::ExportAllSlots));
+  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  WTTask* task = makeTask();
+  startTimer(task, clockNow.addingSeconds(-30 * 60));
+  updater->start();
+  WTStatusBarController statusBar(context.get(), updater.get(), PrivateBus::instance().connect());
+  statusBar.activateStatusMenu();
+  ASSERT_TRUE(waitFor([&] { return statusBar.isShowingIcon(); })) << "the watcher never took the item";
+  ASSERT_EQ(watcher.registered().size(), 1);
+  const QString item = watcher.registered().front();
+  EXPECT_TRUE(item.startsWith(QStringLiteral("org.kde.StatusNotifierItem-"))) << item.toStdString();
+
+  // The host reads the item as AppIndicator hosts do, and hears its label change.
+  QDBusConnection host = PrivateBus::instance().connect();
+  auto call = [&](const QString& path, const QString& interface, const QString& method,
+                  const QVariantList& args) {
+    QDBusMessage message = QDBusMessage::createMethodCall(item, path, interface, method);
+    message.setArguments(args);
+    QDBusPendingCall pending = host.asyncCall(message);
+    waitFor([&] { return pending.isFinished(); });
+    return pending.reply();
+  };
+  auto property = [&](const QString& name) {
+    const QDBusMessage reply =
+        call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.freedesktop.DBus.Properties"),
+             QStringLiteral("Get"), {QStringLiteral("org.kde.StatusNotifierItem"), name});
+    return reply.arguments().value(0).value<QDBusVariant>().variant();
+  };
+  LabelListener listener;
+  ASSERT_TRUE(host.connect(item, QStringLiteral("/StatusNotifierItem"),
+                           QStringLiteral("org.kde.StatusNotifierItem"), QStringLiteral("XAyatanaNewLabel"),
+                           &listener, SLOT(newLabel(QString, QString))));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:30"));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabelGuide")).toString(), QStringLiteral("00:00"));
+  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch-running"));
+  const auto icons = qdbus_cast<QList<WTStatusNotifierIcon>>(property(QStringLiteral("IconPixmap")));
+  ASSERT_FALSE(icons.isEmpty());
+  EXPECT_EQ(icons.front().pixels.size(), icons.front().width * icons.front().height * 4);
+
+  advance(60);
+  updater->update();
+  ASSERT_TRUE(waitFor([&] { return !listener.labels.isEmpty(); }));
+  EXPECT_EQ(listener.labels, QStringList({QStringLiteral("00:31")}));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:31"));
+
+  task->stopAllTimers();
+  settle();
+  ASSERT_TRUE(waitFor([&] { return listener.labels.size() >= 2; }));
+  EXPECT_EQ(listener.labels.back(), QString());
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QString());
+  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch"));
+
+  // Its menu is the tray menu, and a click on an entry is that entry's.
+  const QDBusMessage layout = call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"),
+                                   QStringLiteral("GetLayout"), {0, -1, QStringList()});
+  ASSERT_EQ(layout.type(), QDBusMessage::ReplyMessage) << layout.errorMessage().toStdString();
+  QStringList labels;
+  for (const WTDBusMenuLayout& entry : qdbus_cast<WTDBusMenuLayout>(layout.arguments().value(1)).children)
+    labels << entry.properties.value(QStringLiteral("label")).toString();
+  EXPECT_EQ(labels, QStringList({"Show Tessal", "Recent Tasks", "", "Quit"}));
+  QSignalSpy showRequested(&statusBar, &WTStatusBarController::showMainWindowRequested);
+  call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"), QStringLiteral("Event"),
+       {1, QStringLiteral("clicked"), QVariant::fromValue(QDBusVariant(QString())), 0u});
+  EXPECT_TRUE(waitFor([&] { return showRequested.count() == 1; }));
+  // A click on the item opens the list of tasks.
+  call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.kde.StatusNotifierItem"),
+       QStringLiteral("Activate"), {600, 10});
+  EXPECT_TRUE(waitFor([&] { return statusBar.popup()->isVisible(); }));
+
+  // A tray that restarts (GNOME reloading its extensions) gets the item again.
+  QSignalSpy trayChanged(&statusBar, &WTStatusBarController::trayAvailabilityChanged);
+  ASSERT_TRUE(watcherBus.unregisterService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  ASSERT_TRUE(waitFor([&] { return !statusBar.isShowingIcon(); }));
+  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  EXPECT_TRUE(waitFor([&] { return statusBar.isShowingIcon(); }));
+  EXPECT_EQ(watcher.registered(), QStringList({item, item}));
+  EXPECT_EQ(trayChanged.count(), 2);
 }
 
 }  // namespace

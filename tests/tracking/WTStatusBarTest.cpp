@@ -1,6 +1,7 @@
 // The tray's list and popup over the real model and ticker, with real widgets (offscreen).
 #include "RZLimitedArrayController.h"
 #include "TrackingFixture.h"
+#include "WTImages.h"
 #include "WTStatusBarController.h"
 #include "WTStatusBarPopup.h"
 #include "WTTask.h"
@@ -105,16 +106,46 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   EXPECT_FALSE(popup.isVisible());
 }
 
-TEST_F(StatusBarTest, TheIconsTooltipCarriesTheRunningTotalAfterEachTick) {
+TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) {
   WTTask* task = makeTask();
   WTStatusBarController statusBar(context.get(), updater.get());
   updater->start();
   settle();
+  auto iconIs = [&](const char* name) {
+    return statusBar.statusItem()->icon().cacheKey() == WTImages::icon(QLatin1String(name)).cacheKey();
+  };
   EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal");
+  EXPECT_TRUE(iconIs("StopWatch"));
   startTimer(task, berlin(2026, 3, 2, 10, 45));  // 75 minutes before the fixture's now
   settle();
   EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal — 01:15");
+  EXPECT_TRUE(iconIs("StopWatchRunning"));
+
+  // The list shows the running task's minutes and follows the ticks in place, the rows left as they are.
+  makeTask(nullptr, QStringLiteral("Idle"));
+  statusBar.statusBarClicked(QRect(600, 0, 24, 24));
+  settle();
+  auto labels = [&] {
+    QList<const QLabel*> shown;
+    for (const QLabel* label : statusBar.popup()->findChildren<QLabel*>(QStringLiteral("taskElapsed")))
+      if (label->isVisibleTo(statusBar.popup())) shown << label;
+    return shown;
+  };
+  auto elapsed = [&] {
+    QStringList texts;
+    for (const QLabel* label : labels()) texts << label->text();
+    return texts;
+  };
+  EXPECT_EQ(elapsed(), QStringList({"01:15", ""}));
+  const QList<const QLabel*> before = labels();
+  advance(60);
+  updater->update();
+  settle();
+  EXPECT_EQ(elapsed(), QStringList({"01:16", ""}));
+  EXPECT_EQ(labels(), before);
+
   task->stopAllTimers();
   settle();
   EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal");
+  EXPECT_TRUE(iconIs("StopWatch"));
 }
