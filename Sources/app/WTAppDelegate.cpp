@@ -1,7 +1,6 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
-#include "WTKeychain.h"
 #include "WTPasswordStore.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
@@ -129,6 +128,10 @@ QString WTAppDelegate::syncNetworkRequestsUser(RZSyncNetwork*) {
 WTPasswordStore* WTAppDelegate::passwordStore() {
   if (!passwordStore_) passwordStore_ = std::make_unique<WTPasswordStore>(defaults_);
   return passwordStore_.get();
+}
+
+void WTAppDelegate::setPasswordStore(std::unique_ptr<WTPasswordStore> store) {
+  passwordStore_ = std::move(store);
 }
 
 QString WTAppDelegate::syncNetworkRequestsPassword(RZSyncNetwork*) {
