@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "WTKeychain.h"
 #include "WTPasswordStore.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
