@@ -57,10 +57,12 @@ void usePassword(WTAppDelegate& delegate, UserDefaults& defaults, QTextStream& e
   WTPasswordStore& passwords = *delegate.passwordStore();
   QEventLoop loop;
   bool loaded = false;
-  passwords.load([&] {
-    loaded = true;
-    loop.quit();
-  }, WTPasswordStore::FilePassword::Keep);
+  passwords.load(
+      [&] {
+        loaded = true;
+        loop.quit();
+      },
+      WTPasswordStore::FilePassword::Keep);
   if (!loaded) loop.exec();
   const QString file = QDir::toNativeSeparators(defaults.fileName());
   switch (passwords.location()) {

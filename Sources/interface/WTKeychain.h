@@ -15,8 +15,8 @@ class WTKeychain {
   // Error codes of the answers below.
   enum ErrorCode {
     EntryNotFound = 1,  // the keychain answered: nothing is stored under that key
-    Unavailable = 2,    // it was asked and refused (locked, cancelled, access denied) or did not answer in time
-    NoSession = 3,      // there is no session bus to ask (a server, an SSH login): nothing was asked
+    Unavailable = 2,  // it was asked and refused (locked, cancelled, access denied) or did not answer in time
+    NoSession = 3,    // there is no session bus to ask (a server, an SSH login): nothing was asked
   };
 
   using ReadHandler = std::function<void(const Result<QString>&)>;

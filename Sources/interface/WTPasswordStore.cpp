@@ -19,7 +19,8 @@ constexpr QFileDevice::Permissions kOwnerOnly = QFileDevice::ReadOwner | QFileDe
 
 }  // namespace
 
-WTPasswordStore::WTPasswordStore(UserDefaults* defaults, std::unique_ptr<WTKeychain> keychain, QObject* parent)
+WTPasswordStore::WTPasswordStore(UserDefaults* defaults, std::unique_ptr<WTKeychain> keychain,
+                                 QObject* parent)
     : QObject(parent),
       defaults_(defaults),
       keychain_(keychain ? std::move(keychain) : std::make_unique<WTQtKeychain>()) {}
@@ -54,7 +55,8 @@ void WTPasswordStore::load(std::function<void()> done, FilePassword filePassword
   if (!inFile.isEmpty()) {
     cached_ = inFile;
     location_ = Location::SettingsFile;
-    if (filePassword == FilePassword::Keep || defaults_->boolForKey(kKeptInFileKeyName)) return finishLoading();
+    if (filePassword == FilePassword::Keep || defaults_->boolForKey(kKeptInFileKeyName))
+      return finishLoading();
     return moveToKeychain(inFile);
   }
   keychain_->readPassword(kKeyName, [this](const Result<QString>& stored) {
@@ -63,7 +65,8 @@ void WTPasswordStore::load(std::function<void()> done, FilePassword filePassword
       cached_ = stored.ok() ? stored.value() : QString();
       location_ = cached_->isEmpty() ? Location::None : Location::Keychain;
     }
-    if (!stored.ok() && stored.error().code == WTKeychain::Unavailable) keychainError_ = stored.error().message;
+    if (!stored.ok() && stored.error().code == WTKeychain::Unavailable)
+      keychainError_ = stored.error().message;
     finishLoading();
   });
 }
@@ -124,7 +127,8 @@ void WTPasswordStore::setPassword(const QString& password, std::function<void(Lo
     if (written.ok()) {
       keychainError_.clear();
       if (defaults_ && defaults_->hasStoredValue(kDefaultsKeyName)) defaults_->removeValue(kDefaultsKeyName);
-      if (defaults_ && defaults_->hasStoredValue(kKeptInFileKeyName)) defaults_->removeValue(kKeptInFileKeyName);
+      if (defaults_ && defaults_->hasStoredValue(kKeptInFileKeyName))
+        defaults_->removeValue(kKeptInFileKeyName);
       location_ = Location::Keychain;
     } else {
       // An older entry there would otherwise be read before the file's newer password.

@@ -59,7 +59,8 @@ void WTQtKeychain::run(QKeychain::Job* job, std::function<void(const Outcome&)> 
   }
   if (stuckJobs > 0) {
     delete job;
-    return done({{Unavailable, QStringLiteral("The secret service has not answered an earlier request")}, {}});
+    return done(
+        {{Unavailable, QStringLiteral("The secret service has not answered an earlier request")}, {}});
   }
   // The job deletes itself when it finishes, even after the timeout: deleting it earlier would pull it
   // from under a D-Bus call still in flight.
@@ -75,22 +76,24 @@ void WTQtKeychain::run(QKeychain::Job* job, std::function<void(const Outcome&)> 
   });
   auto* timer = new QTimer(receiver_.get());
   timer->setSingleShot(true);
-  QObject::connect(job, &QKeychain::Job::finished, receiver_.get(), [state, timer, done](QKeychain::Job* job) {
-    if (state->answered) return;
-    state->answered = true;
-    timer->deleteLater();
-    Outcome outcome;
-    if (job->error() != QKeychain::NoError) outcome.error = errorOf(*job);
-    if (auto* read = qobject_cast<QKeychain::ReadPasswordJob*>(job)) outcome.text = read->textData();
-    done(outcome);
-  });
+  QObject::connect(job, &QKeychain::Job::finished, receiver_.get(),
+                   [state, timer, done](QKeychain::Job* job) {
+                     if (state->answered) return;
+                     state->answered = true;
+                     timer->deleteLater();
+                     Outcome outcome;
+                     if (job->error() != QKeychain::NoError) outcome.error = errorOf(*job);
+                     if (auto* read = qobject_cast<QKeychain::ReadPasswordJob*>(job))
+                       outcome.text = read->textData();
+                     done(outcome);
+                   });
   QObject::connect(timer, &QTimer::timeout, receiver_.get(), [this, state, timer, done] {
     if (state->answered) return;
     state->answered = state->timedOut = true;
     ++stuckJobs;
     timer->deleteLater();
-    done({{Unavailable, QStringLiteral("The secret service did not answer within %1 seconds")
-                            .arg(timeoutMs_ / 1000.0)},
+    done({{Unavailable,
+           QStringLiteral("The secret service did not answer within %1 seconds").arg(timeoutMs_ / 1000.0)},
           {}});
   });
   timer->start(timeoutMs_);

@@ -14,8 +14,8 @@ class Job;
 // run on the event loop. A job that has not finished after the timeout is answered Unavailable; its
 // late end is ignored. QtKeychain runs the jobs of the whole process one after another, so while a job
 // that timed out is still out (a keyring prompt nobody answers), later calls are answered Unavailable at
-// once instead of queueing behind it. Where there is no session bus nothing is asked: the answer is NoSession. Answers
-// due when the keychain is destroyed are dropped. Main thread only.
+// once instead of queueing behind it. Where there is no session bus nothing is asked: the answer is
+// NoSession. Answers due when the keychain is destroyed are dropped. Main thread only.
 class WTQtKeychain final : public WTKeychain {
  public:
   // Every entry is filed under `service`, the name the desktop's password manager shows.

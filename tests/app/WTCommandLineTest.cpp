@@ -168,8 +168,11 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
   };
   const Row rows[] = {
       {"no session bus", {}, "a password", "Using the password in the settings file ("},
-      {"a keyring that never answers", address, {},
-       "The secret service gave no password (The secret service did not answer within 5 seconds); the settings "
+      {"a keyring that never answers",
+       address,
+       {},
+       "The secret service gave no password (The secret service did not answer within 5 seconds); the "
+       "settings "
        "file ("},
   };
   for (const Row& row : rows) {

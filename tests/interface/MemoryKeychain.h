@@ -38,11 +38,15 @@ class MemoryKeychain final : public WTKeychain {
 class SharedKeychain final : public WTKeychain {
  public:
   explicit SharedKeychain(MemoryKeychain& target) : target_(target) {}
-  void readPassword(const QString& key, ReadHandler done) override { target_.readPassword(key, std::move(done)); }
+  void readPassword(const QString& key, ReadHandler done) override {
+    target_.readPassword(key, std::move(done));
+  }
   void writePassword(const QString& key, const QString& password, DoneHandler done) override {
     target_.writePassword(key, password, std::move(done));
   }
-  void deletePassword(const QString& key, DoneHandler done) override { target_.deletePassword(key, std::move(done)); }
+  void deletePassword(const QString& key, DoneHandler done) override {
+    target_.deletePassword(key, std::move(done));
+  }
 
  private:
   MemoryKeychain& target_;

@@ -31,7 +31,8 @@ const QString kInFile = QStringLiteral("WTSyncPassword");
 template <class Answered>
 void waitUntil(Answered answered) {
   const QDeadlineTimer deadline(30000);
-  while (!answered() && !deadline.hasExpired()) QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents, 50);
+  while (!answered() && !deadline.hasExpired())
+    QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents, 50);
   EXPECT_TRUE(answered()) << "no answer within 30 seconds";
 }
 template <class T>
@@ -280,11 +281,13 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
     ScopedEnvironment runtime("XDG_RUNTIME_DIR", runtimeWithoutBus);
     WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
     std::optional<Result<QString>> read;
-    secrets.readPassword(QStringLiteral("sync-password"), [&](const Result<QString>& answer) { read = answer; });
+    secrets.readPassword(QStringLiteral("sync-password"),
+                         [&](const Result<QString>& answer) { read = answer; });
     ASSERT_TRUE(read.has_value()) << "answered at once";
     EXPECT_EQ(read->error().code, WTKeychain::NoSession) << read->error().message.toStdString();
 
-    WTPasswordStore store(defaults.get(), std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 10000));
+    WTPasswordStore store(defaults.get(),
+                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 10000));
     QSignalSpy kept(&store, &WTPasswordStore::keptInSettingsFile);
     EXPECT_EQ(storeNow(store, kPassword), Location::SettingsFile);
     EXPECT_EQ(fileMode(), 0600);
@@ -312,13 +315,19 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     Location where;
   };
   const Row rows[] = {
-      {"prompt answered in time", {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 300},
-       10000, Location::Keychain},
+      {"prompt answered in time",
+       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 300},
+       10000,
+       Location::Keychain},
       {"refuses", {FakeSecretService::Answer::Refuse}, 10000, Location::SettingsFile},
-      {"prompt dismissed", {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Dismissed}, 10000,
+      {"prompt dismissed",
+       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Dismissed},
+       10000,
        Location::SettingsFile},
-      {"prompt answered late", {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 1500},
-       300, Location::SettingsFile},
+      {"prompt answered late",
+       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 1500},
+       300,
+       Location::SettingsFile},
       {"never answers", {FakeSecretService::Answer::Never}, 300, Location::SettingsFile},
   };
   for (const Row& row : rows) {
@@ -327,7 +336,8 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     defaults->setValue(kUser, QStringLiteral("ann@example.org"));
     defaults->removeValue(QString::fromLatin1(WTPasswordStore::kKeptInFileKey));
     defaults->setValue(kInFile, kPassword);
-    WTPasswordStore store(defaults.get(), std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), row.timeoutMs));
+    WTPasswordStore store(defaults.get(),
+                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), row.timeoutMs));
     QSignalSpy kept(&store, &WTPasswordStore::keptInSettingsFile);
     std::optional<bool> done;
     store.load([&] { done = true; });

@@ -69,16 +69,19 @@ class PrivateSessionBus {
     const QString config = dir_.filePath(QStringLiteral("bus.conf"));
     QFile file(config);
     if (file.open(QIODevice::WriteOnly)) {
-      file.write(QStringLiteral("<busconfig><type>session</type><listen>unix:dir=%1</listen>"
-                                "<policy context=\"default\"><allow send_destination=\"*\"/><allow receive_sender=\"*\"/>"
-                                "<allow own=\"*\"/>"
-                                "</policy></busconfig>")
-                     .arg(dir_.path())
-                     .toUtf8());
+      file.write(
+          QStringLiteral(
+              "<busconfig><type>session</type><listen>unix:dir=%1</listen>"
+              "<policy context=\"default\"><allow send_destination=\"*\"/><allow receive_sender=\"*\"/>"
+              "<allow own=\"*\"/>"
+              "</policy></busconfig>")
+              .arg(dir_.path())
+              .toUtf8());
       file.close();
     }
-    daemon_.start(QStringLiteral("dbus-daemon"), {QStringLiteral("--config-file=") + config,
-                                                  QStringLiteral("--nofork"), QStringLiteral("--print-address")});
+    daemon_.start(QStringLiteral("dbus-daemon"),
+                  {QStringLiteral("--config-file=") + config, QStringLiteral("--nofork"),
+                   QStringLiteral("--print-address")});
     if (daemon_.waitForStarted(5000) && daemon_.waitForReadyRead(5000))
       address_ = QString::fromUtf8(daemon_.readLine()).trimmed();
   }
@@ -132,10 +135,10 @@ class FakeSecretService final : public QDBusVirtualObject {
   bool start(const QString& address) {
     name_ = QStringLiteral("fake-secrets-%1").arg(QUuid::createUuid().toString(QUuid::Id128));
     QDBusConnection connection = QDBusConnection::connectToBus(address, name_);
-    registered_ = connection.isConnected() &&
-                  connection.registerVirtualObject(QString::fromLatin1(kRoot), this,
-                                                   QDBusConnection::SubPath) &&
-                  connection.registerService(QStringLiteral("org.freedesktop.secrets"));
+    registered_ =
+        connection.isConnected() &&
+        connection.registerVirtualObject(QString::fromLatin1(kRoot), this, QDBusConnection::SubPath) &&
+        connection.registerService(QStringLiteral("org.freedesktop.secrets"));
     moveToThread(&thread_);
     return registered_;
   }
@@ -208,16 +211,19 @@ class FakeSecretService final : public QDBusVirtualObject {
           QMutexLocker lock(&mutex_);
           keyringExists_ = true;
         }
-        QDBusMessage signal = QDBusMessage::createSignal(path, QStringLiteral("org.freedesktop.Secret.Prompt"),
-                                                         QStringLiteral("Completed"));
-        const QString collection = accepted ? QString::fromLatin1(kRoot) + "/collection/login" : QStringLiteral("/");
-        signal << !accepted << QVariant::fromValue(QDBusVariant(QVariant::fromValue(QDBusObjectPath(collection))));
+        QDBusMessage signal = QDBusMessage::createSignal(
+            path, QStringLiteral("org.freedesktop.Secret.Prompt"), QStringLiteral("Completed"));
+        const QString collection =
+            accepted ? QString::fromLatin1(kRoot) + "/collection/login" : QStringLiteral("/");
+        signal << !accepted
+               << QVariant::fromValue(QDBusVariant(QVariant::fromValue(QDBusObjectPath(collection))));
         bus.send(signal);
       };
       // Calls come on QtDBus's own thread; the prompt is answered from the service's.
       const int delay = prompt == Prompt::Accepted ? behaviour_.promptDelayMs : 0;
       if (prompt == Prompt::Dismissed || prompt == Prompt::Accepted)
-        QMetaObject::invokeMethod(this, [this, delay, complete] { QTimer::singleShot(delay, this, complete); });
+        QMetaObject::invokeMethod(this,
+                                  [this, delay, complete] { QTimer::singleShot(delay, this, complete); });
       return true;
     }
     if (member == QLatin1String("SearchItems")) {
@@ -232,7 +238,9 @@ class FakeSecretService final : public QDBusVirtualObject {
       for (const QDBusObjectPath& item : qdbus_cast<QList<QDBusObjectPath>>(message.arguments().value(0))) {
         const QString key = item.path().section(u'/', -1);
         if (secrets_.contains(key))
-          found.insert(item, {QDBusObjectPath(QString::fromLatin1(kRoot) + "/session/1"), {}, secrets_.value(key),
+          found.insert(item, {QDBusObjectPath(QString::fromLatin1(kRoot) + "/session/1"),
+                              {},
+                              secrets_.value(key),
                               QStringLiteral("text/plain")});
       }
       return reply({QVariant::fromValue(found)});
