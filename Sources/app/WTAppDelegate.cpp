@@ -149,6 +149,10 @@ WTPasswordStore* WTAppDelegate::passwordStore() {
   return passwordStore_.get();
 }
 
+void WTAppDelegate::setPasswordStore(std::unique_ptr<WTPasswordStore> store) {
+  passwordStore_ = std::move(store);
+}
+
 QString WTAppDelegate::syncNetworkRequestsPassword(RZSyncNetwork*) {
   return defaults_ ? passwordStore()->password() : QString();
 }

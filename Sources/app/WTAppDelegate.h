@@ -75,8 +75,12 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   std::function<bool(const WTObject*)> archivedPredicate() const;
   void toggleArchived();
 
-  // The sync account's password, kept in the desktop's secret service (made on first use).
+  // The sync account's password, kept in the desktop's secret service (made on first use). Nothing
+  // here loads it from the keychain: the desktop does so once its window is up, a command before it
+  // syncs (WTPasswordStore::load).
   WTPasswordStore* passwordStore();
+  // Replaces the password store (a command's, which waits less for the keychain).
+  void setPasswordStore(std::unique_ptr<WTPasswordStore> store);
 
   // The sync account: the user default "WTSyncUser" and the password store's password.
   QString syncNetworkRequestsUser(RZSyncNetwork* network) override;

@@ -27,8 +27,6 @@ WTApplication::WTApplication(int& argc, char** argv)
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
   delegate_->setSyncErrorPresenter(presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);
-  // A password an earlier version kept in the settings file moves into the desktop's secret service.
-  delegate_->passwordStore()->migrate();
   // Logging out asks nothing: running timers are saved as they are and go on running next time.
   connect(this, &QGuiApplication::commitDataRequest, delegate_.get(), &WTAppDelegate::sessionWillEnd);
 }
@@ -77,6 +75,9 @@ void WTApplication::applicationDidFinishLaunching() {
   statusBarController_ = std::make_unique<WTStatusBarController>(delegate_->managedObjectContext(), updater);
   linkStatusBar(*statusBarController_, *window);
   statusBarController_->activateStatusMenu();
+  // Only now, with the window and the store up, and only for an account: the keyring may prompt, and is
+  // asked in the background. A password an earlier version kept in the settings file moves into it.
+  delegate_->passwordStore()->load();
 }
 
 void WTApplication::linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window) {

@@ -7,6 +7,8 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTObjectContext.h"
+#include "WTPasswordStore.h"
+#include "WTQtKeychain.h"
 #include "WTReportCommand.h"
 #include "WTSingleInstance.h"
 #include "WTStoreWriterLock.h"
@@ -16,6 +18,7 @@
 
 #include <QCoreApplication>
 #include <QDir>
+#include <QEventLoop>
 #include <QGuiApplication>
 #include <QLoggingCategory>
 #include <QTextStream>
@@ -42,6 +45,42 @@ class WTCommandLinePresenter final : public WTAlertPresenter, public RZSyncError
   QTextStream& err_;
 };
 
+// A command waits this long for the keyring, then goes on with the settings file.
+constexpr int kKeychainTimeoutMs = 5000;
+
+// Settles the password before the first poll and says once where it came from. A password in the
+// settings file is used as it is; otherwise the keyring is asked, without moving anything into it (a
+// command never makes a keyring prompt), for a few seconds at most.
+void usePassword(WTAppDelegate& delegate, UserDefaults& defaults, QTextStream& err) {
+  delegate.setPasswordStore(std::make_unique<WTPasswordStore>(
+      &defaults, std::make_unique<WTQtKeychain>(QStringLiteral("Tessal"), kKeychainTimeoutMs)));
+  WTPasswordStore& passwords = *delegate.passwordStore();
+  QEventLoop loop;
+  bool loaded = false;
+  passwords.load(
+      [&] {
+        loaded = true;
+        loop.quit();
+      },
+      WTPasswordStore::FilePassword::Keep);
+  if (!loaded) loop.exec();
+  const QString file = QDir::toNativeSeparators(defaults.fileName());
+  switch (passwords.location()) {
+    case WTPasswordStore::Location::Keychain:
+      err << "Using the password in the secret service.\n";
+      break;
+    case WTPasswordStore::Location::SettingsFile:
+      err << "Using the password in the settings file (" << file << ").\n";
+      break;
+    case WTPasswordStore::Location::None:
+      if (!passwords.keychainError().isEmpty())
+        err << "The secret service gave no password (" << passwords.keychainError()
+            << "); the settings file (" << file << ") holds none either.\n";
+      break;
+  }
+  err.flush();
+}
+
 int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   // The store is one process's: while the desktop copy runs, it is the one that syncs.
   WTSingleInstance instance;
@@ -63,6 +102,7 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   WTCommandLinePresenter presenter(err);
   WTAppDelegate delegate(&defaults, &presenter);
   delegate.setSyncErrorPresenter(&presenter);
+  usePassword(delegate, defaults, err);
   if (!delegate.managedObjectContext()->hasStore()) return 1;  // already reported
   const int status = runSyncCommand(*delegate.syncManager(), arguments, out, err);
   delegate.applicationWillTerminate();

@@ -54,7 +54,36 @@ WTPreferencesWindowController::WTPreferencesWindowController(UserDefaults* defau
   if (syncManager_)
     connect(syncManager_, &RZSyncManager::syncStatusDidChange, this,
             &WTPreferencesWindowController::refreshStatusImageView);
+  connect(passwords_, &WTPasswordStore::passwordChanged, this,
+          &WTPreferencesWindowController::passwordDidLoad);
   refreshStatusImageView();
+  updateKeychainNote();
+}
+
+void WTPreferencesWindowController::passwordDidLoad() {
+  // The keyring answered after the window was made: the account shows, unless the user is typing one.
+  if (emailTextField_->text().isEmpty() && passwordTextField_->text().isEmpty() &&
+      !emailTextField_->hasFocus() && !passwordTextField_->hasFocus()) {
+    const QString password = passwords_->password();
+    if (defaults_->hasStoredValue(kSyncUser) && !password.isEmpty()) {
+      emailTextField_->setText(defaults_->stringForKey(kSyncUser));
+      passwordTextField_->setText(password);
+    }
+  }
+  updateKeychainNote();
+  refreshStatusImageView();
+}
+
+void WTPreferencesWindowController::updateKeychainNote() {
+  const bool kept = passwords_->location() == WTPasswordStore::Location::SettingsFile &&
+                    !passwords_->keychainError().isEmpty();
+  keychainNoteLabel_->setText(kept
+                                  ? tr("The keyring did not take the password (%1). It stays in Tessal's "
+                                       "settings file, which only you can read; Start Sync tries the keyring "
+                                       "again.")
+                                        .arg(passwords_->keychainError())
+                                  : QString());
+  keychainNoteLabel_->setVisible(kept);
 }
 
 WTPreferencesWindowController::~WTPreferencesWindowController() {
@@ -83,6 +112,12 @@ void WTPreferencesWindowController::buildInterface() {
   accountForm->addRow(tr("Server:"), serverField_);
   accountForm->addRow(tr("E-mail:"), emailTextField_);
   accountForm->addRow(tr("Password:"), passwordTextField_);
+  // Said here, not in an alert at start: the keyring may have failed long before anyone looks.
+  keychainNoteLabel_ = new QLabel(account);
+  keychainNoteLabel_->setObjectName(QStringLiteral("keychainNoteLabel"));
+  keychainNoteLabel_->setWordWrap(true);
+  keychainNoteLabel_->setVisible(false);
+  accountForm->addRow(QString(), keychainNoteLabel_);
 
   auto* actions = new QHBoxLayout;
   statusImageView_ = new QLabel(account);

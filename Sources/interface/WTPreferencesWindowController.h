@@ -52,6 +52,8 @@ class WTPreferencesWindowController : public QDialog {
   QLineEdit* emailTextField() const { return emailTextField_; }
   QLineEdit* passwordTextField() const { return passwordTextField_; }
   QLabel* statusImageView() const { return statusImageView_; }
+  // Says, when the keyring did not take the password, that it stays in the settings file.
+  QLabel* keychainNoteLabel() const { return keychainNoteLabel_; }
   QPushButton* startSyncButton() const { return startSyncButton_; }
   QPushButton* signUpButton() const { return signUpButton_; }
   QLineEdit* serverField() const { return serverField_; }
@@ -70,6 +72,8 @@ class WTPreferencesWindowController : public QDialog {
   void commitServer();
   void commitDefaultRate();
   void updateSignUpButton();
+  void passwordDidLoad();
+  void updateKeychainNote();
 
   UserDefaults* defaults_;
   QPointer<RZSyncManager> syncManager_;
@@ -79,6 +83,7 @@ class WTPreferencesWindowController : public QDialog {
   QLineEdit* emailTextField_ = nullptr;
   QLineEdit* passwordTextField_ = nullptr;
   QLabel* statusImageView_ = nullptr;
+  QLabel* keychainNoteLabel_ = nullptr;
   QLabel* statusLabel_ = nullptr;
   QPushButton* startSyncButton_ = nullptr;
   QPushButton* signUpButton_ = nullptr;

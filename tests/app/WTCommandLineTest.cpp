@@ -1,12 +1,16 @@
 // The `tessal` executable's window-less commands, run as a user's shell would run them: a separate
 // process with its own data and settings folders.
 #include "CommandLineInstallation.h"
+#include "FakeSecretService.h"
 #include "SyncTestSupport.h"
 #include "WTProject.h"
 #include "WTSingleInstance.h"
 #include "WTTask.h"
 
 #include <gtest/gtest.h>
+
+#include <QDeadlineTimer>
+#include <QTest>
 
 namespace {
 
@@ -102,6 +106,97 @@ TEST(WTCommandLine, SyncBringsTwoInstallationsInStepThroughTheRealServer) {
   EXPECT_EQ(project->tasks()[0]->name(), "Its task");
   // The store the command made for a synced installation got no first project of its own to send.
   EXPECT_EQ(context->fetch<WTProject>().size(), 1);
+}
+
+// Runs the event loop until `condition` holds, for at most `milliseconds`; whether it came to hold.
+template <class Condition>
+bool waitUntil(Condition condition, int milliseconds) {
+  const QDeadlineTimer deadline(milliseconds);
+  while (!condition() && !deadline.hasExpired()) QTest::qWait(20);
+  return condition();
+}
+
+// A first start of the desktop copy with a password an earlier version left in the settings file, and a
+// keyring whose default collection does not exist yet: its prompt is never answered. The window and the
+// store come first, and the keyring is asked only for an account.
+TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
+  using fakesecrets::FakeSecretService;
+  const QString address = fakesecrets::PrivateSessionBus::instance().address();
+  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
+  FakeSecretService keyring;
+  ASSERT_TRUE(keyring.start(address));
+  keyring.setBehaviour({FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Never});
+  for (const bool account : {false, true}) {
+    SCOPED_TRACE(account ? "an account" : "no account");
+    Installation here;
+    if (account) here.setSetting("WTSyncUser", "ann@example.org");
+    here.setSetting("WTSyncPassword", "a password");
+    const int callsBefore = keyring.calls();
+    std::unique_ptr<QProcess> desktop =
+        here.launch({}, {{"QT_QPA_PLATFORM", "offscreen"}, {"DBUS_SESSION_BUS_ADDRESS", address}});
+    // The store is made once the window shows. The keyring would hold a start that waited for it for
+    // as long as it waits itself (half a minute and more).
+    EXPECT_TRUE(waitUntil([&] { return QFile::exists(here.storePath()); }, 10000))
+        << desktop->readAllStandardError().toStdString();
+    const WTSingleInstance probe(here.runtimeFolder() + "/tessal.socket");
+    EXPECT_TRUE(waitUntil([&] { return probe.notifyRunningInstance(1000, false); }, 10000));
+    if (account) {
+      EXPECT_TRUE(waitUntil([&] { return keyring.calls() > callsBefore; }, 10000)) << "the move is tried";
+    } else {
+      QTest::qWait(500);
+      EXPECT_EQ(keyring.calls(), callsBefore) << "no account: the keyring is left alone";
+    }
+    desktop->kill();
+    desktop->waitForFinished();
+    QFile settings(here.path("config/Tessal/Tessal.conf"));
+    ASSERT_TRUE(settings.open(QIODevice::ReadOnly));
+    EXPECT_TRUE(settings.readAll().contains("a password")) << "the password stays until the keyring takes it";
+  }
+}
+
+// `tessal sync` says once where its password came from. Without a session bus the settings file is the
+// store, and nothing else is said; a keyring that does not answer costs a few seconds and is named.
+TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
+  using fakesecrets::FakeSecretService;
+  const QString address = fakesecrets::PrivateSessionBus::instance().address();
+  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
+  FakeSecretService keyring;
+  ASSERT_TRUE(keyring.start(address));
+  keyring.setBehaviour({FakeSecretService::Answer::Never});
+  struct Row {
+    const char* name;
+    QString bus;  // empty: none at all
+    QString password;
+    QString said;
+  };
+  const Row rows[] = {
+      {"no session bus", {}, "a password", "Using the password in the settings file ("},
+      {"a keyring that never answers",
+       address,
+       {},
+       "The secret service gave no password (The secret service did not answer within 5 seconds); the "
+       "settings "
+       "file ("},
+  };
+  for (const Row& row : rows) {
+    SCOPED_TRACE(row.name);
+    Installation here;
+    here.setSetting("WTSyncUser", "ann@example.org");
+    if (!row.password.isEmpty()) here.setSetting("WTSyncPassword", row.password);
+    QProcess sync;
+    QProcessEnvironment environment = here.environment();
+    if (row.bus.isEmpty())
+      environment.remove("DBUS_SESSION_BUS_ADDRESS");
+    else
+      environment.insert("DBUS_SESSION_BUS_ADDRESS", row.bus);
+    sync.setProcessEnvironment(environment);
+    sync.start(QString::fromUtf8(TESSAL_EXE), {"sync"});
+    const Outcome run = Installation::finish(sync);
+    EXPECT_EQ(run.code, 1) << "no server is set";
+    EXPECT_EQ(run.err.count(row.said), 1) << run.err.toStdString();
+    EXPECT_FALSE(run.err.contains("No secret service")) << run.err.toStdString();
+    EXPECT_FALSE(run.err.contains("D-Bus")) << run.err.toStdString();
+  }
 }
 
 }  // namespace

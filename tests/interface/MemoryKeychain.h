@@ -1,7 +1,8 @@
 #pragma once
 
 // A keychain in memory for tests: what the secret service would hold, and a switch that makes it
-// behave like a desktop without one (every call answers Unavailable, as WTQtKeychain does then).
+// behave like a desktop without one (every call answers Unavailable, as WTQtKeychain does then). It
+// answers before the call returns.
 #include "WTKeychain.h"
 
 #include <QMap>
@@ -9,22 +10,22 @@
 
 class MemoryKeychain final : public WTKeychain {
  public:
-  Result<QString> readPassword(const QString& key) override {
+  void readPassword(const QString& key, ReadHandler done) override {
     ++reads;
-    if (!available) return Error{Unavailable, QStringLiteral("no secret service")};
-    if (!entries.contains(key)) return Error{EntryNotFound, QStringLiteral("not found")};
-    return entries.value(key);
+    if (!available) return done(Error{Unavailable, QStringLiteral("no secret service")});
+    if (!entries.contains(key)) return done(Error{EntryNotFound, QStringLiteral("not found")});
+    done(entries.value(key));
   }
-  Result<void> writePassword(const QString& key, const QString& password) override {
+  void writePassword(const QString& key, const QString& password, DoneHandler done) override {
     ++writes;
-    if (!available) return Error{Unavailable, QStringLiteral("no secret service")};
+    if (!available) return done(Error{Unavailable, QStringLiteral("no secret service")});
     entries.insert(key, password);
-    return {};
+    done({});
   }
-  Result<void> deletePassword(const QString& key) override {
-    if (!available) return Error{Unavailable, QStringLiteral("no secret service")};
+  void deletePassword(const QString& key, DoneHandler done) override {
+    if (!available) return done(Error{Unavailable, QStringLiteral("no secret service")});
     entries.remove(key);
-    return {};
+    done({});
   }
 
   bool available = true;
@@ -37,11 +38,15 @@ class MemoryKeychain final : public WTKeychain {
 class SharedKeychain final : public WTKeychain {
  public:
   explicit SharedKeychain(MemoryKeychain& target) : target_(target) {}
-  Result<QString> readPassword(const QString& key) override { return target_.readPassword(key); }
-  Result<void> writePassword(const QString& key, const QString& password) override {
-    return target_.writePassword(key, password);
+  void readPassword(const QString& key, ReadHandler done) override {
+    target_.readPassword(key, std::move(done));
   }
-  Result<void> deletePassword(const QString& key) override { return target_.deletePassword(key); }
+  void writePassword(const QString& key, const QString& password, DoneHandler done) override {
+    target_.writePassword(key, password, std::move(done));
+  }
+  void deletePassword(const QString& key, DoneHandler done) override {
+    target_.deletePassword(key, std::move(done));
+  }
 
  private:
   MemoryKeychain& target_;

@@ -203,6 +203,26 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKey
   EXPECT_EQ(light(), "green");
 }
 
+// A keyring that did not take the password is said under the password field, not in a dialog: also when
+// that happened at start, before the window was made.
+TEST_F(WTPreferencesWindowTest, AKeyringThatDidNotTakeThePasswordIsSaidUnderIt) {
+  keychain.available = false;
+  defaults->setValue(QStringLiteral("WTSyncUser"), kUser);
+  defaults->setValue(QStringLiteral("WTSyncPassword"), kPassword);
+  passwords->load();
+  open();
+  EXPECT_TRUE(window->keychainNoteLabel()->isVisible());
+  EXPECT_TRUE(window->keychainNoteLabel()->text().contains(QStringLiteral("settings file")));
+  EXPECT_EQ(QApplication::activeModalWidget(), nullptr);
+
+  keychain.available = true;
+  typeAndReturn(window->passwordTextField(), QStringLiteral("battery staple"));
+  EXPECT_FALSE(window->keychainNoteLabel()->isVisible());
+  keychain.available = false;
+  typeAndReturn(window->passwordTextField(), kPassword);
+  EXPECT_TRUE(window->keychainNoteLabel()->isVisible());
+}
+
 TEST_F(WTPreferencesWindowTest, AServerErrorTurnsTheLightRedAndStartSyncTurnsItGreenAgain) {
   LoopbackHttpServer server;
   bool refuse = true;
