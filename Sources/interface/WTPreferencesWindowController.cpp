@@ -3,8 +3,8 @@
 #include "MoneyFormat.h"
 #include "RZSyncManager.h"
 #include "UserDefaults.h"
-#include "WTImages.h"
 #include "WTClient.h"
+#include "WTImages.h"
 #include "WTPasswordStore.h"
 #include "WTProject.h"
 #include "WTRateField.h"
@@ -131,9 +131,11 @@ void WTPreferencesWindowController::buildInterface() {
   defaultRateField_->setObjectName(QStringLiteral("defaultRateField"));
   defaultRateField_->setAlignment(Qt::AlignRight);
   // Empty, the built-in rates are the ones in use: the field says which.
-  defaultRateField_->setPlaceholderText(tr("Built in: %1, or %2 for a project without a client")
-                                            .arg(MoneyFormat::format(WTClient::builtInRate()),
-                                                 MoneyFormat::format(WTProject::builtInRate())));
+  defaultRateField_->setPlaceholderText(
+      tr("Built in: %1, or %2 for a project without a client")
+          .arg(MoneyFormat::format(WTClient::builtInRate()), MoneyFormat::format(WTProject::builtInRate())));
+  defaultRateField_->setMinimumWidth(
+      defaultRateField_->fontMetrics().horizontalAdvance(defaultRateField_->placeholderText()) + 16);
   ratesForm->addRow(tr("Default hourly rate:"), defaultRateField_);
   layout->addWidget(rates);
 
