@@ -80,8 +80,7 @@ std::optional<int> minutesFromTypedText(const QString& text, QString* refusal) {
     if (refusal) {
       *refusal = QCoreApplication::translate(
           "DurationText",
-          "Not a duration: type minutes, hours:minutes or days:hours:minutes in whole "
-          "numbers, as in 1:30");
+          "Not a duration: type minutes, hours:minutes or days:hours:minutes in whole numbers, as in 1:30");
     }
     return std::nullopt;
   };

@@ -90,16 +90,15 @@ Reading refused(const QString& reason) {
 }
 
 Reading notANumber(const Signs& signs) {
-  return refused(QCoreApplication::translate("TypedNumber",
-                                             "Not a number: type digits, with %1 before any "
-                                             "decimals, as in %2")
+  return refused(QCoreApplication::translate(
+                     "TypedNumber", "Not a number: type digits, with %1 before any decimals, as in %2")
                      .arg(nameOf(signs.decimal), exampleWith(signs)));
 }
 
 Reading misgrouped(const Signs& signs) {
-  return refused(QCoreApplication::translate("TypedNumber",
-                                             "%1 only separates thousands, in groups of three "
-                                             "digits; decimals follow %2, as in %3")
+  return refused(QCoreApplication::translate(
+                     "TypedNumber",
+                     "%1 only separates thousands, in groups of three digits; decimals follow %2, as in %3")
                      .arg(nameOf(signs.grouping), nameOf(signs.decimal), exampleWith(signs)));
 }
 
