@@ -1,7 +1,9 @@
 #include "DurationText.h"
 
 #include "Decimal.h"
+#include "TypedNumber.h"
 
+#include <QCoreApplication>
 #include <QLocale>
 #include <QStringList>
 
@@ -71,6 +73,34 @@ int minutesFromString(const QString& text) {
   for (qsizetype i = 0; i < 3 && i < pieces.size(); ++i)
     minutes += kWeights[i] * readPiece(pieces[pieces.size() - 1 - i]);
   return clampToInt(minutes);
+}
+
+std::optional<int> minutesFromTypedText(const QString& text, QString* refusal) {
+  auto refuse = [refusal]() -> std::optional<int> {
+    if (refusal) {
+      *refusal = QCoreApplication::translate(
+          "DurationText",
+          "Not a duration: type minutes, hours:minutes or days:hours:minutes in whole numbers, as in 1:30");
+    }
+    return std::nullopt;
+  };
+  if (refusal) refusal->clear();
+  static constexpr long long kWeights[] = {1, 60, 1440};
+  const QStringList pieces = text.split(QLatin1Char(':'));
+  if (pieces.size() > 3) return refuse();
+  long long minutes = 0;
+  for (qsizetype i = 0; i < pieces.size(); ++i) {
+    const TypedNumber::Reading piece = TypedNumber::read(pieces[pieces.size() - 1 - i]);
+    if (!piece.taken()) return refuse();
+    if (!piece.value) continue;
+    const Decimal value = *piece.value;
+    // Whole and not negative: the value has no fraction when truncating keeps it.
+    if (value.isNegative() || Decimal(value.toInt64()) != value) return refuse();
+    if (value > Decimal(std::int64_t(std::numeric_limits<int>::max()))) return refuse();
+    minutes += kWeights[i] * value.toInt64();
+    if (minutes > std::numeric_limits<int>::max()) return refuse();
+  }
+  return int(minutes);
 }
 
 }  // namespace DurationText

@@ -1,6 +1,5 @@
 #include "MoneyFormat.h"
 
-#include <QLocale>
 #include <QVarLengthArray>
 
 #include <unicode/dcfmtsym.h>
@@ -102,14 +101,12 @@ QString format(const Decimal& amount, const icu::Locale& locale) {
   return Formatter(locale).format(amount);
 }
 
-std::optional<Decimal> parse(const QString& typed) {
-  const QLocale locale;
-  QString text = typed.trimmed();
-  text.remove(locale.groupSeparator());
-  text.replace(locale.decimalPoint(), QStringLiteral("."));
-  text.remove(u' ');
-  if (text.isEmpty()) return std::nullopt;
-  return Decimal::fromString(text);
+TypedNumber::Reading parse(const QString& typed, const icu::Locale& locale) {
+  return TypedNumber::read(typed, locale, true);
+}
+
+TypedNumber::Reading parse(const QString& typed) {
+  return parse(typed, icu::Locale::getDefault());
 }
 
 }  // namespace MoneyFormat

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Decimal.h"
+#include "TypedNumber.h"
 
 #include <QString>
 
@@ -12,7 +13,9 @@ namespace MoneyFormat {
 QString format(const Decimal& amount);
 // The same in `locale` rather than in the default locale of the first use.
 QString format(const Decimal& amount, const icu::Locale& locale);
-// Money typed by a person: the locale's grouping and decimal signs and spaces allowed; none for empty
-// text or text that is no number.
-std::optional<Decimal> parse(const QString& typed);
+// Money typed by a person, read as TypedNumber::read reads numbers; the locale's currency sign may stand
+// before or after the amount. Blank text is taken as no amount.
+TypedNumber::Reading parse(const QString& typed, const icu::Locale& locale);
+// In the user's locale.
+TypedNumber::Reading parse(const QString& typed);
 }  // namespace MoneyFormat

@@ -7,6 +7,7 @@
 #include "WTItemsViewController.h"
 #include "WTNotesTextView.h"
 #include "WTOutlineView.h"
+#include "WTRateField.h"
 #include "WTTableRowView.h"
 
 #include <QApplication>
@@ -313,6 +314,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
                           : field == Field::Start  ? QStringLiteral("startEditor")
                                                    : QStringLiteral("amountEditor"));
     editor->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
+    connect(editor, &QLineEdit::textEdited, editor, [editor] { WTRateField::setRefused(editor, {}); });
   }
   return editor;
 }
@@ -511,8 +513,30 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
   return false;
 }
 
+bool WTItemCellDelegate::refuses(QLineEdit* line) const {
+  const auto field = static_cast<Field>(line->property("field").toInt());
+  if (field != Field::Duration && field != Field::Amount) return false;
+  const QString refusal = WTItemsModel::refusalFor(
+      field == Field::Duration ? WTItemsModel::DurationEditRole : WTItemsModel::AmountEditRole, line->text());
+  if (refusal.isEmpty()) return false;
+  WTRateField::setRefused(line, refusal);
+  if (line->isVisible())
+    QToolTip::showText(line->mapToGlobal(QPoint(0, line->height())), refusal, line);
+  return true;
+}
+
 bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
   auto* line = qobject_cast<QLineEdit*>(object);
+  if (line && (event->type() == QEvent::KeyPress || event->type() == QEvent::FocusOut)) {
+    // A duration or amount that is not one stays in its field, as typed, with the reason in view:
+    // neither Return, Tab nor leaving the field stores it or throws it away.
+    const bool ends = event->type() == QEvent::FocusOut || [&] {
+      const int key = static_cast<QKeyEvent*>(event)->key();
+      return key == Qt::Key_Return || key == Qt::Key_Enter || key == Qt::Key_Tab || key == Qt::Key_Backtab;
+    }();
+    // The field itself still hears of losing the focus; only the commit and close are held back.
+    if (ends && refuses(line)) return event->type() == QEvent::KeyPress;
+  }
   if (!line || event->type() != QEvent::KeyPress) return QStyledItemDelegate::eventFilter(object, event);
   const auto* key = static_cast<QKeyEvent*>(event);
   const bool forward = key->key() == Qt::Key_Tab && !(key->modifiers() & Qt::ShiftModifier);

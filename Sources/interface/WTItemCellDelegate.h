@@ -6,6 +6,7 @@
 #include <QPointer>
 #include <QStyledItemDelegate>
 
+class QLineEdit;
 class WTItemsViewController;
 class WTNotesTextView;
 class WTOutlineView;
@@ -65,6 +66,9 @@ class WTItemCellDelegate : public QStyledItemDelegate {
                  const WTTableCellView& cell) const;
   void paintNotes(QPainter& painter, const QRectF& row, const QModelIndex& index,
                   const WTTableCellView& cell) const;
+  // Whether `line`, a duration or amount editor, holds text that would be refused; if so it is marked
+  // and the reason shown.
+  bool refuses(QLineEdit* line) const;
   void paintHoverBar(QPainter& painter, const QRectF& row, const WTTableCellView& cell,
                      const QModelIndex& index) const;
 

@@ -665,7 +665,7 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       return MoneyFormat::format(item->cost());
     case AmountEditRole:
       if (entity != WTEntity::Expense) return {};
-      return static_cast<const WTExpense*>(item)->expense().value_or(Decimal()).toString();
+      return TypedNumber::editableText(static_cast<const WTExpense*>(item)->expense().value_or(Decimal()));
     case RunningRole:
       return entity == WTEntity::Time && static_cast<const WTTime*>(item)->running();
     case TimerImageRole:
@@ -680,6 +680,15 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
     default:
       return {};
   }
+}
+
+QString WTItemsModel::refusalFor(int role, const QString& text) {
+  QString refusal;
+  if (role == DurationEditRole)
+    DurationText::minutesFromTypedText(text, &refusal);
+  else if (role == AmountEditRole)
+    refusal = MoneyFormat::parse(text).refusal;
+  return refusal;
 }
 
 bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int role) {
@@ -698,7 +707,9 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
       object->setNotes(value.toString());
       return true;
     case DurationEditRole: {
-      const int minutes = DurationText::minutesFromString(value.toString());
+      const std::optional<int> typed = DurationText::minutesFromTypedText(value.toString());
+      if (!typed) return false;
+      const int minutes = *typed;
       if (object->entity() == WTEntity::Time) {
         auto* time = static_cast<WTTime*>(object);
         if (time->running()) return false;  // a running entry's length is the clock's
@@ -724,9 +735,9 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     }
     case AmountEditRole: {
       if (object->entity() != WTEntity::Expense) return false;
-      const std::optional<Decimal> amount = MoneyFormat::parse(value.toString());
-      if (!amount && !value.toString().trimmed().isEmpty()) return false;
-      static_cast<WTExpense*>(object)->setExpense(amount);
+      const TypedNumber::Reading amount = MoneyFormat::parse(value.toString());
+      if (!amount.taken()) return false;
+      static_cast<WTExpense*>(object)->setExpense(amount.value);
       return true;
     }
     case CompletedRole:

@@ -40,7 +40,7 @@ class WTItemsModel : public QAbstractItemModel {
     DurationTextRole,  // empty where the row has no duration
     CostTextRole,      // empty where the row has no cost
     DurationEditRole,  // time entries and flat fees: the duration as text, settable ("1:30")
-    AmountEditRole,    // expenses: the amount as text, settable
+    AmountEditRole,    // expenses: the exact amount as typed in the user's locale, settable
     ImageRole,         // tasks: "notepad_32" or "notepad_clock_32"
     TimerImageRole,    // tasks: "play_32" or "stop_32"; running time entries: "stop_32"
     RunningRole,
@@ -91,6 +91,9 @@ class WTItemsModel : public QAbstractItemModel {
   bool hasChildren(const QModelIndex& parent = QModelIndex()) const override;
   QVariant data(const QModelIndex& index, int role = Qt::DisplayRole) const override;
   bool setData(const QModelIndex& index, const QVariant& value, int role = Qt::EditRole) override;
+  // Why `text` set under `role` (a duration or an amount) would be refused, for the person who typed
+  // it; empty when it would be taken.
+  static QString refusalFor(int role, const QString& text);
   Qt::ItemFlags flags(const QModelIndex& index) const override;
 
   // Drag and drop.

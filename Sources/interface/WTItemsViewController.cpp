@@ -79,7 +79,7 @@ WTItemsViewController::~WTItemsViewController() {
 }
 
 void WTItemsViewController::setProject(WTProject* project) {
-  if (rateField_ && project != project_) WTRateField::setRefused(rateField_, false);
+  if (rateField_ && project != project_) WTRateField::setRefused(rateField_, {});
   project_ = project;
 }
 
@@ -141,7 +141,7 @@ QWidget* WTItemsViewController::loadView() {
   rateField_->setMaximumWidth(rateField_->minimumWidth());
   rateLabel->setBuddy(rateField_);
   connect(rateField_, &QLineEdit::editingFinished, this, &WTItemsViewController::projectRateAction);
-  connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, false); });
+  connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, {}); });
   bar->addWidget(rateLabel);
   bar->addWidget(rateField_);
   // The totals sit right above the rows' duration and cost columns (alignTotals places them); the
@@ -206,7 +206,7 @@ void WTItemsViewController::refreshHeader() {
     totalsLabel_->clear();
     durationLabel_->clear();
     rateField_->clear();
-    WTRateField::setRefused(rateField_, false);
+    WTRateField::setRefused(rateField_, {});
     return;
   }
   titleLabel_->setText(project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
@@ -218,7 +218,7 @@ void WTItemsViewController::refreshHeader() {
   rateField_->setPlaceholderText(WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
-    rateField_->setText(project_->storedRate() ? MoneyFormat::format(*project_->storedRate()) : QString());
+    rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());
   }
 }
 

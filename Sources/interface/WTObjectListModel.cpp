@@ -51,7 +51,8 @@ bool isSortKey(const QString& key) {
 bool isShownKey(const QString& key) {
   static const QSet<QString> keys = {QStringLiteral("duration"),   QStringLiteral("cost"),
                                      QStringLiteral("tableImage"), QStringLiteral("client"),
-                                     QStringLiteral("projects"),   QStringLiteral("notes")};
+                                     QStringLiteral("projects"),   QStringLiteral("notes"),
+                                     QStringLiteral("rate")};
   return keys.contains(key);
 }
 
@@ -194,8 +195,11 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
         return client ? client->name() : tr("No Client");
       }
       if (object->entity() == WTEntity::Client) {
+        // The rate the client's work is billed at, its own or the one it inherits.
         const auto count = static_cast<const WTClient*>(object)->projects().size();
-        return count == 1 ? tr("1 project") : tr("%1 projects").arg(count);
+        return tr("%1 · %2 an hour")
+            .arg(count == 1 ? tr("1 project") : tr("%1 projects").arg(count),
+                 MoneyFormat::format(object->inheritedRate()));
       }
       return {};
     case DurationTextRole:

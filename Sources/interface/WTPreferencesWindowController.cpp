@@ -3,8 +3,10 @@
 #include "MoneyFormat.h"
 #include "RZSyncManager.h"
 #include "UserDefaults.h"
+#include "WTClient.h"
 #include "WTImages.h"
 #include "WTPasswordStore.h"
+#include "WTProject.h"
 #include "WTRateField.h"
 
 #include <QCheckBox>
@@ -163,7 +165,12 @@ void WTPreferencesWindowController::buildInterface() {
   defaultRateField_ = new QLineEdit(rates);
   defaultRateField_->setObjectName(QStringLiteral("defaultRateField"));
   defaultRateField_->setAlignment(Qt::AlignRight);
-  defaultRateField_->setPlaceholderText(tr("Built-in rates"));
+  // Empty, the built-in rates are the ones in use: the field says which.
+  defaultRateField_->setPlaceholderText(
+      tr("Built in: %1, or %2 for a project without a client")
+          .arg(MoneyFormat::format(WTClient::builtInRate()), MoneyFormat::format(WTProject::builtInRate())));
+  defaultRateField_->setMinimumWidth(
+      defaultRateField_->fontMetrics().horizontalAdvance(defaultRateField_->placeholderText()) + 16);
   ratesForm->addRow(tr("Default hourly rate:"), defaultRateField_);
   layout->addWidget(rates);
 
@@ -197,7 +204,7 @@ void WTPreferencesWindowController::buildInterface() {
   connect(defaultRateField_, &QLineEdit::editingFinished, this,
           &WTPreferencesWindowController::commitDefaultRate);
   connect(defaultRateField_, &QLineEdit::textEdited, this,
-          [this] { WTRateField::setRefused(defaultRateField_, false); });
+          [this] { WTRateField::setRefused(defaultRateField_, {}); });
 }
 
 void WTPreferencesWindowController::loadValues() {
@@ -220,7 +227,7 @@ void WTPreferencesWindowController::loadValues() {
                                          : kIdleMinutesWhenUnset);
   stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(kStopsOtherTimes));
   const std::optional<Decimal> rate = defaults_->decimalForKey(kDefaultRate);
-  defaultRateField_->setText(rate ? MoneyFormat::format(*rate) : QString());
+  defaultRateField_->setText(rate ? WTRateField::text(*rate) : QString());
 }
 
 void WTPreferencesWindowController::showWindow() {
@@ -302,7 +309,7 @@ void WTPreferencesWindowController::commitServer() {
 
 void WTPreferencesWindowController::commitDefaultRate() {
   const WTRateField::Parsed parsed = WTRateField::parse(defaultRateField_->text());
-  WTRateField::setRefused(defaultRateField_, !parsed.valid);
+  WTRateField::setRefused(defaultRateField_, parsed.refusal);
   if (!parsed.valid) return;
   const std::optional<Decimal> stored = defaults_->decimalForKey(kDefaultRate);
   if (parsed.rate == stored && defaults_->hasStoredValue(kDefaultRate) == parsed.rate.has_value()) return;

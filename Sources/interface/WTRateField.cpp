@@ -24,20 +24,25 @@ QString placeholder(const WTObject* object) {
 }
 
 Parsed parse(const QString& typed) {
-  if (typed.trimmed().isEmpty()) return {true, std::nullopt};
-  const std::optional<Decimal> rate = MoneyFormat::parse(typed);
-  if (!rate || *rate < Decimal(0)) return {false, std::nullopt};
-  return {true, rate};
+  const TypedNumber::Reading reading = MoneyFormat::parse(typed);
+  if (!reading.taken()) return {false, std::nullopt, reading.refusal};
+  if (reading.value && reading.value->isNegative())
+    return {false, std::nullopt, QObject::tr("Not a rate: a rate is never below zero")};
+  return {true, reading.value, {}};
 }
 
-void setRefused(QLineEdit* field, bool refused) {
-  if (isRefused(field) == refused) return;
+QString text(const Decimal& rate) {
+  const QString formatted = MoneyFormat::format(rate);
+  const TypedNumber::Reading back = MoneyFormat::parse(formatted);
+  return back.value == rate ? formatted : TypedNumber::editableText(rate);
+}
+
+void setRefused(QLineEdit* field, const QString& reason) {
+  const bool refused = !reason.isEmpty();
+  if (!refused && !isRefused(field)) return;
   field->setProperty(kRefusedProperty, refused);
   field->setStyleSheet(refused ? QStringLiteral("QLineEdit { border: 2px solid #d03030; }") : QString());
-  field->setToolTip(refused
-                        ? QObject::tr("Not a rate: type an amount such as %1, or leave it empty to inherit")
-                              .arg(MoneyFormat::format(Decimal(80)))
-                        : QString());
+  field->setToolTip(reason);
 }
 
 bool isRefused(const QLineEdit* field) {
@@ -46,7 +51,7 @@ bool isRefused(const QLineEdit* field) {
 
 bool apply(QLineEdit* field, WTObject* object) {
   const Parsed parsed = parse(field->text());
-  setRefused(field, !parsed.valid);
+  setRefused(field, parsed.refusal);
   if (!parsed.valid) return false;
   if (object->storedRate() != parsed.rate) object->setRate(parsed.rate);
   return true;
@@ -63,7 +68,7 @@ WTRateDialog::WTRateDialog(WTObject* object, QWidget* parent) : QDialog(parent),
   field_->setObjectName(QStringLiteral("rateField"));
   field_->setAlignment(Qt::AlignRight);
   field_->setPlaceholderText(WTRateField::placeholder(object));
-  if (object->storedRate()) field_->setText(MoneyFormat::format(*object->storedRate()));
+  if (object->storedRate()) field_->setText(WTRateField::text(*object->storedRate()));
   label->setBuddy(field_);
   message_ = new QLabel(this);
   message_->setObjectName(QStringLiteral("rateMessage"));
@@ -73,7 +78,7 @@ WTRateDialog::WTRateDialog(WTObject* object, QWidget* parent) : QDialog(parent),
   connect(buttons, &QDialogButtonBox::accepted, this, &WTRateDialog::accept);
   connect(buttons, &QDialogButtonBox::rejected, this, &WTRateDialog::reject);
   connect(field_, &QLineEdit::textEdited, this, [this] {
-    WTRateField::setRefused(field_, false);
+    WTRateField::setRefused(field_, {});
     message_->hide();
   });
   layout->addWidget(label);

@@ -21,11 +21,18 @@ QString placeholder(const WTObject* object);
 struct Parsed {
   bool valid = false;
   std::optional<Decimal> rate;  // empty: inherit
+  QString refusal;              // why the text is not a rate, when it is not
 };
+// Money in the user's locale, as MoneyFormat::parse reads it, and not negative.
 Parsed parse(const QString& text);
 
-// Marks or clears the field as holding a value that was not taken, with the reason as its tool tip.
-void setRefused(QLineEdit* field, bool refused);
+// What a field shows for `rate`: the money format when it reads back as the same rate, else the exact
+// number, so that leaving the field untouched never changes a rate by rounding it.
+QString text(const Decimal& rate);
+
+// Marks the field as holding a value that was not taken, with `reason` as its tool tip; an empty reason
+// clears the mark.
+void setRefused(QLineEdit* field, const QString& reason);
 bool isRefused(const QLineEdit* field);
 
 // Stores the field's text as the rate of `object`; a text that is not a rate changes nothing, marks

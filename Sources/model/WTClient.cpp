@@ -14,7 +14,7 @@ void WTClient::setTotalsUID(const QString& uid) {
 }
 
 Decimal WTClient::rateFromAbove() const {
-  return userDefaultRate().value_or(Decimal(100));
+  return userDefaultRate().value_or(builtInRate());
 }
 
 void WTClient::setRate(const std::optional<Decimal>& rate) {

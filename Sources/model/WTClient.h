@@ -19,8 +19,10 @@ class WTClient final : public WTObject {
 
   const QList<WTProject*>& projects() const { return projects_; }
 
-  // Own rate, else "WTDefaultRate", else 100.
+  // Own rate, else "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;
+  // What a client bills without a rate of its own while the user has set no default: 100.
+  static Decimal builtInRate() { return Decimal(100); }
   void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 

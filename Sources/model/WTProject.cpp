@@ -28,7 +28,7 @@ void WTProject::moveTask(WTTask* task, int index) {
 
 Decimal WTProject::rateFromAbove() const {
   if (client_) return client_->inheritedRate();
-  return userDefaultRate().value_or(Decimal(50));
+  return userDefaultRate().value_or(builtInRate());
 }
 
 void WTProject::setRate(const std::optional<Decimal>& rate) {

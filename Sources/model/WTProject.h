@@ -22,8 +22,10 @@ class WTProject final : public WTObject {
   // Moves one of this project's tasks to `index` among the others (clamped to the list).
   void moveTask(WTTask* task, int index);
 
-  // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else 50.
+  // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;
+  // What a project without a client bills, with no rate of its own and no default set: 50.
+  static Decimal builtInRate() { return Decimal(50); }
   void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 

@@ -1,6 +1,7 @@
 #include "DurationText.h"
 
 #include "Decimal.h"
+#include "UserLocale.h"
 
 #include <gtest/gtest.h>
 
@@ -8,6 +9,7 @@
 
 #include <cstdint>
 #include <limits>
+#include <string>
 
 namespace {
 
@@ -109,6 +111,34 @@ TEST(DurationText, PiecesAreReadInTheUsersLocale) {
   for (const Parsed& c : cases)
     EXPECT_EQ(DurationText::minutesFromString(QString::fromUtf8(c.text)), c.minutes) << c.text;
   QLocale::setDefault(previous);
+}
+
+// What a person types is never read as another length: anything but whole numbers in the user's locale
+// is refused (-1 here) rather than cut, dropped or read in another locale.
+TEST(DurationText, TypedDurationsAreReadStrictlyInTheUsersLocale) {
+  const struct {
+    const char* text;
+    int inEnglish;
+    int inGerman;
+  } cases[] = {
+      {"45", 45, 45},     {"1:30", 90, 90},    {" 1 : 30 ", 90, 90},    {":15", 15, 15},
+      {"1:", 60, 60},     {"0:90", 90, 90},    {"1:00:00", 1440, 1440}, {"", 0, 0},
+      {"1,000", 1000, 1}, {"1.000", 1, 1000},  {"2.5", -1, -1},         {"2,5", -1, -1},
+      {"1:2.5", -1, -1},  {"1:2:3:4", -1, -1}, {"abc", -1, -1},         {"1:abc", -1, -1},
+      {"5m", -1, -1},     {"-5", -1, -1},      {"1:-30", -1, -1},       {"99999999999", -1, -1},
+  };
+  for (const char* name : {"en_US", "de_DE"}) {
+    const UserLocale user(name);
+    const bool german = name == std::string("de_DE");
+    for (const auto& c : cases) {
+      QString refusal = QStringLiteral("stale");
+      const std::optional<int> minutes =
+          DurationText::minutesFromTypedText(QString::fromUtf8(c.text), &refusal);
+      const int expected = german ? c.inGerman : c.inEnglish;
+      EXPECT_EQ(minutes.value_or(-1), expected) << name << " \"" << c.text << '"';
+      EXPECT_EQ(refusal.isEmpty(), expected >= 0) << name << " \"" << c.text << '"';
+    }
+  }
 }
 
 TEST(WTDurationFormatter, FormatsAndAlwaysParses) {

@@ -1,10 +1,12 @@
 #include "MoneyFormat.h"
+#include "UserLocale.h"
 
 #include <gtest/gtest.h>
 
 #include <unicode/dcfmtsym.h>
 #include <unicode/decimfmt.h>
 
+#include <array>
 #include <random>
 #include <string>
 #include <vector>
@@ -48,10 +50,89 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
     for (const QString& amount : amounts) {
       const std::optional<Decimal> decimal = Decimal::fromString(amount);
       ASSERT_TRUE(decimal) << amount.toStdString();
-      EXPECT_EQ(MoneyFormat::format(*decimal, locale), byIcu(decimal->toString(), locale))
+      const QString written = MoneyFormat::format(*decimal, locale);
+      EXPECT_EQ(written, byIcu(decimal->toString(), locale)) << name << ' ' << amount.toStdString();
+      // What is shown reads back as the amount shown (to the cent), and an editor's exact text as the
+      // amount itself, with its places as written.
+      const std::optional<Decimal> cents =
+          Decimal::fromString(byIcu(decimal->toString(), icu::Locale("en_US_POSIX")).remove(u','));
+      EXPECT_EQ(MoneyFormat::parse(written, locale).value, cents) << name << ' ' << written.toStdString();
+      const TypedNumber::Reading exact =
+          TypedNumber::read(TypedNumber::editableText(*decimal, locale), locale);
+      ASSERT_TRUE(exact.value) << name << ' ' << amount.toStdString();
+      EXPECT_EQ(*exact.value, *decimal) << name << ' ' << amount.toStdString();
+      EXPECT_EQ(exact.value->exponent(), std::min(decimal->exponent(), 0))
           << name << ' ' << amount.toStdString();
     }
   }
+}
+
+// Money typed in each locale people use here. "x": refused with a reason; "": blank, no amount.
+TEST(MoneyFormat, TypedAmountsAreReadStrictlyInTheUsersLocale) {
+  struct Row {
+    const char* typed;
+    std::array<const char*, std::size(UserLocale::kNames)> read;  // C, en_US, de_DE, fr_FR, de_CH
+  };
+  const Row rows[] = {
+      {"75,5", {"x", "x", "75.5", "75.5", "x"}},
+      {"75.5", {"75.5", "75.5", "x", "x", "75.5"}},
+      {"12,50", {"x", "x", "12.50", "12.50", "x"}},
+      {"1,250.00", {"1250", "1250", "x", "x", "x"}},
+      {"1.250,00", {"x", "x", "1250", "x", "x"}},
+      {"1\u202F250,00", {"x", "x", "x", "1250", "x"}},
+      {"1\u00A0250,00", {"x", "x", "x", "1250", "x"}},
+      {"1 250,00", {"x", "x", "x", "1250", "x"}},
+      {"1\u2019250.50", {"x", "x", "x", "x", "1250.5"}},
+      {"1'250.50", {"x", "x", "x", "x", "1250.5"}},
+      {"1,000", {"1000", "1000", "1", "1", "x"}},
+      {"1.000", {"1", "1", "1000", "x", "1"}},
+      {"1,2345", {"x", "x", "1.2345", "1.2345", "x"}},
+      {"12,34,567", {"x", "x", "x", "x", "x"}},
+      {"1.234.567,5", {"x", "x", "1234567.5", "x", "x"}},
+      {"1,234.5,6", {"x", "x", "x", "x", "x"}},
+      {"1,,000", {"x", "x", "x", "x", "x"}},
+      {",100", {"x", "x", "0.1", "0.1", "x"}},
+      {".5", {"0.5", "0.5", "x", "x", "0.5"}},
+      {"-12.5", {"-12.5", "-12.5", "x", "x", "-12.5"}},
+      {"\u22125", {"-5", "-5", "-5", "-5", "-5"}},
+      {" 80 ", {"80", "80", "80", "80", "80"}},
+      {"  ", {"", "", "", "", ""}},
+      {"$80", {"80", "80", "x", "x", "x"}},
+      {"80 \u20AC", {"x", "x", "80", "80", "x"}},
+      {"CHF 1\u2019250.50", {"x", "x", "x", "x", "1250.5"}},
+      {"\u20AC", {"x", "x", "x", "x", "x"}},
+      {"abc", {"x", "x", "x", "x", "x"}},
+      {"12abc", {"x", "x", "x", "x", "x"}},
+      {"1e3", {"x", "x", "x", "x", "x"}},
+      {"-", {"x", "x", "x", "x", "x"}},
+      {"+5", {"x", "x", "x", "x", "x"}},
+      // One digit more than a Decimal keeps would be rounded away.
+      {"1234567890123456789012345678901234567.89", {"x", "x", "x", "x", "x"}},
+  };
+  for (const Row& row : rows) {
+    for (std::size_t at = 0; at < std::size(UserLocale::kNames); ++at) {
+      const UserLocale user(UserLocale::kNames[at]);
+      const QString typed = QString::fromUtf8(row.typed);
+      const std::string where = std::string(UserLocale::kNames[at]) + " \"" + row.typed + '"';
+      const TypedNumber::Reading reading = MoneyFormat::parse(typed);
+      const std::string expected = row.read[at];
+      if (expected == "x") {
+        EXPECT_FALSE(reading.taken()) << where;
+        EXPECT_FALSE(reading.value) << where;
+      } else {
+        EXPECT_TRUE(reading.taken()) << where << ": " << reading.refusal.toStdString();
+        EXPECT_EQ(reading.value,
+                  expected.empty() ? std::nullopt : Decimal::fromString(QString::fromStdString(expected)))
+            << where;
+      }
+    }
+  }
+  // The reason says how to type the amount instead.
+  const UserLocale user("en_US");
+  EXPECT_EQ(
+      MoneyFormat::parse("75,5").refusal.toStdString(),
+      "\u201C,\u201D only separates thousands, in groups of three digits; decimals follow \u201C.\u201D, as "
+      "in 1,234.50");
 }
 
 }  // namespace

@@ -82,9 +82,16 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_EQ(row.data(WTObjectListModel::SubtitleRole).toString(), "ACME Ltd");
   EXPECT_EQ(row.data(WTObjectListModel::ImageRole).toString(), "folder_32_dis");
   EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
-  EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::SubtitleRole).toString(), QString("1 project"));
-  // 30 minutes at the client's inherited rate of 100.
+  // A client's row says the rate its work is billed at: 30 minutes at the inherited 100, then its own.
+  EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::SubtitleRole).toString(),
+            "1 project · 100.00 an hour");
   EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::CostTextRole).toString(), QString("50.00"));
+  QSignalSpy clientChanged(&clients, &QAbstractItemModel::dataChanged);
+  client->setRate(Decimal(120));
+  endTurn();
+  EXPECT_GE(clientChanged.count(), 1);
+  EXPECT_EQ(clients.index(0, 0).data(WTObjectListModel::SubtitleRole).toString(),
+            "1 project · 120.00 an hour");
   // Only a project takes a client, and only a client is one.
   EXPECT_FALSE(
       projects.setData(row, WTObjectListModel::variantFromObject(task), WTObjectListModel::ClientRole));

@@ -1,11 +1,16 @@
+#include "MemoryKeychain.h"
 #include "UiFixture.h"
+#include "UserLocale.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
+#include "WTItemCellDelegate.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
 #include "WTListView.h"
 #include "WTObjectListModel.h"
 #include "WTOutlineView.h"
+#include "WTPasswordStore.h"
+#include "WTPreferencesWindowController.h"
 #include "WTRateField.h"
 
 #include <QApplication>
@@ -15,7 +20,14 @@
 #include <QSignalSpy>
 #include <QTimer>
 
+#include <array>
 #include <functional>
+#include <ostream>
+
+// Failures show amounts as numbers.
+static void PrintTo(const Decimal& value, std::ostream* out) {
+  *out << value.toString().toStdString();
+}
 
 namespace {
 
@@ -100,6 +112,146 @@ TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) 
   EXPECT_TRUE(field->toolTip().isEmpty());
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), Decimal(7));
+}
+
+// Money typed into each field that takes it, in each locale people use here: the locale's decimal sign is
+// the decimal sign; anything else stays in its field, marked with the reason, and nothing is stored.
+TEST_F(WTRatesTest, MoneyTypedInEveryFieldIsReadInTheUsersLocale) {
+  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 11, 10));
+  WTPasswordStore passwords(defaults.get(), std::make_unique<MemoryKeychain>());
+  WTPreferencesWindowController preferences(defaults.get(), nullptr, &passwords);
+  preferences.showWindow();
+  // Empty, the box names the rates then in use.
+  EXPECT_EQ(preferences.defaultRateField()->placeholderText(),
+            "Built in: 100.00, or 50.00 for a project without a client");
+  endTurn();
+  controller->expandContainerOfItem(expense);
+  WTOutlineView* outline = controller->outlineView();
+  auto editors = [&] {
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    QApplication::processEvents();
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    return outline->viewport()->findChildren<QLineEdit*>();
+  };
+  const Decimal before(1);  // what every field holds before each typing
+
+  // Each path types `text` as a person does and ends the edit; it answers what is stored then, and
+  // whether the text was refused in place (still in its open field, marked, with a reason).
+  struct Outcome {
+    std::optional<Decimal> stored;
+    bool refused;
+  };
+  auto refusedIn = [](QLineEdit* field, const QString& text) {
+    return WTRateField::isRefused(field) && field->text() == text && !field->toolTip().isEmpty();
+  };
+  auto type = [](QLineEdit* field, const QString& text) {
+    field->setFocus();
+    field->selectAll();
+    QTest::keyClicks(field, text);
+  };
+  auto inDialog = [&](WTObject* object) {
+    return [&, object](const QString& text) {
+      object->setRate(before);
+      WTRateDialog dialog(object);
+      dialog.show();
+      type(dialog.field(), text);
+      dialog.accept();
+      return Outcome{object->storedRate(), dialog.isVisible() && refusedIn(dialog.field(), text)};
+    };
+  };
+  const std::pair<const char*, std::function<Outcome(const QString&)>> paths[] = {
+      {"project",
+       [&](const QString& text) {
+         project->setRate(before);
+         endTurn();
+         type(controller->rateField(), text);
+         QTest::keyClick(controller->rateField(), Qt::Key_Return);
+         return Outcome{project->storedRate(), refusedIn(controller->rateField(), text)};
+       }},
+      {"client", inDialog(acme)},
+      {"task", inDialog(design)},
+      {"expense",
+       [&](const QString& text) {
+         expense->setExpense(before);
+         endTurn();
+         const QModelIndex row = model()->indexOfObject(expense);
+         outline->setCurrentIndex(row);
+         controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Amount);
+         outline->edit(row);
+         QList<QLineEdit*> open = editors();
+         if (open.size() != 1 || open.first()->objectName() != "amountEditor") return Outcome{};
+         type(open.first(), text);
+         QTest::keyClick(open.first(), Qt::Key_Return);
+         open = editors();
+         const bool refused = open.size() == 1 && outline->isEditing() && refusedIn(open.first(), text);
+         if (!open.isEmpty()) QTest::keyClick(open.first(), Qt::Key_Escape);
+         editors();
+         return Outcome{expense->expense(), refused};
+       }},
+      {"preferences",
+       [&](const QString& text) {
+         defaults->setValue(QStringLiteral("WTDefaultRate"), QVariant::fromValue(before));
+         type(preferences.defaultRateField(), text);
+         QTest::keyClick(preferences.defaultRateField(), Qt::Key_Return);
+         return Outcome{defaults->decimalForKey(QStringLiteral("WTDefaultRate")),
+                        refusedIn(preferences.defaultRateField(), text)};
+       }},
+  };
+  struct Row {
+    const char* typed;
+    std::array<const char*, std::size(UserLocale::kNames)> stored;  // C, en_US, de_DE, fr_FR, de_CH
+  };
+  const Row rows[] = {
+      {"75,5", {"x", "x", "75.5", "75.5", "x"}},     {"75.5", {"75.5", "75.5", "x", "x", "75.5"}},
+      {"1,250.00", {"1250", "1250", "x", "x", "x"}}, {"1 250,00", {"x", "x", "x", "1250", "x"}},
+      {"1'250.50", {"x", "x", "x", "x", "1250.5"}},
+  };
+  for (std::size_t at = 0; at < std::size(UserLocale::kNames); ++at) {
+    const UserLocale user(UserLocale::kNames[at]);
+    for (const Row& row : rows) {
+      const QString text = QString::fromUtf8(row.typed);
+      const std::string expected = row.stored[at];
+      for (const auto& [path, typeInto] : paths) {
+        const std::string where = std::string(path) + ' ' + UserLocale::kNames[at] + " \"" + row.typed + '"';
+        const Outcome outcome = typeInto(text);
+        EXPECT_EQ(outcome.refused, expected == "x") << where;
+        EXPECT_EQ(outcome.stored,
+                  expected == "x" ? before : *Decimal::fromString(QString::fromUtf8(expected)))
+            << where;
+      }
+    }
+  }
+
+  // Durations too are whole numbers in the user's locale, never a fraction cut down to whole minutes.
+  auto* flat = makeItem<WTFlat>(design, "Review", at(2024, 3, 11, 11));
+  flat->setMinutes(10);
+  endTurn();
+  controller->expandContainerOfItem(flat);
+  auto typeDuration = [&](const QString& text) {
+    const QModelIndex row = model()->indexOfObject(flat);
+    outline->setCurrentIndex(row);
+    controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Duration);
+    outline->edit(row);
+    QList<QLineEdit*> open = editors();
+    if (open.size() != 1) return false;
+    type(open.first(), text);
+    QTest::keyClick(open.first(), Qt::Key_Return);
+    open = editors();
+    const bool refused = open.size() == 1 && refusedIn(open.first(), text);
+    if (!open.isEmpty()) QTest::keyClick(open.first(), Qt::Key_Escape);
+    editors();
+    return refused;
+  };
+  for (const char* name : {"en_US", "de_DE"}) {
+    const UserLocale user(name);
+    for (const char* fraction : {"1.5", "1,5", "0:1,5"}) {
+      EXPECT_TRUE(typeDuration(fraction)) << name << ' ' << fraction;
+      EXPECT_EQ(flat->minutes(), 10) << name << ' ' << fraction;
+    }
+    EXPECT_FALSE(typeDuration("1:30")) << name;
+    EXPECT_EQ(flat->minutes(), 90) << name;
+    flat->setMinutes(10);
+  }
 }
 
 TEST_F(WTRatesTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
