@@ -4,6 +4,7 @@
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
+#include "WTDialogAlertPresenter.h"
 #include "WTExportController.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
@@ -24,9 +25,13 @@
 #include <QAction>
 #include <QButtonGroup>
 #include <QLineEdit>
+#include <QMessageBox>
 #include <QScreen>
 #include <QTemporaryDir>
 #include <QTest>
+#include <QTimer>
+
+#include <functional>
 
 namespace {
 
@@ -308,6 +313,34 @@ TEST_F(WTMainWindowControllerTest, TheWindowFitsTheScreenAndKeepsItsPlace) {
 
   open();
   EXPECT_EQ(window->size(), QSize(700, 480));
+}
+
+}  // namespace
+
+namespace {
+
+// The desktop's question before a deletion: Return keeps everything, only "Delete" deletes.
+TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenInto) {
+  WTDialogAlertPresenter presenter;
+  auto whenShown = [](const std::function<void(QMessageBox*)>& act) {
+    QTimer::singleShot(0, [act] {
+      auto* box = qobject_cast<QMessageBox*>(QApplication::activeModalWidget());
+      ASSERT_NE(box, nullptr);
+      act(box);
+    });
+  };
+  whenShown([](QMessageBox* box) {
+    EXPECT_EQ(box->text().toStdString(), "Delete “General” and its 14 items?");
+    EXPECT_EQ(box->informativeText().toStdString(), "A timer is running in it.");
+    QTest::keyClick(box, Qt::Key_Return);
+  });
+  EXPECT_FALSE(presenter.confirmDeletion("Delete “General” and its 14 items?", "A timer is running in it."));
+  whenShown([](QMessageBox* box) {
+    for (QAbstractButton* button : box->buttons()) {
+      if (button->text() == "Delete") QTest::mouseClick(button, Qt::LeftButton);
+    }
+  });
+  EXPECT_TRUE(presenter.confirmDeletion("Delete “General” and its 14 items?", QString()));
 }
 
 }  // namespace
