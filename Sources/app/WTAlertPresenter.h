@@ -10,4 +10,7 @@ class WTAlertPresenter {
   virtual bool presentError(const QString& message) = 0;
   // Asks "Could not save changes while quitting. Quit anyway?"; true for "Quit anyway".
   virtual bool confirmQuitAnyway() = 0;
+  // Asks `question` ("Delete “General” and its 14 items?"), with `detail` under it when not empty;
+  // true for "Delete".
+  virtual bool confirmDeletion(const QString& question, const QString& detail) = 0;
 };

@@ -70,6 +70,9 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // must not end it) and saves. Logs "ERROR: ..." and fills `error` when it fails.
   bool saveChanges(Error* error = nullptr);
 
+  // Who speaks to the user for the application (not owned).
+  WTAlertPresenter* alertPresenter() const { return presenter_; }
+
   // Whether archived clients and projects are listed, and the filter that says so.
   bool displayArchived() const { return displayArchived_; }
   std::function<bool(const WTObject*)> archivedPredicate() const;

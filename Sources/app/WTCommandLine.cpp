@@ -38,6 +38,7 @@ class WTCommandLinePresenter final : public WTAlertPresenter, public RZSyncError
     return false;
   }
   bool confirmQuitAnyway() override { return false; }
+  bool confirmDeletion(const QString&, const QString&) override { return false; }
   void presentSyncError(const QString&) override {}
   void presentNetworkError(const QString&) override {}
 

@@ -26,6 +26,22 @@ bool WTDialogAlertPresenter::confirmQuitAnyway() {
   return box.clickedButton() != cancel;
 }
 
+bool WTDialogAlertPresenter::confirmDeletion(const QString& question, const QString& detail) {
+  QMessageBox box(parent_);
+  box.setIcon(QMessageBox::Warning);
+  box.setText(question);
+  box.setInformativeText(detail);
+  QPushButton* remove = box.addButton(QCoreApplication::translate("WTMainWindowController", "Delete"),
+                                      QMessageBox::DestructiveRole);
+  QPushButton* cancel =
+      box.addButton(QCoreApplication::translate("WTMainWindowController", "Cancel"), QMessageBox::RejectRole);
+  // Return keeps what is there: a deletion is chosen, never fallen into.
+  box.setDefaultButton(cancel);
+  box.setEscapeButton(cancel);
+  box.exec();
+  return box.clickedButton() == remove;
+}
+
 void WTDialogAlertPresenter::presentSyncError(const QString& message) {
   QMessageBox box(parent_);
   box.setIcon(QMessageBox::Warning);

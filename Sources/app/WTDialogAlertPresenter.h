@@ -11,6 +11,7 @@ class WTDialogAlertPresenter final : public WTAlertPresenter, public RZSyncError
   void setParentWidget(QWidget* parent) { parent_ = parent; }
   bool presentError(const QString& message) override;
   bool confirmQuitAnyway() override;
+  bool confirmDeletion(const QString& question, const QString& detail) override;
   void presentSyncError(const QString& message) override;
   void presentNetworkError(const QString& message) override;
 

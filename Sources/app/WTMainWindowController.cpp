@@ -2,6 +2,7 @@
 
 #include "RZDate.h"
 #include "UserDefaults.h"
+#include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTClientsViewController.h"
 #include "WTEditCommitter.h"
@@ -191,7 +192,7 @@ void WTMainWindowController::buildActions() {
   file->addAction(tr("&Quit"), QKeySequence::Quit, this, &WTMainWindowController::quit);
 
   QMenu* edit = menuBar()->addMenu(tr("&Edit"));
-  QAction* undo = edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
+  QAction* undo = undo_ = edit->addAction(tr("&Undo"), QKeySequence::Undo, [this] {
     // Typing is undone where it was typed; only then the records, with the keyboard focus kept.
     QWidget* focus = QApplication::focusWidget();
     if (WTEditCommitter::undoTyping(focus)) return;
@@ -199,7 +200,7 @@ void WTMainWindowController::buildActions() {
     delegate_.managedObjectContext()->undoManager().undo();
   });
   undo->setObjectName(QStringLiteral("undo"));
-  QAction* redo = edit->addAction(tr("&Redo"), QKeySequence::Redo, [this] {
+  QAction* redo = redo_ = edit->addAction(tr("&Redo"), QKeySequence::Redo, [this] {
     QWidget* focus = QApplication::focusWidget();
     if (WTEditCommitter::redoTyping(focus)) return;
     WTEditCommitter::closeUntouchedEditor(focus);
@@ -214,9 +215,14 @@ void WTMainWindowController::buildActions() {
   preferences->setMenuRole(QAction::PreferencesRole);
   connect(edit, &QMenu::aboutToShow, this, [this, undo, redo] {
     WTUndoManager& manager = delegate_.managedObjectContext()->undoManager();
-    undo->setEnabled(manager.canUndo());
-    redo->setEnabled(manager.canRedo());
+    QWidget* focus = QApplication::focusWidget();
+    undo->setEnabled(manager.canUndo() || WTEditCommitter::hasTypingToUndo(focus));
+    redo->setEnabled(manager.canRedo() || WTEditCommitter::hasTypingToRedo(focus));
+    updateUndoTitles();
   });
+  connect(delegate_.managedObjectContext(), &WTObjectContext::undoStateChanged, this,
+          &WTMainWindowController::updateUndoTitles);
+  updateUndoTitles();
   connect(edit, &QMenu::aboutToHide, this, [undo, redo] {
     // Shortcuts stay live; an empty stack simply does nothing.
     undo->setEnabled(true);
@@ -253,6 +259,24 @@ void WTMainWindowController::buildActions() {
   });
   about->setObjectName(QStringLiteral("about"));
   about->setMenuRole(QAction::AboutRole);
+}
+
+void WTMainWindowController::updateUndoTitles() {
+  const WTUndoManager& manager = delegate_.managedObjectContext()->undoManager();
+  QWidget* focus = QApplication::focusWidget();
+  // A name may hold "&" (“R&D”): in a menu title it must stay a character, not a mnemonic.
+  const auto title = [](const QString& bare, const QString& named, const QString& name) {
+    if (name.isEmpty()) return bare;
+    return named.arg(QString(name).replace(u'&', QLatin1String("&&")));
+  };
+  undo_->setText(title(tr("&Undo"), tr("&Undo %1"),
+                       WTEditCommitter::hasTypingToUndo(focus) ? tr("Typing") : manager.undoActionName()));
+  redo_->setText(title(tr("&Redo"), tr("&Redo %1"),
+                       WTEditCommitter::hasTypingToRedo(focus) ? tr("Typing") : manager.redoActionName()));
+}
+
+bool WTMainWindowController::confirmDeletion(const QString& question, const QString& detail) {
+  return delegate_.alertPresenter()->confirmDeletion(question, detail);
 }
 
 WTProject* WTMainWindowController::selectedProject() const {

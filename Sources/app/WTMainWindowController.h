@@ -46,6 +46,8 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTNavigationController* currentNavigationController() const override;
   void showProjects() override;
   void showClients() override;
+  // Through the delegate's alert presenter.
+  bool confirmDeletion(const QString& question, const QString& detail) override;
 
   // The root of the visible stack (deliberately not its top).
   WTViewController* topViewController() const;
@@ -113,6 +115,9 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTViewController* lastViewController() const;
   void scheduleValidation();
   void watch(WTViewController* controller);
+  // Titles Edit › Undo and Redo after the step each would take back: the typing in the focused field,
+  // else the store's named step ("Undo Delete “Temp”").
+  void updateUndoTitles();
 
   WTAppDelegate& delegate_;
   QWidget* contentView_ = nullptr;
@@ -127,6 +132,8 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTPreferencesWindowController* preferences_ = nullptr;  // a child window, made on first use
   bool quitting_ = false;
   QActionGroup* stackGroup_ = nullptr;
+  QAction* undo_ = nullptr;
+  QAction* redo_ = nullptr;
   QList<QAction*> actions_;
   QTimer validation_;
 };

@@ -20,6 +20,7 @@ void WTClientsViewController::report() {
 
 void WTClientsViewController::addObject() {
   auto* client = WTClient::insertNewObject(context());
+  context()->undoManager().setActionName(tr("New Client"));
   context()->processPendingChanges();
   arrayController()->rearrangeObjects();
   editObject(client, false);

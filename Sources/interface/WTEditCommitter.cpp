@@ -72,6 +72,18 @@ bool WTEditCommitter::commitWithoutEnding(QWidget* focus) {
   return false;
 }
 
+bool WTEditCommitter::hasTypingToUndo(const QWidget* focus) {
+  if (auto* edit = qobject_cast<const QLineEdit*>(focus)) return edit->isUndoAvailable();
+  if (auto* text = qobject_cast<const QPlainTextEdit*>(focus)) return text->document()->isUndoAvailable();
+  return false;
+}
+
+bool WTEditCommitter::hasTypingToRedo(const QWidget* focus) {
+  if (auto* edit = qobject_cast<const QLineEdit*>(focus)) return edit->isRedoAvailable();
+  if (auto* text = qobject_cast<const QPlainTextEdit*>(focus)) return text->document()->isRedoAvailable();
+  return false;
+}
+
 bool WTEditCommitter::undoTyping(QWidget* focus) {
   if (auto* edit = qobject_cast<QLineEdit*>(focus); edit && edit->isUndoAvailable()) {
     edit->undo();

@@ -17,6 +17,9 @@ bool commitWithoutEnding(QWidget* focus);
 bool undoTyping(QWidget* focus);
 // Its counterpart for Redo.
 bool redoTyping(QWidget* focus);
+// Whether undoTyping and redoTyping would take anything back in `focus`.
+bool hasTypingToUndo(const QWidget* focus);
+bool hasTypingToRedo(const QWidget* focus);
 
 // Before the records themselves are undone: an open cell editor with nothing typed in it is closed (it
 // would otherwise show, and later store, a value the undo replaced), the keyboard focus going to its

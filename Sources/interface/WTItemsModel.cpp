@@ -696,6 +696,9 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
   Node* node = nodeOf(index);
   if (!node->object) return false;
   WTObject* object = node->object;
+  QString stepName = tr("Typing");
+  if (role == CompletedRole) stepName = value.toBool() ? tr("Complete To-Do") : tr("Reopen To-Do");
+  const WTUndoManager::NamedStep step(context_->undoManager(), stepName);
   switch (role) {
     case Qt::EditRole:
     case NameRole:
@@ -842,6 +845,7 @@ bool WTItemsModel::canDropMimeData(const QMimeData* data, Qt::DropAction, int ro
 bool WTItemsModel::dropMimeData(const QMimeData* data, Qt::DropAction action, int row, int column,
                                 const QModelIndex& parent) {
   if (!canDropMimeData(data, action, row, column, parent)) return false;
+  const WTUndoManager::NamedStep step(context_->undoManager(), tr("Move"));
   const QStringList uuids = objectUUIDs(data);
   if (containsTasks(data)) {
     QList<WTTask*> tasks = project_->tasks();

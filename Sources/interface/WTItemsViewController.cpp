@@ -179,6 +179,9 @@ QWidget* WTItemsViewController::loadView() {
           &WTOutlineView::noteHeightOfRowChanged);
   connect(outlineView_, &WTOutlineView::editRequested, this, [this](const QModelIndex& index) {
     if (!treeController_->objectAt(index)) return;
+    // The row renamed is the one selected, alone, so that a Delete after it takes nothing else.
+    outlineView_->selectionModel()->select(index,
+                                           QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
     delegate_->setEditField(WTItemCellDelegate::Field::Name);
     outlineView_->edit(index);
   });
@@ -326,11 +329,14 @@ void WTItemsViewController::addObject() {
   if (!project_) return;
   auto* task = WTTask::insertNewObject(context_);
   task->setProject(project_);
+  context_->undoManager().setActionName(tr("New Task"));
   context_->processPendingChanges();
   treeController_->processChanges();
   const QModelIndex index = treeController_->indexOfObject(task);
   if (!index.isValid()) return;
-  outlineView()->setCurrentIndex(index);
+  // The new row alone: the keys that asked for it (Ctrl+N) must not add it to the old selection.
+  outlineView()->selectionModel()->setCurrentIndex(
+      index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
   delegate_->setEditField(WTItemCellDelegate::Field::Name);
   outlineView_->edit(index);
   outlineView_->scrollTo(index);
@@ -343,13 +349,13 @@ void WTItemsViewController::removeSelectedObjects() {
   for (const QModelIndex& index : outlineView_->selectionModel()->selectedRows()) {
     if (WTObject* object = treeController_->objectAt(index)) objects.append(object);
   }
-  for (WTObject* object : objects) context_->deleteObject(object);
-  treeController_->processChanges();
+  if (deleteObjects(context_, objects)) treeController_->processChanges();
 }
 
 void WTItemsViewController::toggleArchive() {
   if (!project_) return;
   project_->setArchived(!project_->archived());
+  context_->undoManager().setActionName(project_->archived() ? tr("Archive") : tr("Unarchive"));
   emit validationChanged();
 }
 
@@ -380,6 +386,23 @@ WTItem* WTItemsViewController::addItem(WTEntity kind, WTTask* task) {
   if (!task || !WTEntities::isItem(kind)) return nullptr;
   auto* item = static_cast<WTItem*>(context_->insertNewObject(kind));
   item->setTask(task);
+  switch (kind) {
+    case WTEntity::Time:
+      context_->undoManager().setActionName(tr("New Time Entry"));
+      break;
+    case WTEntity::Flat:
+      context_->undoManager().setActionName(tr("New Flat Fee"));
+      break;
+    case WTEntity::Expense:
+      context_->undoManager().setActionName(tr("New Expense"));
+      break;
+    case WTEntity::ToDo:
+      context_->undoManager().setActionName(tr("New To-Do"));
+      break;
+    default:
+      context_->undoManager().setActionName(tr("New Note"));
+      break;
+  }
   selectItem(item);
   return item;
 }
@@ -464,6 +487,7 @@ void WTItemsViewController::popoverWillClose() {
   // Only a new day moves the item: closing without a choice leaves it (and its seconds) alone.
   if (picked.isValid() && picked != old.date()) {
     item->setDate(Date::fromQDateTime(QDateTime(picked, old.time())));
+    context_->undoManager().setActionName(tr("Move"));
     refreshChildren(item);
   }
 }

@@ -52,7 +52,8 @@ class WTItemsViewController : public WTViewController {
   bool respondsTo(Command command) const override;
   // A new task in the project, its name edited at once.
   void addObject() override;
-  // Deletes the selected tasks and items, without asking (undo brings them back).
+  // Deletes the selected tasks and items; a task holding items, or a running timer, is asked about
+  // first (undo brings everything back).
   void removeSelectedObjects() override;
   // Archives or unarchives the project.
   void toggleArchive() override;

@@ -35,6 +35,13 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
   const QString image = index.data(WTObjectListModel::ImageRole).toString();
   if (!image.isEmpty())
     painter->drawPixmap(icon.topLeft(), WTImages::pixmap(image, icon.size().toSize(), ratio));
+  // A stopwatch on the icon's corner: a timer runs in this project (which is why an archived one is
+  // listed).
+  if (index.data(WTObjectListModel::RunningRole).toBool()) {
+    const QSizeF badge = icon.size() / 2;
+    painter->drawPixmap((icon.bottomRight() - QPointF(badge.width(), badge.height())).toPoint(),
+                        WTImages::pixmap(QStringLiteral("StopWatch"), badge.toSize(), ratio));
+  }
 
   const QColor text = selected   ? (archived ? dimSelectedText : selectedText)
                       : archived ? RZColor::calibratedWhite(0.55)

@@ -36,7 +36,7 @@ void WTListView::keyPressEvent(QKeyEvent* event) {
   const bool editing = state() == QAbstractItemView::EditingState;
   if (!editing && (event->key() == Qt::Key_Return || event->key() == Qt::Key_Enter) &&
       currentIndex().isValid()) {
-    edit(currentIndex());
+    editRow(currentIndex().row(), false);
     return;
   }
   if (!editing && event->key() == Qt::Key_Right && event->modifiers() == Qt::NoModifier &&

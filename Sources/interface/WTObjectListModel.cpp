@@ -44,8 +44,13 @@ QString imageOf(const WTObject* object) {
   }
 }
 
+bool isRunning(const WTObject* object) {
+  return object->entity() == WTEntity::Project && static_cast<const WTProject*>(object)->running();
+}
+
+// The keys that decide a record's row: its place in the order, or whether it is listed at all.
 bool isSortKey(const QString& key) {
-  return key == QLatin1String("name") || key == QLatin1String("archived");
+  return key == QLatin1String("name") || key == QLatin1String("archived") || key == QLatin1String("running");
 }
 
 bool isShownKey(const QString& key) {
@@ -94,7 +99,11 @@ QModelIndex WTObjectListModel::indexOfObject(const WTObject* object) const {
 
 QList<WTObject*> WTObjectListModel::computeArrangement() const {
   QList<WTObject*> result;
-  const auto fetched = context_->fetchObjectsForEntityName(WTEntities::name(entity_), {}, predicate_);
+  std::function<bool(const WTObject*)> listed;
+  if (predicate_) {
+    listed = [this](const WTObject* object) { return predicate_(object) || isRunning(object); };
+  }
+  const auto fetched = context_->fetchObjectsForEntityName(WTEntities::name(entity_), {}, listed);
   if (fetched) result = *fetched;
   // By name, ignoring case; the identity breaks ties so the order never flickers between equal names.
   std::sort(result.begin(), result.end(), [](const WTObject* a, const WTObject* b) {
@@ -186,7 +195,9 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
     case NameRole:
       return object->name();
     case Qt::ToolTipRole:
-      return object->notes().isEmpty() ? QVariant() : QVariant(object->notes());
+      if (!object->notes().isEmpty()) return object->notes();
+      if (object->archived() && isRunning(object)) return tr("Archived, listed while a timer runs in it");
+      return {};
     case ObjectRole:
       return variantFromObject(object);
     case SubtitleRole:
@@ -210,6 +221,8 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
       return imageOf(object);
     case ArchivedRole:
       return object->archived();
+    case RunningRole:
+      return isRunning(object);
     case ClientRole:
       if (object->entity() != WTEntity::Project) return {};
       return variantFromObject(static_cast<const WTProject*>(object)->client());
@@ -221,6 +234,8 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
 bool WTObjectListModel::setData(const QModelIndex& index, const QVariant& value, int role) {
   if (!checkIndex(index, CheckIndexOption::IndexIsValid | CheckIndexOption::ParentIsInvalid)) return false;
   WTObject* object = arranged_[index.row()];
+  const WTUndoManager::NamedStep step(context_->undoManager(),
+                                      role == ClientRole ? tr("Change Client") : tr("Typing"));
   switch (role) {
     case Qt::EditRole:
     case NameRole:
@@ -252,6 +267,7 @@ QHash<int, QByteArray> WTObjectListModel::roleNames() const {
   names.insert(CostTextRole, "costText");
   names.insert(ImageRole, "image");
   names.insert(ArchivedRole, "archived");
+  names.insert(RunningRole, "running");
   return names;
 }
 

@@ -16,6 +16,9 @@ class WTObjectContext;
 // without regard to case, and kept up to date from the context's change notices with exact row
 // inserts, removals and moves, never a reset after the first fill. Text, totals and images are
 // offered under the roles below.
+//
+// A project in which a timer runs is listed whatever the filter says: a running timer is never out of
+// sight, even on an archived project (which stays archived, and is marked as running).
 class WTObjectListModel : public QAbstractListModel {
   Q_OBJECT
  public:
@@ -27,7 +30,8 @@ class WTObjectListModel : public QAbstractListModel {
     CostTextRole,
     ImageRole,
     ArchivedRole,
-    ClientRole,  // projects: the client (WTObject* as quintptr), settable
+    ClientRole,   // projects: the client (WTObject* as quintptr), settable
+    RunningRole,  // projects: whether a timer runs in it
   };
 
   // `context` is not owned and must outlive the model.

@@ -100,7 +100,7 @@ WTObject* WTObjectListViewController::selectedObject() const {
 
 void WTObjectListViewController::removeSelectedObjects() {
   if (tableView_) tableView_->endEditing();
-  for (WTObject* object : selectedObjects()) context_->deleteObject(object);
+  if (!deleteObjects(context_, selectedObjects())) return;
   arrayController_->rearrangeObjects();
   emit validationChanged();
 }
@@ -114,6 +114,7 @@ void WTObjectListViewController::toggleArchive() {
   WTObject* target = tableView_ && tableView_->clickedRow() >= 0 ? clickedObject() : selectedObject();
   if (!target) return;
   target->setArchived(!target->archived());
+  context_->undoManager().setActionName(target->archived() ? tr("Archive") : tr("Unarchive"));
   emit validationChanged();
 }
 
@@ -126,8 +127,8 @@ QMenu* WTObjectListViewController::rowMenu() {
   archive->setData(1);  // the tag the menu update looks for
   rowMenu_->addSeparator();
   rowMenu_->addAction(tr("Delete"), this, [this] {
-    if (WTObject* object = clickedObject()) {
-      context_->deleteObject(object);
+    WTObject* object = clickedObject();
+    if (object && deleteObjects(context_, {object})) {
       arrayController_->rearrangeObjects();
       emit validationChanged();
     }

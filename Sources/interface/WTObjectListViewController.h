@@ -41,7 +41,8 @@ class WTObjectListViewController : public WTViewController {
   bool respondsTo(Command command) const override;
   // The last of the selected records; none without a selection.
   WTObject* selectedObject() const override;
-  // Deletes the selected records at once, without asking (undo brings them back).
+  // Deletes the selected records; a project holding items, or a running timer, is asked about first
+  // (undo brings everything back).
   void removeSelectedObjects() override;
   // Flips `archived` of the right-clicked row's record while its menu is open, else of the last
   // selected record; nothing without either.

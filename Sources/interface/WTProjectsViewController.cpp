@@ -37,6 +37,7 @@ void WTProjectsViewController::addObject() {
   auto* task = WTTask::insertNewObject(context());
   task->setName(tr("General"));
   task->setProject(project);
+  context()->undoManager().setActionName(tr("New Project"));
   context()->processPendingChanges();
   arrayController()->rearrangeObjects();
   editObject(project, true);

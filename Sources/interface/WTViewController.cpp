@@ -1,6 +1,8 @@
 #include "WTViewController.h"
 
+#include "WTDeletion.h"
 #include "WTNavigationController.h"
+#include "WTObjectContext.h"
 
 #include <QTimer>
 
@@ -39,4 +41,15 @@ void WTViewController::popViewController() {
 
 bool WTViewController::respondsTo(Command) const {
   return false;
+}
+
+bool WTViewController::deleteObjects(WTObjectContext* context, const QList<WTObject*>& objects) {
+  const WTDeletion deletion(objects);
+  if (deletion.objects().isEmpty()) return false;
+  WTNavigationHost* host = navigationHost();
+  if (deletion.needsQuestion() && host && !host->confirmDeletion(deletion.question(), deletion.detail()))
+    return false;
+  for (WTObject* object : deletion.objects()) context->deleteObject(object);
+  context->undoManager().setActionName(deletion.undoName());
+  return true;
 }

@@ -6,6 +6,7 @@
 
 class WTNavigationController;
 class WTObject;
+class WTObjectContext;
 
 // What a window that holds navigation stacks offers the controllers inside them.
 class WTNavigationHost {
@@ -15,6 +16,9 @@ class WTNavigationHost {
   virtual WTNavigationController* currentNavigationController() const = 0;
   virtual void showProjects() = 0;
   virtual void showClients() = 0;
+  // Asks the user whether to delete what `question` names (`detail`, when not empty, says more);
+  // true for "Delete".
+  virtual bool confirmDeletion(const QString& question, const QString& detail) = 0;
 };
 
 // Base of every list controller that lives in a navigation stack. It owns its view (made on first
@@ -58,6 +62,10 @@ class WTViewController : public QObject {
 
  protected:
   virtual QWidget* loadView() = 0;
+  // Deletes `objects` (and what they hold) from `context` as one undo step named after them. When
+  // items or a running timer would go, the host window asks first (outside one nobody can be asked);
+  // returns false when the user kept them.
+  bool deleteObjects(WTObjectContext* context, const QList<WTObject*>& objects);
 
  private:
   QPointer<QWidget> view_;

@@ -22,6 +22,7 @@ const std::vector<Declaration>& declarations(WTEntity entity) {
       {"duration", {"tasks"}},     {"cost", {"duration", "rate"}},
       {"tasksArray", {"tasks"}},   {"rate", {"inheritedRate", "client", "client.rate"}},
       {"inheritedRate", {"rate"}}, {"tableImage", {"archived"}},
+      {"running", {"tasks"}},
   };
   static const std::vector<Declaration> task = {
       {"duration", {"items"}},           {"cost", {"rate", "items"}},  {"rate", {"project", "project.rate"}},

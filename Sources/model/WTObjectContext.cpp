@@ -38,6 +38,7 @@ QString inverseKey(WTEntity entity) {
 
 WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent)
     : QObject(parent), defaults_(defaults) {
+  undo_.setChangeHandler([this] { emit undoStateChanged(); });
   if (defaults_) {
     connect(defaults_, &UserDefaults::valueChanged, this, [this](const QString& key) {
       if (key == QLatin1String("WTDefaultRate")) defaultRateDidChange();
@@ -65,7 +66,8 @@ void WTObjectContext::defaultRateDidChange() {
 
 WTObjectContext::~WTObjectContext() {
   if (gDefaultContext == this) gDefaultContext = nullptr;
-  // Undo actions capture records; drop them before the records go.
+  // Undo actions capture records; drop them before the records go. Nobody is told: this is going.
+  undo_.setChangeHandler({});
   undo_.removeAllActions();
   // Records go first, while the observer tables they may still unregister from are alive.
   for (auto& list : objects_) list.clear();
@@ -292,7 +294,12 @@ void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int old
     if (!owner) continue;
     announce(owner, inverse);
     // A task's totals follow its items; the chain goes on up to project and client.
-    if (owner->entity() == WTEntity::Task) static_cast<WTTask*>(owner)->itemsDidChange();
+    if (owner->entity() != WTEntity::Task) continue;
+    auto* task = static_cast<WTTask*>(owner);
+    task->itemsDidChange();
+    // A running entry that comes or goes starts or stops the task's (and project's) timer.
+    if (object->entity() == WTEntity::Time && static_cast<WTTime*>(object)->running())
+      task->runningDidChange();
   }
 }
 

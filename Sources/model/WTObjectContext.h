@@ -119,6 +119,8 @@ class WTObjectContext : public QObject {
   // Every announcement of a key, derived keys included.
   void objectValueDidChange(WTObject* object, const QString& key);
   void didSave();
+  // What Undo and Redo would do, or their names, may have changed.
+  void undoStateChanged();
 
  private:
   friend class WTObject;

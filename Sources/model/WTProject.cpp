@@ -5,6 +5,8 @@
 #include "WTStoreRecord.h"
 #include "WTTask.h"
 
+#include <algorithm>
+
 WT_ENTITY_CLASS_IMPL(WTProject)
 
 void WTProject::setClient(WTClient* client) {
@@ -59,6 +61,14 @@ void WTProject::costDidChange() {
   if (client_) client_->costDidChange();
 }
 
+bool WTProject::running() const {
+  return std::any_of(tasks_.begin(), tasks_.end(), [](const WTTask* task) { return task->running(); });
+}
+
+void WTProject::runningDidChange() {
+  announce(QStringLiteral("running"));
+}
+
 QString WTProject::tableImage() const {
   return archived() ? QStringLiteral("folder_32_dis") : QStringLiteral("folder_32");
 }
@@ -73,6 +83,7 @@ QVariant WTProject::valueForKey(const QString& key) const {
   if (key == QLatin1String("duration")) return duration();
   if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
   if (key == QLatin1String("tableImage")) return tableImage();
+  if (key == QLatin1String("running")) return running();
   return WTObject::valueForKey(key);
 }
 

@@ -34,6 +34,10 @@ class WTProject final : public WTObject {
   void durationDidChange();
   void costDidChange();
 
+  // Whether a timer runs in one of its tasks; announced as "running".
+  bool running() const;
+  void runningDidChange();
+
   // "folder_32", or "folder_32_dis" when archived.
   QString tableImage() const;
 

@@ -271,6 +271,7 @@ std::optional<Date> WTTask::maxTimeEndDate() const {
 
 void WTTask::runningDidChange() {
   announce(QStringLiteral("running"));
+  if (project_) project_->runningDidChange();
 }
 
 void WTTask::stopAllTimers() {

@@ -5,6 +5,8 @@
 #include "WTStoreRecord.h"
 #include "WTTask.h"
 
+#include <QCoreApplication>
+
 #include <cmath>
 #include <limits>
 
@@ -27,6 +29,8 @@ void WTTime::setRunning(bool running) {
     setEndDate(Date::now());
   }
   if (task()) task()->runningDidChange();
+  context()->undoManager().setActionName(running ? QCoreApplication::translate("WTTime", "Start Timer")
+                                                 : QCoreApplication::translate("WTTime", "Stop Timer"));
 }
 
 void WTTime::storedValueDidChange(const QString& key) {

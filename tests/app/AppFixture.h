@@ -24,9 +24,15 @@ class RecordingPresenter final : public WTAlertPresenter {
     ++questions;
     return quitAnyway;
   }
+  bool confirmDeletion(const QString& question, const QString& detail) override {
+    deletionQuestions << (detail.isEmpty() ? question : question + u' ' + detail);
+    return deletes;
+  }
   QStringList errors;
   int questions = 0;
   bool quitAnyway = false;
+  QStringList deletionQuestions;
+  bool deletes = true;
 };
 
 class AppTest : public ::testing::Test {

@@ -4,13 +4,16 @@
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
+#include "WTDialogAlertPresenter.h"
 #include "WTExportController.h"
+#include "WTItemsModel.h"
 #include "WTItemsViewController.h"
 #include "WTListView.h"
 #include "WTMainWindowController.h"
 #include "WTNavigationController.h"
 #include "WTObjectContext.h"
 #include "WTObjectListModel.h"
+#include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
 #include "WTReportWindowController.h"
@@ -23,9 +26,14 @@
 #include <QAction>
 #include <QButtonGroup>
 #include <QDir>
+#include <QLineEdit>
+#include <QMessageBox>
 #include <QScreen>
 #include <QTemporaryDir>
 #include <QTest>
+#include <QTimer>
+
+#include <functional>
 
 namespace {
 
@@ -184,6 +192,79 @@ TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnThe
   reports.front()->close();
 }
 
+// Ctrl+N over a selected task whose timer runs, "Temp", Return, Del: only the new task goes, and the
+// Edit menu names each step.
+TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeARunningTimerGoes) {
+  open();
+  WTObjectContext* context = delegate->managedObjectContext();
+  WTProject* project = window->fetchProjects().front();
+  WTTask* task = project->tasks().front();
+  task->toggleTimer();
+  window->projectsViewController()->openProject(project);
+  ASSERT_TRUE(
+      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  WTOutlineView* outline = items->outlineView();
+  auto selected = [&] {
+    QList<WTObject*> objects;
+    for (const QModelIndex& index : outline->selectionModel()->selectedRows())
+      objects << items->treeController()->objectAt(index);
+    return objects;
+  };
+  outline->setCurrentIndex(items->treeController()->indexOfObject(task));
+  window->activateWindow();
+  ASSERT_TRUE(QTest::qWaitForWindowActive(window.get()));
+  outline->setFocus();
+
+  QTest::keyClick(outline, Qt::Key_N, Qt::ControlModifier);
+  auto* editor = qobject_cast<QLineEdit*>(outline->indexWidget(outline->currentIndex()));
+  ASSERT_NE(editor, nullptr);
+  QTest::keyClicks(editor, "Temp");
+  QTest::keyClick(editor, Qt::Key_Return);
+  QCoreApplication::processEvents();  // the editor commits on the next turn
+  context->processPendingChanges();
+  ASSERT_EQ(project->tasks().size(), 2);
+  WTTask* temp = project->tasks().last();
+  EXPECT_EQ(temp->name(), "Temp");
+  EXPECT_EQ(selected(), QList<WTObject*>{temp});
+  QAction* undo = window->findChild<QAction*>("undo");
+  QAction* redo = window->findChild<QAction*>("redo");
+  auto text = [](const QAction* action) { return action->text().toStdString(); };
+  auto asked = [&] { return presenter.deletionQuestions.join(" | ").toStdString(); };
+  EXPECT_EQ(text(undo), "&Undo Typing");
+
+  QTest::keyClick(outline, Qt::Key_Delete);  // an empty task goes without a question
+  context->processPendingChanges();
+  EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
+  EXPECT_TRUE(task->running());
+  EXPECT_EQ(asked(), "");
+  EXPECT_EQ(text(undo), "&Undo Delete “Temp”");
+  undo->trigger();
+  context->processPendingChanges();
+  EXPECT_EQ(project->tasks().size(), 2);
+  EXPECT_EQ(text(redo), "&Redo Delete “Temp”");
+  EXPECT_EQ(text(undo), "&Undo Typing");
+
+  // Renaming with Return also leaves the renamed row selected alone.
+  outline->selectionModel()->select(items->treeController()->indexOfObject(task),
+                                    QItemSelectionModel::Select | QItemSelectionModel::Rows);
+  outline->selectionModel()->setCurrentIndex(items->treeController()->indexOfObject(temp),
+                                             QItemSelectionModel::Select | QItemSelectionModel::Rows);
+  QTest::keyClick(outline, Qt::Key_Return);
+  EXPECT_TRUE(outline->isEditing());
+  EXPECT_EQ(selected(), QList<WTObject*>{temp});
+  outline->endEditing();
+
+  // The task with the running timer: asked first, and kept when the answer is no.
+  presenter.deletes = false;
+  outline->selectionModel()->setCurrentIndex(items->treeController()->indexOfObject(task),
+                                             QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  QTest::keyClick(outline, Qt::Key_Delete);
+  EXPECT_EQ(asked(), "Delete “Default Task” and its 1 item? A timer is running in it.");
+  EXPECT_TRUE(project->tasks().contains(task));
+  EXPECT_TRUE(task->running());
+}
+
 TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   open();
   WTObjectContext* context = delegate->managedObjectContext();
@@ -239,6 +320,34 @@ TEST_F(WTMainWindowControllerTest, TheWindowFitsTheScreenAndKeepsItsPlace) {
 
   open();
   EXPECT_EQ(window->size(), QSize(700, 480));
+}
+
+}  // namespace
+
+namespace {
+
+// The desktop's question before a deletion: Return keeps everything, only "Delete" deletes.
+TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenInto) {
+  WTDialogAlertPresenter presenter;
+  auto whenShown = [](const std::function<void(QMessageBox*)>& act) {
+    QTimer::singleShot(0, [act] {
+      auto* box = qobject_cast<QMessageBox*>(QApplication::activeModalWidget());
+      ASSERT_NE(box, nullptr);
+      act(box);
+    });
+  };
+  whenShown([](QMessageBox* box) {
+    EXPECT_EQ(box->text().toStdString(), "Delete “General” and its 14 items?");
+    EXPECT_EQ(box->informativeText().toStdString(), "A timer is running in it.");
+    QTest::keyClick(box, Qt::Key_Return);
+  });
+  EXPECT_FALSE(presenter.confirmDeletion("Delete “General” and its 14 items?", "A timer is running in it."));
+  whenShown([](QMessageBox* box) {
+    for (QAbstractButton* button : box->buttons()) {
+      if (button->text() == "Delete") QTest::mouseClick(button, Qt::LeftButton);
+    }
+  });
+  EXPECT_TRUE(presenter.confirmDeletion("Delete “General” and its 14 items?", QString()));
 }
 
 }  // namespace

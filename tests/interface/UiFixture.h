@@ -25,14 +25,21 @@
 
 #include <memory>
 
-// A window that hosts one navigation stack, as the main window does.
+// A window that hosts one navigation stack, as the main window does. Asked about a deletion, it
+// records the question and its detail and answers `deletes`.
 class TestHostWindow : public QMainWindow, public WTNavigationHost {
  public:
   WTNavigationController* stack = nullptr;
   int clientsShown = 0;
+  QStringList questions;
+  bool deletes = true;
   WTNavigationController* currentNavigationController() const override { return stack; }
   void showProjects() override {}
   void showClients() override { ++clientsShown; }
+  bool confirmDeletion(const QString& question, const QString& detail) override {
+    questions << (detail.isEmpty() ? question : question + u' ' + detail);
+    return deletes;
+  }
 };
 
 // A project's items outline shown in a host window, as the main window shows it, with its first

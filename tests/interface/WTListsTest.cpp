@@ -1,6 +1,7 @@
 #include "UiFixture.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
+#include "WTDeletion.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
 #include "WTListView.h"
@@ -99,6 +100,89 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
                                WTObjectListModel::ClientRole));
 }
 
+TEST_F(WTObjectListModelTest, AnArchivedProjectIsListedAndMarkedWhileATimerRunsInIt) {
+  auto* project = makeProject("Default Project");
+  WTTask* task = makeTask(project, "Default Task");
+  makeProject("Other");
+  project->setArchived(true);
+  WTObjectListModel model(context.get(), WTEntity::Project);
+  QAbstractItemModelTester tester(&model, QAbstractItemModelTester::FailureReportingMode::Fatal);
+  model.setFilterPredicate(notArchived);
+  EXPECT_EQ(names(model), QStringList{"Other"});
+
+  // Started from elsewhere (the tray), the timer brings its archived project into the list, still archived.
+  WTTime* time = task->toggleTimer();
+  endTurn();
+  ASSERT_EQ(names(model), (QStringList{"Default Project", "Other"}));
+  const QModelIndex row = model.indexOfObject(project);
+  EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
+  EXPECT_TRUE(row.data(WTObjectListModel::RunningRole).toBool());
+  EXPECT_FALSE(model.index(1, 0).data(WTObjectListModel::RunningRole).toBool());
+  EXPECT_TRUE(project->archived());
+
+  task->toggleTimer();  // stopped: it goes back out of sight
+  endTurn();
+  EXPECT_EQ(names(model), QStringList{"Other"});
+  time->setRunning(true);
+  endTurn();
+  EXPECT_EQ(names(model).size(), 2);
+  context->deleteObject(time);  // the running entry goes, and the project with it
+  endTurn();
+  EXPECT_EQ(names(model), QStringList{"Other"});
+  context->undoManager().undo();
+  endTurn();
+  EXPECT_EQ(names(model).size(), 2);
+}
+
+// What a deletion asks and how Undo names it, for selections of records holding what goes with them.
+TEST_F(WTObjectListModelTest, ADeletionAsksOnlyWhenItemsOrARunningTimerGoAndNamesWhatGoes) {
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setName("ACME");
+  auto* site = makeProject("Site");
+  site->setClient(client);
+  WTTask* general = makeTask(site, "General");
+  WTTask* empty = makeTask(site, "Temp");
+  WTTask* build = makeTask(site, "");
+  for (int i = 0; i < 14; ++i) makeItem<WTNote>(general, "note", at(2024, 3, 1));
+  WTNote* note = general->items().isEmpty() ? nullptr : static_cast<WTNote*>(general->items().first());
+  makeItem<WTFlat>(build, "fee", at(2024, 3, 2));
+  WTTime* running = build->toggleTimer();
+  running->setName("");
+  auto* idle = makeProject("Idle");
+  makeTask(idle, "General");
+
+  struct Row {
+    QList<WTObject*> selected;
+    const char* question;  // empty: nothing worth asking about
+    const char* undoName;
+  };
+  const Row rows[] = {
+      {{empty}, "", "Delete “Temp”"},
+      {{general}, "Delete “General” and its 14 items?", "Delete “General”"},
+      {{general, note}, "Delete “General” and its 14 items?", "Delete “General”"},  // the note goes with it
+      {{general, empty}, "Delete 2 tasks and their 14 items?", "Delete 2 Tasks"},
+      {{running}, "Delete this time entry? Its timer is running.", "Delete Time Entry"},
+      {{note, running}, "Delete 2 items? A timer is running among them.", "Delete 2 Items"},
+      {{build}, "Delete this task and its 2 items? A timer is running in it.", "Delete Task"},
+      {{site}, "Delete “Site” and its 16 items? A timer is running in it.", "Delete “Site”"},
+      {{site, idle},
+       "Delete 2 projects and their 16 items? A timer is running among them.",
+       "Delete 2 Projects"},
+      {{idle}, "", "Delete “Idle”"},  // only an empty task
+      {{empty, note}, "", "Delete 2 Rows"},
+      {{client}, "", "Delete “ACME”"},  // its projects stay
+  };
+  for (const Row& row : rows) {
+    const WTDeletion deletion(row.selected);
+    const QString asked = deletion.needsQuestion()
+                              ? (deletion.detail().isEmpty() ? deletion.question()
+                                                             : deletion.question() + ' ' + deletion.detail())
+                              : QString();
+    EXPECT_EQ(asked, QString::fromUtf8(row.question)) << row.undoName;
+    EXPECT_EQ(deletion.undoName(), QString::fromUtf8(row.undoName));
+  }
+}
+
 class WTListControllerTest : public UiTest {
  protected:
   void SetUp() override {
@@ -192,7 +276,7 @@ TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowNotTheSelection) {
   EXPECT_FALSE(archived->archived());
 }
 
-TEST_F(WTListControllerTest, TheToolbarArchiveTakesTheLastSelectedAndRemoveDeletesAtOnce) {
+TEST_F(WTListControllerTest, TheToolbarArchiveTakesTheLastSelectedAndRemoveAsksWhenItemsGo) {
   auto* a = makeProject("A");
   auto* b = makeProject("B");
   auto* c = makeProject("C");
@@ -217,6 +301,21 @@ TEST_F(WTListControllerTest, TheToolbarArchiveTakesTheLastSelectedAndRemoveDelet
   EXPECT_EQ(projects->selectedObject(), nullptr);
   projects->toggleArchive();  // nothing selected: nothing happens
   EXPECT_FALSE(b->archived());
+  EXPECT_EQ(window->questions, QStringList{});  // nothing of value went
+
+  // A project holding items is asked about, by the toolbar and by its row's menu alike.
+  makeItem<WTNote>(makeTask(b, "General"), "note", at(2024, 3, 1));
+  window->deletes = false;
+  projects->selectObject(b);
+  projects->removeSelectedObjects();
+  EXPECT_EQ(window->questions, QStringList{"Delete “B” and its 1 item?"});
+  EXPECT_TRUE(context->fetch<WTProject>().contains(b));
+  window->deletes = true;
+  projects->tableView()->setClickedRow(projects->arrayController()->rowOfObject(b));
+  projects->rowMenu()->actions().last()->trigger();
+  EXPECT_EQ(window->questions.size(), 2);
+  EXPECT_FALSE(context->fetch<WTProject>().contains(b));
+  EXPECT_EQ(context->undoManager().undoActionName(), "Delete “B”");
 }
 
 TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {

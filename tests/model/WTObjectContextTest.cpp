@@ -204,6 +204,50 @@ TEST_F(WTObjectContextTest, UndoTakesBackOneEventLoopTurnAtATime) {
   EXPECT_FALSE(context->undoManager().canRedo());
 }
 
+TEST_F(WTObjectContextTest, EachUndoStepKeepsTheNameOfWhatMadeItThroughUndoAndRedo) {
+  WTUndoManager& undo = context->undoManager();
+  QSignalSpy changed(context.get(), &WTObjectContext::undoStateChanged);
+  WTTask* task = makeTask(nullptr, "before");
+  context->processPendingChanges();
+  EXPECT_EQ(undo.undoActionName(), "");  // nobody named it
+
+  task->toggleTimer();
+  context->processPendingChanges();
+  EXPECT_EQ(undo.undoActionName(), "Start Timer");
+  task->setName("after");
+  undo.setActionName("Typing");
+  undo.setActionName("Rename");  // the last name of the turn wins
+  context->processPendingChanges();
+  // A name given in a turn that changed nothing names nothing.
+  undo.setActionName("Nothing");
+  { const WTUndoManager::NamedStep unchanged(undo, "Unchanged"); }
+  context->processPendingChanges();
+  EXPECT_EQ(undo.undoActionName(), "Rename");
+  {
+    const WTUndoManager::NamedStep step(undo, "Typing");
+    task->setNotes("n");
+  }
+  EXPECT_EQ(undo.undoActionName(), "Typing");  // the open step already answers to its name
+  context->processPendingChanges();
+
+  changed.clear();
+  undo.undo();
+  EXPECT_EQ(undo.undoActionName(), "Rename");
+  EXPECT_EQ(undo.redoActionName(), "Typing");
+  undo.undo();
+  EXPECT_EQ(undo.undoActionName(), "Start Timer");
+  EXPECT_EQ(undo.redoActionName(), "Rename");
+  undo.redo();
+  EXPECT_EQ(undo.undoActionName(), "Rename");
+  EXPECT_EQ(undo.redoActionName(), "Typing");
+  EXPECT_EQ(task->name(), "after");
+  EXPECT_EQ(changed.count(), 3);
+  // A new change drops what could be redone, and says so.
+  task->setBudget(dec("5"));
+  EXPECT_EQ(undo.redoActionName(), "");
+  EXPECT_EQ(changed.count(), 4);
+}
+
 TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
   auto* project = WTProject::insertNewObject(context.get());
   WTTask* task = makeTask(project);
