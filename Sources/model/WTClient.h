@@ -21,7 +21,6 @@ class WTClient final : public WTObject {
 
   // Own rate, else "WTDefaultRate", else 100.
   Decimal rateFromAbove() const override;
-  void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
@@ -37,6 +36,8 @@ class WTClient final : public WTObject {
   QStringList storedKeys() const override;
 
  protected:
+  // A rate announces the client's cost.
+  void storedValueDidChange(const QString& key) override;
   QVariant primitiveValue(const QString& key) const override;
   bool writePrimitive(const QString& key, const QVariant& value) override;
   QList<WTObject*> relatedObjects(const QString& relationship) const override;

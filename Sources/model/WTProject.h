@@ -24,7 +24,6 @@ class WTProject final : public WTObject {
 
   // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else 50.
   Decimal rateFromAbove() const override;
-  void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
@@ -40,6 +39,8 @@ class WTProject final : public WTObject {
   QStringList storedKeys() const override;
 
  protected:
+  // A rate tells the client its cost changed.
+  void storedValueDidChange(const QString& key) override;
   WTObject* owner() const override;
   QString ownerKey() const override { return QStringLiteral("client"); }
   void relinkOwner(WTObject* owner, int index) override;

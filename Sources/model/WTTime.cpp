@@ -30,7 +30,8 @@ void WTTime::setRunning(bool running) {
 }
 
 void WTTime::storedValueDidChange(const QString& key) {
-  if (key == QLatin1String("endDate")) {
+  // Either end of the span changes its length, whoever moves it: an edit, undo, redo or sync.
+  if (key == QLatin1String("endDate") || key == QLatin1String("startDate")) {
     if (task()) task()->durationDidChange();
   } else if (key == QLatin1String("running")) {
     // The setter tells the task itself once the end date is settled; undo and redo replay values only.
