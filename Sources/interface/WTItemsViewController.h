@@ -122,6 +122,8 @@ class WTItemsViewController : public WTViewController {
   void saveExpandedItems();
   void restoreExpandedItems();
   void refreshHeader();
+  // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.
+  static void setElidedText(QLabel* label, const QString& text);
   // Puts the header's totals over the duration and cost columns of the rows below.
   void alignTotals();
   bool eventFilter(QObject* watched, QEvent* event) override;

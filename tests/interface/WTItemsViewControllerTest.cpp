@@ -14,6 +14,7 @@
 #include <QLabel>
 #include <QLineEdit>
 #include <QMenu>
+#include <QScrollBar>
 #include <QToolTip>
 
 namespace {
@@ -346,29 +347,67 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
 
 namespace {
 
+// The header's name, rate and totals share its width without covering one another, at the narrowest
+// window and with or without a vertical scroll bar beside the rows.
 TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCostColumns) {
-  makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
+  project->setName("The new website of the regional library and its branches");
+  for (int day = 1; day <= 25; ++day) makeItem<WTTime>(design, "Sketches", at(2024, 3, day));
+  endTurn();
+  auto* title = controller->view()->findChild<QLabel*>("projectTitle");
+  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
+  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
+  ASSERT_NE(title, nullptr);
+  ASSERT_NE(duration, nullptr);
+  ASSERT_NE(cost, nullptr);
+  QLineEdit* rate = controller->rateField();
+  EXPECT_EQ(duration->text(), "12:30");
+  for (const bool scrolls : {false, true}) {
+    if (scrolls) outline()->expandAll();
+    for (const QSize size : {QSize(620, 600), QSize(900, 600), QSize(1200, 600)}) {
+      window->resize(size);
+      QApplication::processEvents();
+      SCOPED_TRACE(testing::Message() << size.width() << (scrolls ? " with a scroll bar" : ""));
+      ASSERT_EQ(outline()->verticalScrollBar()->isVisible(), scrolls);
+      EXPECT_EQ(controller->view()->width(), size.width());  // the header does not widen the window
+      const QRect row = outline()->visualRect(rowOf(design));
+      const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
+      WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
+      for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
+                                        std::pair{cost, WTTableCellView::Part::Cost}}) {
+        const QRect column = cell.partRect(part, line).toRect();
+        const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
+        const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
+        EXPECT_EQ(labelLeft.x(), columnLeft.x());
+        EXPECT_EQ(label->width(), column.width());
+      }
+      EXPECT_LT(rate->geometry().right(), duration->geometry().left());
+      EXPECT_LT(title->geometry().right(), rate->geometry().left());
+      // A name too long for its room is shortened visibly, not cut off, and shown whole in its tip.
+      EXPECT_LE(title->fontMetrics().horizontalAdvance(title->text()), title->contentsRect().width());
+      if (title->text() != project->name()) {
+        EXPECT_EQ(title->toolTip(), project->name());
+      }
+    }
+  }
+}
+
+// Totals once waited for the next minute tick after a start was moved or a rate was undone.
+TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRateAtOnce) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
   auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
   auto* cost = controller->view()->findChild<QLabel*>("projectCost");
-  ASSERT_NE(duration, nullptr);
-  ASSERT_NE(cost, nullptr);
+  ASSERT_TRUE(model()->setData(rowOf(time), "11:45", WTItemsModel::StartTimeEditRole));
+  EXPECT_EQ(duration->text(), "00:45");
+  EXPECT_EQ(cost->text().right(5), "37.50");  // at the inherited 50
+  endTurn();
+  design->setRate(Decimal(80));
+  endTurn();
+  EXPECT_EQ(cost->text().right(5), "60.00");
+  context->undoManager().undo();
+  EXPECT_EQ(cost->text().right(5), "37.50");
+  context->undoManager().undo();  // the start
   EXPECT_EQ(duration->text(), "00:30");
-  for (const QSize size : {QSize(900, 600), QSize(700, 500), QSize(1200, 600)}) {
-    window->resize(size);
-    QApplication::processEvents();
-    const QRect row = outline()->visualRect(rowOf(design));
-    const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
-    WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
-    for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
-                                      std::pair{cost, WTTableCellView::Part::Cost}}) {
-      const QRect column = cell.partRect(part, line).toRect();
-      const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
-      const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
-      EXPECT_EQ(labelLeft.x(), columnLeft.x()) << size.width();
-      EXPECT_EQ(label->width(), column.width()) << size.width();
-    }
-  }
 }
 
 }  // namespace

@@ -216,7 +216,7 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
 
     KeyCounter clientDuration(*context, r.client, "duration"), clientCost(*context, r.client, "cost");
     KeyCounter projectDuration(*context, r.project, "duration"), projectCost(*context, r.project, "cost");
-    KeyCounter taskCost(*context, r.task, "cost");
+    KeyCounter taskDuration(*context, r.task, "duration"), taskCost(*context, r.task, "cost");
     const int before = r.client->duration();
     test.change(r);
     EXPECT_GE(clientCost.count, 1);
@@ -225,6 +225,7 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
     if (r.client->duration() != before) {
       EXPECT_GE(clientDuration.count, 1);
       EXPECT_GE(projectDuration.count, 1);
+      EXPECT_GE(taskDuration.count, 1);
     }
     EXPECT_EQ(r.client->duration(), test.duration);
     EXPECT_EQ(r.client->cost(), dec(test.cost));  // at the client's 100
