@@ -429,13 +429,13 @@ WTTime* WTItemsViewController::addStoppedTimeItem(WTTask* task) {
   if (!task) return nullptr;
   auto* time = static_cast<WTTime*>(context_->insertNewObject(WTEntity::Time));
   time->setTask(task);
-  // Time already spent: it ends now and its length is typed at once.
+  // Time already spent ends now: the length typed at once moves its start back.
   time->setEndDate(time->startDate());
   selectItem(time);
   if (outlineView_ && outlineView_->isEditing()) outlineView_->endEditing();
   const QModelIndex index = treeController_->indexOfObject(time);
   if (index.isValid()) {
-    delegate_->setEditField(WTItemCellDelegate::Field::Duration);
+    delegate_->setEditField(WTItemCellDelegate::Field::SpentDuration);
     outlineView_->edit(index);
   }
   return time;

@@ -68,7 +68,8 @@ class WTItemsViewController : public WTViewController {
   WTItem* addItem(WTEntity kind, WTTask* task);
   // The same for a time entry, which then runs at once.
   WTTime* addTimeItem(WTTask* task);
-  // A stopped time entry ending now, selected with its duration being edited; none without a task.
+  // A stopped time entry ending now, selected with its duration being edited (the duration typed moves
+  // its start back); none without a task.
   WTTime* addStoppedTimeItem(WTTask* task);
   // Starts (selecting and editing the new entry) or stops the task's timer.
   void toggleTimerOfTask(WTTask* task);

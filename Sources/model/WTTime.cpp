@@ -56,6 +56,11 @@ void WTTime::setDuration(int minutes) {
   setEndDate(startDate()->addingSeconds(double(minutes) * 60.0));
 }
 
+void WTTime::setDurationKeepingEnd(int minutes) {
+  if (!endDate()) return;
+  setStartDate(endDate()->addingSeconds(-double(minutes) * 60.0));
+}
+
 void WTTime::setDate(const std::optional<Date>& date) {
   if (!date || !startDate()) {
     WTItem::setDate(date);

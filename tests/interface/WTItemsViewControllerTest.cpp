@@ -435,7 +435,11 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   endTurn();
   EXPECT_EQ(time->duration(), 90);
   EXPECT_FALSE(time->running());
-  EXPECT_TRUE(time->endDate().has_value());
+  // Spent already: it ends now, not an hour and a half from now.
+  EXPECT_EQ(time->endDate(), now);
+  EXPECT_EQ(time->startDate(), now.addingSeconds(-90 * 60));
+  EXPECT_EQ(rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30");
+  EXPECT_EQ(rowOf(time).data(WTItemsModel::EndTimeEditRole).toString(), "10:00");
 }
 
 TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
@@ -454,7 +458,16 @@ TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
     QApplication::sendEvent(outline()->viewport(), &help);
     return QToolTip::isVisible() ? QToolTip::text() : QString();
   };
-  EXPECT_TRUE(tipAt(time, WTTableCellView::Part::Duration).contains("double-click"));
+  // Each of an entry's fields says what an edit of it moves and what stays.
+  const std::pair<WTTableCellView::Part, const char*> timeTips[] = {
+      {WTTableCellView::Part::Label, "the end stays"},
+      {WTTableCellView::Part::End, "the start stays"},
+      {WTTableCellView::Part::Duration, "the end moves"},
+  };
+  for (const auto& [part, says] : timeTips) {
+    const QString tip = tipAt(time, part);
+    EXPECT_TRUE(tip.contains("double-click") && tip.contains(says)) << tip.toStdString();
+  }
   EXPECT_TRUE(tipAt(expense, WTTableCellView::Part::Cost).contains("double-click"));
   EXPECT_EQ(tipAt(time, WTTableCellView::Part::Cost), QString());  // a time's cost follows from it
   QToolTip::hideText();
@@ -464,20 +477,19 @@ TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
 
 namespace {
 
-TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) {
+TEST_F(WTItemsViewControllerTest, AnEntrysStartAndEndAreChangedInItsRowEachKeepingTheOther) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
   controller->expandContainerOfItem(time);
   const Date end = *time->endDate();
-  auto typeStart = [&](const char* text) {
+  auto typeInto = [&](WTTableCellView::Part part, const char* editorName, const char* text) {
     const QModelIndex index = rowOf(time);
     const QRect visual = outline()->visualRect(index);
     const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    const QRectF label =
-        controller->cellViewPrototypeForIndex(index).partRect(WTTableCellView::Part::Label, row);
-    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
-    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
-    auto* editor = outline()->viewport()->findChild<QLineEdit*>("startEditor");
+    const QRectF field = controller->cellViewPrototypeForIndex(index).partRect(part, row);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
+    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
+    auto* editor = outline()->viewport()->findChild<QLineEdit*>(editorName);
     if (!editor) return QString("no editor");
     const QString shown = editor->text();
     editor->setText(text);
@@ -486,6 +498,10 @@ TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) 
     QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);  // the closed editor goes
     return shown;
   };
+  auto typeStart = [&](const char* text) {
+    return typeInto(WTTableCellView::Part::Label, "startEditor", text);
+  };
+  auto typeEnd = [&](const char* text) { return typeInto(WTTableCellView::Part::End, "endEditor", text); };
   EXPECT_EQ(typeStart("11:45"), "12:00");
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45));
   EXPECT_EQ(time->endDate(), end);
@@ -497,6 +513,15 @@ TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) 
   EXPECT_EQ(typeStart("9"), "11:45");
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
   EXPECT_EQ(time->duration(), 210);
+
+  EXPECT_EQ(typeEnd("17:20"), "12:30");
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
+  EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20));
+  EXPECT_EQ(time->duration(), 500);
+  for (const char* refused : {"8:59", "24:00", "later"}) {
+    EXPECT_EQ(typeEnd(refused), "17:20") << refused;
+    EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20)) << refused;
+  }
 }
 
 }  // namespace
@@ -521,23 +546,33 @@ TEST_F(WTItemsViewControllerTest, TabWalksThroughAnEntrysFieldsInTheirOrder) {
   QLineEdit* editor = openEditor();
   ASSERT_NE(editor, nullptr);
   EXPECT_EQ(editor->objectName(), "startEditor");
-  editor->setText("11:00");
-  QTest::keyClick(editor, Qt::Key_Tab);
-  editor = openEditor();
+  // Start, end, duration, name; each is committed on the way.
+  const std::pair<const char*, const char*> typed[] = {
+      {"startEditor", "11:00"}, {"endEditor", "12:15"}, {"durationEditor", "1:45"}};
+  for (const auto& [name, text] : typed) {
+    ASSERT_NE(editor, nullptr) << name;
+    EXPECT_EQ(editor->objectName(), name);
+    editor->setText(text);
+    QTest::keyClick(editor, Qt::Key_Tab);
+    editor = openEditor();
+  }
   ASSERT_NE(editor, nullptr);
   EXPECT_EQ(editor->objectName(), "nameEditor");
-  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));  // committed on the way
   editor->setText("Drawings");
-  QTest::keyClick(editor, Qt::Key_Tab);
+  outline()->endEditing();
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));
+  EXPECT_EQ(time->endDate(), at(2024, 3, 13, 12, 45));
+  EXPECT_EQ(time->name(), "Drawings");
+  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  // Back from the name to the duration.
+  controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Name);
+  outline()->edit(rowOf(time));
   editor = openEditor();
   ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "durationEditor");
-  EXPECT_EQ(time->name(), "Drawings");
   QTest::keyClick(editor, Qt::Key_Backtab, Qt::ShiftModifier);
   editor = openEditor();
   ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "nameEditor");
-  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  EXPECT_EQ(editor->objectName(), "durationEditor");
   outline()->endEditing();
 }
 
