@@ -198,9 +198,12 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
   const QRectF label = cell.partRect(WTTableCellView::Part::Label, row);
   if (!label.isEmpty()) {
-    painter.setFont(kind == QLatin1String("WTTime") ? option.font : small);
-    painter.setPen(kind == QLatin1String("WTTime") ? textColour(option) : dimTextColour(option));
-    painter.drawText(label, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::LabelRole).toString());
+    const bool time = kind == QLatin1String("WTTime");
+    painter.setFont(time ? option.font : small);
+    painter.setPen(time ? textColour(option) : dimTextColour(option));
+    // A start stands against the dash before its end.
+    painter.drawText(label, (time ? Qt::AlignRight : Qt::AlignLeft) | Qt::AlignVCenter,
+                     index.data(WTItemsModel::LabelRole).toString());
   }
   // A stopped entry shows where it ends; a running one ends with the clock.
   const QRectF end = cell.partRect(WTTableCellView::Part::End, row);
