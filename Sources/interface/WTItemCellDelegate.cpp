@@ -199,9 +199,20 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
   const QRectF label = cell.partRect(WTTableCellView::Part::Label, row);
   if (!label.isEmpty()) {
-    painter.setFont(kind == QLatin1String("WTTime") ? option.font : small);
-    painter.setPen(kind == QLatin1String("WTTime") ? textColour(option) : dimTextColour(option));
-    painter.drawText(label, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::LabelRole).toString());
+    const bool time = kind == QLatin1String("WTTime");
+    painter.setFont(time ? option.font : small);
+    painter.setPen(time ? textColour(option) : dimTextColour(option));
+    // A start stands against the dash before its end.
+    painter.drawText(label, (time ? Qt::AlignRight : Qt::AlignLeft) | Qt::AlignVCenter,
+                     index.data(WTItemsModel::LabelRole).toString());
+  }
+  // A stopped entry shows where it ends; a running one ends with the clock.
+  const QRectF end = cell.partRect(WTTableCellView::Part::End, row);
+  const QString endText = index.data(WTItemsModel::EndTimeEditRole).toString();
+  if (!end.isEmpty() && !endText.isEmpty()) {
+    painter.drawText(QRectF(label.right(), row.y(), end.left() - label.right(), end.height()),
+                     Qt::AlignCenter, QStringLiteral("–"));
+    painter.drawText(end, Qt::AlignLeft | Qt::AlignVCenter, endText);
   }
   const QRectF box = cell.partRect(WTTableCellView::Part::Checkbox, row);
   if (!box.isEmpty()) {
@@ -288,8 +299,15 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
     field = Field::Name;
   }
   if (field == Field::Amount && kind != QLatin1String("WTExpense")) field = Field::Name;
-  if (field == Field::Start && kind != QLatin1String("WTTime")) field = Field::Name;
-  if (field == Field::Duration && index.data(WTItemsModel::RunningRole).toBool()) return nullptr;
+  if ((field == Field::Start || field == Field::End || field == Field::SpentDuration) &&
+      kind != QLatin1String("WTTime")) {
+    field = Field::Name;
+  }
+  // A running entry's end and length are the clock's.
+  if ((field == Field::Duration || field == Field::End || field == Field::SpentDuration) &&
+      index.data(WTItemsModel::RunningRole).toBool()) {
+    return nullptr;
+  }
   openField_ = field;
   if (field == Field::Notes) {
     auto* editor = new WTNotesTextView(parent);
@@ -310,9 +328,21 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
     font.setBold(model->isTaskIndex(index));
     editor->setFont(font);
   } else {
-    editor->setObjectName(field == Field::Duration ? QStringLiteral("durationEditor")
-                          : field == Field::Start  ? QStringLiteral("startEditor")
-                                                   : QStringLiteral("amountEditor"));
+    switch (field) {
+      case Field::Duration:
+      case Field::SpentDuration:
+        editor->setObjectName(QStringLiteral("durationEditor"));
+        break;
+      case Field::Start:
+        editor->setObjectName(QStringLiteral("startEditor"));
+        break;
+      case Field::End:
+        editor->setObjectName(QStringLiteral("endEditor"));
+        break;
+      default:
+        editor->setObjectName(QStringLiteral("amountEditor"));
+        break;
+    }
     editor->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
     connect(editor, &QLineEdit::textEdited, editor, [editor] { WTRateField::setRefused(editor, {}); });
   }
@@ -342,7 +372,11 @@ void WTItemCellDelegate::setEditorData(QWidget* editor, const QModelIndex& index
   auto* line = static_cast<QLineEdit*>(editor);
   switch (static_cast<Field>(editor->property("field").toInt())) {
     case Field::Duration:
+    case Field::SpentDuration:
       line->setText(index.data(WTItemsModel::DurationEditRole).toString());
+      break;
+    case Field::End:
+      line->setText(index.data(WTItemsModel::EndTimeEditRole).toString());
       break;
     case Field::Amount:
       line->setText(index.data(WTItemsModel::AmountEditRole).toString());
@@ -368,6 +402,12 @@ void WTItemCellDelegate::setModelData(QWidget* editor, QAbstractItemModel* model
     case Field::Duration:
       model->setData(index, line->text(), WTItemsModel::DurationEditRole);
       break;
+    case Field::SpentDuration:
+      model->setData(index, line->text(), WTItemsModel::SpentDurationEditRole);
+      break;
+    case Field::End:
+      model->setData(index, line->text(), WTItemsModel::EndTimeEditRole);
+      break;
     case Field::Amount:
       model->setData(index, line->text(), WTItemsModel::AmountEditRole);
       break;
@@ -391,7 +431,11 @@ void WTItemCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptio
   WTTableCellView::Part part = WTTableCellView::Part::Name;
   switch (static_cast<Field>(editor->property("field").toInt())) {
     case Field::Duration:
+    case Field::SpentDuration:
       part = WTTableCellView::Part::Duration;
+      break;
+    case Field::End:
+      part = WTTableCellView::Part::End;
       break;
     case Field::Amount:
       part = WTTableCellView::Part::Cost;
@@ -438,7 +482,9 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
       text = tr("New To-Do");
       break;
     case Part::DateButton:
-      text = tr("Move to Another Day");
+      text = index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTTime")
+                 ? tr("Move to Another Day — the times of day and the duration stay")
+                 : tr("Move to Another Day");
       break;
     case Part::NotesButton:
       text = tr("Notes");
@@ -447,13 +493,19 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
       // Nothing on the row says these can be changed; the tip does.
       const QString kind = index.data(WTItemsModel::KindRole).toString();
       const bool stopped = !index.data(WTItemsModel::RunningRole).toBool();
-      if (stopped && (kind == QLatin1String("WTTime") || kind == QLatin1String("WTFlat")))
+      if (stopped && kind == QLatin1String("WTTime"))
+        text = tr("Duration — double-click to change it (hours:minutes); the start stays, the end moves");
+      else if (kind == QLatin1String("WTFlat"))
         text = tr("Duration — double-click to change it (hours:minutes)");
       break;
     }
     case Part::Label:
       if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTTime"))
-        text = tr("Start — double-click to change it (hours:minutes)");
+        text = tr("Start — double-click to change it (hours:minutes); the end stays, the duration follows");
+      break;
+    case Part::End:
+      if (!index.data(WTItemsModel::EndTimeEditRole).toString().isEmpty())
+        text = tr("End — double-click to change it (hours:minutes); the start stays, the duration follows");
       break;
     case Part::Cost:
       if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTExpense"))
@@ -486,7 +538,8 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
   const auto part = cell.partAt(mouse->position(), row, hover);
   using Part = WTTableCellView::Part;
   const bool button = part && *part != Part::Name && *part != Part::Duration && *part != Part::Cost &&
-                      *part != Part::Icon && *part != Part::Label && *part != Part::Notes;
+                      *part != Part::Icon && *part != Part::Label && *part != Part::End &&
+                      *part != Part::Notes;
   if (button) {
     // Buttons act on press, like the toolbar's; the release and double click are theirs too.
     if (type == QEvent::MouseButtonPress)
@@ -501,6 +554,8 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
       setEditField(Field::Amount);
     } else if (part == Part::Label && items->kindAt(index) == QLatin1String("WTTime")) {
       setEditField(Field::Start);
+    } else if (part == Part::End && items->kindAt(index) == QLatin1String("WTTime")) {
+      setEditField(Field::End);
     } else if (part == Part::Notes) {
       setEditField(Field::Notes);
     } else if (part == Part::Name && items->objectAt(index)) {
@@ -545,27 +600,37 @@ bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
   const QPersistentModelIndex index = view_->currentIndex();
   const auto* model = qobject_cast<const WTItemsModel*>(index.model());
   if (!model || !model->isItemIndex(index)) return QStyledItemDelegate::eventFilter(object, event);
-  // The fields of the row in the order they stand, left to right.
+  // The fields of the row in the order they are typed: a time entry's times before its name.
   const QString kind = model->kindAt(index);
-  QList<Field> fields;
-  if (kind == QLatin1String("WTTime"))
-    fields = {Field::Start, Field::Name};
-  else
-    fields = {Field::Name};
   const bool running = index.data(WTItemsModel::RunningRole).toBool();
-  if ((kind == QLatin1String("WTTime") && !running) || kind == QLatin1String("WTFlat"))
-    fields.append(Field::Duration);
-  if (kind == QLatin1String("WTExpense")) fields.append(Field::Amount);
-  const int at = fields.indexOf(static_cast<Field>(line->property("field").toInt()));
+  QList<Field> fields;
+  if (kind == QLatin1String("WTTime")) {
+    fields = running ? QList<Field>{Field::Start, Field::Name}
+                     : QList<Field>{Field::Start, Field::End, Field::Duration, Field::Name};
+  } else {
+    fields = {Field::Name};
+    if (kind == QLatin1String("WTFlat")) fields.append(Field::Duration);
+    if (kind == QLatin1String("WTExpense")) fields.append(Field::Amount);
+  }
+  Field current = static_cast<Field>(line->property("field").toInt());
+  if (current == Field::SpentDuration) current = Field::Duration;
+  const int at = fields.indexOf(current);
   const int next = at + (forward ? 1 : -1);
   if (at < 0 || next < 0 || next >= fields.size()) return QStyledItemDelegate::eventFilter(object, event);
+  WTObject* item = model->objectAt(index);
   emit commitData(line);
   emit closeEditor(line, QAbstractItemDelegate::NoHint);
   const Field field = fields[next];
-  QTimer::singleShot(0, view_, [this, index, field] {
-    if (!index.isValid()) return;
+  QTimer::singleShot(0, view_, [this, item, field] {
+    // What was typed may have moved the entry to another day's group: its row is looked up again.
+    WTItemsModel* items = controller_->treeController();
+    items->processChanges();
+    const QModelIndex row = items->indexOfObject(item);
+    if (!row.isValid()) return;
+    controller_->expandContainerOfItem(static_cast<WTItem*>(item));
+    view_->setCurrentIndex(row);
     setEditField(field);
-    view_->edit(index);
+    view_->edit(row);
   });
   return true;
 }

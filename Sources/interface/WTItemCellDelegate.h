@@ -17,7 +17,8 @@ class WTOutlineView;
 class WTItemCellDelegate : public QStyledItemDelegate {
   Q_OBJECT
  public:
-  enum class Field { Name, Duration, Amount, Notes, Start };
+  // SpentDuration is the duration of time already spent: typing it moves the start, not the end.
+  enum class Field { Name, Duration, Amount, Notes, Start, End, SpentDuration };
 
   WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view);
 
@@ -48,8 +49,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
   void rowHeightChanged(const QModelIndex& index);
 
  protected:
-  // Tab and Shift+Tab in an item's field move to its next or previous field (start, name, duration or
-  // amount) before leaving the row.
+  // Tab and Shift+Tab in an item's field move to its next or previous field before leaving the row: a
+  // time entry's start, end, duration and name; another item's name, then its duration or amount.
   bool eventFilter(QObject* object, QEvent* event) override;
   bool editorEvent(QEvent* event, QAbstractItemModel* model, const QStyleOptionViewItem& option,
                    const QModelIndex& index) override;

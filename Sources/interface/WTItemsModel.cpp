@@ -643,6 +643,12 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       return entity == WTEntity::Time && item->startDate()
                  ? QVariant(RZDate::stringWithPattern(*item->startDate(), QStringLiteral("HH:mm")))
                  : QVariant();
+    case EndTimeEditRole: {
+      if (entity != WTEntity::Time) return {};
+      const auto* time = static_cast<const WTTime*>(item);
+      if (time->running() || !time->endDate()) return {};
+      return RZDate::stringWithPattern(*time->endDate(), QStringLiteral("HH:mm"));
+    }
     case LabelRole:
       switch (entity) {
         case WTEntity::Time:
@@ -658,6 +664,7 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       }
     case DurationTextRole:
     case DurationEditRole:
+    case SpentDurationEditRole:
       if (entity != WTEntity::Time && entity != WTEntity::Flat) return {};
       return DurationText::stringWithMinutes(item->duration());
     case CostTextRole:
@@ -734,6 +741,25 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
       if (!moved || (!time->running() && time->endDate() && *moved > *time->endDate())) return false;
       if (*moved == *start) return false;
       time->setStartDate(moved);
+      return true;
+    }
+    case EndTimeEditRole: {
+      if (object->entity() != WTEntity::Time) return false;
+      auto* time = static_cast<WTTime*>(object);
+      const std::optional<Date> end = time->endDate();
+      if (time->running() || !end) return false;
+      const std::optional<Date> moved = timeOnDay(*end, value.toString());
+      // Only the end moves: the start stays, so an end before it is refused.
+      if (!moved || (time->startDate() && *moved < *time->startDate())) return false;
+      if (*moved == RZDate::beginOfMinute(*end)) return false;
+      time->setEndDate(moved);
+      return true;
+    }
+    case SpentDurationEditRole: {
+      if (object->entity() != WTEntity::Time) return false;
+      auto* time = static_cast<WTTime*>(object);
+      if (time->running()) return false;
+      time->setDurationKeepingEnd(DurationText::minutesFromString(value.toString()));
       return true;
     }
     case AmountEditRole: {

@@ -47,6 +47,10 @@ class WTItemsModel : public QAbstractItemModel {
     CompletedRole,      // to-dos, settable
     DateRole,           // items: the start date as a QDateTime
     StartTimeEditRole,  // time entries: the start's hour and minute ("9:05"), settable on its day
+    // Stopped time entries: the end's hour and minute, settable on its day but not before the start.
+    EndTimeEditRole,
+    // Stopped time entries: the duration as DurationEditRole, set by moving the start (the end stays).
+    SpentDurationEditRole,
   };
 
   static const QString kObjectUUIDsType;    // "WTObjectUUIDs"

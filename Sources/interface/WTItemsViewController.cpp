@@ -105,6 +105,7 @@ QWidget* WTItemsViewController::loadView() {
   header_->setIBGradientBeginHexColor(QStringLiteral("F5F7FA"));
   header_->setIBGradientEndHexColor(QStringLiteral("DCE2EA"));
   auto* bar = new QHBoxLayout(header_);
+  // The right margin keeps the totals' room free; alignTotals sets it.
   bar->setContentsMargins(8, 6, 12, 6);
   bar->setSpacing(10);
   auto* back = new QToolButton(header_);
@@ -127,6 +128,12 @@ QWidget* WTItemsViewController::loadView() {
   titleLabel_->setFont(titleFont);
   clientLabel_ = new QLabel(header_);
   clientLabel_->setStyleSheet(QStringLiteral("color: #666;"));
+  // A long name gives way to the rate and the totals (shortened, whole in its tip) rather than widening
+  // the window or running under them.
+  for (QLabel* label : {titleLabel_, clientLabel_}) {
+    label->setSizePolicy(QSizePolicy::Ignored, QSizePolicy::Preferred);
+    label->installEventFilter(this);
+  }
   titles->addWidget(titleLabel_);
   titles->addWidget(clientLabel_);
   bar->addLayout(titles, 1);
@@ -156,7 +163,6 @@ QWidget* WTItemsViewController::loadView() {
     totalsFont.setBold(true);
     label->setFont(totalsFont);
   }
-  bar->addSpacing(190);
   header_->installEventFilter(this);
   layout->addWidget(header_);
 
@@ -204,18 +210,18 @@ QWidget* WTItemsViewController::loadView() {
 void WTItemsViewController::refreshHeader() {
   if (!titleLabel_) return;
   if (!project_) {
-    titleLabel_->clear();
-    clientLabel_->clear();
+    setElidedText(titleLabel_, QString());
+    setElidedText(clientLabel_, QString());
     totalsLabel_->clear();
     durationLabel_->clear();
     rateField_->clear();
     WTRateField::setRefused(rateField_, {});
     return;
   }
-  titleLabel_->setText(project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
+  setElidedText(titleLabel_, project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
   QString client = project_->client() ? project_->client()->name() : tr("No Client");
   if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
-  clientLabel_->setText(client);
+  setElidedText(clientLabel_, client);
   durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
   totalsLabel_->setText(MoneyFormat::format(project_->cost()));
   rateField_->setPlaceholderText(WTRateField::placeholder(project_));
@@ -225,11 +231,33 @@ void WTItemsViewController::refreshHeader() {
   }
 }
 
+namespace {
+
+const char* const kFullTextProperty = "fullText";
+
+void elide(QLabel* label) {
+  const QString text = label->property(kFullTextProperty).toString();
+  const QString shown = label->fontMetrics().elidedText(text, Qt::ElideRight, label->contentsRect().width());
+  label->setText(shown);
+  label->setToolTip(shown == text ? QString() : text);
+}
+
+}  // namespace
+
+void WTItemsViewController::setElidedText(QLabel* label, const QString& text) {
+  label->setProperty(kFullTextProperty, text);
+  elide(label);
+}
+
 bool WTItemsViewController::eventFilter(QObject* watched, QEvent* event) {
   const auto type = event->type();
   if ((type == QEvent::Resize || type == QEvent::Show || type == QEvent::Move) &&
       (watched == header_ || (outlineView_ && watched == outlineView_->viewport()))) {
     alignTotals();
+  }
+  if ((type == QEvent::Resize || type == QEvent::FontChange) &&
+      (watched == titleLabel_ || watched == clientLabel_)) {
+    elide(static_cast<QLabel*>(watched));
   }
   return WTViewController::eventFilter(watched, event);
 }
@@ -247,6 +275,13 @@ void WTItemsViewController::alignTotals() {
   };
   place(durationLabel_, WTTableCellView::Part::Duration);
   place(totalsLabel_, WTTableCellView::Part::Cost);
+  // The rate field ends a little before the duration column, wherever a scroll bar beside the rows
+  // has put that column.
+  constexpr int kGap = 8;
+  QLayout* bar = header_->layout();
+  const QMargins margins = bar->contentsMargins();
+  const int room = std::max(header_->width() - durationLabel_->x() + kGap, 12);
+  if (margins.right() != room) bar->setContentsMargins(margins.left(), margins.top(), room, margins.bottom());
 }
 
 QMenu* WTItemsViewController::taskMenu(WTTask* task) {
@@ -417,13 +452,13 @@ WTTime* WTItemsViewController::addStoppedTimeItem(WTTask* task) {
   if (!task) return nullptr;
   auto* time = static_cast<WTTime*>(context_->insertNewObject(WTEntity::Time));
   time->setTask(task);
-  // Time already spent: it ends now and its length is typed at once.
+  // Time already spent ends now: the length typed at once moves its start back.
   time->setEndDate(time->startDate());
   selectItem(time);
   if (outlineView_ && outlineView_->isEditing()) outlineView_->endEditing();
   const QModelIndex index = treeController_->indexOfObject(time);
   if (index.isValid()) {
-    delegate_->setEditField(WTItemCellDelegate::Field::Duration);
+    delegate_->setEditField(WTItemCellDelegate::Field::SpentDuration);
     outlineView_->edit(index);
   }
   return time;

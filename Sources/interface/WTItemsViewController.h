@@ -69,7 +69,8 @@ class WTItemsViewController : public WTViewController {
   WTItem* addItem(WTEntity kind, WTTask* task);
   // The same for a time entry, which then runs at once.
   WTTime* addTimeItem(WTTask* task);
-  // A stopped time entry ending now, selected with its duration being edited; none without a task.
+  // A stopped time entry ending now, selected with its duration being edited (the duration typed moves
+  // its start back); none without a task.
   WTTime* addStoppedTimeItem(WTTask* task);
   // Starts (selecting and editing the new entry) or stops the task's timer.
   void toggleTimerOfTask(WTTask* task);
@@ -123,6 +124,8 @@ class WTItemsViewController : public WTViewController {
   void saveExpandedItems();
   void restoreExpandedItems();
   void refreshHeader();
+  // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.
+  static void setElidedText(QLabel* label, const QString& text);
   // Puts the header's totals over the duration and cost columns of the rows below.
   void alignTotals();
   bool eventFilter(QObject* watched, QEvent* event) override;

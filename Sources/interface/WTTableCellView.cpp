@@ -16,6 +16,9 @@ constexpr qreal kTimer = 26.0;
 constexpr qreal kCostWidth = 96.0;
 constexpr qreal kDurationWidth = 64.0;
 constexpr qreal kRightMargin = 44.0;  // room for the timer, stop or open button
+constexpr qreal kLabelX = 40.0;
+constexpr qreal kClockWidth = 42.0;  // "23:59"
+constexpr qreal kDashWidth = 12.0;   // between a time entry's start and end
 
 QRectF centredSquare(qreal x, const QRectF& line, qreal side) {
   return QRectF(x, line.y() + (line.height() - side) / 2.0, side, side);
@@ -45,7 +48,8 @@ qreal WTTableCellView::textX() const {
   if (identifier_ == QLatin1String("WTTask")) return 50.0;
   if (identifier_ == QLatin1String("WTItemContainer")) return 40.0;
   if (identifier_ == QLatin1String("Project") || identifier_ == QLatin1String("Client")) return 54.0;
-  return 96.0;  // items: after the start time or kind
+  if (identifier_ == QLatin1String("WTTime")) return kLabelX + 2 * kClockWidth + kDashWidth + 10.0;
+  return 96.0;  // other items: after their kind
 }
 
 void WTTableCellView::setFrame(const QRectF& frame) {
@@ -118,7 +122,12 @@ QRectF WTTableCellView::partRect(Part part, const QRectF& row) const {
       return {};
     case Part::Label:
       if (!item || id == QLatin1String("WTToDo")) return {};
-      return QRectF(row.x() + 40.0, line.y(), 52.0, line.height());
+      if (id == QLatin1String("WTTime"))
+        return QRectF(row.x() + kLabelX, line.y(), kClockWidth, line.height());
+      return QRectF(row.x() + kLabelX, line.y(), 52.0, line.height());
+    case Part::End:
+      if (id != QLatin1String("WTTime")) return {};
+      return QRectF(row.x() + kLabelX + kClockWidth + kDashWidth, line.y(), kClockWidth, line.height());
     case Part::Checkbox:
       if (id != QLatin1String("WTToDo")) return {};
       return centredSquare(row.x() + 58.0, line, 16.0);
@@ -193,7 +202,7 @@ std::optional<WTTableCellView::Part> WTTableCellView::partAt(const QPointF& poin
   }
   static constexpr Part kParts[] = {Part::Disclosure, Part::Checkbox, Part::TimerButton, Part::OpenButton,
                                     Part::Subtitle,   Part::Duration, Part::Cost,        Part::Name,
-                                    Part::Icon,       Part::Label,    Part::Notes};
+                                    Part::Icon,       Part::Label,    Part::End,         Part::Notes};
   for (Part part : kParts) {
     if (partRect(part, row).contains(point)) return part;
   }

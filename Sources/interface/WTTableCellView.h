@@ -21,6 +21,7 @@ class WTTableCellView {
     Disclosure,
     Icon,
     Label,     // a time entry's start, another item's kind
+    End,       // a time entry's end
     Name,      // the main, editable text
     Subtitle,  // a project's client chooser, a client's project count
     Duration,

@@ -17,9 +17,9 @@ Decimal WTClient::rateFromAbove() const {
   return userDefaultRate().value_or(builtInRate());
 }
 
-void WTClient::setRate(const std::optional<Decimal>& rate) {
-  WTObject::setRate(rate);
-  costDidChange();
+// Here rather than in the setter, so that a rate put back by undo or redo is announced as a cost too.
+void WTClient::storedValueDidChange(const QString& key) {
+  if (key == QLatin1String("rate")) costDidChange();
 }
 
 int WTClient::duration() const {

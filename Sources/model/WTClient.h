@@ -23,7 +23,6 @@ class WTClient final : public WTObject {
   Decimal rateFromAbove() const override;
   // What a client bills without a rate of its own while the user has set no default: 100.
   static Decimal builtInRate() { return Decimal(100); }
-  void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
@@ -39,6 +38,8 @@ class WTClient final : public WTObject {
   QStringList storedKeys() const override;
 
  protected:
+  // A rate announces the client's cost.
+  void storedValueDidChange(const QString& key) override;
   QVariant primitiveValue(const QString& key) const override;
   bool writePrimitive(const QString& key, const QVariant& value) override;
   QList<WTObject*> relatedObjects(const QString& relationship) const override;

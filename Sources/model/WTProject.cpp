@@ -33,9 +33,9 @@ Decimal WTProject::rateFromAbove() const {
   return userDefaultRate().value_or(builtInRate());
 }
 
-void WTProject::setRate(const std::optional<Decimal>& rate) {
-  WTObject::setRate(rate);
-  if (client_) client_->costDidChange();
+// Here rather than in the setter, so that a rate put back by undo or redo reaches the client too.
+void WTProject::storedValueDidChange(const QString& key) {
+  if (key == QLatin1String("rate") && client_) client_->costDidChange();
 }
 
 int WTProject::duration() const {

@@ -26,7 +26,6 @@ class WTProject final : public WTObject {
   Decimal rateFromAbove() const override;
   // What a project without a client bills, with no rate of its own and no default set: 50.
   static Decimal builtInRate() { return Decimal(50); }
-  void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
@@ -46,6 +45,8 @@ class WTProject final : public WTObject {
   QStringList storedKeys() const override;
 
  protected:
+  // A rate tells the client its cost changed.
+  void storedValueDidChange(const QString& key) override;
   WTObject* owner() const override;
   QString ownerKey() const override { return QStringLiteral("client"); }
   void relinkOwner(WTObject* owner, int index) override;

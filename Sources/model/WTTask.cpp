@@ -48,9 +48,9 @@ Decimal WTTask::rateFromAbove() const {
   return userDefaultRate().value_or(Decimal(75));
 }
 
-void WTTask::setRate(const std::optional<Decimal>& rate) {
-  WTObject::setRate(rate);
-  if (project_) project_->costDidChange();
+// Here rather than in the setter, so that a rate put back by undo or redo reaches the totals above too.
+void WTTask::storedValueDidChange(const QString& key) {
+  if (key == QLatin1String("rate") && project_) project_->costDidChange();
 }
 
 namespace {

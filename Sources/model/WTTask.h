@@ -34,7 +34,6 @@ class WTTask final : public WTObject {
 
   // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else 75.
   Decimal rateFromAbove() const override;
-  void setRate(const std::optional<Decimal>& rate) override;
   void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
@@ -107,6 +106,8 @@ class WTTask final : public WTObject {
  protected:
   QVariant primitiveValue(const QString& key) const override;
   bool writePrimitive(const QString& key, const QVariant& value) override;
+  // A rate tells the project its cost changed.
+  void storedValueDidChange(const QString& key) override;
   WTObject* owner() const override;
   QString ownerKey() const override { return QStringLiteral("project"); }
   void relinkOwner(WTObject* owner, int index) override;

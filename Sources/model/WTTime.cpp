@@ -34,7 +34,8 @@ void WTTime::setRunning(bool running) {
 }
 
 void WTTime::storedValueDidChange(const QString& key) {
-  if (key == QLatin1String("endDate")) {
+  // Either end of the span changes its length, whoever moves it: an edit, undo, redo or sync.
+  if (key == QLatin1String("endDate") || key == QLatin1String("startDate")) {
     if (task()) task()->durationDidChange();
   } else if (key == QLatin1String("running")) {
     // The setter tells the task itself once the end date is settled; undo and redo replay values only.
@@ -57,6 +58,11 @@ int WTTime::duration() const {
 void WTTime::setDuration(int minutes) {
   if (!startDate()) return;
   setEndDate(startDate()->addingSeconds(double(minutes) * 60.0));
+}
+
+void WTTime::setDurationKeepingEnd(int minutes) {
+  if (!endDate()) return;
+  setStartDate(endDate()->addingSeconds(-double(minutes) * 60.0));
 }
 
 void WTTime::setDate(const std::optional<Date>& date) {

@@ -19,6 +19,9 @@ class WTTime final : public WTItem {
   int duration() const override;
   // Makes the entry last `minutes` from its start.
   void setDuration(int minutes);
+  // Makes the entry last `minutes` up to its end: the start moves. For time already spent, which ends
+  // when it is entered.
+  void setDurationKeepingEnd(int minutes);
   // Moves the entry to the day of `date`, keeping hour and minute (seconds dropped) and its length.
   void setDate(const std::optional<Date>& date) override;
   // The start time as "HH:mm".

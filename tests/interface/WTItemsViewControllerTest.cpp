@@ -14,6 +14,7 @@
 #include <QLabel>
 #include <QLineEdit>
 #include <QMenu>
+#include <QScrollBar>
 #include <QToolTip>
 
 namespace {
@@ -346,29 +347,67 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
 
 namespace {
 
+// The header's name, rate and totals share its width without covering one another, at the narrowest
+// window and with or without a vertical scroll bar beside the rows.
 TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCostColumns) {
-  makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
+  project->setName("The new website of the regional library and its branches");
+  for (int day = 1; day <= 25; ++day) makeItem<WTTime>(design, "Sketches", at(2024, 3, day));
+  endTurn();
+  auto* title = controller->view()->findChild<QLabel*>("projectTitle");
+  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
+  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
+  ASSERT_NE(title, nullptr);
+  ASSERT_NE(duration, nullptr);
+  ASSERT_NE(cost, nullptr);
+  QLineEdit* rate = controller->rateField();
+  EXPECT_EQ(duration->text(), "12:30");
+  for (const bool scrolls : {false, true}) {
+    if (scrolls) outline()->expandAll();
+    for (const QSize size : {QSize(620, 600), QSize(900, 600), QSize(1200, 600)}) {
+      window->resize(size);
+      QApplication::processEvents();
+      SCOPED_TRACE(testing::Message() << size.width() << (scrolls ? " with a scroll bar" : ""));
+      ASSERT_EQ(outline()->verticalScrollBar()->isVisible(), scrolls);
+      EXPECT_EQ(controller->view()->width(), size.width());  // the header does not widen the window
+      const QRect row = outline()->visualRect(rowOf(design));
+      const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
+      WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
+      for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
+                                        std::pair{cost, WTTableCellView::Part::Cost}}) {
+        const QRect column = cell.partRect(part, line).toRect();
+        const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
+        const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
+        EXPECT_EQ(labelLeft.x(), columnLeft.x());
+        EXPECT_EQ(label->width(), column.width());
+      }
+      EXPECT_LT(rate->geometry().right(), duration->geometry().left());
+      EXPECT_LT(title->geometry().right(), rate->geometry().left());
+      // A name too long for its room is shortened visibly, not cut off, and shown whole in its tip.
+      EXPECT_LE(title->fontMetrics().horizontalAdvance(title->text()), title->contentsRect().width());
+      if (title->text() != project->name()) {
+        EXPECT_EQ(title->toolTip(), project->name());
+      }
+    }
+  }
+}
+
+// Totals once waited for the next minute tick after a start was moved or a rate was undone.
+TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRateAtOnce) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
   auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
   auto* cost = controller->view()->findChild<QLabel*>("projectCost");
-  ASSERT_NE(duration, nullptr);
-  ASSERT_NE(cost, nullptr);
+  ASSERT_TRUE(model()->setData(rowOf(time), "11:45", WTItemsModel::StartTimeEditRole));
+  EXPECT_EQ(duration->text(), "00:45");
+  EXPECT_EQ(cost->text().right(5), "37.50");  // at the inherited 50
+  endTurn();
+  design->setRate(Decimal(80));
+  endTurn();
+  EXPECT_EQ(cost->text().right(5), "60.00");
+  context->undoManager().undo();
+  EXPECT_EQ(cost->text().right(5), "37.50");
+  context->undoManager().undo();  // the start
   EXPECT_EQ(duration->text(), "00:30");
-  for (const QSize size : {QSize(900, 600), QSize(700, 500), QSize(1200, 600)}) {
-    window->resize(size);
-    QApplication::processEvents();
-    const QRect row = outline()->visualRect(rowOf(design));
-    const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
-    WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
-    for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
-                                      std::pair{cost, WTTableCellView::Part::Cost}}) {
-      const QRect column = cell.partRect(part, line).toRect();
-      const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
-      const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
-      EXPECT_EQ(labelLeft.x(), columnLeft.x()) << size.width();
-      EXPECT_EQ(label->width(), column.width()) << size.width();
-    }
-  }
 }
 
 }  // namespace
@@ -396,7 +435,11 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   endTurn();
   EXPECT_EQ(time->duration(), 90);
   EXPECT_FALSE(time->running());
-  EXPECT_TRUE(time->endDate().has_value());
+  // Spent already: it ends now, not an hour and a half from now.
+  EXPECT_EQ(time->endDate(), now);
+  EXPECT_EQ(time->startDate(), now.addingSeconds(-90 * 60));
+  EXPECT_EQ(rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30");
+  EXPECT_EQ(rowOf(time).data(WTItemsModel::EndTimeEditRole).toString(), "10:00");
 }
 
 TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
@@ -415,7 +458,16 @@ TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
     QApplication::sendEvent(outline()->viewport(), &help);
     return QToolTip::isVisible() ? QToolTip::text() : QString();
   };
-  EXPECT_TRUE(tipAt(time, WTTableCellView::Part::Duration).contains("double-click"));
+  // Each of an entry's fields says what an edit of it moves and what stays.
+  const std::pair<WTTableCellView::Part, const char*> timeTips[] = {
+      {WTTableCellView::Part::Label, "the end stays"},
+      {WTTableCellView::Part::End, "the start stays"},
+      {WTTableCellView::Part::Duration, "the end moves"},
+  };
+  for (const auto& [part, says] : timeTips) {
+    const QString tip = tipAt(time, part);
+    EXPECT_TRUE(tip.contains("double-click") && tip.contains(says)) << tip.toStdString();
+  }
   EXPECT_TRUE(tipAt(expense, WTTableCellView::Part::Cost).contains("double-click"));
   EXPECT_EQ(tipAt(time, WTTableCellView::Part::Cost), QString());  // a time's cost follows from it
   QToolTip::hideText();
@@ -425,20 +477,19 @@ TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
 
 namespace {
 
-TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) {
+TEST_F(WTItemsViewControllerTest, AnEntrysStartAndEndAreChangedInItsRowEachKeepingTheOther) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
   controller->expandContainerOfItem(time);
   const Date end = *time->endDate();
-  auto typeStart = [&](const char* text) {
+  auto typeInto = [&](WTTableCellView::Part part, const char* editorName, const char* text) {
     const QModelIndex index = rowOf(time);
     const QRect visual = outline()->visualRect(index);
     const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    const QRectF label =
-        controller->cellViewPrototypeForIndex(index).partRect(WTTableCellView::Part::Label, row);
-    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
-    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, label.center().toPoint());
-    auto* editor = outline()->viewport()->findChild<QLineEdit*>("startEditor");
+    const QRectF field = controller->cellViewPrototypeForIndex(index).partRect(part, row);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
+    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
+    auto* editor = outline()->viewport()->findChild<QLineEdit*>(editorName);
     if (!editor) return QString("no editor");
     const QString shown = editor->text();
     editor->setText(text);
@@ -447,6 +498,10 @@ TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) 
     QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);  // the closed editor goes
     return shown;
   };
+  auto typeStart = [&](const char* text) {
+    return typeInto(WTTableCellView::Part::Label, "startEditor", text);
+  };
+  auto typeEnd = [&](const char* text) { return typeInto(WTTableCellView::Part::End, "endEditor", text); };
   EXPECT_EQ(typeStart("11:45"), "12:00");
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45));
   EXPECT_EQ(time->endDate(), end);
@@ -458,6 +513,15 @@ TEST_F(WTItemsViewControllerTest, AnEntrysStartIsChangedInItsRowAndItsEndStays) 
   EXPECT_EQ(typeStart("9"), "11:45");
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
   EXPECT_EQ(time->duration(), 210);
+
+  EXPECT_EQ(typeEnd("17:20"), "12:30");
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
+  EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20));
+  EXPECT_EQ(time->duration(), 500);
+  for (const char* refused : {"8:59", "24:00", "later"}) {
+    EXPECT_EQ(typeEnd(refused), "17:20") << refused;
+    EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20)) << refused;
+  }
 }
 
 }  // namespace
@@ -482,23 +546,33 @@ TEST_F(WTItemsViewControllerTest, TabWalksThroughAnEntrysFieldsInTheirOrder) {
   QLineEdit* editor = openEditor();
   ASSERT_NE(editor, nullptr);
   EXPECT_EQ(editor->objectName(), "startEditor");
-  editor->setText("11:00");
-  QTest::keyClick(editor, Qt::Key_Tab);
-  editor = openEditor();
+  // Start, end, duration, name; each is committed on the way.
+  const std::pair<const char*, const char*> typed[] = {
+      {"startEditor", "11:00"}, {"endEditor", "12:15"}, {"durationEditor", "1:45"}};
+  for (const auto& [name, text] : typed) {
+    ASSERT_NE(editor, nullptr) << name;
+    EXPECT_EQ(editor->objectName(), name);
+    editor->setText(text);
+    QTest::keyClick(editor, Qt::Key_Tab);
+    editor = openEditor();
+  }
   ASSERT_NE(editor, nullptr);
   EXPECT_EQ(editor->objectName(), "nameEditor");
-  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));  // committed on the way
   editor->setText("Drawings");
-  QTest::keyClick(editor, Qt::Key_Tab);
+  outline()->endEditing();
+  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));
+  EXPECT_EQ(time->endDate(), at(2024, 3, 13, 12, 45));
+  EXPECT_EQ(time->name(), "Drawings");
+  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  // Back from the name to the duration.
+  controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Name);
+  outline()->edit(rowOf(time));
   editor = openEditor();
   ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "durationEditor");
-  EXPECT_EQ(time->name(), "Drawings");
   QTest::keyClick(editor, Qt::Key_Backtab, Qt::ShiftModifier);
   editor = openEditor();
   ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "nameEditor");
-  EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  EXPECT_EQ(editor->objectName(), "durationEditor");
   outline()->endEditing();
 }
 

@@ -1,6 +1,8 @@
 #include "ModelFixture.h"
 #include "WTKeyDependencies.h"
 
+#include <functional>
+
 class WTRatesTest : public ModelTest {};
 
 TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
@@ -170,29 +172,64 @@ TEST_F(WTRatesTest, SumsRunUpFromItemsToClients) {
   EXPECT_EQ(client->cost(), dec("240.01"));
 }
 
-TEST_F(WTRatesTest, AFlatFeeChangeReachesObserversThreeLevelsUp) {
-  auto* client = WTClient::insertNewObject(context.get());
-  auto* project = WTProject::insertNewObject(context.get());
-  project->setClient(client);
-  WTTask* task = makeTask(project);
-  auto* flat = makeItem<WTFlat>(task, berlin(2026, 2, 2, 12));
-  flat->setMinutes(30);
+// Whatever changes a total below a client, its observers up to the client hear of it: the header of a
+// project once showed an old total after an entry's start was moved or a rate was undone.
+TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
+  struct Records {
+    WTClient* client;
+    WTProject* project;
+    WTTask* task;
+    WTFlat* flat;
+    WTTime* time;  // 12:00 to 12:30
+  };
+  struct Case {
+    const char* name;
+    std::function<void(Records&)> prepare;
+    std::function<void(Records&)> change;
+    int duration;  // the client's, after the change
+    const char* cost;
+  };
+  const auto undo = [this](Records&) { context->undoManager().undo(); };
+  const auto startEarlier = [](Records& r) {
+    r.time->setStartDate(r.time->startDate()->addingSeconds(-900));
+  };
+  const Case cases[] = {
+      {"flat fee minutes", {}, [](Records& r) { r.flat->setMinutes(45); }, 75, "125"},
+      {"entry start", {}, startEarlier, 75, "125"},
+      {"entry start undone", startEarlier, undo, 60, "100"},
+      {"task rate undone", [](Records& r) { r.task->setRate(dec("60")); }, undo, 60, "100"},
+      {"project rate undone", [](Records& r) { r.project->setRate(dec("60")); }, undo, 60, "100"},
+  };
+  for (const Case& test : cases) {
+    SCOPED_TRACE(test.name);
+    Records r;
+    r.client = WTClient::insertNewObject(context.get());
+    r.project = WTProject::insertNewObject(context.get());
+    r.project->setClient(r.client);
+    r.task = makeTask(r.project);
+    r.flat = makeItem<WTFlat>(r.task, berlin(2026, 2, 2, 12));
+    r.flat->setMinutes(30);
+    r.time = makeTime(r.task, berlin(2026, 2, 2, 12), berlin(2026, 2, 2, 12, 30));
+    context->processPendingChanges();  // each turn is undone on its own
+    if (test.prepare) test.prepare(r);
+    context->processPendingChanges();
 
-  KeyCounter clientDuration(*context, client, "duration"), clientCost(*context, client, "cost");
-  KeyCounter projectDuration(*context, project, "duration"), projectCost(*context, project, "cost");
-  KeyCounter taskDuration(*context, task, "duration"), taskCost(*context, task, "cost");
-  KeyCounter flatCost(*context, flat, "cost");
-
-  flat->setMinutes(45);
-  EXPECT_GE(clientDuration.count, 1);
-  EXPECT_GE(clientCost.count, 1);
-  EXPECT_GE(projectDuration.count, 1);
-  EXPECT_GE(projectCost.count, 1);
-  EXPECT_GE(taskDuration.count, 1);
-  EXPECT_GE(taskCost.count, 1);
-  EXPECT_GE(flatCost.count, 1);
-  EXPECT_EQ(client->duration(), 45);
-  EXPECT_EQ(client->cost(), dec("75"));  // 45 minutes at the client's 100
+    KeyCounter clientDuration(*context, r.client, "duration"), clientCost(*context, r.client, "cost");
+    KeyCounter projectDuration(*context, r.project, "duration"), projectCost(*context, r.project, "cost");
+    KeyCounter taskDuration(*context, r.task, "duration"), taskCost(*context, r.task, "cost");
+    const int before = r.client->duration();
+    test.change(r);
+    EXPECT_GE(clientCost.count, 1);
+    EXPECT_GE(projectCost.count, 1);
+    EXPECT_GE(taskCost.count, 1);
+    if (r.client->duration() != before) {
+      EXPECT_GE(clientDuration.count, 1);
+      EXPECT_GE(projectDuration.count, 1);
+      EXPECT_GE(taskDuration.count, 1);
+    }
+    EXPECT_EQ(r.client->duration(), test.duration);
+    EXPECT_EQ(r.client->cost(), dec(test.cost));  // at the client's 100
+  }
 }
 
 TEST_F(WTRatesTest, AnExpenseChangeAnnouncesCostButNotDuration) {
