@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # Builds the Debian package from a Release build folder and checks what a distribution would:
 # exactly the expected files, icons of the size their folder names, valid desktop entry, metainfo and
-# systemd unit, and library dependencies found by dpkg-shlibdeps.
+# systemd unit, and library dependencies found by dpkg-shlibdeps; and that the installed `tessal` finds
+# the desktop executable and stays lean.
 #   scripts/package-check.sh [BUILD_DIR]     (default build-release, already built)
 set -euo pipefail
 cd "$(dirname "$0")/.."
@@ -34,4 +35,9 @@ for lib in libqt6widgets6 libicu72 libsqlite3-0 libsodium23 libpq5 qt6-qpa-plugi
   case "$depends" in *"$lib"*) ;; *) fail "Depends lacks $lib: $depends" ;; esac
 done
 "$work/root/usr/bin/tessal" --version >/dev/null
+# `tessal` finds the desktop executable from where it is installed, and stays lean itself.
+env -u DISPLAY -u WAYLAND_DISPLAY "$work/root/usr/bin/tessal" template /dev/null
+if readelf -d "$work/root/usr/bin/tessal" | grep -E 'NEEDED.*(Qt6Gui|Qt6Widgets|Qt6DBus|Qt6Network)'; then
+  fail "usr/bin/tessal links a GUI, D-Bus or network library"
+fi
 echo "package-check: $(basename "$deb") holds $(wc -l <"$work/files") files as expected"

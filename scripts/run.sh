@@ -5,7 +5,7 @@ set -euo pipefail
 cd "$(dirname "$0")/.."
 bash scripts/install-deps.sh
 cmake -S . -B build-release -G Ninja -DCMAKE_BUILD_TYPE=Release -DTESSAL_BUILD_TESTS=OFF
-cmake --build build-release --target tessal
+cmake --build build-release --target tessal tessal-desktop
 app=build-release/Sources/app/tessal
 launch=("$app")
 if [ -z "${DISPLAY:-}" ] && [ -z "${WAYLAND_DISPLAY:-}" ]; then

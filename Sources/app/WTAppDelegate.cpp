@@ -11,6 +11,7 @@
 #include "WTProject.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStore.h"
+#include "WTStoreSetup.h"
 #include "WTTask.h"
 
 #include <QDir>
@@ -29,18 +30,15 @@ WTAppDelegate::~WTAppDelegate() {
 }
 
 QString WTAppDelegate::applicationSupportFolder() {
-  QString base = QStandardPaths::writableLocation(QStandardPaths::GenericDataLocation);
-  if (base.isEmpty()) base = QDir::tempPath();
-  return base + QStringLiteral("/Tessal2");
+  return WTStoreSetup::applicationSupportFolder();
 }
 
 QString WTAppDelegate::storePath() {
-  return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
+  return WTStoreSetup::storePath();
 }
 
 QString WTAppDelegate::syncJournalPath() {
-  const QFileInfo store(storePath());
-  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+  return WTStoreSetup::syncJournalPath();
 }
 
 WTObjectContext* WTAppDelegate::managedObjectContext() {
@@ -79,13 +77,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
 }
 
 void WTAppDelegate::fillNewStore(WTObjectContext& context) {
-  const UserDefaults* defaults = context.userDefaults();
-  if (defaults && !defaults->stringForKey(QStringLiteral("WTSyncUser")).isEmpty()) return;
-  auto* project = WTProject::insertNewObject(&context);
-  project->setName(QStringLiteral("Default Project"));
-  auto* task = WTTask::insertNewObject(&context);
-  task->setName(QStringLiteral("Default Task"));
-  task->setProject(project);
+  WTStoreSetup::fillNewStore(context);
 }
 
 WTStopwatchUpdater* WTAppDelegate::startStopwatchUpdater(WTIdleSource* idle, WTTrackingAlertPresenter* presenter,

@@ -12,6 +12,7 @@
 #include "WTSleepMonitor.h"
 #include "WTStatusBarController.h"
 #include "WTStopwatchUpdater.h"
+#include "WTStoreSetup.h"
 
 #include <QDBusConnection>
 
@@ -38,8 +39,7 @@ WTApplication::~WTApplication() {
 }
 
 void WTApplication::registerDefaults(UserDefaults& defaults) {
-  defaults.registerDefaults(
-      {{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")}, {QStringLiteral("WTIdleTime"), 5}});
+  WTStoreSetup::registerDefaults(defaults);
 }
 
 WTMainWindowController* WTApplication::mainWindowController() {

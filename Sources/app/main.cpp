@@ -2,6 +2,7 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTCommandLine.h"
+#include "WTDesktopCommands.h"
 #include "WTSingleInstance.h"
 #include "WTStoreWriterLock.h"
 #include "WTTimerCommands.h"
@@ -10,8 +11,10 @@
 #include <QMainWindow>
 
 int main(int argc, char** argv) {
-  // The commands (`tessal report …`, `tessal sync …`, …) run without a window.
-  if (const std::optional<int> status = runCommandLine(argc, argv)) return *status;
+  // `tessal` hands this executable the desktop and the commands it does not carry itself; run directly,
+  // it answers them all. The commands run without a window.
+  if (const std::optional<int> status = WTCommandLine::run(argc, argv)) return *status;
+  if (const std::optional<int> status = runDesktopCommand(argc, argv)) return *status;
 
   WTApplication app(argc, argv);
   // One copy per user: a second launch brings the first one's window forward and never opens the

@@ -6,6 +6,38 @@
 
 #include <QUuid>
 
+namespace {
+
+// The GUI module's colour type when that module is loaded; it registers the conversions from and to text.
+QMetaType guiColorType() {
+  return QMetaType::isRegistered(QMetaType::QColor) ? QMetaType(QMetaType::QColor) : QMetaType();
+}
+
+// The colour a text names, as color() holds it; null for none.
+QVariant colorFromText(const QString& text) {
+  if (text.isEmpty()) return {};
+  const QMetaType type = guiColorType();
+  if (!type.isValid()) return text;
+  QVariant color(text);
+  if (!color.convert(type)) return {};
+  return color;
+}
+
+}  // namespace
+
+QString WTObject::colorText(const QVariant& color) {
+  if (color.isNull()) return {};
+  const QMetaType type = guiColorType();
+  // Without the GUI module a colour only ever comes as its text, from the store or the sync.
+  if (!type.isValid()) return color.typeId() == QMetaType::QString ? color.toString() : QString();
+  QVariant value = color;
+  if (value.metaType() != type && !value.convert(type)) return {};
+  if (value == QVariant(type)) return {};  // QColor(): no colour
+  QString name = value.toString();         // "#rrggbb" when opaque, else "#aarrggbb"
+  if (name.size() == 7) name.insert(1, QStringLiteral("ff"));
+  return name;
+}
+
 WTObject::WTObject(WTEntity entity, WTObjectContext* context) : context_(context), entity_(entity) {}
 
 WTObject::~WTObject() = default;
@@ -33,8 +65,8 @@ void WTObject::setName(const QString& name) {
 void WTObject::setNotes(const QString& notes) {
   setStoredValue(QStringLiteral("notes"), notes);
 }
-void WTObject::setColor(const QColor& color) {
-  setStoredValue(QStringLiteral("color"), color.isValid() ? QVariant(color) : QVariant());
+void WTObject::setColor(const QVariant& color) {
+  setStoredValue(QStringLiteral("color"), colorFromText(colorText(color)));
 }
 void WTObject::setArchived(bool archived) {
   setStoredValue(QStringLiteral("archived"), archived);
@@ -53,7 +85,7 @@ QVariant WTObject::primitiveValue(const QString& key) const {
   if (key == QLatin1String("name")) return name_.isNull() ? QVariant() : QVariant(name_);
   if (key == QLatin1String("notes")) return notes_.isNull() ? QVariant() : QVariant(notes_);
   if (key == QLatin1String("rate")) return rate_ ? QVariant::fromValue(*rate_) : QVariant();
-  if (key == QLatin1String("color")) return color_.isValid() ? QVariant(color_) : QVariant();
+  if (key == QLatin1String("color")) return color_;
   if (key == QLatin1String("archived")) return archived_;
   return {};
 }
@@ -68,7 +100,7 @@ bool WTObject::writePrimitive(const QString& key, const QVariant& value) {
   } else if (key == QLatin1String("rate")) {
     rate_ = Decimal::fromVariant(value);
   } else if (key == QLatin1String("color")) {
-    color_ = value.isNull() ? QColor() : value.value<QColor>();
+    color_ = colorFromText(colorText(value));
   } else if (key == QLatin1String("archived")) {
     archived_ = value.toBool();
   } else {
@@ -134,8 +166,10 @@ bool WTObject::setValue(const QString& key, const QVariant& value) {
     if (!value.isNull() && !rate) return false;
     setRate(rate);
   } else if (key == QLatin1String("color")) {
-    if (!value.isNull() && !value.canConvert<QColor>()) return false;
-    setColor(value.isNull() ? QColor() : value.value<QColor>());
+    const QMetaType type = guiColorType();
+    if (!value.isNull() && !(type.isValid() ? value.canConvert(type) : value.typeId() == QMetaType::QString))
+      return false;
+    setColor(value);
   } else if (key == QLatin1String("archived")) {
     setArchived(value.toBool());
   } else {
@@ -204,7 +238,7 @@ void WTObject::readRecord(const WTStoreRecord& record) {
   name_ = record.name;
   notes_ = record.notes;
   rate_ = record.rate;
-  color_ = record.color.isNull() ? QColor() : QColor::fromString(record.color);
+  color_ = colorFromText(record.color);
   archived_ = record.archived;
 }
 
@@ -214,7 +248,7 @@ void WTObject::writeRecord(WTStoreRecord& record) const {
   record.name = name_;
   record.notes = notes_;
   record.rate = rate_;
-  record.color = color_.isValid() ? color_.name(QColor::HexArgb) : QString();
+  record.color = colorText(color_);
   record.archived = archived_;
 }
 

@@ -4,7 +4,6 @@
 #include "KeyPath.h"
 #include "WTEntity.h"
 
-#include <QColor>
 #include <QList>
 #include <QMetaType>
 #include <QString>
@@ -60,8 +59,15 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   void setName(const QString& name);
   QString notes() const { return notes_; }
   void setNotes(const QString& notes);
-  QColor color() const { return color_; }
-  void setColor(const QColor& color);
+  // The colour: a QColor where the GUI module is loaded (the desktop, reports), the store's text
+  // "#aarrggbb" where it is not (the command line), null when there is none. The model meets the GUI's
+  // colour type only as a QVariant, through the conversions that module registers, so it links no GUI
+  // library.
+  QVariant color() const { return color_; }
+  // A QColor or a colour's text ("#rrggbb", "#aarrggbb", a name); null or not a colour: none.
+  void setColor(const QVariant& color);
+  // The store's and the sync's text of a colour: "#aarrggbb", null when there is none.
+  static QString colorText(const QVariant& color);
   bool archived() const { return archived_; }
   void setArchived(bool archived);
 
@@ -147,7 +153,7 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   QString name_;
   QString notes_;
   std::optional<Decimal> rate_;
-  QColor color_;
+  QVariant color_;
   WTEntity entity_;
   bool archived_ = false;
 

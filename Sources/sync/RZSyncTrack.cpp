@@ -6,7 +6,6 @@
 #include "TessalLogging.h"
 #include "WTObject.h"
 
-#include <QColor>
 #include <QDateTime>
 #include <QFile>
 #include <QFileInfo>
@@ -190,9 +189,9 @@ std::optional<QVariant> RZSyncTrack::transformedValue(const QVariant& value) {
     for (const WTObject* member : value.value<WTOrderedRelationship>().objects) uuids.append(member->uuid());
     return uuids;
   }
-  if (value.metaType() == QMetaType::fromType<QColor>()) {
-    const QColor color = value.value<QColor>();
-    return color.isValid() ? QVariant(color.name(QColor::HexArgb)) : QVariant();
+  if (value.typeId() == QMetaType::QColor) {
+    const QString text = WTObject::colorText(value);
+    return text.isNull() ? QVariant() : QVariant(text);
   }
   return value;
 }

@@ -9,6 +9,7 @@
 
 #include <gtest/gtest.h>
 
+#include <QColor>
 #include <QElapsedTimer>
 #include <QJsonArray>
 #include <QJsonDocument>
@@ -38,7 +39,7 @@ class TrackCommand : public ::testing::Test {
     WTProject* atlas = project(*context, "Atlas", acme);
     WTProject* hermes = project(*context, "Hermes", nullptr);
     hermes->setRate(Decimal::fromString(u"100"));
-    task(*context, atlas, "Design");
+    task(*context, atlas, "Design")->setColor(QColor(255, 0, 0, 128));
     task(*context, atlas, kQuoted);
     task(*context, hermes, "Design");
     WTTask* old = task(*context, hermes, "Review");
@@ -62,10 +63,12 @@ class TrackCommand : public ::testing::Test {
     return task;
   }
 
-  // What the store file holds now: "PROJECT/TASK" of each running entry, sorted, and the number of entries.
+  // What the store file holds now: "PROJECT/TASK" of each running entry, sorted, the number of entries,
+  // and "PROJECT/TASK COLOUR" of each task with a colour.
   struct Stored {
     QStringList running;
     qsizetype times = 0;
+    QStringList colors;
   };
   Stored stored() const {
     Stored result;
@@ -80,6 +83,11 @@ class TrackCommand : public ::testing::Test {
       if (time->running()) result.running.append(time->task()->project()->name() + "/" + time->task()->name());
     }
     result.running.sort();
+    for (const WTTask* task : context.fetch<WTTask>()) {
+      if (task->color().isNull()) continue;
+      const QString color = WTObject::colorText(task->color());
+      result.colors.append(task->project()->name() + "/" + task->name() + " " + color);
+    }
     return result;
   }
 
@@ -142,6 +150,8 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
   EXPECT_EQ(run.code, 0);
   EXPECT_TRUE(run.out.startsWith("Stopped Atlas › Design")) << run.out.toStdString();
   EXPECT_EQ(stored().running, QStringList());
+  // `tessal` loads no GUI library, so it keeps a colour as the store's text: rewritten, the task keeps it.
+  EXPECT_EQ(stored().colors, QStringList({"Atlas/Design #80ff0000"}));
   EXPECT_EQ(here.tessal({"status"}).code, 1);
   EXPECT_EQ(here.tessal({"stop"}).out, "No timer is running\n");
 

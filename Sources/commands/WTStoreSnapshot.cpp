@@ -1,11 +1,10 @@
 #include "WTStoreSnapshot.h"
 
-#include "WTAppDelegate.h"
-#include "WTApplication.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTProject.h"
 #include "WTStore.h"
+#include "WTStoreSetup.h"
 #include "WTTask.h"
 
 #include <QCommandLineParser>
@@ -15,8 +14,9 @@
 std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore::Records which,
                                                        const QStringList& tasks) {
   auto defaults = std::make_unique<UserDefaults>();
-  WTApplication::registerDefaults(*defaults);
-  Result<std::unique_ptr<WTStoreSnapshot>> snapshot = open(WTAppDelegate::storePath(), std::move(defaults), which, tasks);
+  WTStoreSetup::registerDefaults(*defaults);
+  Result<std::unique_ptr<WTStoreSnapshot>> snapshot =
+      open(WTStoreSetup::storePath(), std::move(defaults), which, tasks);
   if (!snapshot) {
     WTCommandArguments::failure(err, snapshot.error().message);
     return nullptr;

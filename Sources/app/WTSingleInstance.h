@@ -1,5 +1,7 @@
 #pragma once
 
+#include "WTSingleInstanceClient.h"
+
 #include <QJsonObject>
 #include <QObject>
 #include <QString>
@@ -12,7 +14,7 @@ class QLocalServer;
 // Keeps the application to one running copy per user. The first copy listens on a local socket in the
 // user's runtime folder; a later copy finds it there, asks it to come forward and then leaves without
 // touching the store. The running copy also carries out requests sent to it (the shell's commands
-// that change data), so that the store keeps one writer.
+// that change data, through WTSingleInstanceClient), so that the store keeps one writer.
 class WTSingleInstance : public QObject {
   Q_OBJECT
  public:
@@ -29,18 +31,14 @@ class WTSingleInstance : public QObject {
   bool start(bool bringRunningCopyForward = true);
   bool isListening() const;
 
-  // Asks the running copy to come forward (or, with `reopen` false, only whether it is there). True
-  // when a copy is there: it accepted the connection, whether or not it acknowledged within `timeoutMs`.
-  bool notifyRunningInstance(int timeoutMs = 2000, bool reopen = true) const;
-
-  // Carries out a request in the running copy: sends it and waits up to `replyTimeoutMs` for the reply.
-  // `reached` is false when no copy listens (nothing was sent); `reply` is empty when the copy took the
-  // request but gave no answer in time or could not carry out requests.
-  struct Forwarded {
-    bool reached = false;
-    std::optional<QJsonObject> reply;
-  };
-  Forwarded sendRequest(const QJsonObject& request, int replyTimeoutMs) const;
+  // The client side, as a command sees it (WTSingleInstanceClient).
+  bool notifyRunningInstance(int timeoutMs = 2000, bool reopen = true) const {
+    return client_.notifyRunningInstance(timeoutMs, reopen);
+  }
+  using Forwarded = WTSingleInstanceClient::Forwarded;
+  Forwarded sendRequest(const QJsonObject& request, int replyTimeoutMs) const {
+    return client_.sendRequest(request, replyTimeoutMs);
+  }
 
   // What answers requests in this copy, on its thread, between events; without one a request is closed
   // unanswered.
@@ -54,6 +52,7 @@ class WTSingleInstance : public QObject {
  private:
   void acceptConnections();
 
+  WTSingleInstanceClient client_;
   QString path_;
   QLocalServer* server_ = nullptr;
   RequestHandler requestHandler_;

@@ -4,16 +4,15 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
-#include "WTAppDelegate.h"
-#include "WTApplication.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTCSVExport.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTRangePredicate.h"
-#include "WTSingleInstance.h"
+#include "WTSingleInstanceClient.h"
 #include "WTStore.h"
+#include "WTStoreSetup.h"
 #include "WTStoreSnapshot.h"
 #include "WTStoreWriterLock.h"
 #include "WTTask.h"
@@ -85,14 +84,14 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     tasks = named.value();
   }
   UserDefaults defaults;
-  WTApplication::registerDefaults(defaults);
+  WTStoreSetup::registerDefaults(defaults);
   WTObjectContext context(&defaults);
   const Result<void> loaded = context.attachStore(std::move(store.value()), which, tasks);
   if (!loaded) return failure(err, loaded.error().message);
-  const QString journalFile = WTAppDelegate::syncJournalPath();
+  const QString journalFile = WTStoreSetup::syncJournalPath();
   RZSyncTrack journal(journalFile);
   context.setChangeJournal(&journal);
-  if (storeIsNew) WTAppDelegate::fillNewStore(context);
+  if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {
     const Result<void> saved = context.save();
@@ -107,16 +106,16 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
 }
 
 int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
-  const QString storePath = WTAppDelegate::storePath();
+  const QString storePath = WTStoreSetup::storePath();
   // The lock lives beside the store: a command that may make the store makes its folder first.
   if (WTTimerCommands::createsRecords(command, arguments)) QDir().mkpath(QFileInfo(storePath).path());
   WTStoreWriterLock lock(storePath);
-  const WTSingleInstance desktop;
+  const WTSingleInstanceClient desktop;
   const QDeadlineTimer deadline(kWriterWaitMs);
   do {
     if (lock.tryLock()) return runOnStore(storePath, command, arguments, out, err);
     // The writer is a desktop copy, which carries the command out, or another command, which soon lets go.
-    const WTSingleInstance::Forwarded forwarded =
+    const WTSingleInstanceClient::Forwarded forwarded =
         desktop.sendRequest(WTTimerCommands::request(command, arguments), kWriterWaitMs);
     if (forwarded.reached) {
       if (forwarded.reply) return print(WTCommandOutcome::fromJson(*forwarded.reply), out, err);

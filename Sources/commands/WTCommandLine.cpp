@@ -1,0 +1,133 @@
+#include "WTCommandLine.h"
+
+#include "WTTimerCommands.h"
+#include "WTTrackCommand.h"
+
+#include <QCoreApplication>
+#include <QLoggingCategory>
+#include <QTextStream>
+
+#include <cstdio>
+
+namespace {
+
+constexpr char kUsage[] =
+    "usage: tessal [start|stop|add|status|log|list|report|export|template|sync] [ARGS...]\n"
+    "       (tessal --help tells more)\n";
+
+constexpr char kHelp[] =
+    "Tessal tracks working time and bills it.\n"
+    "\n"
+    "usage:\n"
+    "  tessal                                        start the desktop application (or bring it forward)\n"
+    "  tessal start TASK [--project NAME] [--client NAME] [--create]\n"
+    "                                                start the task's timer (names match without regard\n"
+    "                                                to case; --create makes a missing task, project and\n"
+    "                                                client)\n"
+    "  tessal stop [TASK] [--project NAME] [--client NAME]\n"
+    "                                                stop every running timer, or the task's\n"
+    "  tessal add TASK (DURATION | START-END) [--date DAY] [--note TEXT] [--project NAME]\n"
+    "             [--client NAME] [--create]         add a finished time entry: 0:45 ends now, 09:00-10:30\n"
+    "                                                is on DAY (today, yesterday or YYYY-MM-DD; today by\n"
+    "                                                default)\n"
+    "  tessal status [--json]                        the running timers and their total; exit status 1 when\n"
+    "                                                none runs\n"
+    "  tessal log [--range RANGE] [--project NAME]   the time entries of a range (today by default) and its\n"
+    "                                                totals\n"
+    "  tessal list tasks|projects|clients [--project NAME] [--client NAME] [--qualified]\n"
+    "                                                the names there are, one a line; qualified, tasks are\n"
+    "                                                PROJECT › TASK, which start and stop take too\n"
+    "  tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n"
+    "                                                a report as HTML on stdout, or in FILE as .html, .pdf "
+    "or .csv\n"
+    "                                                (modes: 0 tasks, 1 items, 2 days, 3 months)\n"
+    "  tessal export [--range RANGE] [--project NAME] [--out FILE.csv]\n"
+    "                                                time entries as CSV; RANGE is today, yesterday, "
+    "this-week,\n"
+    "                                                last-week, this-month, last-month, this-year, "
+    "last-year,\n"
+    "                                                any (the default) or YYYY-MM-DD..YYYY-MM-DD\n"
+    "  tessal template TEMPLATE_FILE [--vars VARS.json]\n"
+    "                                                render a report template with a JSON object's "
+    "variables\n"
+    "  tessal sync [--timeout SECONDS]               bring this installation in step with its sync server\n"
+    "  tessal --help                                 show this text\n"
+    "  tessal --version                              show the version\n"
+    "\n"
+    "While the desktop application runs, start, stop and add are carried out by it.\n"
+    "The desktop application also takes Qt's own options (-platform NAME, -style NAME, -session ID, ...).\n"
+    "Data: $XDG_DATA_HOME/Tessal2/Tessal.sqlite; settings: $XDG_CONFIG_HOME/Tessal/Tessal.conf.\n";
+
+// Options Qt's application object takes for the desktop application, with whether each takes a value.
+// A session manager restores a session with "-session ID", so these must keep reaching Qt.
+bool isQtOption(const QString& argument, bool& takesValue) {
+  static const QStringList withValue = {
+      "-platform",     "-platformpluginpath", "-platformtheme", "-plugin",     "-qwindowgeometry",
+      "-qwindowicon",  "-qwindowtitle",       "-style",         "-stylesheet", "-session",
+      "-display",      "-geometry",           "-name",          "-title",      "-widgetcount",
+      "-qmljsdebugger"};
+  static const QStringList plain = {"-reverse", "-nograb", "-dograb", "-sync", "-visual"};
+  QString name = argument.section(u'=', 0, 0);
+  if (name.startsWith(QLatin1String("--"))) name.remove(0, 1);
+  takesValue = withValue.contains(name) && !argument.contains(u'=');
+  return withValue.contains(name) || plain.contains(name);
+}
+
+}  // namespace
+
+bool WTCommandLine::isDesktopCommand(const QString& command) {
+  static const QStringList commands = {QStringLiteral("report"), QStringLiteral("export"),
+                                       QStringLiteral("template"), QStringLiteral("sync")};
+  return commands.contains(command);
+}
+
+bool WTCommandLine::desktopArgumentsValid(int argc, char** argv) {
+  for (int i = 1; i < argc; ++i) {
+    bool takesValue = false;
+    if (!isQtOption(QString::fromLocal8Bit(argv[i]), takesValue)) return false;
+    if (takesValue && ++i >= argc) return false;
+  }
+  return true;
+}
+
+std::optional<int> WTCommandLine::run(int argc, char** argv) {
+  if (argc < 2) return std::nullopt;
+  const QString command = QString::fromLocal8Bit(argv[1]);
+  // Nothing here may need a display: these answer before any application object exists.
+  if (command == QLatin1String("--help") || command == QLatin1String("-h")) {
+    std::fputs(kHelp, stdout);
+    return 0;
+  }
+  if (command == QLatin1String("--version")) {
+    std::printf("tessal %s\n", TESSAL_VERSION);
+    return 0;
+  }
+  if (isDesktopCommand(command)) return std::nullopt;
+  if (!isTrackingCommand(command)) {
+    if (desktopArgumentsValid(argc, argv)) return std::nullopt;
+    return usageError(argv[1]);
+  }
+
+  QCoreApplication app(argc, argv);
+  app.setApplicationName(QStringLiteral("Tessal"));
+  app.setOrganizationName(QStringLiteral("Tessal"));
+  QTextStream out(stdout), err(stderr);
+  // Their output is for people and scripts: the journal's and the store's diary stays out of it.
+  QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
+  QStringList arguments;
+  for (int i = 2; i < argc; ++i) arguments.append(QString::fromLocal8Bit(argv[i]));
+  if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);
+  if (command == QLatin1String("list")) return runListCommand(arguments, out, err);
+  return runTrackCommand(command, arguments, out, err);
+}
+
+bool WTCommandLine::isTrackingCommand(const QString& command) {
+  return WTTimerCommands::isTimerCommand(command) || command == QLatin1String("log") ||
+         command == QLatin1String("list");
+}
+
+int WTCommandLine::usageError(const char* argument) {
+  std::fprintf(stderr, "tessal: unknown command or option '%s'\n", argument);
+  std::fputs(kUsage, stderr);
+  return 2;
+}

@@ -1,0 +1,44 @@
+#include "WTStoreSetup.h"
+
+#include "UserDefaults.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <QDir>
+#include <QFileInfo>
+#include <QStandardPaths>
+
+namespace WTStoreSetup {
+
+QString applicationSupportFolder() {
+  QString base = QStandardPaths::writableLocation(QStandardPaths::GenericDataLocation);
+  if (base.isEmpty()) base = QDir::tempPath();
+  return base + QStringLiteral("/Tessal2");
+}
+
+QString storePath() {
+  return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
+}
+
+QString syncJournalPath() {
+  const QFileInfo store(storePath());
+  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+}
+
+void registerDefaults(UserDefaults& defaults) {
+  defaults.registerDefaults(
+      {{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")}, {QStringLiteral("WTIdleTime"), 5}});
+}
+
+void fillNewStore(WTObjectContext& context) {
+  const UserDefaults* defaults = context.userDefaults();
+  if (defaults && !defaults->stringForKey(QStringLiteral("WTSyncUser")).isEmpty()) return;
+  auto* project = WTProject::insertNewObject(&context);
+  project->setName(QStringLiteral("Default Project"));
+  auto* task = WTTask::insertNewObject(&context);
+  task->setName(QStringLiteral("Default Task"));
+  task->setProject(project);
+}
+
+}  // namespace WTStoreSetup

@@ -1,0 +1,27 @@
+#pragma once
+
+#include <QString>
+
+class UserDefaults;
+class WTObjectContext;
+
+// Where an installation keeps its data and what a new store and the settings start with. The desktop
+// and the commands share it: either may be the one that makes the store.
+namespace WTStoreSetup {
+
+// $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
+QString applicationSupportFolder();
+QString storePath();
+// The store's path with the extension "sync": where the change journal lives.
+QString syncJournalPath();
+
+// The settings' values until the user sets them.
+void registerDefaults(UserDefaults& defaults);
+
+// What a store file gets when it is made, by the desktop copy or by a command: "Default Project" with
+// "Default Task", for the first day's work. Not when this installation syncs (a "WTSyncUser" is set):
+// its projects come from the account, which would otherwise gain a first project from every device
+// set up. A store that exists is never filled, so the user's own emptying it sticks. Saves nothing.
+void fillNewStore(WTObjectContext& context);
+
+}  // namespace WTStoreSetup

@@ -1,0 +1,34 @@
+#include "WTCommandLine.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+#include <system_error>
+
+#include <unistd.h>
+
+namespace {
+
+// The executable that links the interface: beside this one in the build tree, in the library folder's
+// tessal/ once installed.
+std::filesystem::path desktopExecutable() {
+  std::error_code error;
+  const std::filesystem::path self = std::filesystem::read_symlink("/proc/self/exe", error);
+  const std::filesystem::path folder = error ? std::filesystem::path(".") : self.parent_path();
+  const std::filesystem::path beside = folder / "tessal-desktop";
+  if (std::filesystem::exists(beside, error)) return beside;
+  return (folder / TESSAL_DESKTOP_FROM_BINDIR / "tessal-desktop").lexically_normal();
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  if (const std::optional<int> status = WTCommandLine::run(argc, argv)) return *status;
+  // The desktop and the commands that render or sync: the same process goes on as the executable that
+  // links them, so its id, its signals and its exit status stay the caller's.
+  const std::filesystem::path desktop = desktopExecutable();
+  ::execv(desktop.c_str(), argv);
+  std::fprintf(stderr, "tessal: cannot start %s: %s\n", desktop.c_str(), std::strerror(errno));
+  return 127;
+}
