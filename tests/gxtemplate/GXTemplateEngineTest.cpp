@@ -4,7 +4,6 @@
 #include "KeyPath.h"
 #include "RXRegex.h"
 #include "TemplateTestSupport.h"
-#include "WTReportFilters.h"
 
 #include <QFile>
 #include <QStringEncoder>
@@ -391,10 +390,13 @@ TEST_F(EngineVariableTest, ANameIsReadAgainOnlyAfterAVariableMayHaveChanged) {
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}{% if c.n %}{{ c.n }}{% /if %}|{% set x 1 %}{{ c.n }}"), vars),
             QStringLiteral("11|2"));
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}"), vars), QStringLiteral("3"));
-  EXPECT_EQ(render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"), vars),
-            QStringLiteral("aabb"));
+  EXPECT_EQ(
+      render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"),
+             vars),
+      QStringLiteral("aabb"));
   EXPECT_EQ(render(QStringLiteral("{{ title }}{% set title B %}{{ title }}"), vars), QStringLiteral("AB"));
-  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")), QStringLiteral("A[]"));
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")),
+            QStringLiteral("A[]"));
   engine.setObject(QStringLiteral("G"), QStringLiteral("g"));
   EXPECT_EQ(render(QStringLiteral("{{ g }}")), QStringLiteral("G"));
   engine.setObject(QStringLiteral("H"), QStringLiteral("g"));
@@ -433,8 +435,12 @@ TEST_F(EngineVariableTest, FiltersApplyToExpressionsAndMarkers) {
   EXPECT_EQ(render(QStringLiteral("{% for 1 to 2 %}{% cycle odd even | uppercase %}{% /for %}")),
             QStringLiteral("ODDEVEN"));
   // A filter that gives no value writes nothing (and is no error).
-  engine.loadFilter(std::make_shared<WTReportFilters>());
-  EXPECT_EQ(render(QStringLiteral("[{{ name | decimal }}]"), vars), QStringLiteral("[]"));
+  struct Nothing : GXTemplateFilter {
+    QStringList filters() const override { return {QStringLiteral("nothing")}; }
+    QVariant filterInvoked(const QString&, const QStringList&, const QVariant&) override { return {}; }
+  };
+  engine.loadFilter(std::make_shared<Nothing>());
+  EXPECT_EQ(render(QStringLiteral("[{{ name | nothing }}]"), vars), QStringLiteral("[]"));
   EXPECT_TRUE(delegate.errors.empty());
 }
 
