@@ -6,8 +6,8 @@
 
 class GXTemplateEngine;
 
-// What went wrong in a template run. The numbers are part of the engine's interface: `tessal template`
-// prints them and report authors look them up, so they never change.
+// What went wrong in a template run. The numbers are part of the engine's interface (`tessal template`
+// prints them as "error CODE: MESSAGE"), so they never change.
 enum class GXTemplateErrorCode {
   BlockBeganAndEnded = 0,  // a marker both began and ended a block; neither is honoured
   UnopenedBlockEnded = 1,  // a block ended that is not open; processing stops

@@ -444,7 +444,8 @@ void GXTemplateStandardMarkers::load(const QStringList& names) {
   for (const QString& name : names) {
     if (std::shared_ptr<GXTemplateFilter> filter = engine_->classRegistry().makeFilter(name)) {
       engine_->loadFilter(std::move(filter));
-    } else if (std::shared_ptr<GXTemplateMarker> marker = engine_->classRegistry().makeMarker(name, engine_)) {
+    } else if (std::shared_ptr<GXTemplateMarker> marker =
+                   engine_->classRegistry().makeMarker(name, engine_)) {
       engine_->loadMarker(std::move(marker));
     }
   }

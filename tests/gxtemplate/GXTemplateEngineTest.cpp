@@ -390,13 +390,10 @@ TEST_F(EngineVariableTest, ANameIsReadAgainOnlyAfterAVariableMayHaveChanged) {
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}{% if c.n %}{{ c.n }}{% /if %}|{% set x 1 %}{{ c.n }}"), vars),
             QStringLiteral("11|2"));
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}"), vars), QStringLiteral("3"));
-  EXPECT_EQ(
-      render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"),
-             vars),
-      QStringLiteral("aabb"));
+  EXPECT_EQ(render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"), vars),
+            QStringLiteral("aabb"));
   EXPECT_EQ(render(QStringLiteral("{{ title }}{% set title B %}{{ title }}"), vars), QStringLiteral("AB"));
-  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")),
-            QStringLiteral("A[]"));
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")), QStringLiteral("A[]"));
   engine.setObject(QStringLiteral("G"), QStringLiteral("g"));
   EXPECT_EQ(render(QStringLiteral("{{ g }}")), QStringLiteral("G"));
   engine.setObject(QStringLiteral("H"), QStringLiteral("g"));
