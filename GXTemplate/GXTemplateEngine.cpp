@@ -231,7 +231,7 @@ GXTemplateEngine::Prepared& GXTemplateEngine::prepared(const std::shared_ptr<con
 
 void GXTemplateEngine::handleExpression(const std::shared_ptr<const GXTemplateMatch>& match, Run& run) {
   // An expression's value is only ever written or reported while output is enabled, and looking a value
-  // up changes nothing, so a disabled region (the other levels of a report) skips the lookup.
+  // up changes nothing, so a disabled region (a branch not taken, a level not shown) skips the lookup.
   if (!outputEnabled()) return;
   const QString& name = match->name;
   QVariant value;

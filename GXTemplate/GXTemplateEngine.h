@@ -57,7 +57,7 @@ class GXTemplateEngine {
   // Not owned; may be null.
   GXTemplateEngineDelegate* delegate() const { return delegate_; }
   void setDelegate(GXTemplateEngineDelegate* delegate) { delegate_ = delegate; }
-  // Shared with the caller; without one a run reports error 7 and gives no result.
+  // Shared with the caller; without one a run reports NoMatcher and gives no result.
   std::shared_ptr<GXTemplateEngineMatcher> matcher() const { return matcher_; }
   void setMatcher(std::shared_ptr<GXTemplateEngineMatcher> matcher) { matcher_ = std::move(matcher); }
 

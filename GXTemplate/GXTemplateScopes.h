@@ -18,7 +18,7 @@
 //
 // A name read again before any variable may have changed (a value set, a loop going round, a block with
 // values closing, a new run) gives what it gave before: records are not asked twice for the same key path
-// in a row. Whoever changes a frame's values other than through this class must say so (blockClosing).
+// in a row. The engine, which owns the frames, says when one closes (blockClosing); it opens them empty.
 class GXTemplateScopes {
  public:
   // A variable name split at ".", kept across runs (templates repeat the same few names), with the
