@@ -85,7 +85,8 @@ bool HttpRequestParser::readHeaderLine(const std::string& line, Outcome& outcome
   if (version_.empty()) {
     const size_t space1 = line.find(' ');
     const size_t space2 = line.rfind(' ');
-    if (space1 == std::string::npos || space2 == space1) {
+    // A method and a target, both not empty, and the version.
+    if (space1 == std::string::npos || space1 == 0 || space2 <= space1 + 1) {
       refuse(outcome, 400, "Bad request line.");
       return false;
     }

@@ -78,6 +78,8 @@ TEST(HttpRequestParserTest, BytesGiveTheSameRequestOrRefusalHoweverTheyArrive) {
 
       {"GET /\r\n\r\n", "400"},
       {"\r\n\r\n", "400"},
+      {" / HTTP/1.1\r\n\r\n", "400"},
+      {"GET  HTTP/1.1\r\n\r\n", "400"},
       {"GET / HTTP/2\r\n\r\n", "400"},
       {"GET / HTTP/1.1\r\n X: 1\r\n\r\n", "400"},
       {"GET / HTTP/1.1\r\nNoColon\r\n\r\n", "400"},
