@@ -316,8 +316,9 @@ void HttpListener::readFrom(int fd) {
 }
 
 void HttpListener::refuse(Connection& connection, int status, const std::string& why) {
-  HttpRequest partial = connection.parser.partial();
-  partial.peer = connection.peer;
+  // The head is all a refusal needs; a partial body could be megabytes to copy.
+  const HttpRequest& read = connection.parser.partial();
+  const HttpRequest partial{read.method, read.path, read.query, read.headers, {}, connection.peer};
   const std::string bytes = serialise(refusal_(partial, status, why), false);
   // Best effort and never blocking: the reader must not wait on a client that does not read.
   [[maybe_unused]] const ssize_t sent =

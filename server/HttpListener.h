@@ -50,7 +50,8 @@ class HttpListener {
     size_t maxConnections = 4096;  // lowered to what the process's descriptor limit allows
   };
   using Handler = std::function<HttpReply(const HttpRequest&)>;
-  // What to answer a request refused before it was complete (status 400, 408, 413, 415, 431).
+  // What to answer a request refused before it was complete (status 400, 408, 413, 415, 431); `partial`
+  // holds what was read of its request line and headers, and no body.
   using Refusal = std::function<HttpReply(const HttpRequest& partial, int status, const std::string& why)>;
 
   HttpListener(Limits limits, int workers, Handler handler, Refusal refusal);
