@@ -485,12 +485,6 @@ void WTItemsViewController::showNotes(WTObject* object) {
   outlineView_->noteHeightOfRowChanged(index);
 }
 
-void WTItemsViewController::toggleCompleted(WTToDo* todo) {
-  if (!todo) return;
-  if (todo->completed()) todo->setStartDate(Date::now());
-  refreshChildren(todo);
-}
-
 void WTItemsViewController::refreshChildren(WTItem* item) {
   if (!item) return;
   context_->processPendingChanges();
@@ -630,9 +624,10 @@ void WTItemsViewController::partActivated(const QModelIndex& index, WTTableCellV
       break;
     case Part::Checkbox:
       if (item && item->entity() == WTEntity::ToDo) {
+        // The to-do dates itself; it then moves between "Pending" and its day, which is opened.
         treeController_->setData(index, !static_cast<WTToDo*>(item)->completed(),
                                  WTItemsModel::CompletedRole);
-        toggleCompleted(static_cast<WTToDo*>(item));
+        refreshChildren(item);
       }
       break;
     case Part::DateButton:
