@@ -13,6 +13,7 @@
 #include <QList>
 #include <QSet>
 
+#include <algorithm>
 #include <functional>
 #include <memory>
 #include <utility>

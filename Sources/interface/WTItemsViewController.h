@@ -120,6 +120,7 @@ class WTItemsViewController : public WTViewController {
   void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
   void saveExpandedItems();
   void restoreExpandedItems();
+  // The header (WTItemsViewHeader.cpp).
   void refreshHeader();
   // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.
   static void setElidedText(QLabel* label, const QString& text);
