@@ -10,6 +10,7 @@ void WTToDo::setCompleted(bool completed) {
 }
 
 void WTToDo::markCompleted(bool completed) {
+  if (completed == completed_) return;
   setCompleted(completed);
   if (completed) setStartDate(Date::now());
 }

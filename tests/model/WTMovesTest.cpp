@@ -65,6 +65,8 @@ TEST_F(WTMovesTest, ACompletedToDoIsDatedThenAndOpenedAgainKeepsThatDate) {
   EXPECT_TRUE(todo->completed());
   EXPECT_EQ(todo->startDate(), berlin(2024, 3, 14, 16, 30));
   setNow(berlin(2024, 3, 15, 8));
+  todo->markCompleted(true);  // already completed: still dated then
+  EXPECT_EQ(todo->startDate(), berlin(2024, 3, 14, 16, 30));
   todo->markCompleted(false);
   EXPECT_FALSE(todo->completed());
   EXPECT_EQ(todo->startDate(), berlin(2024, 3, 14, 16, 30));
