@@ -13,7 +13,7 @@ class WTOutlineView;
 
 // Paints every row of the items outline (tasks, groups, the five kinds of item) in the flat grey look
 // with its hover bar, edits a row's name, duration, amount or notes in place, and reports clicks on a
-// row's buttons to the controller.
+// row's buttons to the controller (the editing, tips and clicks in WTItemCellInteraction.cpp).
 class WTItemCellDelegate : public QStyledItemDelegate {
   Q_OBJECT
  public:

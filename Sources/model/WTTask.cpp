@@ -22,6 +22,28 @@ void WTTask::setProject(WTProject* project, int index) {
   changeOwner(project, index);
 }
 
+QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items) {
+  for (WTItem* item : items) item->setTask(this);
+  return items;
+}
+
+QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items, std::optional<Date> day) {
+  QList<WTItem*> adopted;
+  for (WTItem* item : items) {
+    if (day) {
+      item->setTask(this);
+      item->setDate(day);
+    } else if (item->entity() == WTEntity::ToDo) {
+      static_cast<WTToDo*>(item)->setCompleted(false);
+      item->setTask(this);
+    } else {
+      continue;
+    }
+    adopted << item;
+  }
+  return adopted;
+}
+
 void WTTask::setBudget(const std::optional<Decimal>& budget) {
   setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
 }

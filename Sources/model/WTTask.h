@@ -31,6 +31,12 @@ class WTTask final : public WTObject {
 
   // Every item of the task, of every kind, in no particular order.
   const QList<WTItem*>& items() const { return items_; }
+  // Takes `items` into this task, each keeping its date. Returns them.
+  QList<WTItem*> adoptItems(const QList<WTItem*>& items);
+  // Takes `items` into this task's group of `day`: a day books them on it (WTItem::setDate); none is
+  // "Pending", where only to-dos come, opened again, and other items stay where they were. Returns the
+  // items that came.
+  QList<WTItem*> adoptItems(const QList<WTItem*>& items, std::optional<Date> day);
 
   // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else 75.
   Decimal rateFromAbove() const override;
