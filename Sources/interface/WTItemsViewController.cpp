@@ -5,6 +5,7 @@
 #include "MoneyFormat.h"
 #include "RZBackgroundView.h"
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTDatePopover.h"
@@ -37,7 +38,7 @@
 
 namespace {
 
-const QString kExpandedItemsKey = QStringLiteral("NSOutlineView Items ");
+const QString kExpandedItemsKey = SettingsKeys::kExpandedItemsPrefix;
 
 }  // namespace
 
