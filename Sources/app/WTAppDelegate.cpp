@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
@@ -80,7 +81,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
 
 void WTAppDelegate::fillNewStore(WTObjectContext& context) {
   const UserDefaults* defaults = context.userDefaults();
-  if (defaults && !defaults->stringForKey(QStringLiteral("WTSyncUser")).isEmpty()) return;
+  if (defaults && !defaults->stringForKey(SettingsKeys::kSyncUser).isEmpty()) return;
   auto* project = WTProject::insertNewObject(&context);
   project->setName(QStringLiteral("Default Project"));
   auto* task = WTTask::insertNewObject(&context);
@@ -141,7 +142,7 @@ void WTAppDelegate::setSyncErrorPresenter(RZSyncErrorPresenter* presenter) {
 }
 
 QString WTAppDelegate::syncNetworkRequestsUser(RZSyncNetwork*) {
-  return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncUser")) : QString();
+  return defaults_ ? defaults_->stringForKey(SettingsKeys::kSyncUser) : QString();
 }
 
 WTPasswordStore* WTAppDelegate::passwordStore() {

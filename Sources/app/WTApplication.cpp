@@ -1,11 +1,12 @@
 #include "WTApplication.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTAppDelegate.h"
 #include "WTDialogAlertPresenter.h"
-#include "WTImages.h"
 #include "WTDialogTrackingAlertPresenter.h"
 #include "WTIdleSourceChain.h"
+#include "WTImages.h"
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
 #include "WTPasswordStore.h"
@@ -39,7 +40,7 @@ WTApplication::~WTApplication() {
 
 void WTApplication::registerDefaults(UserDefaults& defaults) {
   defaults.registerDefaults(
-      {{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")}, {QStringLiteral("WTIdleTime"), 5}});
+      {{SettingsKeys::kInvoiceUnit, QStringLiteral("h")}, {SettingsKeys::kIdleTime, 5}});
 }
 
 WTMainWindowController* WTApplication::mainWindowController() {

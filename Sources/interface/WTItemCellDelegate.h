@@ -24,10 +24,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
 
   // Which field the next edit opens (the name unless told otherwise).
   void setEditField(Field field) { field_ = field; }
-  Field editField() const { return field_; }
 
   // The row whose notes are being edited, and what they say now (not yet stored).
-  QModelIndex notesEditingIndex() const { return notesIndex_; }
   bool isEditingNotes(const QModelIndex& index) const;
   QString notesEditingText() const;
   WTNotesTextView* notesEditor() const;

@@ -3,6 +3,7 @@
 #include "Decimal.h"
 #include "RZBackgroundView.h"
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTDatePopover.h"
 #include "WTEmptyHint.h"
@@ -33,7 +34,7 @@
 
 namespace {
 
-const QString kExpandedItemsKey = QStringLiteral("NSOutlineView Items ");
+const QString kExpandedItemsKey = SettingsKeys::kExpandedItemsPrefix;
 
 }  // namespace
 

@@ -29,7 +29,6 @@ class WTProject final : public WTObject {
   Decimal rateFromAbove() const override;
   // What a project without a client bills, with no rate of its own and no default set: 50.
   static Decimal builtInRate() { return Decimal(50); }
-  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
   Decimal cost() const;
