@@ -2,10 +2,12 @@
 
 #include "GXBlockInfo.h"
 #include "GXRange.h"
+#include "GXTemplateClassRegistry.h"
 #include "GXTemplateEngineDelegate.h"
 #include "GXTemplateEngineMatcher.h"
 #include "GXTemplateFilter.h"
 #include "GXTemplateMarker.h"
+#include "GXTemplateScopes.h"
 #include "GXTemplateValue.h"
 
 #include <QString>
@@ -19,16 +21,10 @@
 
 // Turns a template text plus a map of variables into an output text. It finds markers and expressions
 // through its matcher, hands each marker to the handler registered under the marker's name, keeps the
-// stack of open blocks with their variable frames, resolves variables by key path, applies filters and
-// reports errors and block boundaries to its delegate. Main thread only; reusable: globals, markers and
-// filters persist across runs, everything else is reset by each run. A name read again before any
-// variable may have changed (a value set, a loop going round, a block with values closing, a new run)
-// gives what it gave before: records are not asked twice for the same key path in a row.
-//
-// Errors (domain "GXTemplateEngineErrorDomain"): 0 a marker both began and ended a block, 1 a block ended
-// that is not open (processing stops), 2 unknown marker, 3 unknown variable, 4 a block without end markers,
-// 5 an invalid resume range (fatal), 6 blocks left open, 7 no matcher (fatal, no result), 8 a run exceeded
-// its work or output limit (fatal; see setMaximumSteps).
+// stack of open blocks (whose variable frames, with the run's variables and the globals, are its scopes),
+// applies filters and reports errors (GXTemplateErrorCode) and block boundaries to its delegate. Main
+// thread only; reusable: globals, markers, filters and registered classes persist across runs, everything
+// else is reset by each run.
 class GXTemplateEngine {
  public:
   // "1.0.0".
@@ -61,7 +57,7 @@ class GXTemplateEngine {
   // Not owned; may be null.
   GXTemplateEngineDelegate* delegate() const { return delegate_; }
   void setDelegate(GXTemplateEngineDelegate* delegate) { delegate_ = delegate; }
-  // Shared with the caller; without one a run reports error 7 and gives no result.
+  // Shared with the caller; without one a run reports NoMatcher and gives no result.
   std::shared_ptr<GXTemplateEngineMatcher> matcher() const { return matcher_; }
   void setMatcher(std::shared_ptr<GXTemplateEngineMatcher> matcher) { matcher_ = std::move(matcher); }
 
@@ -71,18 +67,17 @@ class GXTemplateEngine {
 
   // Engine-wide variables ("globals"), kept across runs. Each run sets "engine" (a map with "delimiters")
   // and the booleans "true", "false", "YES", "NO", "yes", "no".
-  void setObject(const QVariant& object, const QString& key) {
-    globals_.insert(key, object);
-    ++rootKeysVersion_;
-    ++valuesVersion_;
-  }
-  void addEntriesFromDictionary(const QVariantMap& entries);
-  QVariant objectForKey(const QString& key) const { return globals_.value(key); }
+  void setObject(const QVariant& object, const QString& key) { scopes_.setGlobal(key, object); }
+  void addEntriesFromDictionary(const QVariantMap& entries) { scopes_.addGlobals(entries); }
+  QVariant objectForKey(const QString& key) const { return scopes_.global(key); }
 
   // Registers `marker` under each of its names not yet taken (the first handler loaded for a name keeps
   // it). Null is ignored.
   void loadMarker(std::shared_ptr<GXTemplateMarker> marker);
   void loadFilter(std::shared_ptr<GXTemplateFilter> filter);
+  // The classes the "load" marker finds by name; register your own here before running templates that
+  // load them.
+  GXTemplateClassRegistry& classRegistry() { return classes_; }
 
   // The output of `templateText` over `variables`, or a null QString when no matcher is set. The output
   // built so far is returned also when processing stops on an error.
@@ -95,41 +90,54 @@ class GXTemplateEngine {
   // record or list answers may index a list by its leading digits ("items.2" is the third item).
   // `parent` and `parentKey`, when given, receive the container that holds the value and its key there.
   QVariant valueForVariable(const QString& variable, QVariant* parent = nullptr,
-                            QString* parentKey = nullptr);
+                            QString* parentKey = nullptr) {
+    return scopes_.valueForVariable(variable, parent, parentKey);
+  }
   // Stores a value: where the variable already lives (unless forced), else in the innermost block's frame
   // (or the run's variables when no block is open) under the whole dotted name.
-  void setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame);
+  void setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame) {
+    scopes_.setValue(value, variable, forceCurrentStackFrame);
+  }
   // For the handler of the innermost block, to change one of its frame's values in place (a loop's next
   // round): the value of the plain `name` when that frame is where setValue would store it, else null.
   // The caller must leave a value there (nil would be removed by setValue).
-  QVariant* variableInInnermostBlock(const QString& name);
+  QVariant* variableInInnermostBlock(const QString& name) { return scopes_.variableInInnermostBlock(name); }
   QVariant resolveVariable(const QString& variable) { return valueForVariable(variable); }
   // A copy of the run's variables.
-  QVariantMap templateVariables() const { return templateVariables_; }
+  QVariantMap templateVariables() const { return scopes_.runVariables(); }
 
   // For the engine and its handlers: tell the delegate.
-  void reportError(const QString& message, int code, bool continuing);
+  void reportError(const QString& message, GXTemplateErrorCode code, bool continuing);
   void reportBlockBoundaryStarted(bool started);
   void reportTemplateProcessingFinished();
 
   // Guards against runaway templates (loops over huge ranges, loops that never end): a run stops with the
-  // fatal error 8 once it has handled more markers and expressions than `steps`, or once its output holds
-  // more than `length` UTF-16 units. 0 means no limit. Defaults: 200,000,000 steps, 256 Mi units.
+  // fatal error LimitExceeded once it has handled more markers and expressions than `steps`, or once its
+  // output holds more than `length` UTF-16 units. 0 means no limit. Defaults: 200,000,000 steps, 256 Mi
+  // units.
   void setMaximumSteps(qint64 steps) { maximumSteps_ = steps; }
   void setMaximumOutputLength(qint64 length) { maximumOutputLength_ = length; }
 
  private:
-  struct Step;
-  struct Place;
-  struct VariableName;
+  struct Run;
+  struct Prepared;
 
-  QVariant lookUp(const QString& variable, Place* place);
-  QVariant lookUp(VariableName& name, const QString& variable, Place* place);
-  QVariant resolve(VariableName& name, const QString& variable, Place* place);
-  void assign(const Place& place, const QVariant& value);
-  VariableName& nameOf(const QString& variable);
-  // The frame whose entry for the name's first component is found first, and that entry; null if none.
-  QVariantMap* rootFor(VariableName& name, const QVariant** entry);
+  void beginRun(const QString& templateText, const QVariantMap& variables);
+  bool limitReached(Run& run);
+  // One handler per kind of thing the matcher finds, each given the match it found. Those that return a
+  // flag return false when processing stops.
+  bool takeTextBefore(const GXTemplateMatch& match, Run& run);
+  void takeTextAfterLastMatch(Run& run);
+  bool handleLiteralMarker(const GXTemplateMatch& match, Run& run);
+  void handleExpression(const std::shared_ptr<const GXTemplateMatch>& match, Run& run);
+  bool handleMarker(const std::shared_ptr<const GXTemplateMatch>& match, Run& run);
+  // The block-opening and -closing halves of a marker; openBlock returns false when the marker's output and
+  // variables are to be dropped.
+  bool openBlock(const GXTemplateMatch& match, GXTemplateMarker* handler);
+  bool closeBlock(const QString& name, bool handlerOpenedTopBlock);
+  void write(const std::shared_ptr<const GXTemplateMatch>& match, QVariant value, Run& run);
+  void endRun();
+  Prepared& prepared(const std::shared_ptr<const GXTemplateMatch>& match);
   bool outputEnabled() const { return outputDisabledCount_ == 0; }
 
   QString markerStartDelimiter_ = QStringLiteral("{%");
@@ -148,31 +156,16 @@ class GXTemplateEngine {
   std::vector<GXBlockInfo> openBlocksStack_;
   // The handler that opened each open block (the one registered under its name), beside the stack.
   std::vector<GXTemplateMarker*> openBlockHandlers_;
-  QVariantMap globals_;
+  GXTemplateScopes scopes_{openBlocksStack_};
+  GXTemplateClassRegistry classes_;
   std::unordered_map<QString, std::shared_ptr<GXTemplateMarker>, GXTemplateValue::StringHash> markers_;
   std::unordered_map<QString, std::shared_ptr<GXTemplateFilter>, GXTemplateValue::StringHash> filters_;
-  QVariantMap templateVariables_;
   int outputDisabledCount_ = 0;
   qint64 templateLength_ = 0;
   bool literal_ = false;
 
   qint64 maximumSteps_ = 200'000'000;
   qint64 maximumOutputLength_ = qint64(256) * 1024 * 1024;
-  // Variable names split at ".", kept across runs (templates repeat the same few names), each with the
-  // version of the run's variables and globals in which its first component was found in neither;
-  // the version changes whenever either may have gained a key.
-  struct VariableName {
-    QStringList components;
-    quint64 absentFromRootsVersion = 0;
-    // The value last read, good while valuesVersion_ is memoVersion: a row that tests a value with "if"
-    // and then writes it reads it once.
-    quint64 memoVersion = 0;
-    QVariant memo;
-  };
-  // Moves on whenever a variable may have changed: a value set, a block opened or closed, a run begun.
-  quint64 valuesVersion_ = 1;
-  std::unordered_map<QString, VariableName, GXTemplateValue::StringHash> names_;
-  quint64 rootKeysVersion_ = 1;
   // What the engine looked up for each match of the current run, found again by the match's address (the
   // match is held, so its address is not reused). Only handlers and filters that exist are kept: a name
   // unknown now may be loaded later in the run.
@@ -180,7 +173,7 @@ class GXTemplateEngine {
     std::shared_ptr<const GXTemplateMatch> match;
     GXTemplateMarker* handler = nullptr;
     GXTemplateFilter* filter = nullptr;
-    VariableName* name = nullptr;
+    GXTemplateScopes::Name* name = nullptr;
   };
   std::unordered_map<const GXTemplateMatch*, Prepared> prepared_;
 };

@@ -6,11 +6,25 @@
 
 class GXTemplateEngine;
 
-// An error of a template run: domain "GXTemplateEngineErrorDomain", a code from 0 to 8 and the message
-// (localized, with the "Fatal Error: " prefix when processing could not continue).
+// What went wrong in a template run. The numbers are part of the engine's interface (`tessal template`
+// prints them as "error CODE: MESSAGE"), so they never change.
+enum class GXTemplateErrorCode {
+  BlockBeganAndEnded = 0,  // a marker both began and ended a block; neither is honoured
+  UnopenedBlockEnded = 1,  // a block ended that is not open; processing stops
+  UnknownMarker = 2,
+  UnknownVariable = 3,
+  NoEndMarkers = 4,        // a block without end markers; the marker's output and variables are dropped
+  InvalidResumeRange = 5,  // fatal
+  BlocksLeftOpen = 6,      // reported at the end of the run
+  NoMatcher = 7,           // fatal, no result
+  LimitExceeded = 8,       // a run exceeded its work or output limit; fatal (see setMaximumSteps)
+};
+
+// An error of a template run: domain "GXTemplateEngineErrorDomain", its code and the message (localized,
+// with the "Fatal Error: " prefix when processing could not continue).
 struct GXTemplateError {
   QString domain;
-  int code = 0;
+  GXTemplateErrorCode code = GXTemplateErrorCode::BlockBeganAndEnded;
   QString localizedDescription;
 };
 

@@ -2,7 +2,6 @@
 
 #include "Date.h"
 #include "Decimal.h"
-#include "GXTemplateClassRegistry.h"
 #include "GXTemplateEngine.h"
 #include "GXTemplateValue.h"
 #include "VariantNumbers.h"
@@ -443,10 +442,10 @@ bool GXTemplateStandardMarkers::condition(const QStringList& args) {
 void GXTemplateStandardMarkers::load(const QStringList& names) {
   if (!engine_) return;
   for (const QString& name : names) {
-    if (std::shared_ptr<GXTemplateFilter> filter = GXTemplateClassRegistry::makeFilter(name)) {
+    if (std::shared_ptr<GXTemplateFilter> filter = engine_->classRegistry().makeFilter(name)) {
       engine_->loadFilter(std::move(filter));
     } else if (std::shared_ptr<GXTemplateMarker> marker =
-                   GXTemplateClassRegistry::makeMarker(name, engine_)) {
+                   engine_->classRegistry().makeMarker(name, engine_)) {
       engine_->loadMarker(std::move(marker));
     }
   }

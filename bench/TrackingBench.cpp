@@ -1,5 +1,6 @@
 // One tick of the stopwatch updater with ten timers running in the 100,000-item store.
 #include "LargeStore.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTIdleSource.h"
 #include "WTObjectContext.h"
@@ -27,7 +28,7 @@ class NeverIdle final : public WTIdleSource {
 struct TenTimers {
   TenTimers() {
     defaults = std::make_unique<UserDefaults>(dir.filePath(QStringLiteral("settings.conf")));
-    defaults->setValue(QStringLiteral("WTShouldIdle"), true);
+    defaults->setValue(SettingsKeys::kShouldIdle, true);
     context = std::make_unique<WTObjectContext>(defaults.get());
     auto store = WTStore::open(LargeStore::instance().path());
     if (store.ok()) (void)context->attachStore(std::move(store.value()));

@@ -26,20 +26,6 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-std::string lowerCase(std::string text) {
-  for (char& c : text) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return text;
-}
-
-std::string trimmed(const std::string& text) {
-  size_t begin = 0, end = text.size();
-  while (begin < end && (text[begin] == ' ' || text[begin] == '\t')) ++begin;
-  while (end > begin && (text[end - 1] == ' ' || text[end - 1] == '\t')) --end;
-  return text.substr(begin, end - begin);
-}
-
 const char* reason(int status) {
   switch (status) {
     case 100:
@@ -128,37 +114,17 @@ HttpReply textReply(int status, const std::string& text) {
   return reply;
 }
 
-std::string HttpRequest::header(const std::string& lowerCaseName) const {
-  auto found = headers.find(lowerCaseName);
-  return found == headers.end() ? std::string() : found->second;
-}
-
 struct HttpListener::Connection {
-  enum class Phase { Idle, Headers, Body, Busy };
-  int fd = -1;
+  // Idle: between requests, under the idle deadline. Reading: under the request's deadline. Busy: a
+  // worker holds the connection, and no deadline runs.
+  enum class Phase { Idle, Reading, Busy };
+  Connection(int fd, std::string peer, HttpRequestParser::Limits limits)
+      : fd(fd), peer(std::move(peer)), parser(limits) {}
+  int fd;
   std::string peer;
-  std::string buffer;
+  HttpRequestParser parser;
   Phase phase = Phase::Idle;
   Clock::time_point deadline;
-  HttpRequest request;
-  bool keepAlive = true;
-  bool chunked = false;
-  size_t contentLength = 0;
-  // Chunked bodies: the bytes left of the present chunk, or none while a size line is awaited.
-  std::optional<size_t> chunkLeft;
-  bool trailers = false;
-
-  void reset(Clock::time_point idleDeadline) {
-    phase = Phase::Idle;
-    deadline = idleDeadline;
-    request = HttpRequest{};
-    request.peer = peer;
-    keepAlive = true;
-    chunked = false;
-    contentLength = 0;
-    chunkLeft.reset();
-    trailers = false;
-  }
 };
 
 HttpListener::HttpListener(Limits limits, int workers, Handler handler, Refusal refusal)
@@ -269,13 +235,14 @@ void HttpListener::readLoop() {
         continue;
       }
       Connection& connection = *found->second;
-      connection.reset(Clock::now() + limits_.idleTimeout);
+      connection.phase = Connection::Phase::Idle;
+      connection.deadline = Clock::now() + limits_.idleTimeout;
       epoll_event event{};
       event.events = EPOLLIN | EPOLLRDHUP;
       event.data.fd = fd;
       epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event);
       // A pipelined request may already be waiting in the buffer.
-      if (!connection.buffer.empty()) dispatch(fd);
+      if (connection.parser.hasBufferedBytes()) dispatch(fd, {});
     }
     sweepDeadlines(Clock::now());
     if (acceptPausedUntil_ && Clock::now() >= *acceptPausedUntil_) {
@@ -315,10 +282,11 @@ void HttpListener::accept() {
     } else {
       inet_ntop(AF_INET, &reinterpret_cast<sockaddr_in*>(&address)->sin_addr, text, sizeof text);
     }
-    auto connection = std::make_unique<Connection>();
-    connection->fd = fd;
-    connection->peer = text;
-    connection->reset(Clock::now() + limits_.idleTimeout);
+    auto connection = std::make_unique<Connection>(
+        fd, text,
+        HttpRequestParser::Limits{limits_.maxBodyBytes, limits_.maxHeaderBytes, limits_.maxHeaderLine,
+                                  limits_.maxHeaderCount});
+    connection->deadline = Clock::now() + limits_.idleTimeout;
     connections_[fd] = std::move(connection);
     epoll_event event{};
     event.events = EPOLLIN | EPOLLRDHUP;
@@ -336,9 +304,7 @@ void HttpListener::close(int fd) {
 }
 
 void HttpListener::readFrom(int fd) {
-  auto found = connections_.find(fd);
-  if (found == connections_.end()) return;
-  Connection& connection = *found->second;
+  if (!connections_.count(fd)) return;
   char chunk[16384];
   const ssize_t got = ::read(fd, chunk, sizeof chunk);
   if (got == 0 || (got < 0 && errno != EAGAIN && errno != EWOULDBLOCK && errno != EINTR)) {
@@ -346,166 +312,45 @@ void HttpListener::readFrom(int fd) {
     return;
   }
   if (got < 0) return;
-  if (connection.phase == Connection::Phase::Idle) {
-    connection.phase = Connection::Phase::Headers;
-    connection.deadline = Clock::now() + limits_.requestTimeout;
-  }
-  connection.buffer.append(chunk, static_cast<size_t>(got));
-  dispatch(fd);
+  dispatch(fd, std::string_view(chunk, static_cast<size_t>(got)));
 }
 
 void HttpListener::refuse(Connection& connection, int status, const std::string& why) {
-  connection.request.peer = connection.peer;
-  const std::string bytes = serialise(refusal_(connection.request, status, why), false);
+  // The head is all a refusal needs; a partial body could be megabytes to copy.
+  const HttpRequest& read = connection.parser.partial();
+  const HttpRequest partial{read.method, read.path, read.query, read.headers, {}, connection.peer};
+  const std::string bytes = serialise(refusal_(partial, status, why), false);
   // Best effort and never blocking: the reader must not wait on a client that does not read.
   [[maybe_unused]] const ssize_t sent =
       send(connection.fd, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
   close(connection.fd);
 }
 
-// Parses what the buffer holds; hands a complete request to the workers or refuses a bad one.
-void HttpListener::dispatch(int fd) {
+// Parses what has arrived; hands a complete request to the workers or refuses a bad one.
+void HttpListener::dispatch(int fd, std::string_view bytes) {
   Connection& connection = *connections_.at(fd);
-  if (connection.phase == Connection::Phase::Idle && !connection.buffer.empty()) {
-    connection.phase = Connection::Phase::Headers;
+  // The request's deadline runs from its first byte.
+  if (connection.phase == Connection::Phase::Idle) {
+    connection.phase = Connection::Phase::Reading;
     connection.deadline = Clock::now() + limits_.requestTimeout;
   }
-  if (connection.phase == Connection::Phase::Headers) {
-    const size_t end = connection.buffer.find("\r\n\r\n");
-    const size_t headerBytes = end == std::string::npos ? connection.buffer.size() : end + 4;
-    if (headerBytes > limits_.maxHeaderBytes)
-      return refuse(connection, 431, "The request's headers are too large.");
-    if (end == std::string::npos) {
-      const size_t lineStart = connection.buffer.rfind('\n');
-      const size_t open = connection.buffer.size() - (lineStart == std::string::npos ? 0 : lineStart + 1);
-      if (open > limits_.maxHeaderLine) return refuse(connection, 431, "A header line is too long.");
-      return;
-    }
-    HttpRequest& request = connection.request;
-    size_t position = 0, count = 0;
-    bool first = true;
-    std::string version;
-    while (position < end) {
-      size_t lineEnd = connection.buffer.find("\r\n", position);
-      if (lineEnd == std::string::npos || lineEnd > end) lineEnd = end;
-      const std::string line = connection.buffer.substr(position, lineEnd - position);
-      position = lineEnd + 2;
-      if (line.size() > limits_.maxHeaderLine) return refuse(connection, 431, "A header line is too long.");
-      if (first) {
-        first = false;
-        const size_t space1 = line.find(' ');
-        const size_t space2 = line.rfind(' ');
-        if (space1 == std::string::npos || space2 == space1)
-          return refuse(connection, 400, "Bad request line.");
-        request.method = line.substr(0, space1);
-        const std::string target = line.substr(space1 + 1, space2 - space1 - 1);
-        version = line.substr(space2 + 1);
-        if (version != "HTTP/1.1" && version != "HTTP/1.0")
-          return refuse(connection, 400, "Bad HTTP version.");
-        const size_t question = target.find('?');
-        request.path = target.substr(0, question);
-        if (question != std::string::npos) request.query = target.substr(question + 1);
-        continue;
-      }
-      if (++count > limits_.maxHeaderCount)
-        return refuse(connection, 431, "The request has too many headers.");
-      const size_t colon = line.find(':');
-      if (colon == std::string::npos || colon == 0 || line[0] == ' ' || line[0] == '\t')
-        return refuse(connection, 400, "Bad header line.");
-      std::string& value = request.headers[lowerCase(line.substr(0, colon))];
-      value =
-          value.empty() ? trimmed(line.substr(colon + 1)) : value + ", " + trimmed(line.substr(colon + 1));
-    }
-    connection.buffer.erase(0, end + 4);
-    const std::string connectionHeader = lowerCase(request.header("connection"));
-    connection.keepAlive = version == "HTTP/1.1" ? connectionHeader.find("close") == std::string::npos
-                                                 : connectionHeader.find("keep-alive") != std::string::npos;
-    const std::string encoding = lowerCase(request.header("content-encoding"));
-    if (!encoding.empty() && encoding != "identity")
-      return refuse(connection, 415, "Compressed request bodies are not accepted.");
-    const std::string transfer = lowerCase(request.header("transfer-encoding"));
-    const std::string length = request.header("content-length");
-    if (!transfer.empty()) {
-      if (transfer != "chunked" || !length.empty())
-        return refuse(connection, 400, "Unsupported transfer encoding.");
-      connection.chunked = true;
-    } else if (!length.empty()) {
-      if (length.size() > 18 || length.find_first_not_of("0123456789") != std::string::npos)
-        return refuse(connection, 400, "Bad Content-Length.");
-      connection.contentLength = std::stoull(length);
-      if (connection.contentLength > limits_.maxBodyBytes)
-        return refuse(connection, 413, "The request is larger than this server accepts.");
-    }
-    if (lowerCase(request.header("expect")) == "100-continue") {
-      static const char kContinue[] = "HTTP/1.1 100 Continue\r\n\r\n";
-      [[maybe_unused]] const ssize_t sent =
-          send(fd, kContinue, sizeof kContinue - 1, MSG_NOSIGNAL | MSG_DONTWAIT);
-    }
-    connection.phase = Connection::Phase::Body;
+  HttpRequestParser::Outcome outcome = connection.parser.feed(bytes);
+  if (outcome.continueFirst) {
+    static const char kContinue[] = "HTTP/1.1 100 Continue\r\n\r\n";
+    [[maybe_unused]] const ssize_t sent =
+        send(fd, kContinue, sizeof kContinue - 1, MSG_NOSIGNAL | MSG_DONTWAIT);
   }
-  if (connection.phase != Connection::Phase::Body) return;
-
-  HttpRequest& request = connection.request;
-  if (!connection.chunked) {
-    if (connection.buffer.size() < connection.contentLength) {
-      return;
-    }
-    request.body = connection.buffer.substr(0, connection.contentLength);
-    connection.buffer.erase(0, connection.contentLength);
-  } else {
-    // Decoded as it arrives; the decoded size is what counts against the limit.
-    for (;;) {
-      if (connection.trailers) {
-        const size_t lineEnd = connection.buffer.find("\r\n");
-        if (lineEnd == std::string::npos) {
-          if (connection.buffer.size() > limits_.maxHeaderLine)
-            return refuse(connection, 431, "A trailer is too long.");
-          return;
-        }
-        connection.buffer.erase(0, lineEnd + 2);
-        if (lineEnd == 0) break;  // the blank line after the trailers ends the request
-        continue;
-      }
-      if (!connection.chunkLeft) {
-        const size_t lineEnd = connection.buffer.find("\r\n");
-        if (lineEnd == std::string::npos) {
-          if (connection.buffer.size() > 64) return refuse(connection, 400, "Bad chunk size.");
-          return;
-        }
-        const std::string sizeText = connection.buffer.substr(0, connection.buffer.find_first_of(";\r"));
-        if (sizeText.empty() || sizeText.size() > 15 ||
-            sizeText.find_first_not_of("0123456789abcdefABCDEF") != std::string::npos)
-          return refuse(connection, 400, "Bad chunk size.");
-        const size_t size = std::stoull(sizeText, nullptr, 16);
-        connection.buffer.erase(0, lineEnd + 2);
-        if (size == 0) {
-          connection.trailers = true;
-          continue;
-        }
-        if (request.body.size() + size > limits_.maxBodyBytes)
-          return refuse(connection, 413, "The request is larger than this server accepts.");
-        connection.chunkLeft = size;
-      }
-      const size_t take = std::min(*connection.chunkLeft, connection.buffer.size());
-      request.body.append(connection.buffer, 0, take);
-      connection.buffer.erase(0, take);
-      *connection.chunkLeft -= take;
-      if (*connection.chunkLeft > 0) return;
-      if (connection.buffer.size() < 2) return;
-      if (connection.buffer.compare(0, 2, "\r\n") != 0) return refuse(connection, 400, "Bad chunk.");
-      connection.buffer.erase(0, 2);
-      connection.chunkLeft.reset();
-    }
-  }
+  if (outcome.kind == HttpRequestParser::Outcome::Kind::Refusal)
+    return refuse(connection, outcome.status, outcome.why);
+  if (outcome.kind == HttpRequestParser::Outcome::Kind::NeedMore) return;
   // Complete: the connection leaves the reader until a worker has answered.
   epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
   connection.phase = Connection::Phase::Busy;
-  request.peer = connection.peer;
+  outcome.request.peer = connection.peer;
   {
     std::lock_guard lock(mutex_);
-    jobs_.push_back(Job{fd, std::move(request), connection.keepAlive});
+    jobs_.push_back(Job{fd, std::move(outcome.request), outcome.keepAlive});
   }
-  connection.request = HttpRequest{};
   work_.notify_one();
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "HttpRequestParser.h"
 #include "SyncService.h"
 
 #include <atomic>
@@ -13,23 +14,11 @@
 #include <mutex>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <vector>
 
 namespace tessal::server {
-
-// One request, read completely before any worker sees it.
-struct HttpRequest {
-  std::string method;
-  std::string path;                            // without the query
-  std::string query;                           // after "?", undecoded
-  std::map<std::string, std::string> headers;  // names in lower case
-  std::string body;
-  std::string peer;  // the client's address
-
-  // A header's value, or empty.
-  std::string header(const std::string& lowerCaseName) const;
-};
 
 // A plain-text answer: `text` and a line break.
 HttpReply textReply(int status, const std::string& text);
@@ -37,11 +26,17 @@ HttpReply textReply(int status, const std::string& text);
 // The HTTP/1.1 front of the server, written for a service that strangers can reach.
 //
 // One thread reads every connection without blocking, with a deadline for the whole request (not per
-// byte, which one byte every few seconds would defeat) and caps on header lines, header count, header
-// size and body size, counted on the bytes as they arrive whatever the framing (Content-Length or
-// chunked); compressed bodies are refused. Only complete requests reach the workers, so slow or idle
-// connections never hold one, and a flood of them costs memory bounded by the caps and the connection
-// limit, not service. The listen backlog is the system's maximum.
+// byte, which one byte every few seconds would defeat), and feeds what arrives to the connection's
+// HttpRequestParser, which applies the caps on header lines, header count, header size and body size.
+// Only complete requests reach the workers, so slow or idle connections never hold one, and a flood of
+// them costs memory bounded by the caps and the connection limit, not service. The listen backlog is
+// the system's maximum.
+//
+// Threads: the reader thread alone accepts, reads, parses, refuses and closes; it owns every
+// connection between requests. A complete request goes to the job queue and its connection leaves the
+// reader's epoll set; one of the workers answers it, writes the reply (blocking, with writeTimeout) and
+// hands the connection back through `returned_`, waking the reader. `mutex_` guards only the queue and
+// `returned_`; the handler runs on the workers with no lock of the listener held.
 class HttpListener {
  public:
   struct Limits {
@@ -55,7 +50,8 @@ class HttpListener {
     size_t maxConnections = 4096;  // lowered to what the process's descriptor limit allows
   };
   using Handler = std::function<HttpReply(const HttpRequest&)>;
-  // What to answer a request refused before it was complete (status 400, 408, 411, 413, 415, 431).
+  // What to answer a request refused before it was complete (status 400, 408, 413, 415, 431); `partial`
+  // holds what was read of its request line and headers, and no body.
   using Refusal = std::function<HttpReply(const HttpRequest& partial, int status, const std::string& why)>;
 
   HttpListener(Limits limits, int workers, Handler handler, Refusal refusal);
@@ -83,7 +79,7 @@ class HttpListener {
   void readFrom(int fd);
   void refuse(Connection& connection, int status, const std::string& why);
   void close(int fd);
-  void dispatch(int fd);
+  void dispatch(int fd, std::string_view bytes);
   void sweepDeadlines(std::chrono::steady_clock::time_point now);
   bool writeAll(int fd, const std::string& bytes);
   // A worker is done with a connection: the reader keeps it for the next request or closes it.

@@ -22,6 +22,11 @@ struct HttpReply {
 };
 
 // The sync protocol: one JSON request in, one JSON reply out. Documented in server/README.md.
+//
+// Threads: every HTTP worker calls handle() at the same time, with no lock of the listener held.
+// The only state it keeps is the last head sent to each device, under `headsMutex_`, which is held
+// for a map look-up or update and never across a call to the authenticator or the store. Password
+// checks lock inside PasswordAuthenticator; storage calls lock nothing here (see SyncStore).
 class SyncService {
  public:
   // The "code" of an error reply.

@@ -15,6 +15,16 @@ namespace tessal::server {
 // Each account keeps the current state of its records, not a log: per record its creation and, once
 // deleted, its tombstone; per field its value, the iteration that wrote it and the device that did.
 // The account's head is the last iteration written. server/README.md explains why this converges.
+//
+// Threads: the HTTP workers call it at the same time (SyncService for head, save and currentHead;
+// PasswordAuthenticator for findAccount and createAccount, on behalf of the sync and sign-up pages);
+// the "adduser" command calls it from its only thread. It keeps no state of its own and takes no lock
+// of its own: each call leases a connection from SqlDatabase's pool (whose mutex is held only to take
+// or give back an idle connection) and runs on it alone. The storage does the rest: head() reads one
+// consistent snapshot; save() is one write transaction in which saves of one account queue on the
+// account's row (PostgreSQL: SELECT ... FOR UPDATE) or on the file's write lock (SQLite: BEGIN
+// IMMEDIATE, which queues saves of every account for up to 10 s). Reads never wait for a save: SQLite
+// runs in WAL mode, PostgreSQL reads its snapshot.
 class SyncStore {
  public:
   // Opens (and on first use sets up) the storage at `location` (see SqlDatabase::open). None with

@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
@@ -133,7 +134,7 @@ void WTAppDelegate::setSyncErrorPresenter(RZSyncErrorPresenter* presenter) {
 }
 
 QString WTAppDelegate::syncNetworkRequestsUser(RZSyncNetwork*) {
-  return defaults_ ? defaults_->stringForKey(QStringLiteral("WTSyncUser")) : QString();
+  return defaults_ ? defaults_->stringForKey(SettingsKeys::kSyncUser) : QString();
 }
 
 WTPasswordStore* WTAppDelegate::passwordStore() {

@@ -1,11 +1,12 @@
 #include "WTApplication.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTAppDelegate.h"
 #include "WTDialogAlertPresenter.h"
-#include "WTImages.h"
 #include "WTDialogTrackingAlertPresenter.h"
 #include "WTIdleSourceChain.h"
+#include "WTImages.h"
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
 #include "WTPasswordStore.h"

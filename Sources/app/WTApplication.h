@@ -42,9 +42,6 @@ class WTApplication : public QApplication {
   // the toolbar's running-time button opens the tray's list. Both ways lead to the window and to Quit.
   static void linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window);
 
-  // The tray's icon and list; made at launch.
-  WTStatusBarController* statusBarController() const { return statusBarController_.get(); }
-
  private:
   std::unique_ptr<UserDefaults> defaults_;
   std::unique_ptr<WTDialogAlertPresenter> presenter_;

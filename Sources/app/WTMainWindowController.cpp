@@ -1,6 +1,7 @@
 #include "WTMainWindowController.h"
 
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
@@ -97,8 +98,8 @@ WTMainWindowController::~WTMainWindowController() {
 void WTMainWindowController::registerDefaults(UserDefaults& defaults) {
   const Date now = Date::now();
   defaults.registerDefaults(
-      {{QStringLiteral("WTCustomRangeBegin"), QVariant::fromValue(RZDate::addMonth(now, -1))},
-       {QStringLiteral("WTCustomRangeEnd"), QVariant::fromValue(now)}});
+      {{SettingsKeys::kCustomRangeBegin, QVariant::fromValue(RZDate::addMonth(now, -1))},
+       {SettingsKeys::kCustomRangeEnd, QVariant::fromValue(now)}});
 }
 
 void WTMainWindowController::watch(WTViewController* controller) {
@@ -417,7 +418,7 @@ void WTMainWindowController::scheduleValidation() {
 
 void WTMainWindowController::saveLastSelectedProject(int index) {
   if (UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults()) {
-    defaults->setValue(QStringLiteral("WTLastSelectedProject"), index);
+    defaults->setValue(SettingsKeys::kLastSelectedProject, index);
   }
 }
 
@@ -430,7 +431,7 @@ void WTMainWindowController::bringToFront() {
 
 void WTMainWindowController::restoreWindowGeometry() {
   UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults();
-  const QString saved = defaults ? defaults->stringForKey(QString::fromLatin1(kGeometryKey)) : QString();
+  const QString saved = defaults ? defaults->stringForKey(SettingsKeys::kMainWindowGeometry) : QString();
   if (!saved.isEmpty() && restoreGeometry(QByteArray::fromBase64(saved.toLatin1()))) return;
   // First run: a comfortable size that still fits a small or highly scaled screen, centred on it.
   QSize size(960, 640);
@@ -445,7 +446,7 @@ void WTMainWindowController::restoreWindowGeometry() {
 
 void WTMainWindowController::saveWindowGeometry() {
   if (UserDefaults* defaults = delegate_.managedObjectContext()->userDefaults())
-    defaults->setValue(QString::fromLatin1(kGeometryKey), QString::fromLatin1(saveGeometry().toBase64()));
+    defaults->setValue(SettingsKeys::kMainWindowGeometry, QString::fromLatin1(saveGeometry().toBase64()));
 }
 
 WTPreferencesWindowController* WTMainWindowController::showPreferences() {

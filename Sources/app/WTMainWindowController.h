@@ -85,7 +85,6 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   // With a tray to come back from, closing the window only hides it and Tessal keeps running there;
   // without, closing it quits.
   void setHidesOnClose(bool hides) { hidesOnClose_ = hides; }
-  bool hidesOnClose() const { return hidesOnClose_; }
   // Where the desktop has no tray, a toolbar button shows the running time and opens the tray's list.
   void setRunningTimeButtonVisible(bool visible);
   void setRunningTime(const QString& label);
@@ -94,7 +93,6 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTProjectsViewController* projectsViewController() const { return projectsViewController_; }
   WTClientsViewController* clientsViewController() const { return clientsViewController_; }
   WTNavigationController* projectsNavigationController() const { return projectsNavigationController_; }
-  WTNavigationController* clientsNavigationController() const { return clientsNavigationController_; }
   QWidget* contentView() const { return contentView_; }
 
  signals:
@@ -105,8 +103,6 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void closeEvent(QCloseEvent* event) override;
 
  private:
-  // The window's place and size are kept under this user default (ours) from one run to the next.
-  static constexpr const char* kGeometryKey = "WTMainWindowGeometry";
   void restoreWindowGeometry();
   void saveWindowGeometry();
   void buildActions();

@@ -24,7 +24,7 @@ class ErrorPrinter : public GXTemplateEngineDelegate {
   explicit ErrorPrinter(QTextStream& err) : err_(err) {}
   bool observesBlocks() const override { return false; }
   void templateEngineEncounteredError(GXTemplateEngine*, const GXTemplateError& error, bool) override {
-    err_ << "error " << error.code << ": " << error.localizedDescription << '\n';
+    err_ << "error " << int(error.code) << ": " << error.localizedDescription << '\n';
     err_.flush();
   }
 

@@ -1,5 +1,6 @@
 #include "WTStoreSetup.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -28,12 +29,12 @@ QString syncJournalPath() {
 
 void registerDefaults(UserDefaults& defaults) {
   defaults.registerDefaults(
-      {{QStringLiteral("wtInvoiceUnit"), QStringLiteral("h")}, {QStringLiteral("WTIdleTime"), 5}});
+      {{SettingsKeys::kInvoiceUnit, QStringLiteral("h")}, {SettingsKeys::kIdleTime, 5}});
 }
 
 void fillNewStore(WTObjectContext& context) {
   const UserDefaults* defaults = context.userDefaults();
-  if (defaults && !defaults->stringForKey(QStringLiteral("WTSyncUser")).isEmpty()) return;
+  if (defaults && !defaults->stringForKey(SettingsKeys::kSyncUser).isEmpty()) return;
   auto* project = WTProject::insertNewObject(&context);
   project->setName(QStringLiteral("Default Project"));
   auto* task = WTTask::insertNewObject(&context);

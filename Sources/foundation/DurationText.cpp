@@ -54,17 +54,6 @@ QString stringWithMinutes(std::int32_t minutes) {
   return twoDigits(minutes / 60) + QLatin1Char(':') + twoDigits(minutes % 60);
 }
 
-QString stringWithSeconds(std::int32_t seconds) {
-  return stringWithMinutes(seconds / 60) + QLatin1Char(':') + twoDigits(seconds % 60);
-}
-
-QString durationString(const QVariant& number) {
-  // Truncated toward zero (2.9 is 2), whether the number is an integer, a double, a decimal or numeric
-  // text; values beyond 32 bits saturate.
-  const std::optional<Decimal> value = Decimal::fromVariant(number);
-  return stringWithMinutes(value ? clampToInt(value->toInt64()) : 0);
-}
-
 int minutesFromString(const QString& text) {
   // Minutes last, then hours, then days; anything further left is ignored.
   static constexpr long long kWeights[] = {1, 60, 1440};
@@ -104,24 +93,3 @@ std::optional<int> minutesFromTypedText(const QString& text, QString* refusal) {
 }
 
 }  // namespace DurationText
-
-QString WTDurationFormatter::stringForObjectValue(const QVariant& value) const {
-  return DurationText::durationString(value);
-}
-
-bool WTDurationFormatter::getObjectValue(QVariant* result, const QString& text,
-                                         QString* errorDescription) const {
-  Q_UNUSED(errorDescription);  // parsing never fails, so there is never an error text
-  if (result) *result = QVariant(DurationText::minutesFromString(text));
-  return true;
-}
-
-QVariant WTDurationTransformer::transformedValue(const QVariant& value) const {
-  // No value stays no value, so an empty field shows nothing rather than "00:00".
-  if (!value.isValid() || value.isNull()) return QVariant();
-  return DurationText::durationString(value);
-}
-
-QVariant WTDurationTransformer::reverseTransformedValue(const QVariant& value) const {
-  return QVariant(DurationText::minutesFromString(value.toString()));
-}

@@ -17,10 +17,6 @@ class WTDeletion {
 
   // The records to delete, outermost only, in the given order.
   const QList<WTObject*>& objects() const { return objects_; }
-  // Items that go with them without being among them.
-  int itemCount() const { return items_; }
-  // Running time entries among everything that goes.
-  int runningCount() const { return running_; }
 
   bool needsQuestion() const { return items_ > 0 || running_ > 0; }
   // "Delete “General” and its 14 items?", "Delete 2 tasks and their 14 items?", "Delete “Temp”?"

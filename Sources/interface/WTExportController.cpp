@@ -28,13 +28,13 @@ WTExportController::WTExportController(WTObjectContext* context, std::function<W
   rangeButton_ = new WTRangePopUpButton(context ? context->userDefaults() : nullptr, this);
   form->addRow(tr("Date range:"), rangeButton_);
 
-  projectFilterMatrix_ = new QButtonGroup(this);
+  projectChoice_ = new QButtonGroup(this);
   auto* all = new QRadioButton(tr("All projects"), this);
   all->setObjectName(QStringLiteral("allProjects"));
   auto* selected = new QRadioButton(tr("Selected project"), this);
   selected->setObjectName(QStringLiteral("selectedProject"));
-  projectFilterMatrix_->addButton(all, AllProjects);
-  projectFilterMatrix_->addButton(selected, SelectedProject);
+  projectChoice_->addButton(all, AllProjects);
+  projectChoice_->addButton(selected, SelectedProject);
   all->setChecked(true);
   selectedProjectLabel_ = new QLabel(this);
   selectedProjectLabel_->setObjectName(QStringLiteral("selectedProjectName"));
@@ -78,7 +78,7 @@ void WTExportController::updateSelectedProjectLabel() {
 }
 
 WTProject* WTExportController::projectLimit() const {
-  if (projectFilterMatrix_->checkedId() != SelectedProject || !selectedProject_) return nullptr;
+  if (projectChoice_->checkedId() != SelectedProject || !selectedProject_) return nullptr;
   return selectedProject_();
 }
 

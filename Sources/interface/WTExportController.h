@@ -30,7 +30,7 @@ class WTExportController : public QDialog {
   ~WTExportController() override;
 
   WTRangePopUpButton* rangeButton() const { return rangeButton_; }
-  QButtonGroup* projectFilterMatrix() const { return projectFilterMatrix_; }
+  QButtonGroup* projectChoice() const { return projectChoice_; }
 
   // The project the export is limited to: the selected one when that choice is made and a project is
   // selected, otherwise none (every project).
@@ -52,7 +52,7 @@ class WTExportController : public QDialog {
   WTObjectContext* context_;
   std::function<WTProject*()> selectedProject_;
   WTRangePopUpButton* rangeButton_;
-  QButtonGroup* projectFilterMatrix_;
+  QButtonGroup* projectChoice_;
   QLabel* selectedProjectLabel_;
   WTSaveLocationChooser chooseSaveLocation_;
 };

@@ -13,7 +13,7 @@ class WTOutlineView;
 
 // Paints every row of the items outline (tasks, groups, the five kinds of item) in the flat grey look
 // with its hover bar, edits a row's name, duration, amount or notes in place, and reports clicks on a
-// row's buttons to the controller.
+// row's buttons to the controller (the editing, tips and clicks in WTItemCellInteraction.cpp).
 class WTItemCellDelegate : public QStyledItemDelegate {
   Q_OBJECT
  public:
@@ -24,10 +24,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
 
   // Which field the next edit opens (the name unless told otherwise).
   void setEditField(Field field) { field_ = field; }
-  Field editField() const { return field_; }
 
   // The row whose notes are being edited, and what they say now (not yet stored).
-  QModelIndex notesEditingIndex() const { return notesIndex_; }
   bool isEditingNotes(const QModelIndex& index) const;
   QString notesEditingText() const;
   WTNotesTextView* notesEditor() const;

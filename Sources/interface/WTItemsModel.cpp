@@ -4,13 +4,12 @@
 #include "DurationText.h"
 #include "MoneyFormat.h"
 #include "RZDate.h"
-#include "WTClient.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
+#include "WTItemsModelNode.h"
 #include "WTObjectContext.h"
-#include "WTOrderedDiff.h"
 #include "WTProject.h"
 #include "WTTask.h"
 #include "WTTime.h"
@@ -19,67 +18,15 @@
 #include <unicode/dtptngen.h>
 #include <unicode/locid.h>
 
-#include <QDataStream>
-#include <QIODevice>
-#include <QMimeData>
 #include <QRegularExpression>
 
-#include <algorithm>
-#include <cmath>
-#include <limits>
 #include <memory>
 #include <string>
 
-const QString WTItemsModel::kObjectUUIDsType = QStringLiteral("WTObjectUUIDs");
-const QString WTItemsModel::kContainsTasksType = QStringLiteral("WTContainsTasks");
-
-struct WTItemsModel::Node {
-  enum Kind { Root, Task, Container, Item };
-  Kind kind = Root;
-  Node* parent = nullptr;
-  int row = 0;
-  WTObject* object = nullptr;  // tasks and items
-  std::shared_ptr<WTItemContainer> container;
-  std::vector<std::unique_ptr<Node>> children;
-
-  void renumber(size_t from = 0) {
-    for (size_t i = from; i < children.size(); ++i) children[i]->row = static_cast<int>(i);
-  }
-};
+// Presenting rows: the tree built from a project, the lookups the views use, and what each row shows
+// and takes.
 
 namespace {
-
-using ContainerKey = qint64;
-constexpr ContainerKey kPendingKey = std::numeric_limits<qint64>::min();
-
-ContainerKey keyOfDay(std::optional<Date> day) {
-  return day ? static_cast<ContainerKey>(std::llround(day->secondsSince1970() * 1000.0)) : kPendingKey;
-}
-
-bool isStructureKeyOfItem(const QString& key) {
-  return key == QLatin1String("startDate") || key == QLatin1String("completed") ||
-         key == QLatin1String("task");
-}
-
-bool isShownKeyOfItem(const QString& key) {
-  static const QSet<QString> keys = {QStringLiteral("name"),      QStringLiteral("notes"),
-                                     QStringLiteral("duration"),  QStringLiteral("cost"),
-                                     QStringLiteral("running"),   QStringLiteral("endDate"),
-                                     QStringLiteral("expense"),   QStringLiteral("minutes"),
-                                     QStringLiteral("completed"), QStringLiteral("startDate")};
-  return keys.contains(key);
-}
-
-bool isShownKeyOfTask(const QString& key) {
-  static const QSet<QString> keys = {QStringLiteral("name"),
-                                     QStringLiteral("notes"),
-                                     QStringLiteral("duration"),
-                                     QStringLiteral("cost"),
-                                     QStringLiteral("running"),
-                                     QStringLiteral("tableImage"),
-                                     QStringLiteral("timerButtonImage")};
-  return keys.contains(key);
-}
 
 QVariant pointerVariant(const WTObject* object) {
   return object ? QVariant::fromValue(reinterpret_cast<quintptr>(object)) : QVariant();
@@ -213,10 +160,10 @@ QModelIndex WTItemsModel::indexOfObject(const WTObject* object) const {
 QModelIndex WTItemsModel::indexOfContainer(const WTTask* task, std::optional<Date> day) const {
   const Node* taskNode = nodes_.value(task);
   if (!taskNode || taskNode->kind != Node::Task) return {};
-  const ContainerKey key = keyOfDay(day);
+  const Node::GroupKey key = Node::keyOfDay(day);
   // Searched from the end, as the last matching group wins.
   for (auto it = taskNode->children.rbegin(); it != taskNode->children.rend(); ++it) {
-    if (keyOfDay((*it)->container->date()) == key) return indexOfNode(it->get());
+    if (Node::keyOfDay((*it)->container->date()) == key) return indexOfNode(it->get());
   }
   return {};
 }
@@ -270,7 +217,7 @@ QString WTItemsModel::persistentIdentity(const QModelIndex& index) const {
   if (node->object) return node->object->uuid();
   const std::optional<Date> day = node->container->date();
   const QString task = node->parent->object->uuid();
-  return task + u'|' + (day ? QString::number(keyOfDay(day)) : QStringLiteral("Pending"));
+  return task + u'|' + (day ? QString::number(Node::keyOfDay(day)) : QStringLiteral("Pending"));
 }
 
 QModelIndex WTItemsModel::indexForPersistentIdentity(const QString& identity) const {
@@ -281,279 +228,12 @@ QModelIndex WTItemsModel::indexForPersistentIdentity(const QString& identity) co
   const Node* taskNode = nodes_.value(task);
   if (!taskNode) return {};
   bool ok = false;
-  const ContainerKey key = day == QLatin1String("Pending") ? kPendingKey : day.toLongLong(&ok);
+  const Node::GroupKey key = day == QLatin1String("Pending") ? Node::kPendingKey : day.toLongLong(&ok);
   if (day != QLatin1String("Pending") && !ok) return {};
   for (const auto& child : taskNode->children) {
-    if (keyOfDay(child->container->date()) == key) return indexOfNode(child.get());
+    if (Node::keyOfDay(child->container->date()) == key) return indexOfNode(child.get());
   }
   return {};
-}
-
-// Change tracking.
-
-bool WTItemsModel::belongsHere(const WTObject* object) const {
-  if (!project_ || !object) return false;
-  if (nodes_.contains(object)) return true;
-  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->project() == project_;
-  if (WTEntities::isItem(object->entity())) {
-    const WTTask* task = static_cast<const WTItem*>(object)->task();
-    return task && task->project() == project_;
-  }
-  return false;
-}
-
-void WTItemsModel::schedule() {
-  if (!flushTimer_.isActive()) flushTimer_.start();
-}
-
-void WTItemsModel::markTaskDirty(WTTask* task) {
-  if (!task || !nodes_.contains(task)) return;
-  dirtyTasks_.insert(task);
-  schedule();
-}
-
-void WTItemsModel::markChanged(const WTObject* object) {
-  changed_.insert(object);
-  schedule();
-}
-
-void WTItemsModel::markSubtreeChanged(const Node* node) {
-  if (node->object) changed_.insert(node->object);
-  for (const auto& child : node->children) markSubtreeChanged(child.get());
-  schedule();
-}
-
-void WTItemsModel::objectValueDidChange(WTObject* object, const QString& key) {
-  if (!project_) return;
-  // A rate reaches the cost of every row below the record it is set on: those rows are shown anew at
-  // once, day groups included, since no cost of theirs announces itself.
-  if (key == QLatin1String("rate")) {
-    if (object == project_) {
-      markSubtreeChanged(root_.get());
-    } else if (project_->client() && object == project_->client()) {
-      markSubtreeChanged(root_.get());
-      emit projectChanged();
-    } else if (const Node* node = nodes_.value(object); node && node->kind == Node::Task) {
-      markSubtreeChanged(node);
-    }
-  }
-  if (object == project_) {
-    if (key == QLatin1String("tasks")) {
-      tasksDirty_ = true;
-      schedule();
-    }
-    emit projectChanged();
-    return;
-  }
-  if (!belongsHere(object)) return;
-  const WTEntity entity = object->entity();
-  if (entity == WTEntity::Task) {
-    auto* task = static_cast<WTTask*>(object);
-    if (key == QLatin1String("project")) {
-      tasksDirty_ = true;
-      schedule();
-    } else if (key == QLatin1String("items") || key == QLatin1String("children")) {
-      markTaskDirty(task);
-    }
-    if (isShownKeyOfTask(key) && nodes_.contains(task)) markChanged(task);
-    return;
-  }
-  if (!WTEntities::isItem(entity)) return;
-  auto* item = static_cast<WTItem*>(object);
-  if (isStructureKeyOfItem(key)) {
-    // The item may leave one task's tree and join another's: both are brought up to date.
-    if (const Node* node = nodes_.value(item))
-      markTaskDirty(static_cast<WTTask*>(node->parent->parent->object));
-    if (item->task() && item->task()->project() == project_) markTaskDirty(item->task());
-  }
-  if (isShownKeyOfItem(key) && nodes_.contains(item)) markChanged(item);
-}
-
-void WTItemsModel::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>&,
-                                    const QList<WTObject*>& deleted) {
-  if (!project_) return;
-  if (deleted.contains(project_)) {
-    setProject(nullptr);
-    emit projectDeleted();
-    return;
-  }
-  for (const WTObject* object : inserted) {
-    if (object->entity() == WTEntity::Task && static_cast<const WTTask*>(object)->project() == project_) {
-      tasksDirty_ = true;
-      schedule();
-    } else if (WTEntities::isItem(object->entity())) {
-      markTaskDirty(static_cast<const WTItem*>(object)->task());
-    }
-  }
-}
-
-bool WTItemsModel::hasPendingChanges() const {
-  return tasksDirty_ || !dirtyTasks_.isEmpty() || !changed_.isEmpty();
-}
-
-void WTItemsModel::processChanges() {
-  flushTimer_.stop();
-  if (!project_) {
-    dirtyTasks_.clear();
-    changed_.clear();
-    tasksDirty_ = false;
-    return;
-  }
-  if (std::exchange(tasksDirty_, false)) syncTasks();
-  const QSet<WTTask*> dirty = std::exchange(dirtyTasks_, {});
-  for (WTTask* task : dirty) {
-    if (Node* node = nodes_.value(task); node && node->kind == Node::Task) syncTask(node);
-  }
-  // One repaint per row: the changed rows and the groups above changed items.
-  const QSet<const WTObject*> changed = std::exchange(changed_, {});
-  QSet<const Node*> rows;
-  for (const WTObject* object : changed) {
-    const Node* node = nodes_.value(object);
-    if (!node) continue;
-    rows.insert(node);
-    if (node->kind == Node::Item) rows.insert(node->parent);
-  }
-  for (const Node* node : rows) {
-    const QModelIndex index = indexOfNode(node);
-    emit dataChanged(index, index);
-  }
-}
-
-void WTItemsModel::syncTasks() {
-  Node* root = root_.get();
-  QList<WTObject*> current;
-  for (const auto& child : root->children) current.append(child->object);
-  QList<WTObject*> target;
-  for (WTTask* task : project_->tasks()) target.append(task);
-  struct Ops {
-    WTItemsModel* model;
-    Node* root;
-    QList<WTObject*>& current;
-    void remove(int first, int last) {
-      model->beginRemoveRows(QModelIndex(), first, last);
-      for (int i = first; i <= last; ++i) model->forget(root->children[i].get());
-      root->children.erase(root->children.begin() + first, root->children.begin() + last + 1);
-      current.remove(first, last - first + 1);
-      root->renumber(first);
-      model->endRemoveRows();
-    }
-    void move(int from, int to) {
-      model->beginMoveRows(QModelIndex(), from, from, QModelIndex(), to);
-      std::unique_ptr<Node> node = std::move(root->children[from]);
-      root->children.erase(root->children.begin() + from);
-      root->children.insert(root->children.begin() + to, std::move(node));
-      current.move(from, to);
-      root->renumber(std::min(from, to));
-      model->endMoveRows();
-    }
-    void insert(int at, WTObject* task) {
-      model->beginInsertRows(QModelIndex(), at, at);
-      root->children.insert(root->children.begin() + at,
-                            model->makeTaskNode(static_cast<WTTask*>(task), root));
-      current.insert(at, task);
-      root->renumber(at);
-      model->endInsertRows();
-    }
-  };
-  applyOrderedDiff(current, target, Ops{this, root, current});
-}
-
-void WTItemsModel::syncTask(Node* taskNode) {
-  auto* task = static_cast<WTTask*>(taskNode->object);
-  const QModelIndex parent = indexOfNode(taskNode);
-  QHash<ContainerKey, std::shared_ptr<WTItemContainer>> fresh;
-  QList<ContainerKey> target;
-  for (const auto& container : task->children()) {
-    const ContainerKey key = keyOfDay(container->date());
-    target.append(key);
-    fresh.insert(key, container);
-  }
-  QList<ContainerKey> current;
-  for (const auto& child : taskNode->children) current.append(keyOfDay(child->container->date()));
-  struct Ops {
-    WTItemsModel* model;
-    Node* taskNode;
-    QModelIndex parent;
-    QList<ContainerKey>& current;
-    QHash<ContainerKey, std::shared_ptr<WTItemContainer>>& fresh;
-    void remove(int first, int last) {
-      model->beginRemoveRows(parent, first, last);
-      for (int i = first; i <= last; ++i) model->forget(taskNode->children[i].get());
-      taskNode->children.erase(taskNode->children.begin() + first, taskNode->children.begin() + last + 1);
-      current.remove(first, last - first + 1);
-      taskNode->renumber(first);
-      model->endRemoveRows();
-    }
-    void move(int from, int to) {
-      model->beginMoveRows(parent, from, from, parent, to);
-      std::unique_ptr<Node> node = std::move(taskNode->children[from]);
-      taskNode->children.erase(taskNode->children.begin() + from);
-      taskNode->children.insert(taskNode->children.begin() + to, std::move(node));
-      current.move(from, to);
-      taskNode->renumber(std::min(from, to));
-      model->endMoveRows();
-    }
-    void insert(int at, ContainerKey key) {
-      model->beginInsertRows(parent, at, at);
-      // The new group comes with its items: they are part of the inserted row.
-      taskNode->children.insert(taskNode->children.begin() + at,
-                                model->makeContainerNode(fresh.take(key), taskNode));
-      current.insert(at, key);
-      taskNode->renumber(at);
-      model->endInsertRows();
-    }
-  };
-  applyOrderedDiff(current, target, Ops{this, taskNode, parent, current, fresh});
-  // Groups that stayed take their rebuilt container and bring their items in line with it.
-  for (const auto& child : taskNode->children) {
-    auto it = fresh.find(keyOfDay(child->container->date()));
-    if (it == fresh.end()) continue;  // inserted just now, already current
-    child->container = it.value();
-    syncContainerItems(child.get());
-    const QModelIndex index = indexOfNode(child.get());
-    emit dataChanged(index, index);
-  }
-}
-
-void WTItemsModel::syncContainerItems(Node* containerNode) {
-  const QModelIndex parent = indexOfNode(containerNode);
-  QList<WTItem*> current;
-  for (const auto& child : containerNode->children) current.append(static_cast<WTItem*>(child->object));
-  const QList<WTItem*>& target = containerNode->container->items();
-  if (current == target) return;
-  struct Ops {
-    WTItemsModel* model;
-    Node* node;
-    QModelIndex parent;
-    QList<WTItem*>& current;
-    void remove(int first, int last) {
-      model->beginRemoveRows(parent, first, last);
-      for (int i = first; i <= last; ++i) model->forget(node->children[i].get());
-      node->children.erase(node->children.begin() + first, node->children.begin() + last + 1);
-      current.remove(first, last - first + 1);
-      node->renumber(first);
-      model->endRemoveRows();
-    }
-    void move(int from, int to) {
-      model->beginMoveRows(parent, from, from, parent, to);
-      std::unique_ptr<Node> moved = std::move(node->children[from]);
-      node->children.erase(node->children.begin() + from);
-      node->children.insert(node->children.begin() + to, std::move(moved));
-      current.move(from, to);
-      node->renumber(std::min(from, to));
-      model->endMoveRows();
-    }
-    void insert(int at, WTItem* item) {
-      model->beginInsertRows(parent, at, at);
-      // An item that moved here from another group leaves its old row first (already removed there,
-      // or about to be: its node is replaced either way).
-      node->children.insert(node->children.begin() + at, model->makeItemNode(item, node));
-      current.insert(at, item);
-      node->renumber(at);
-      model->endInsertRows();
-    }
-  };
-  applyOrderedDiff(current, target, Ops{this, containerNode, parent, current});
 }
 
 // QAbstractItemModel.
@@ -771,7 +451,7 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     }
     case CompletedRole:
       if (object->entity() != WTEntity::ToDo) return false;
-      static_cast<WTToDo*>(object)->setCompleted(value.toBool());
+      static_cast<WTToDo*>(object)->markCompleted(value.toBool());
       return true;
     default:
       return false;
@@ -794,129 +474,4 @@ Qt::ItemFlags WTItemsModel::flags(const QModelIndex& index) const {
     default:
       return Qt::NoItemFlags;
   }
-}
-
-// Drag and drop.
-
-QStringList WTItemsModel::mimeTypes() const {
-  return {kObjectUUIDsType, kContainsTasksType};
-}
-
-QMimeData* WTItemsModel::mimeData(const QModelIndexList& indexes) const {
-  // Outline order: by the path of rows from the top.
-  auto path = [this](const QModelIndex& index) {
-    QList<int> rows;
-    for (QModelIndex at = index; at.isValid(); at = parent(at)) rows.prepend(at.row());
-    return rows;
-  };
-  QList<QPair<QList<int>, const WTObject*>> rows;
-  bool tasks = false;
-  for (const QModelIndex& index : indexes) {
-    const Node* node = index.isValid() ? nodeOf(index) : nullptr;
-    if (!node || !node->object) continue;
-    rows.append({path(index), node->object});
-    tasks = tasks || node->kind == Node::Task;
-  }
-  if (rows.isEmpty()) return nullptr;
-  std::sort(rows.begin(), rows.end(), [](const auto& a, const auto& b) { return a.first < b.first; });
-  QStringList uuids;
-  for (const auto& row : rows) {
-    if (!uuids.contains(row.second->uuid())) uuids.append(row.second->uuid());
-  }
-  auto* data = new QMimeData;
-  QByteArray archive;
-  {
-    QDataStream stream(&archive, QIODevice::WriteOnly);
-    stream << uuids;
-  }
-  data->setData(kObjectUUIDsType, archive);
-  QByteArray flag;
-  {
-    QDataStream stream(&flag, QIODevice::WriteOnly);
-    stream << tasks;
-  }
-  data->setData(kContainsTasksType, flag);
-  return data;
-}
-
-QStringList WTItemsModel::objectUUIDs(const QMimeData* data) {
-  QStringList uuids;
-  if (!data || !data->hasFormat(kObjectUUIDsType)) return uuids;
-  QDataStream stream(data->data(kObjectUUIDsType));
-  stream >> uuids;
-  if (stream.status() != QDataStream::Ok) return {};
-  return uuids;
-}
-
-bool WTItemsModel::containsTasks(const QMimeData* data) {
-  if (!data || !data->hasFormat(kContainsTasksType)) return false;
-  QDataStream stream(data->data(kContainsTasksType));
-  bool flag = false;
-  stream >> flag;
-  return stream.status() == QDataStream::Ok && flag;
-}
-
-bool WTItemsModel::canDropMimeData(const QMimeData* data, Qt::DropAction, int row, int,
-                                   const QModelIndex& parent) const {
-  if (!project_ || !data) return false;
-  const Node* target = parent.isValid() ? nodeOf(parent) : nullptr;
-  // Tasks move only among the top-level rows; the items dragged with them are ignored.
-  if (containsTasks(data)) return target == nullptr;
-  if (!data->hasFormat(kObjectUUIDsType)) return false;
-  if (!target || (target->kind != Node::Container && target->kind != Node::Task)) return false;
-  // Items land on a row, never between rows.
-  return row == -1;
-}
-
-bool WTItemsModel::dropMimeData(const QMimeData* data, Qt::DropAction action, int row, int column,
-                                const QModelIndex& parent) {
-  if (!canDropMimeData(data, action, row, column, parent)) return false;
-  const WTUndoManager::NamedStep step(context_->undoManager(), tr("Move"));
-  const QStringList uuids = objectUUIDs(data);
-  if (containsTasks(data)) {
-    QList<WTTask*> tasks = project_->tasks();
-    for (const QString& uuid : uuids) {
-      if (!uuid.endsWith(QLatin1String("@WTTask"))) continue;
-      auto* task = dynamic_cast<WTTask*>(context_->objectWithUUID(uuid));
-      const qsizetype from = tasks.indexOf(task);
-      if (from < 0) continue;
-      // Each dragged task goes to the drop's place in turn; a place past the removed one shifts by one.
-      const qsizetype to = row < 0 ? tasks.size() : row;
-      if (to == from) continue;
-      tasks.move(from, to > from ? to - 1 : to);
-    }
-    for (int i = 0; i < tasks.size(); ++i) {
-      if (project_->tasks().indexOf(tasks[i]) != i) project_->moveTask(tasks[i], i);
-    }
-    return true;
-  }
-  const Node* target = nodeOf(parent);
-  QList<WTItem*> moved;
-  for (const QString& uuid : uuids) {
-    auto* item = dynamic_cast<WTItem*>(context_->objectWithUUID(uuid));
-    if (!item) continue;
-    if (target->kind == Node::Task) {
-      item->setTask(static_cast<WTTask*>(target->object));
-    } else if (target->container->date()) {
-      item->setTask(target->container->task());
-      item->setDate(target->container->date());
-    } else if (item->entity() == WTEntity::ToDo) {
-      // Onto "Pending": the to-do is open again.
-      static_cast<WTToDo*>(item)->setCompleted(false);
-      item->setTask(target->container->task());
-    } else {
-      continue;
-    }
-    moved << item;
-  }
-  if (!moved.isEmpty()) emit itemsDropped(moved);
-  return true;
-}
-
-Qt::DropActions WTItemsModel::supportedDropActions() const {
-  return Qt::MoveAction;
-}
-
-Qt::DropActions WTItemsModel::supportedDragActions() const {
-  return Qt::MoveAction;
 }

@@ -27,7 +27,8 @@ class WTTask;
 // The tree follows the records by itself: changes are collected as they are announced and applied
 // once per event-loop turn (or at once by processChanges) as exact row inserts, removals and moves, so
 // the outline keeps its expanded rows and selection; a change of a total repaints only the rows that
-// show it. Drag and drop carries the private types "WTObjectUUIDs" and "WTContainsTasks".
+// show it. Drag and drop carries the private types "WTObjectUUIDs" and "WTContainsTasks"; a drop is
+// carried out by the records' own operations (WTProject::moveTasks, WTTask::adoptItems).
 class WTItemsModel : public QAbstractItemModel {
   Q_OBJECT
  public:
@@ -100,7 +101,7 @@ class WTItemsModel : public QAbstractItemModel {
   static QString refusalFor(int role, const QString& text);
   Qt::ItemFlags flags(const QModelIndex& index) const override;
 
-  // Drag and drop.
+  // Drag and drop (WTItemsModelDragAndDrop.cpp).
   QStringList mimeTypes() const override;
   // Carries the uuids of the tasks and items among `indexes`, in outline order; none (a refused
   // drag) when no task or item is among them.
@@ -126,13 +127,17 @@ class WTItemsModel : public QAbstractItemModel {
   void itemsDropped(const QList<WTItem*>& items);
 
  private:
-  struct Node;
+  struct Node;  // WTItemsModelNode.h
+  // The tree and its rows (WTItemsModel.cpp).
   Node* nodeOf(const QModelIndex& index) const;
   QModelIndex indexOfNode(const Node* node) const;
   std::unique_ptr<Node> makeTaskNode(WTTask* task, Node* parent);
   std::unique_ptr<Node> makeContainerNode(std::shared_ptr<WTItemContainer> container, Node* parent);
   std::unique_ptr<Node> makeItemNode(WTItem* item, Node* parent);
   void forget(Node* node);
+  // Following the store (WTItemsModelChanges.cpp).
+  template <class Key>
+  struct ChildRows;
   void syncTasks();
   void syncTask(Node* taskNode);
   void syncContainerItems(Node* containerNode);

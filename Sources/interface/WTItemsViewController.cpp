@@ -1,12 +1,10 @@
 #include "WTItemsViewController.h"
 
 #include "Decimal.h"
-#include "DurationText.h"
-#include "MoneyFormat.h"
 #include "RZBackgroundView.h"
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
-#include "WTClient.h"
 #include "WTDatePopover.h"
 #include "WTEmptyHint.h"
 #include "WTImages.h"
@@ -23,7 +21,6 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
-#include <QEvent>
 #include <QHBoxLayout>
 #include <QItemSelectionModel>
 #include <QLabel>
@@ -37,7 +34,7 @@
 
 namespace {
 
-const QString kExpandedItemsKey = QStringLiteral("NSOutlineView Items ");
+const QString kExpandedItemsKey = SettingsKeys::kExpandedItemsPrefix;
 
 }  // namespace
 
@@ -207,83 +204,6 @@ QWidget* WTItemsViewController::loadView() {
   return container;
 }
 
-void WTItemsViewController::refreshHeader() {
-  if (!titleLabel_) return;
-  if (!project_) {
-    setElidedText(titleLabel_, QString());
-    setElidedText(clientLabel_, QString());
-    totalsLabel_->clear();
-    durationLabel_->clear();
-    rateField_->clear();
-    WTRateField::setRefused(rateField_, {});
-    return;
-  }
-  setElidedText(titleLabel_, project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
-  QString client = project_->client() ? project_->client()->name() : tr("No Client");
-  if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
-  setElidedText(clientLabel_, client);
-  durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
-  totalsLabel_->setText(MoneyFormat::format(project_->cost()));
-  rateField_->setPlaceholderText(WTRateField::placeholder(project_));
-  // A refused text stays as typed until the user changes it, so the mistake is in view.
-  if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
-    rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());
-  }
-}
-
-namespace {
-
-const char* const kFullTextProperty = "fullText";
-
-void elide(QLabel* label) {
-  const QString text = label->property(kFullTextProperty).toString();
-  const QString shown = label->fontMetrics().elidedText(text, Qt::ElideRight, label->contentsRect().width());
-  label->setText(shown);
-  label->setToolTip(shown == text ? QString() : text);
-}
-
-}  // namespace
-
-void WTItemsViewController::setElidedText(QLabel* label, const QString& text) {
-  label->setProperty(kFullTextProperty, text);
-  elide(label);
-}
-
-bool WTItemsViewController::eventFilter(QObject* watched, QEvent* event) {
-  const auto type = event->type();
-  if ((type == QEvent::Resize || type == QEvent::Show || type == QEvent::Move) &&
-      (watched == header_ || (outlineView_ && watched == outlineView_->viewport()))) {
-    alignTotals();
-  }
-  if ((type == QEvent::Resize || type == QEvent::FontChange) &&
-      (watched == titleLabel_ || watched == clientLabel_)) {
-    elide(static_cast<QLabel*>(watched));
-  }
-  return WTViewController::eventFilter(watched, event);
-}
-
-void WTItemsViewController::alignTotals() {
-  if (!header_ || !outlineView_) return;
-  QWidget* viewport = outlineView_->viewport();
-  const WTTableCellView cell(QStringLiteral("WTTask"));
-  const QRectF row(0, 0, viewport->width(), 30.0);  // the columns do not depend on the height
-  const auto place = [&](QLabel* label, WTTableCellView::Part part) {
-    const QRect column = cell.partRect(part, row).toRect();
-    const QPoint left =
-        header_->mapFrom(outlineView_->window(), viewport->mapTo(outlineView_->window(), column.topLeft()));
-    label->setGeometry(left.x(), 0, column.width(), header_->height());
-  };
-  place(durationLabel_, WTTableCellView::Part::Duration);
-  place(totalsLabel_, WTTableCellView::Part::Cost);
-  // The rate field ends a little before the duration column, wherever a scroll bar beside the rows
-  // has put that column.
-  constexpr int kGap = 8;
-  QLayout* bar = header_->layout();
-  const QMargins margins = bar->contentsMargins();
-  const int room = std::max(header_->width() - durationLabel_->x() + kGap, 12);
-  if (margins.right() != room) bar->setContentsMargins(margins.left(), margins.top(), room, margins.bottom());
-}
-
 QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   auto* menu = new QMenu;
   menu->setObjectName(QStringLiteral("taskMenu"));
@@ -291,11 +211,6 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
   return menu;
-}
-
-void WTItemsViewController::projectRateAction() {
-  if (!project_) return;
-  if (WTRateField::apply(rateField_, project_)) refreshHeader();
 }
 
 void WTItemsViewController::willDisplayView() {
@@ -485,12 +400,6 @@ void WTItemsViewController::showNotes(WTObject* object) {
   outlineView_->noteHeightOfRowChanged(index);
 }
 
-void WTItemsViewController::toggleCompleted(WTToDo* todo) {
-  if (!todo) return;
-  if (todo->completed()) todo->setStartDate(Date::now());
-  refreshChildren(todo);
-}
-
 void WTItemsViewController::refreshChildren(WTItem* item) {
   if (!item) return;
   context_->processPendingChanges();
@@ -630,9 +539,10 @@ void WTItemsViewController::partActivated(const QModelIndex& index, WTTableCellV
       break;
     case Part::Checkbox:
       if (item && item->entity() == WTEntity::ToDo) {
+        // The to-do dates itself; it then moves between "Pending" and its day, which is opened.
         treeController_->setData(index, !static_cast<WTToDo*>(item)->completed(),
                                  WTItemsModel::CompletedRole);
-        toggleCompleted(static_cast<WTToDo*>(item));
+        refreshChildren(item);
       }
       break;
     case Part::DateButton:

@@ -21,7 +21,6 @@ class WTOutlineView;
 class WTProject;
 class WTTask;
 class WTTime;
-class WTToDo;
 
 // One project as an outline of its tasks, their day groups and items, pushed onto the projects stack
 // when a project is opened. It adds items of every kind to a task, runs and stops timers, completes
@@ -77,8 +76,6 @@ class WTItemsViewController : public WTViewController {
   void stopTimer(WTTime* time);
   // Starts editing the notes field of the row of `object`.
   void showNotes(WTObject* object);
-  // After a to-do's box was clicked: a completed to-do is dated now; the item is regrouped.
-  void toggleCompleted(WTToDo* todo);
   // Regroups the item's task now and opens the item's new group.
   void refreshChildren(WTItem* item);
 
@@ -123,6 +120,7 @@ class WTItemsViewController : public WTViewController {
   void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
   void saveExpandedItems();
   void restoreExpandedItems();
+  // The header (WTItemsViewHeader.cpp).
   void refreshHeader();
   // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.
   static void setElidedText(QLabel* label, const QString& text);

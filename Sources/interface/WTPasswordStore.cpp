@@ -1,5 +1,6 @@
 #include "WTPasswordStore.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTQtKeychain.h"
 
@@ -13,8 +14,8 @@ namespace {
 Q_LOGGING_CATEGORY(lcPasswords, "tessal.passwords")
 
 const QString kKeyName = QString::fromLatin1(WTPasswordStore::kKey);
-const QString kDefaultsKeyName = QString::fromLatin1(WTPasswordStore::kDefaultsKey);
-const QString kKeptInFileKeyName = QString::fromLatin1(WTPasswordStore::kKeptInFileKey);
+const QString kDefaultsKeyName = SettingsKeys::kSyncPassword;
+const QString kKeptInFileKeyName = SettingsKeys::kSyncPasswordKeptInFile;
 constexpr QFileDevice::Permissions kOwnerOnly = QFileDevice::ReadOwner | QFileDevice::WriteOwner;
 
 }  // namespace
@@ -32,7 +33,7 @@ QString WTPasswordStore::filePassword() const {
 }
 
 bool WTPasswordStore::hasAccount() const {
-  return defaults_ && !defaults_->stringForKey(QString::fromLatin1(kUserKey)).trimmed().isEmpty();
+  return defaults_ && !defaults_->stringForKey(SettingsKeys::kSyncUser).trimmed().isEmpty();
 }
 
 QString WTPasswordStore::password() const {

@@ -25,12 +25,6 @@ class WTPasswordStore : public QObject {
   Q_OBJECT
  public:
   static constexpr const char* kKey = "sync-password";
-  static constexpr const char* kDefaultsKey = "WTSyncPassword";
-  static constexpr const char* kUserKey = "WTSyncUser";
-  // Set when the keychain refused the password, cancelled its prompt or did not answer in time: the
-  // password then stays in the settings file and later starts do not ask again (no prompt at every
-  // start). Storing a password through setPassword() asks again.
-  static constexpr const char* kKeptInFileKey = "WTSyncPasswordKeptInFile";
 
   enum class Location { None, Keychain, SettingsFile };
   // What load() does with a password it finds in the settings file.

@@ -6,11 +6,6 @@
 #include <QPainter>
 #include <QPainterPath>
 
-QString WTPopUpButtonCell::attributedTitle(const QString& title) {
-  if (title.isEmpty()) return {};
-  return title + QStringLiteral(" \u25BF");
-}
-
 QColor WTPopUpButtonCell::colorForTag(int tag) {
   return tag % 2 != 0 ? RZColor::calibratedWhite(0.1) : QColor(Qt::white);
 }
@@ -54,8 +49,4 @@ void WTPopUpButtonCell::drawWithFrame(QPainter& painter, const QRectF& frame, co
   arrows.closeSubpath();
   painter.fillPath(arrows, color);
   painter.restore();
-}
-
-qreal WTPopUpButtonCell::widthForTitle(const QString& title, const QFont& font) {
-  return 4.0 + 6.0 + 6.0 + QFontMetricsF(font).horizontalAdvance(title) + 4.0;
 }

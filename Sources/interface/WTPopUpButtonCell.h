@@ -13,8 +13,6 @@ class QPainter;
 // left.
 class WTPopUpButtonCell {
  public:
-  // The title followed by a blank and U+25BF; empty for an empty title.
-  static QString attributedTitle(const QString& title);
   // The colour of the title and the arrow for `tag`.
   static QColor colorForTag(int tag);
   // Where the arrow starts, from the frame's left edge, for a title of `titleWidth`.
@@ -24,6 +22,4 @@ class WTPopUpButtonCell {
   // Paints the whole control into `frame`.
   static void drawWithFrame(QPainter& painter, const QRectF& frame, const QString& title, const QFont& font,
                             int tag);
-  // The width the control needs for `title` in `font`.
-  static qreal widthForTitle(const QString& title, const QFont& font);
 };

@@ -2,6 +2,7 @@
 
 #include "MoneyFormat.h"
 #include "RZSyncManager.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTImages.h"
@@ -23,12 +24,6 @@
 
 namespace {
 
-const QString kSyncUser = QStringLiteral("WTSyncUser");
-const QString kSyncServer = QStringLiteral("WTSyncServer");
-const QString kShouldIdle = QStringLiteral("WTShouldIdle");
-const QString kIdleTime = QStringLiteral("WTIdleTime");
-const QString kStopsOtherTimes = QStringLiteral("WTStopsOtherTimes");
-const QString kDefaultRate = QStringLiteral("WTDefaultRate");
 constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
 // What the idle check uses when no usable number of minutes is set.
 constexpr int kIdleMinutesWhenUnset = 5;
@@ -67,8 +62,8 @@ void WTPreferencesWindowController::passwordDidLoad() {
   if (emailTextField_->text().isEmpty() && passwordTextField_->text().isEmpty() &&
       !emailTextField_->hasFocus() && !passwordTextField_->hasFocus()) {
     const QString password = passwords_->password();
-    if (defaults_->hasStoredValue(kSyncUser) && !password.isEmpty()) {
-      emailTextField_->setText(defaults_->stringForKey(kSyncUser));
+    if (defaults_->hasStoredValue(SettingsKeys::kSyncUser) && !password.isEmpty()) {
+      emailTextField_->setText(defaults_->stringForKey(SettingsKeys::kSyncUser));
       passwordTextField_->setText(password);
     }
   }
@@ -194,13 +189,13 @@ void WTPreferencesWindowController::buildInterface() {
     updateSignUpButton();
   });
   connect(shouldIdleCheckBox_, &QCheckBox::toggled, this, [this](bool on) {
-    defaults_->setValue(kShouldIdle, on);
+    defaults_->setValue(SettingsKeys::kShouldIdle, on);
     idleTimeSpinBox_->setEnabled(on);
   });
   connect(idleTimeSpinBox_, &QSpinBox::valueChanged, this,
-          [this](int value) { defaults_->setValue(kIdleTime, value); });
+          [this](int value) { defaults_->setValue(SettingsKeys::kIdleTime, value); });
   connect(stopsOtherTimesCheckBox_, &QCheckBox::toggled, this,
-          [this](bool on) { defaults_->setValue(kStopsOtherTimes, on); });
+          [this](bool on) { defaults_->setValue(SettingsKeys::kStopsOtherTimes, on); });
   connect(defaultRateField_, &QLineEdit::editingFinished, this,
           &WTPreferencesWindowController::commitDefaultRate);
   connect(defaultRateField_, &QLineEdit::textEdited, this,
@@ -210,23 +205,23 @@ void WTPreferencesWindowController::buildInterface() {
 void WTPreferencesWindowController::loadValues() {
   // The account shows only when it is complete.
   const QString password = passwords_->password();
-  if (defaults_->hasStoredValue(kSyncUser) && !password.isEmpty()) {
-    emailTextField_->setText(defaults_->stringForKey(kSyncUser));
+  if (defaults_->hasStoredValue(SettingsKeys::kSyncUser) && !password.isEmpty()) {
+    emailTextField_->setText(defaults_->stringForKey(SettingsKeys::kSyncUser));
     passwordTextField_->setText(password);
   }
-  serverField_->setText(defaults_->stringForKey(kSyncServer));
+  serverField_->setText(defaults_->stringForKey(SettingsKeys::kSyncServer));
   updateSignUpButton();
 
   const QSignalBlocker idleBlocker(shouldIdleCheckBox_);
   const QSignalBlocker minutesBlocker(idleTimeSpinBox_);
   const QSignalBlocker stopsBlocker(stopsOtherTimesCheckBox_);
-  shouldIdleCheckBox_->setChecked(defaults_->boolForKey(kShouldIdle));
+  shouldIdleCheckBox_->setChecked(defaults_->boolForKey(SettingsKeys::kShouldIdle));
   idleTimeSpinBox_->setEnabled(shouldIdleCheckBox_->isChecked());
-  const qint64 minutes = defaults_->integerForKey(kIdleTime);
+  const qint64 minutes = defaults_->integerForKey(SettingsKeys::kIdleTime);
   idleTimeSpinBox_->setValue(minutes > 0 ? int(std::min<qint64>(minutes, idleTimeSpinBox_->maximum()))
                                          : kIdleMinutesWhenUnset);
-  stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(kStopsOtherTimes));
-  const std::optional<Decimal> rate = defaults_->decimalForKey(kDefaultRate);
+  stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(SettingsKeys::kStopsOtherTimes));
+  const std::optional<Decimal> rate = defaults_->decimalForKey(SettingsKeys::kDefaultRate);
   defaultRateField_->setText(rate ? WTRateField::text(*rate) : QString());
 }
 
@@ -261,7 +256,7 @@ void WTPreferencesWindowController::startSync() {
   const QString user = emailTextField_->text();
   const QString password = passwordTextField_->text();
   if (user.isEmpty() || password.isEmpty()) return;
-  defaults_->setValue(kSyncUser, user);
+  defaults_->setValue(SettingsKeys::kSyncUser, user);
   passwords_->setPassword(password);
   // Announces the change of status, which lights the light; without a manager nobody would.
   if (syncManager_)
@@ -300,23 +295,25 @@ void WTPreferencesWindowController::commitServer() {
               tr("Not a server address: type a host name such as sync.example.org, perhaps with a port, "
                  "or an http or https address"));
   updateSignUpButton();
-  if (!usable || text == defaults_->stringForKey(kSyncServer)) return;
+  if (!usable || text == defaults_->stringForKey(SettingsKeys::kSyncServer)) return;
   if (text.isEmpty())
-    defaults_->removeValue(kSyncServer);
+    defaults_->removeValue(SettingsKeys::kSyncServer);
   else
-    defaults_->setValue(kSyncServer, text);
+    defaults_->setValue(SettingsKeys::kSyncServer, text);
 }
 
 void WTPreferencesWindowController::commitDefaultRate() {
   const WTRateField::Parsed parsed = WTRateField::parse(defaultRateField_->text());
   WTRateField::setRefused(defaultRateField_, parsed.refusal);
   if (!parsed.valid) return;
-  const std::optional<Decimal> stored = defaults_->decimalForKey(kDefaultRate);
-  if (parsed.rate == stored && defaults_->hasStoredValue(kDefaultRate) == parsed.rate.has_value()) return;
+  const std::optional<Decimal> stored = defaults_->decimalForKey(SettingsKeys::kDefaultRate);
+  if (parsed.rate == stored &&
+      defaults_->hasStoredValue(SettingsKeys::kDefaultRate) == parsed.rate.has_value())
+    return;
   if (parsed.rate)
-    defaults_->setValue(kDefaultRate, QVariant::fromValue(*parsed.rate));
+    defaults_->setValue(SettingsKeys::kDefaultRate, QVariant::fromValue(*parsed.rate));
   else
-    defaults_->removeValue(kDefaultRate);
+    defaults_->removeValue(SettingsKeys::kDefaultRate);
 }
 
 void WTPreferencesWindowController::hideEvent(QHideEvent* event) {

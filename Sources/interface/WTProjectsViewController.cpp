@@ -15,14 +15,14 @@
 
 WTProjectsViewController::WTProjectsViewController(WTObjectContext* context, QObject* parent)
     : WTObjectListViewController(context, WTEntity::Project, QStringLiteral("Project"), parent),
-      clientsArrayController_(new WTObjectListModel(context, WTEntity::Client, this)) {
+      clientsModel_(new WTObjectListModel(context, WTEntity::Client, this)) {
   setObjectName(QStringLiteral("Projects"));
 }
 
 WTProjectsViewController::~WTProjectsViewController() = default;
 
 void WTProjectsViewController::setArchivedPredicate(std::function<bool(const WTObject*)> predicate) {
-  clientsArrayController_->setFilterPredicate(predicate);
+  clientsModel_->setFilterPredicate(predicate);
   WTObjectListViewController::setArchivedPredicate(std::move(predicate));
 }
 
@@ -77,11 +77,11 @@ QMenu* WTProjectsViewController::clientMenu(WTProject* project) {
   };
   add(tr("No Client"), nullptr);
   menu->addSeparator();
-  for (WTObject* client : clientsArrayController_->arrangedObjects()) {
+  for (WTObject* client : clientsModel_->arrangedObjects()) {
     add(client->name().isEmpty() ? tr("Untitled") : client->name(), static_cast<WTClient*>(client));
   }
   // A client that is archived (and so not listed) still shows as the project's choice.
-  if (project->client() && !clientsArrayController_->arrangedObjects().contains(project->client())) {
+  if (project->client() && !clientsModel_->arrangedObjects().contains(project->client())) {
     add(project->client()->name(), project->client());
   }
   menu->addSeparator();

@@ -14,8 +14,7 @@ class WTProjectsViewController : public WTObjectListViewController {
   explicit WTProjectsViewController(WTObjectContext* context, QObject* parent = nullptr);
   ~WTProjectsViewController() override;
 
-  // The clients offered by each row's client chooser (archived ones hidden like the list's).
-  WTObjectListModel* clientsArrayController() const { return clientsArrayController_; }
+  // Hides archived rows, and archived clients in each row's client chooser alike.
   void setArchivedPredicate(std::function<bool(const WTObject*)> predicate);
 
   // Inserts a project with a task "General"; when the list shows it, scrolls to it and edits its name.
@@ -37,6 +36,6 @@ class WTProjectsViewController : public WTObjectListViewController {
   void addRowMenuItems(QMenu* menu) override;
 
  private:
-  WTObjectListModel* clientsArrayController_;
+  WTObjectListModel* clientsModel_;
   WTItemsViewController* itemsViewController_ = nullptr;
 };

@@ -1,6 +1,7 @@
 #include "WTRangePopUpButton.h"
 
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTCustomRangeDialog.h"
 
@@ -31,11 +32,6 @@ void WTRangePopUpButton::setupMenu() {
   }
 }
 
-void WTRangePopUpButton::setCustomRange(std::optional<Date> begin, std::optional<Date> end) {
-  customRangeBegin_ = begin;
-  customRangeEnd_ = end;
-}
-
 int WTRangePopUpButton::selectedTag() const {
   const QVariant tag = currentData();
   return tag.isValid() ? tag.toInt() : -1;
@@ -64,10 +60,10 @@ WTCustomRangeDialog* WTRangePopUpButton::showRangeWindow() {
   if (!defaults_) return nullptr;
   if (rangeWindow_) return rangeWindow_;
   auto date = [](std::optional<Date> value) { return value ? QVariant::fromValue(*value) : QVariant(); };
-  defaults_->setValue(QString::fromLatin1(kBeginKey), date(customRangeBegin_));
-  defaults_->setValue(QString::fromLatin1(kEndKey), date(customRangeEnd_));
-  rangeWindow_ = new WTCustomRangeDialog(defaults_, QString::fromLatin1(kBeginKey),
-                                         QString::fromLatin1(kEndKey), window());
+  defaults_->setValue(SettingsKeys::kCustomRangeWindowBegin, date(customRangeBegin_));
+  defaults_->setValue(SettingsKeys::kCustomRangeWindowEnd, date(customRangeEnd_));
+  rangeWindow_ = new WTCustomRangeDialog(defaults_, SettingsKeys::kCustomRangeWindowBegin,
+                                         SettingsKeys::kCustomRangeWindowEnd, window());
   rangeWindow_->setAttribute(Qt::WA_DeleteOnClose);
   connect(rangeWindow_, &QDialog::finished, this, &WTRangePopUpButton::didEndRangeWindow);
   rangeWindow_->open();
@@ -76,7 +72,7 @@ WTCustomRangeDialog* WTRangePopUpButton::showRangeWindow() {
 
 void WTRangePopUpButton::didEndRangeWindow() {
   // Whatever ended the dialog, the dates it showed are the range: they were stored as they were chosen.
-  customRangeBegin_ = defaults_->dateForKey(QString::fromLatin1(kBeginKey));
-  customRangeEnd_ = defaults_->dateForKey(QString::fromLatin1(kEndKey));
+  customRangeBegin_ = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowBegin);
+  customRangeEnd_ = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowEnd);
   emit rangeChosen();
 }

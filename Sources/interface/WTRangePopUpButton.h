@@ -24,7 +24,6 @@ class WTRangePopUpButton : public QComboBox {
 
   std::optional<Date> customRangeBegin() const { return customRangeBegin_; }
   std::optional<Date> customRangeEnd() const { return customRangeEnd_; }
-  void setCustomRange(std::optional<Date> begin, std::optional<Date> end);
 
   // The tag of the chosen item.
   int selectedTag() const;
@@ -36,10 +35,6 @@ class WTRangePopUpButton : public QComboBox {
   // Hands the custom dates to the dialog through the settings and opens it over the window; whichever
   // way it is closed, the dates it shows become the custom range and rangeChosen() follows.
   WTCustomRangeDialog* showRangeWindow();
-  WTCustomRangeDialog* rangeWindow() const { return rangeWindow_.data(); }
-
-  static constexpr const char* kBeginKey = "WTCustomRangeWindowBegin";
-  static constexpr const char* kEndKey = "WTCustomRangeWindowEnd";
 
  signals:
   // The user chose a range (after the custom dialog closed, for "Custom…"): read selectedPredicate().

@@ -1,5 +1,6 @@
 #include "WTReportWindowController.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTCSVExport.h"
 #include "WTClient.h"
@@ -49,7 +50,7 @@ WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWi
     if (UserDefaults* defaults = context->userDefaults()) {
       // A new default rate changes costs without changing a record, so no save follows it.
       connect(defaults, &UserDefaults::valueChanged, this, [this](const QString& key) {
-        if (key == QLatin1String("WTDefaultRate")) refreshWhenSeen();
+        if (key == SettingsKeys::kDefaultRate) refreshWhenSeen();
       });
     }
     connect(context, &WTObjectContext::didSave, this, [this] {

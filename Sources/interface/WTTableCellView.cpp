@@ -62,10 +62,6 @@ QRectF WTTableCellView::initialFrame() const {
   return QRectF(frame_.x(), frame_.y(), frame_.width(), mainHeight());
 }
 
-void WTTableCellView::setObjectValue(const WTObject* object) {
-  setNotes(object ? object->notes() : QString());
-}
-
 void WTTableCellView::setNotes(const QString& notes) {
   if (notes == notes_ && !notesFrame_.isNull()) return;
   notes_ = notes;

@@ -52,8 +52,6 @@ class WTTableCellView {
   // The frame of the row without notes: its height is the main line's.
   QRectF initialFrame() const;
 
-  // Takes the notes of `object` (an empty text for none) and re-measures.
-  void setObjectValue(const WTObject* object);
   QString notes() const { return notes_; }
   void setNotes(const QString& notes);
 
@@ -63,9 +61,6 @@ class WTTableCellView {
   // The row's height: the main line's, plus the notes field and its margin when there is text or the
   // notes are being edited.
   qreal requestedHeight(bool editing) const;
-
-  bool mouseOver() const { return mouseOver_; }
-  void setMouseOver(bool over) { mouseOver_ = over; }
 
   // Where `part` lies for a row occupying `row` (the full row, all columns); an empty rectangle when
   // the kind has no such part. `depth` indents outline rows.
@@ -87,5 +82,4 @@ class WTTableCellView {
   QRectF frame_;
   QString notes_;
   QRectF notesFrame_;
-  bool mouseOver_ = false;
 };

@@ -17,14 +17,11 @@ class WTTableRowView {
   // As the default, with both colours given (an invalid colour means "the default").
   static WTTableRowView initWithBgColor(const QColor& backColor, const QColor& selectionColor);
 
-  bool drawsSeparator() const { return drawsSeparator_; }
   void setDrawsSeparator(bool draws) { drawsSeparator_ = draws; }
-  bool drawsBackground() const { return drawsBackground_; }
   void setDrawsBackground(bool draws) { drawsBackground_ = draws; }
   QColor selectionColor() const { return selectionColor_; }
   void setSelectionColor(const QColor& color) { selectionColor_ = color; }
   QColor backColor() const { return backColor_; }
-  void setBackColor(const QColor& color) { backColor_ = color; }
 
   // The colours in force: the set ones or the defaults.
   QColor effectiveBackColor() const;

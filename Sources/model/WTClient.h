@@ -23,7 +23,6 @@ class WTClient final : public WTObject {
   Decimal rateFromAbove() const override;
   // What a client bills without a rate of its own while the user has set no default: 100.
   static Decimal builtInRate() { return Decimal(100); }
-  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
   Decimal cost() const;

@@ -90,7 +90,6 @@ QVariant WTItem::valueForKey(const QString& key) const {
     return itemRate ? QVariant::fromValue(*itemRate) : QVariant();
   }
   if (key == QLatin1String("title")) return title();
-  if (key == QLatin1String("isLeaf")) return true;
   return WTObject::valueForKey(key);
 }
 

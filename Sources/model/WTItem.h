@@ -34,7 +34,6 @@ class WTItem : public WTObject {
   // never used); none without a task, and the item then costs nothing.
   std::optional<Decimal> rate() const;
   virtual QString title() const { return name(); }
-  bool isLeaf() const { return true; }
 
   QVariant valueForKey(const QString& key) const override;
   bool setValue(const QString& key, const QVariant& value) override;

@@ -196,7 +196,6 @@ QVariant WTItemContainer::valueForKey(const QString& key) const {
   }
   if (key == QLatin1String("date")) return date_ ? QVariant::fromValue(*date_) : QVariant();
   if (key == QLatin1String("task")) return task_ ? KeyPath::variantFromObject(task_) : QVariant();
-  if (key == QLatin1String("type")) return type_;
   if (key == QLatin1String("duration")) return duration();
   if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
   if (key == QLatin1String("title")) return title();
@@ -206,6 +205,5 @@ QVariant WTItemContainer::valueForKey(const QString& key) const {
     return names.isEmpty() ? QVariant() : QVariant(names);
   }
   if (key == QLatin1String("uuid")) return uuid();
-  if (key == QLatin1String("isLeaf")) return false;
   return {};
 }

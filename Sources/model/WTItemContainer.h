@@ -47,10 +47,10 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   static std::shared_ptr<WTItemContainer> objectWithUUID(const QVariant& uuid, WTObjectContext* context);
 
   bool isEqual(const WTItemContainer& other) const;
-  // The short date, or "Pending" (translated) without a date.
   // The names its items carry, each once, in the items' order, joined by "; " (for a report's line of a
   // day or a month); empty when none of them has a name.
   QString itemNames() const;
+  // The short date, or "Pending" (translated) without a date.
   QString title() const;
   // {"date": date or null, "task": the task's uuid}.
   QVariantMap uuid() const;
@@ -60,13 +60,10 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   const QList<WTItem*>& items() const { return items_; }
   const QList<WTItem*>& children() const { return items_; }
   void setItems(QList<WTItem*> items);
-  bool isLeaf() const { return false; }
 
   std::optional<Date> date() const { return date_; }
   void setDate(std::optional<Date> date) { date_ = date; }
   WTTask* task() const { return task_; }
-  QString type() const { return type_; }
-  void setType(const QString& type) { type_ = type; }
 
   void startObserving();
   void stopObserving();
@@ -87,7 +84,6 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   QList<WTItem*> items_;
   std::optional<Date> date_;
   WTTask* task_;
-  QString type_;
   QPointer<WTObjectContext> context_;
   std::vector<WTObjectContext::ObserverId> observers_;
 };

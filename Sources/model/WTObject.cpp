@@ -1,6 +1,8 @@
 #include "WTObject.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
+#include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTStoreRecord.h"
 
@@ -77,7 +79,7 @@ void WTObject::setRate(const std::optional<Decimal>& rate) {
 }
 
 Decimal WTObject::rateFromAbove() const {
-  return Decimal(100);
+  return WTClient::builtInRate();
 }
 
 QVariant WTObject::primitiveValue(const QString& key) const {
@@ -254,5 +256,5 @@ void WTObject::writeRecord(WTStoreRecord& record) const {
 
 std::optional<Decimal> WTObject::userDefaultRate() const {
   const UserDefaults* defaults = context_->userDefaults();
-  return defaults ? defaults->decimalForKey(QStringLiteral("WTDefaultRate")) : std::nullopt;
+  return defaults ? defaults->decimalForKey(SettingsKeys::kDefaultRate) : std::nullopt;
 }

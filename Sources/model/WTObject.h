@@ -78,7 +78,7 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   // The rate in force for this record after inheritance: its own rate, else rateFromAbove().
   Decimal inheritedRate() const { return rate_ ? *rate_ : rateFromAbove(); }
   // What this record inherits while it has no rate of its own (its owner's rate, or the default rate
-  // of its kind); the base answers "100".
+  // of its kind); the base answers a client's built-in rate.
   virtual Decimal rateFromAbove() const;
 
   // Key-value access by the stored and derived key names the lists, reports and sync use.

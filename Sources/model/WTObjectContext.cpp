@@ -1,5 +1,6 @@
 #include "WTObjectContext.h"
 
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTExpense.h"
@@ -41,7 +42,7 @@ WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent)
   undo_.setChangeHandler([this] { emit undoStateChanged(); });
   if (defaults_) {
     connect(defaults_, &UserDefaults::valueChanged, this, [this](const QString& key) {
-      if (key == QLatin1String("WTDefaultRate")) defaultRateDidChange();
+      if (key == SettingsKeys::kDefaultRate) defaultRateDidChange();
     });
   }
 }

@@ -28,6 +28,21 @@ void WTProject::moveTask(WTTask* task, int index) {
   task->changeOwner(this, std::clamp(index, 0, static_cast<int>(tasks_.size()) - 1));
 }
 
+void WTProject::moveTasks(const QList<WTTask*>& tasks, int row) {
+  QList<WTTask*> order = tasks_;
+  for (WTTask* task : tasks) {
+    const qsizetype from = order.indexOf(task);
+    if (from < 0) continue;
+    // The place is counted with the moving task still in it: past that task, it is one less.
+    const qsizetype to = row < 0 ? order.size() : row;
+    if (to == from) continue;
+    order.move(from, to > from ? to - 1 : to);
+  }
+  for (int i = 0; i < order.size(); ++i) {
+    if (tasks_.indexOf(order[i]) != i) moveTask(order[i], i);
+  }
+}
+
 Decimal WTProject::rateFromAbove() const {
   if (client_) return client_->inheritedRate();
   return userDefaultRate().value_or(builtInRate());

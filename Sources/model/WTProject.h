@@ -21,12 +21,14 @@ class WTProject final : public WTObject {
   const QList<WTTask*>& tasksArray() const { return tasks_; }
   // Moves one of this project's tasks to `index` among the others (clamped to the list).
   void moveTask(WTTask* task, int index);
+  // Moves each of `tasks` in turn to the place `row` names between the tasks as they stand (-1: after
+  // the last), as a drag of several rows does; tasks of other projects are left where they are.
+  void moveTasks(const QList<WTTask*>& tasks, int row);
 
   // Own rate, else the client's inherited rate; without a client "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;
   // What a project without a client bills, with no rate of its own and no default set: 50.
   static Decimal builtInRate() { return Decimal(50); }
-  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
 
   int duration() const;
   Decimal cost() const;

@@ -21,7 +21,6 @@ class WTStoreWriterLock {
   bool tryLock();
   // Takes the lock, waiting up to `timeoutMs` for its holder to let go.
   bool lock(int timeoutMs);
-  bool isLocked() const { return fd_ >= 0; }
   void unlock();
 
  private:

@@ -1,6 +1,7 @@
 #include "WTTask.h"
 
 #include "RZDate.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTItemContainer.h"
 #include "WTObjectContext.h"
@@ -20,6 +21,28 @@ WTTask::~WTTask() = default;
 
 void WTTask::setProject(WTProject* project, int index) {
   changeOwner(project, index);
+}
+
+QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items) {
+  for (WTItem* item : items) item->setTask(this);
+  return items;
+}
+
+QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items, std::optional<Date> day) {
+  QList<WTItem*> adopted;
+  for (WTItem* item : items) {
+    if (day) {
+      item->setTask(this);
+      item->setDate(day);
+    } else if (item->entity() == WTEntity::ToDo) {
+      static_cast<WTToDo*>(item)->setCompleted(false);
+      item->setTask(this);
+    } else {
+      continue;
+    }
+    adopted << item;
+  }
+  return adopted;
 }
 
 void WTTask::setBudget(const std::optional<Decimal>& budget) {
@@ -45,7 +68,7 @@ void WTTask::relinkOwner(WTObject* owner, int index) {
 
 Decimal WTTask::rateFromAbove() const {
   if (project_) return project_->inheritedRate();
-  return userDefaultRate().value_or(Decimal(75));
+  return userDefaultRate().value_or(builtInRate());
 }
 
 // Here rather than in the setter, so that a rate put back by undo or redo reaches the totals above too.
@@ -128,14 +151,6 @@ QList<WTItem*> WTTask::itemsWithoutPendingToDos() const {
   QList<WTItem*> result;
   for (WTItem* item : items_) {
     if (item->entity() != WTEntity::ToDo || static_cast<WTToDo*>(item)->completed()) result.append(item);
-  }
-  return result;
-}
-
-QList<WTItem*> WTTask::filteredItems(const QStringList& entityNames) const {
-  QList<WTItem*> result;
-  for (WTItem* item : items_) {
-    if (entityNames.contains(item->entityName())) result.append(item);
   }
   return result;
 }
@@ -286,7 +301,7 @@ WTTime* WTTask::toggleTimer() {
     return nullptr;
   }
   const UserDefaults* defaults = context()->userDefaults();
-  if (defaults && defaults->boolForKey(QStringLiteral("WTStopsOtherTimes"))) {
+  if (defaults && defaults->boolForKey(SettingsKeys::kStopsOtherTimes)) {
     for (WTTask* task : context()->fetch<WTTask>()) task->stopAllTimers();
   }
   auto* time = WTTime::insertNewObject(context());

@@ -31,10 +31,17 @@ class WTTask final : public WTObject {
 
   // Every item of the task, of every kind, in no particular order.
   const QList<WTItem*>& items() const { return items_; }
+  // Takes `items` into this task, each keeping its date. Returns them.
+  QList<WTItem*> adoptItems(const QList<WTItem*>& items);
+  // Takes `items` into this task's group of `day`: a day books them on it (WTItem::setDate); none is
+  // "Pending", where only to-dos come, opened again, and other items stay where they were. Returns the
+  // items that came.
+  QList<WTItem*> adoptItems(const QList<WTItem*>& items, std::optional<Date> day);
 
-  // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else 75.
+  // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;
-  void setInheritedRate(const std::optional<Decimal>& rate) { setRate(rate); }
+  // What a task without a project bills, with no rate of its own and no default set: 75.
+  static Decimal builtInRate() { return Decimal(75); }
 
   int duration() const;
   Decimal cost() const;
@@ -64,7 +71,6 @@ class WTTask final : public WTObject {
   QList<WTTime*> times() const;
   QList<WTItem*> pendingToDos() const;  // open to-dos, newest first
   QList<WTItem*> itemsWithoutPendingToDos() const;
-  QList<WTItem*> filteredItems(const QStringList& entityNames) const;
   QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses, newest first
   // The start dates of the oldest and the newest of the valuable items that have one: the period a report
   // of the task covers, found without listing the items.
@@ -77,7 +83,6 @@ class WTTask final : public WTObject {
   const WTItemContainerList& cachedChildren() const { return cachedChildren_; }
   const WTItemContainerList& children();
   void updateChildren();
-  bool isLeaf() const { return false; }
   // The cached group that holds `item` (its day's group, or "Pending" for an open to-do); never rebuilds.
   std::shared_ptr<WTItemContainer> itemContainerForItem(const WTItem* item) const;
 

@@ -31,7 +31,6 @@ class WTTime final : public WTItem {
   // whether it did.
   bool peek();
   std::optional<int> lastDuration() const { return lastDuration_; }
-  void setLastDuration(std::optional<int> minutes) { lastDuration_ = minutes; }
 
   QVariant valueForKey(const QString& key) const override;
   bool setValue(const QString& key, const QVariant& value) override;

@@ -9,6 +9,12 @@ void WTToDo::setCompleted(bool completed) {
   setStoredValue(QStringLiteral("completed"), completed);
 }
 
+void WTToDo::markCompleted(bool completed) {
+  if (completed == completed_) return;
+  setCompleted(completed);
+  if (completed) setStartDate(Date::now());
+}
+
 QVariant WTToDo::valueForKey(const QString& key) const {
   if (key == QLatin1String("completed")) return completed_;
   return WTItem::valueForKey(key);

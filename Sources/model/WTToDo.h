@@ -9,8 +9,11 @@ class WTToDo final : public WTItem {
   explicit WTToDo(WTObjectContext* context) : WTItem(WTEntity::ToDo, context) {}
 
   bool completed() const { return completed_; }
-  // Stores the flag; nothing else follows (the caller dates the item when it wants to).
+  // Stores the flag; nothing else follows (loading, sync and undo put back what was stored).
   void setCompleted(bool completed);
+  // What the person ticking the box means: a to-do completed now is dated now, the completion time; one
+  // opened again keeps that date. Saying what already holds changes nothing.
+  void markCompleted(bool completed);
 
   QVariant valueForKey(const QString& key) const override;
   bool setValue(const QString& key, const QVariant& value) override;

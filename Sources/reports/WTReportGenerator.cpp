@@ -37,7 +37,7 @@ class ErrorCollector : public GXTemplateEngineDelegate {
     const GXRange remaining = engine->remainingRange();
     const qsizetype reached = std::clamp<qsizetype>(qsizetype(remaining.location), 0, contents.size());
     const int line = contents.isEmpty() ? 0 : int(QStringView(contents).left(reached).count(u'\n')) + 1;
-    errors_.push_back({error.code, error.localizedDescription, line});
+    errors_.push_back({int(error.code), error.localizedDescription, line});
   }
 
  private:

@@ -5,6 +5,7 @@
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
 #include "RZSyncReply.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
@@ -91,10 +92,10 @@ RZSyncManager::RZSyncManager(WTObjectContext* context, const QString& trackFile,
   // One identity per installation, kept with the user's settings.
   QString device;
   if (UserDefaults* defaults = userDefaults()) {
-    device = defaults->stringForKey(QStringLiteral("WTSyncDevice"));
+    device = defaults->stringForKey(SettingsKeys::kSyncDevice);
     if (device.isEmpty()) {
       device = QUuid::createUuid().toString(QUuid::WithoutBraces);
-      defaults->setValue(QStringLiteral("WTSyncDevice"), device);
+      defaults->setValue(SettingsKeys::kSyncDevice, device);
     }
   } else {
     device = QUuid::createUuid().toString(QUuid::WithoutBraces);
@@ -143,7 +144,7 @@ QUrl RZSyncManager::endpointURL(const QString& server) {
 
 QUrl RZSyncManager::configuredEndpoint() const {
   const UserDefaults* defaults = userDefaults();
-  return defaults ? endpointURL(defaults->stringForKey(QStringLiteral("WTSyncServer"))) : QUrl();
+  return defaults ? endpointURL(defaults->stringForKey(SettingsKeys::kSyncServer)) : QUrl();
 }
 
 void RZSyncManager::fileNotifications() {

@@ -70,9 +70,6 @@ class RZSyncNetwork : public QObject {
   // Idle (0), or Busy (1) while a request is in flight.
   int networkAction() const { return networkAction_; }
 
-  // The body received so far (for inspection in tests).
-  QByteArray responseData() const { return responseData_; }
-
   // A reply larger than this fails the exchange and is not read further (64 MiB unless changed).
   static constexpr qsizetype kMaxReplyBytes = qsizetype(64) << 20;
   qsizetype maxReplyBytes() const { return maxReplyBytes_; }

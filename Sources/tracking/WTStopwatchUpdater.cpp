@@ -2,6 +2,7 @@
 
 #include "DurationText.h"
 #include "KeyPath.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTIdleSource.h"
@@ -100,10 +101,9 @@ void WTStopwatchUpdater::processIdleTime() {
   // entries changed) asks nothing more.
   if (alertOpen_) return;
   const std::optional<Date> sleepBegan = std::exchange(sleepBegan_, std::nullopt);
-  if (times_.isEmpty() || !defaults_ || !defaults_->boolForKey(QStringLiteral("WTShouldIdle"))) return;
+  if (times_.isEmpty() || !defaults_ || !defaults_->boolForKey(SettingsKeys::kShouldIdle)) return;
 
-  const qint64 minutes =
-      std::clamp<qint64>(defaults_->integerForKey(QStringLiteral("WTIdleTime")), -1, 1000000);
+  const qint64 minutes = std::clamp<qint64>(defaults_->integerForKey(SettingsKeys::kIdleTime), -1, 1000000);
   const qint64 threshold = minutes > 0 ? minutes * 60 : 300;
 
   const Date now = Date::now();

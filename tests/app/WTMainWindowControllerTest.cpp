@@ -287,7 +287,7 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   EXPECT_EQ(exportAction->shortcut(), QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_E));
   WTExportController* exporter = window->exportData();
   EXPECT_TRUE(exporter->isVisible());
-  exporter->projectFilterMatrix()->button(WTExportController::SelectedProject)->click();
+  exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
   EXPECT_EQ(exporter->projectLimit(), first);
   exporter->reject();
 }

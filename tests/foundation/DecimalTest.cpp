@@ -230,29 +230,6 @@ TEST(DecimalTest, ComparesValuesAcrossScalesAndSigns) {
   }
 }
 
-TEST(DecimalTest, DivisionByZeroHasNoResult) {
-  EXPECT_FALSE(Decimal::divide(Decimal(1), Decimal(0)).has_value());
-  EXPECT_FALSE(Decimal::divide(Decimal(0), dec("0.00")).has_value());
-  EXPECT_FALSE(Decimal::divide(Decimal(-5), dec("-0")).has_value());
-  EXPECT_TRUE(Decimal::divide(dec("0.00"), Decimal(7)).value().isIdenticalTo(dec("0.00")));
-}
-
-TEST(DecimalTest, MoneyKeepsFullPrecision) {
-  const Decimal sixty(60);
-  const Decimal ninetyMinutes = Decimal::divide(Decimal(90), sixty).value();
-  EXPECT_TRUE(ninetyMinutes.isIdenticalTo(dec("1.5")));
-  const Decimal cost = Decimal(80) * ninetyMinutes;
-  EXPECT_EQ(cost.toString(), QStringLiteral("120.0"));
-  EXPECT_EQ(cost, Decimal(120));
-  EXPECT_EQ((Decimal(75) * Decimal::divide(Decimal(30), sixty).value()).toString(), QStringLiteral("37.5"));
-
-  const Decimal oneMinute = Decimal::divide(Decimal(1), sixty).value();
-  EXPECT_EQ(oneMinute.toString(), QStringLiteral("0.016666666666666666666666666666666666667"));
-  EXPECT_EQ((Decimal(100) * oneMinute).toString(), QStringLiteral("1.6666666666666666666666666666666666667"));
-  EXPECT_EQ((dec("12.30") + dec("0.70")).toString(), QStringLiteral("13.00"));
-  EXPECT_EQ((dec("12.30") - dec("12.3")).toString(), QStringLiteral("0.00"));
-}
-
 TEST(DecimalTest, ResultsBeyondTheLargestValueSaturate) {
   const Decimal largest = dec("9.9999999999999999999999999999999999999E+999999");
   EXPECT_TRUE((largest + largest).isIdenticalTo(largest));

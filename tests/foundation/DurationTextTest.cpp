@@ -1,6 +1,5 @@
 #include "DurationText.h"
 
-#include "Decimal.h"
 #include "UserLocale.h"
 
 #include <gtest/gtest.h>
@@ -41,34 +40,6 @@ TEST(DurationText, MinutesAsHoursAndMinutes) {
       {std::numeric_limits<std::int32_t>::min(), "0-35791394:0-8"},
   };
   for (const Formatted& c : cases) EXPECT_EQ(DurationText::stringWithMinutes(c.value), c.text) << c.value;
-}
-
-TEST(DurationText, SecondsAsHoursMinutesAndSeconds) {
-  const Formatted cases[] = {
-      {0, "00:00:00"},       {59, "00:00:59"},       {60, "00:01:00"},
-      {3600, "01:00:00"},    {3725, "01:02:05"},     {36610, "10:10:10"},
-      {360000, "100:00:00"}, {-3725, "0-1:0-2:0-5"}, {-59, "00:00:0-59"},
-  };
-  for (const Formatted& c : cases) EXPECT_EQ(DurationText::stringWithSeconds(c.value), c.text) << c.value;
-}
-
-TEST(DurationText, NumbersAreTakenAsWholeMinutes) {
-  const struct {
-    QVariant number;
-    const char* text;
-  } cases[] = {
-      {QVariant(90), "01:30"},
-      {QVariant(qlonglong(75)), "01:15"},
-      {QVariant(2.9), "00:02"},  // truncated, not rounded
-      {QVariant(-2.9), "00:0-2"},
-      {QVariant(59.999), "00:59"},
-      {QVariant::fromValue(*Decimal::fromString(u"90.99")), "01:30"},
-      {QVariant(true), "00:01"},
-      {QVariant(), "00:00"},
-      {QVariant(qlonglong(1) << 40), "35791394:07"},  // beyond 32 bits: saturates
-  };
-  for (const auto& c : cases)
-    EXPECT_EQ(DurationText::durationString(c.number), c.text) << c.number.toString().toStdString();
 }
 
 struct Parsed {
@@ -139,40 +110,6 @@ TEST(DurationText, TypedDurationsAreReadStrictlyInTheUsersLocale) {
       EXPECT_EQ(refusal.isEmpty(), expected >= 0) << name << " \"" << c.text << '"';
     }
   }
-}
-
-TEST(WTDurationFormatter, FormatsAndAlwaysParses) {
-  const WTDurationFormatter formatter;
-  EXPECT_EQ(formatter.stringForObjectValue(QVariant(2.9)), "00:02");
-  EXPECT_EQ(formatter.stringForObjectValue(QVariant(6000)), "100:00");
-
-  for (const Parsed& c : {Parsed{"1:2:3:4", 3064}, Parsed{"abc", 0}, Parsed{"", 0}, Parsed{"1:30", 90}}) {
-    QVariant result(QStringLiteral("stale"));
-    QString error;
-    EXPECT_TRUE(formatter.getObjectValue(&result, QString::fromUtf8(c.text), &error)) << c.text;
-    EXPECT_EQ(result.typeId(), QMetaType::Int) << c.text;
-    EXPECT_EQ(result.toInt(), c.minutes) << c.text;
-    EXPECT_TRUE(error.isEmpty()) << c.text;
-  }
-}
-
-TEST(WTDurationTransformer, TransformsBothWays) {
-  const WTDurationTransformer transformer;
-  EXPECT_EQ(WTDurationTransformer::transformedValueClass(), QMetaType::fromType<QString>());
-  EXPECT_TRUE(WTDurationTransformer::allowsReverseTransformation());
-
-  const QVariant shown = transformer.transformedValue(QVariant(90));
-  EXPECT_EQ(shown.typeId(), QMetaType::QString);
-  EXPECT_EQ(shown.toString(), "01:30");
-  EXPECT_EQ(transformer.transformedValue(QVariant(2.9)).toString(), "00:02");
-  EXPECT_FALSE(transformer.transformedValue(QVariant()).isValid());
-
-  const QVariant minutes = transformer.reverseTransformedValue(QStringLiteral("1:00:00"));
-  EXPECT_EQ(minutes.typeId(), QMetaType::Int);
-  EXPECT_EQ(minutes.toInt(), 1440);
-  EXPECT_EQ(transformer.reverseTransformedValue(QStringLiteral("0:90")).toInt(), 90);
-  EXPECT_EQ(transformer.reverseTransformedValue(QStringLiteral("x")).toInt(), 0);
-  EXPECT_EQ(transformer.reverseTransformedValue(QVariant()).toInt(), 0);
 }
 
 }  // namespace

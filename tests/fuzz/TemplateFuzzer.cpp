@@ -15,7 +15,6 @@
 #include "GXTemplateEngine.h"
 #include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
-#include "WTReportFilters.h"
 
 #include <QString>
 #include <QVariant>
@@ -103,7 +102,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   engine.setExpressionEndDelimiter(QString::fromLatin1(d.expressionEnd));
   engine.setFilterDelimiter(QString::fromLatin1(d.filter));
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
-  engine.loadFilter(std::make_shared<WTReportFilters>());
   // Runaway loops end at these limits instead of running for minutes.
   engine.setMaximumSteps(20000);
   engine.setMaximumOutputLength(1 << 20);

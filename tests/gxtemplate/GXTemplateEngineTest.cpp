@@ -4,7 +4,6 @@
 #include "KeyPath.h"
 #include "RXRegex.h"
 #include "TemplateTestSupport.h"
-#include "WTReportFilters.h"
 
 #include <QFile>
 #include <QStringEncoder>
@@ -180,91 +179,63 @@ TEST(EngineWithoutMatcher, ReportsFatalErrorSevenAndGivesNone) {
   EXPECT_TRUE(delegate.events.isEmpty());  // no run took place, so none finished
 }
 
-TEST_F(EngineErrorTest, UnknownVariablesAreReportedOnlyWhileWriting) {
-  EXPECT_EQ(render(QStringLiteral("a{{ missing }}b")), QStringLiteral("ab"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 3);
-  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"missing\" is not a valid variable"));
-  EXPECT_TRUE(delegate.errors[0].continuing);
-  EXPECT_EQ(render(QStringLiteral("{% if false %}{{ missing }}{% /if %}c")), QStringLiteral("c"));
-  EXPECT_TRUE(delegate.errors.empty());
-  EXPECT_EQ(render(QStringLiteral("{{}}")), QString());
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"(null)\" is not a valid variable"));
-}
-
-TEST_F(EngineErrorTest, UnknownMarkersAreReportedEvenWhenOutputIsOff) {
-  EXPECT_EQ(render(QStringLiteral("a{% bogus x y %}b")), QStringLiteral("ab"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 2);
-  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"bogus\" is not a valid marker"));
-  EXPECT_EQ(render(QStringLiteral("{% if false %}{% bogus %}{% /if %}c")), QStringLiteral("c"));
-  EXPECT_EQ(delegate.codes(), QList<int>{2});
-  render(QStringLiteral("{%%}"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].message, QStringLiteral("\"(null)\" is not a valid marker"));
-}
-
-TEST_F(EngineErrorTest, BlocksLeftOpenAreCountedAndNamed) {
-  EXPECT_EQ(render(QStringLiteral("{% for x in items %}abc"), {{"items", QVariantList{1}}}),
-            QStringLiteral("abc"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 6);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Finished processing template, but 1 block was left open (for)."));
-  EXPECT_TRUE(delegate.errors[0].continuing);
-  render(QStringLiteral("{% for 1 to 2 %}{% if true %}{% section s %}x"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Finished processing template, but 3 blocks were left open (for, if, section)."));
-}
-
-TEST_F(EngineErrorTest, ClosingABlockThatIsNotOpenStopsTheRun) {
-  EXPECT_EQ(render(QStringLiteral("a{% /for %}b{{ missing }}")), QStringLiteral("a"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 1);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Marker \"/for\" reported that a non-existent block ended"));
-  EXPECT_TRUE(delegate.errors[0].continuing);  // reported as continuing, and yet the run ends
-  EXPECT_EQ(delegate.events.last(), QStringLiteral("finished"));
-
-  EXPECT_EQ(render(QStringLiteral("{% section s %}x{% /if %}y{% /section %}z")), QStringLiteral("x"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(
-      delegate.errors[0].message,
-      QStringLiteral(
-          "Marker \"/if\" reported that a block ended, but current block was started by \"section\" marker"));
-}
-
-TEST_F(EngineErrorTest, AMarkerBothBeginningAndEndingABlockKeepsItsOutput) {
-  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"both"}));
-  EXPECT_EQ(render(QStringLiteral("{% both %}{{ bothVar }}")), QStringLiteral("BOTHkept"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 0);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Marker \"both\" reported that a block simultaneously began and ended"));
+// Each error with what the run made of the template: the output (built up to a stop), the codes in order,
+// and the first error's message and whether it was reported as continuing.
+TEST_F(EngineErrorTest, ErrorsAreReportedWithTheirCodeMessageAndOutcome) {
+  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"both", "noend", "jump"}));
+  struct Case {
+    const char* text;
+    const char* output;
+    QList<int> codes;
+    const char* message;
+    bool continuing = true;
+  };
+  const Case cases[] = {
+      {"a{{ missing }}b", "ab", {3}, "\"missing\" is not a valid variable"},
+      {"{% if false %}{{ missing }}{% /if %}c", "c", {}, nullptr},  // silent while output is off
+      {"{{}}", "", {3}, "\"(null)\" is not a valid variable"},
+      {"a{% bogus x y %}b", "ab", {2}, "\"bogus\" is not a valid marker"},
+      {"{% if false %}{% bogus %}{% /if %}c", "c", {2}, "\"bogus\" is not a valid marker"},
+      {"{%%}", "", {2}, "\"(null)\" is not a valid marker"},
+      {"{% for x in items %}abc",
+       "abc",
+       {6},
+       "Finished processing template, but 1 block was left open (for)."},
+      {"{% for 1 to 2 %}{% if true %}{% section s %}x",
+       "x",
+       {6},
+       "Finished processing template, but 3 blocks were left open (for, if, section)."},
+      // Reported as continuing, and yet the run ends.
+      {"a{% /for %}b{{ missing }}", "a", {1}, "Marker \"/for\" reported that a non-existent block ended"},
+      {"{% section s %}x{% /if %}y{% /section %}z",
+       "x",
+       {1},
+       "Marker \"/if\" reported that a block ended, but current block was started by \"section\" marker"},
+      {"{% both %}{{ bothVar }}",
+       "BOTHkept",
+       {0},
+       "Marker \"both\" reported that a block simultaneously began and ended"},
+      {"a{% noend %}b{{ noendVar }}",
+       "ab",
+       {4, 3},
+       "Marker \"noend\" started a block but did not supply any suitable end-markers"},
+      {"before{% jump %}after",
+       "before",
+       {5},
+       "Fatal Error: Marker handler \"jump\" specified an invalid range to resume processing from",
+       false},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(render(QString::fromUtf8(c.text), {{"items", QVariantList{1}}}), QString::fromUtf8(c.output))
+        << c.text;
+    EXPECT_EQ(delegate.codes(), c.codes) << c.text;
+    if (!c.message || delegate.errors.empty()) continue;
+    EXPECT_EQ(delegate.errors[0].message, QString::fromUtf8(c.message)) << c.text;
+    EXPECT_EQ(delegate.errors[0].continuing, c.continuing) << c.text;
+    EXPECT_EQ(delegate.events.last(), QStringLiteral("finished")) << c.text;
+  }
+  render(QStringLiteral("{% both %}"));
   EXPECT_EQ(delegate.events, QStringList{"finished"});  // no block was opened or closed
-}
-
-TEST_F(EngineErrorTest, ABlockWithoutEndMarkersDropsItsOutputAndVariables) {
-  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"noend"}));
-  EXPECT_EQ(render(QStringLiteral("a{% noend %}b{{ noendVar }}")), QStringLiteral("ab"));
-  EXPECT_EQ(delegate.codes(), (QList<int>{4, 3}));
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Marker \"noend\" started a block but did not supply any suitable end-markers"));
-  EXPECT_TRUE(delegate.errors[0].continuing);
-}
-
-TEST_F(EngineErrorTest, AResumeRangePastTheEndIsFatal) {
-  engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"jump"}));
-  EXPECT_EQ(render(QStringLiteral("before{% jump %}after")), QStringLiteral("before"));
-  ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 5);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral(
-                "Fatal Error: Marker handler \"jump\" specified an invalid range to resume processing from"));
-  EXPECT_FALSE(delegate.errors[0].continuing);
-  EXPECT_EQ(delegate.events.last(), QStringLiteral("finished"));
 }
 
 TEST_F(EngineErrorTest, RunawayTemplatesStopAtTheLimits) {
@@ -391,10 +362,13 @@ TEST_F(EngineVariableTest, ANameIsReadAgainOnlyAfterAVariableMayHaveChanged) {
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}{% if c.n %}{{ c.n }}{% /if %}|{% set x 1 %}{{ c.n }}"), vars),
             QStringLiteral("11|2"));
   EXPECT_EQ(render(QStringLiteral("{{ c.n }}"), vars), QStringLiteral("3"));
-  EXPECT_EQ(render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"), vars),
-            QStringLiteral("aabb"));
+  EXPECT_EQ(
+      render(QStringLiteral("{% for item in items %}{{ item }}{% if item %}{{ item }}{% /if %}{% /for %}"),
+             vars),
+      QStringLiteral("aabb"));
   EXPECT_EQ(render(QStringLiteral("{{ title }}{% set title B %}{{ title }}"), vars), QStringLiteral("AB"));
-  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")), QStringLiteral("A[]"));
+  EXPECT_EQ(render(QStringLiteral("{% section s %}{% set t A %}{{ t }}{% /section %}[{{ t }}]")),
+            QStringLiteral("A[]"));
   engine.setObject(QStringLiteral("G"), QStringLiteral("g"));
   EXPECT_EQ(render(QStringLiteral("{{ g }}")), QStringLiteral("G"));
   engine.setObject(QStringLiteral("H"), QStringLiteral("g"));
@@ -433,8 +407,12 @@ TEST_F(EngineVariableTest, FiltersApplyToExpressionsAndMarkers) {
   EXPECT_EQ(render(QStringLiteral("{% for 1 to 2 %}{% cycle odd even | uppercase %}{% /for %}")),
             QStringLiteral("ODDEVEN"));
   // A filter that gives no value writes nothing (and is no error).
-  engine.loadFilter(std::make_shared<WTReportFilters>());
-  EXPECT_EQ(render(QStringLiteral("[{{ name | decimal }}]"), vars), QStringLiteral("[]"));
+  struct Nothing : GXTemplateFilter {
+    QStringList filters() const override { return {QStringLiteral("nothing")}; }
+    QVariant filterInvoked(const QString&, const QStringList&, const QVariant&) override { return {}; }
+  };
+  engine.loadFilter(std::make_shared<Nothing>());
+  EXPECT_EQ(render(QStringLiteral("[{{ name | nothing }}]"), vars), QStringLiteral("[]"));
   EXPECT_TRUE(delegate.errors.empty());
 }
 

@@ -1,9 +1,7 @@
 #include "Date.h"
-#include "Decimal.h"
 #include "GXTemplateStandardFilters.h"
 #include "RZDate.h"
 #include "TemplateTestSupport.h"
-#include "WTReportFilters.h"
 
 #include <QColor>
 #include <QDateTime>
@@ -12,25 +10,19 @@
 
 namespace {
 
-// Money text depends on the locale, and its formatter is made on first use: fix the locale before any test.
-const bool kLocaleFixed = [] {
-  UErrorCode status = U_ZERO_ERROR;
-  icu::Locale::setDefault(icu::Locale("en_US"), status);
-  return U_SUCCESS(status);
-}();
-
 class FilterTest : public TemplateTest {
  protected:
-  FilterTest() { engine.loadFilter(std::make_shared<WTReportFilters>()); }
-
   QString filtered(const QVariant& value, const QString& filter) {
     return render(QStringLiteral("{{ v | %1 }}").arg(filter), {{"v", value}});
   }
 };
 
-Decimal decimal(const char* text) {
-  return *Decimal::fromString(QString::fromLatin1(text));
-}
+// Date texts depend on the locale: fix it before any test.
+const bool kLocaleFixed = [] {
+  UErrorCode status = U_ZERO_ERROR;
+  icu::Locale::setDefault(icu::Locale("en_US"), status);
+  return U_SUCCESS(status);
+}();
 
 TEST_F(FilterTest, CaseFiltersWorkOnTheValuesText) {
   EXPECT_EQ(filtered(12, QStringLiteral("uppercase")), QStringLiteral("12"));
@@ -53,6 +45,7 @@ TEST_F(FilterTest, CaseFiltersWorkOnTheValuesText) {
 }
 
 TEST_F(FilterTest, DateFormatNeedsADateAndOnePattern) {
+  ASSERT_TRUE(kLocaleFixed);
   ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
   const QVariant date =
       QVariant::fromValue(Date::fromQDateTime(QDateTime(QDate(2024, 3, 31), QTime(22, 30), Qt::UTC)));
@@ -121,41 +114,6 @@ TEST_F(FilterTest, ColorFormatWritesHexForHex) {
                                   QStringLiteral("ff0000")),
             QVariant(QStringLiteral("ff0000")));
   EXPECT_EQ(filters.filterInvoked(QStringLiteral("nosuch"), {}, red), red);
-}
-
-TEST_F(FilterTest, DigiclockWritesMinutesAsDurationText) {
-  struct Case {
-    QVariant value;
-    const char* text;
-  };
-  const Case cases[] = {{90, "01:30"},
-                        {0, "00:00"},
-                        {6000, "100:00"},
-                        {-90, "0-1:0-30"},
-                        {2.9, "00:02"},
-                        {QVariant::fromValue(decimal("61.9")), "01:01"},
-                        {QStringLiteral("125 min"), "02:05"},
-                        {QStringLiteral("abc"), "00:00"},
-                        {true, "00:01"}};
-  for (const Case& c : cases) {
-    EXPECT_EQ(filtered(c.value, QStringLiteral("digiclock")), QString::fromUtf8(c.text)) << c.text;
-  }
-}
-
-TEST_F(FilterTest, DecimalWritesMoneyText) {
-  ASSERT_TRUE(kLocaleFixed);
-  EXPECT_EQ(filtered(QVariant::fromValue(decimal("1234.5")), QStringLiteral("decimal")),
-            QStringLiteral("1,234.50"));
-  EXPECT_EQ(filtered(QVariant::fromValue(decimal("-0.005")), QStringLiteral("decimal")),
-            QStringLiteral("-0.01"));
-  EXPECT_EQ(filtered(1234567, QStringLiteral("decimal")), QStringLiteral("1,234,567.00"));
-  EXPECT_EQ(filtered(0.1, QStringLiteral("decimal")), QStringLiteral("0.10"));
-  // Not a number: no text at all.
-  EXPECT_EQ(filtered(QStringLiteral("12"), QStringLiteral("decimal")), QString());
-  EXPECT_TRUE(delegate.errors.empty());
-  WTReportFilters report;
-  EXPECT_FALSE(report.filterInvoked(QStringLiteral("uppercase"), {}, QStringLiteral("x")).isValid());
-  EXPECT_EQ(report.filters(), (QStringList{"digiclock", "decimal"}));
 }
 
 }  // namespace

@@ -38,7 +38,7 @@ class RecordingDelegate : public GXTemplateEngineDelegate {
   void templateEngineEncounteredError(GXTemplateEngine*, const GXTemplateError& error,
                                       bool continuing) override {
     EXPECT_EQ(error.domain, QStringLiteral("GXTemplateEngineErrorDomain"));
-    errors.push_back({error.code, error.localizedDescription, continuing});
+    errors.push_back({int(error.code), error.localizedDescription, continuing});
   }
 
   QList<int> codes() const {

@@ -1,4 +1,3 @@
-#include "RZEditableArrayController.h"
 #include "RZViewAdditions.h"
 
 #include <gtest/gtest.h>
@@ -37,23 +36,6 @@ TEST(RZViewAdditionsTest, ColumnsAreFoundAndEditedByIdentifier) {
   auto* editor = qobject_cast<QLineEdit*>(table.view.indexWidget(table.model.index(0, 1)));
   ASSERT_NE(editor, nullptr);
   EXPECT_EQ(editor->selectedText(), "10");
-}
-
-TEST(RZViewAdditionsTest, ANewRowIsEditedOnTheNextTurn) {
-  NamedColumns table;
-  RZEditableArrayController controller;
-  controller.setTableView(&table.view);
-  controller.setTableColumnIdentifier("name");
-  controller.setInserter([&] {
-    table.model.appendRow({new QStandardItem("new"), new QStandardItem("0")});
-    const int row = table.model.rowCount() - 1;
-    table.view.selectRow(row);
-    return row;
-  });
-  controller.add();
-  EXPECT_EQ(table.view.indexWidget(table.model.index(1, 0)), nullptr);  // not yet
-  QCoreApplication::processEvents();
-  EXPECT_NE(table.view.indexWidget(table.model.index(1, 0)), nullptr);
 }
 
 TEST(RZViewAdditionsTest, ASheetStaysOpenWhileAFieldHoldsWhatItCannotTake) {

@@ -64,8 +64,6 @@ TEST(WTTableRowViewTest, FlatGreyTonesAndTheGroove) {
 }
 
 TEST(WTPopUpButtonCellTest, TheTagChoosesColourAndSide) {
-  EXPECT_EQ(WTPopUpButtonCell::attributedTitle("ACME"), QString("ACME \u25BF"));
-  EXPECT_TRUE(WTPopUpButtonCell::attributedTitle(QString()).isEmpty());
   EXPECT_EQ(WTPopUpButtonCell::colorForTag(1), RZColor::calibratedWhite(0.1));
   EXPECT_EQ(WTPopUpButtonCell::colorForTag(0), QColor(Qt::white));
   EXPECT_EQ(WTPopUpButtonCell::colorForTag(4), QColor(Qt::white));

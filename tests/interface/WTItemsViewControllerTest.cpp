@@ -115,23 +115,27 @@ TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsNotToTheWholeRow) {
   QToolTip::hideText();
 }
 
-TEST_F(WTItemsViewControllerTest, CompletingAToDoStampsItsDateAndRegroupsIt) {
+TEST_F(WTItemsViewControllerTest, TickingAToDosBoxCompletesItIntoItsDaysOpenGroupAndBack) {
   auto* todo = makeItem<WTToDo>(design, "call back", at(2024, 3, 1));
   endTurn();
-  ASSERT_EQ(model()->indexOfContainerOfItem(todo), model()->indexOfContainer(design, std::nullopt));
-  todo->setCompleted(true);
-  controller->toggleCompleted(todo);
-  EXPECT_EQ(todo->startDate(), now);
+  controller->expandContainerOfItem(todo);
+  auto tick = [&] {
+    const QRect visual = outline()->visualRect(rowOf(todo));
+    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
+    const QRectF box =
+        controller->cellViewPrototypeForIndex(rowOf(todo)).partRect(WTTableCellView::Part::Checkbox, row);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, box.center().toPoint());
+  };
+  tick();
+  EXPECT_TRUE(todo->completed());
+  EXPECT_EQ(context->undoManager().undoActionName(), "Complete To-Do");
   const QModelIndex today = model()->indexOfContainer(design, RZDate::midnight(now));
   ASSERT_TRUE(today.isValid());
   EXPECT_EQ(model()->indexOfContainerOfItem(todo), today);
   EXPECT_TRUE(outline()->isExpanded(today));
-  EXPECT_FALSE(model()->indexOfContainer(design, std::nullopt).isValid());  // "Pending" is empty now
-  // Opening it again keeps the completion date.
-  now = now.addingSeconds(3600);
-  todo->setCompleted(false);
-  controller->toggleCompleted(todo);
-  EXPECT_EQ(todo->startDate(), now.addingSeconds(-3600));
+  tick();
+  EXPECT_FALSE(todo->completed());
+  EXPECT_EQ(context->undoManager().undoActionName(), "Reopen To-Do");
   EXPECT_EQ(model()->indexOfContainerOfItem(todo), model()->indexOfContainer(design, std::nullopt));
 }
 

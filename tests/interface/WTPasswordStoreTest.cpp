@@ -1,5 +1,6 @@
 #include "FakeSecretService.h"
 #include "MemoryKeychain.h"
+#include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTPasswordStore.h"
 #include "WTQtKeychain.h"
@@ -162,7 +163,7 @@ TEST_F(WTPasswordStoreTest, AKeychainThatComesBackTakesThePasswordOutOfTheFile) 
   EXPECT_EQ(storeNow(*store, QStringLiteral("battery staple")), Location::Keychain);
   EXPECT_FALSE(fileBytes().contains("horse"));
   EXPECT_FALSE(fileBytes().contains("staple"));
-  EXPECT_FALSE(defaults->hasStoredValue(QString::fromLatin1(WTPasswordStore::kKeptInFileKey)));
+  EXPECT_FALSE(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile));
   defaults->setValue(kUser, QStringLiteral("ann@example.org"));
   auto again = makeStore();
   loadNow(*again);
@@ -293,7 +294,7 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
     EXPECT_EQ(fileMode(), 0600);
     EXPECT_EQ(kept.count(), 0);
     EXPECT_TRUE(store.keychainError().isEmpty());
-    EXPECT_FALSE(defaults->hasStoredValue(QString::fromLatin1(WTPasswordStore::kKeptInFileKey)));
+    EXPECT_FALSE(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile));
   }
 }
 
@@ -334,7 +335,7 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     SCOPED_TRACE(row.name);
     service.setBehaviour(row.behaviour);
     defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-    defaults->removeValue(QString::fromLatin1(WTPasswordStore::kKeptInFileKey));
+    defaults->removeValue(SettingsKeys::kSyncPasswordKeptInFile);
     defaults->setValue(kInFile, kPassword);
     WTPasswordStore store(defaults.get(),
                           std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), row.timeoutMs));

@@ -459,7 +459,7 @@ TEST_F(RangeAndExportTest, TheExportWritesTheRangeOfTheChosenProjects) {
       [&](QWidget*, const QString&, const QString&, const QString&) { return path; });
 
   // "Selected project" without a selection exports every project's entries of the month.
-  exporter.projectFilterMatrix()->button(WTExportController::SelectedProject)->click();
+  exporter.projectChoice()->button(WTExportController::SelectedProject)->click();
   exporter.accept();
   QStringList lines = readAll(path).split(QLatin1Char('\n'), Qt::SkipEmptyParts);
   EXPECT_EQ(lines.size(), 2);

@@ -1,5 +1,4 @@
 #include "ModelFixture.h"
-#include "WTCollections.h"
 #include "WTItemContainer.h"
 
 #include <QSignalSpy>
@@ -168,32 +167,4 @@ TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
   EXPECT_EQ(months[1]->date(), berlin(2026, 1, 15, 9));
   EXPECT_EQ(months[1]->task(), a);
   EXPECT_EQ(a->dailyItems().size(), 1u);
-}
-
-TEST(WTCollectionsTest, MovingAnElementReportsWhereItLanded) {
-  QList<int> list{0, 1, 2, 3, 4};
-  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 0, 3), 2);
-  EXPECT_EQ(list, (QList<int>{1, 2, 0, 3, 4}));
-  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 0, 0), 0);
-  EXPECT_EQ(list, (QList<int>{1, 2, 0, 3, 4}));
-  EXPECT_EQ(WTCollections::moveObjectAtIndex(list, 4, 1), 1);
-  EXPECT_EQ(list, (QList<int>{1, 4, 2, 0, 3}));
-}
-
-TEST(WTCollectionsTest, SplittingByKeyPath) {
-  QVariantList values;
-  for (auto [kind, n] :
-       std::initializer_list<std::pair<const char*, int>>{{"b", 1}, {"a", 2}, {"b", 3}, {"c", 4}}) {
-    values.append(QVariantMap{{"kind", kind}, {"n", n}});
-  }
-  const auto groups = WTCollections::arrayBySplittingByKeyPath(values, "kind", {{"self", false, false}},
-                                                               {{"n", false, false}});
-  ASSERT_EQ(groups.size(), 3);
-  EXPECT_EQ(groups[0].size(), 1);
-  EXPECT_EQ(groups[1][0].toMap()["n"], 3);
-  EXPECT_EQ(groups[1][1].toMap()["n"], 1);
-  const auto maps = WTCollections::arrayBySplittingByKey(values, "kind", "items");
-  ASSERT_EQ(maps.size(), 3);
-  EXPECT_EQ(maps[0]["kind"], "b");  // first seen
-  EXPECT_EQ(maps[0]["items"].toList().size(), 2);
 }

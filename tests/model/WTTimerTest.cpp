@@ -1,8 +1,4 @@
-#include "INSortDescriptorsProxy.h"
 #include "ModelFixture.h"
-#include "WTStopwatch.h"
-
-#include <thread>
 
 class WTTimerTest : public ModelTest {};
 
@@ -125,45 +121,4 @@ TEST_F(WTTimerTest, UndoingAStopRestartsTheTimer) {
   EXPECT_FALSE(time->endDate().has_value());
   EXPECT_TRUE(task->running());
   EXPECT_GE(running.count, 2);
-}
-
-TEST(WTStopwatchTest, SumsSpansAndIgnoresRepeatedStartsAndStops) {
-  WTStopwatch watch;
-  EXPECT_EQ(watch.elapsedSeconds(), 0.0);
-  watch.stop();
-  EXPECT_EQ(watch.elapsedSeconds(), 0.0);
-  watch.start();
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
-  watch.start();  // ignored: the first span goes on
-  watch.stop();
-  const double first = watch.elapsedSeconds();
-  EXPECT_GE(first, 0.019);
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
-  EXPECT_EQ(watch.elapsedSeconds(), first);  // stopped: nothing accrues
-  watch.start();
-  std::this_thread::sleep_for(std::chrono::milliseconds(5));
-  EXPECT_GT(watch.elapsedSeconds(), first);
-  watch.reset();
-  EXPECT_FALSE(watch.started());
-  EXPECT_EQ(watch.elapsedSeconds(), 0.0);
-}
-
-TEST(INSortDescriptorsProxyTest, KeysSpellTheirOrder) {
-  INSortDescriptorsProxy proxy;
-  auto d = proxy.valueForKey("_@name");
-  ASSERT_EQ(d.size(), 1);
-  EXPECT_EQ(d[0].keyPath, "name");
-  EXPECT_FALSE(d[0].ascending);
-  EXPECT_TRUE(d[0].caseInsensitive);
-  d = proxy.valueForKey("x+_date");
-  EXPECT_EQ(d[0].keyPath, "date");
-  EXPECT_FALSE(d[0].ascending);
-  EXPECT_FALSE(d[0].caseInsensitive);
-  d = proxy.valueForKey("@client@name");
-  EXPECT_EQ(d[0].keyPath, "client.name");
-  EXPECT_TRUE(d[0].ascending);
-  proxy.setValue("anything", {{"duration", false, false}});
-  EXPECT_EQ(proxy.valueForKey("_@name")[0].keyPath, "duration");
-  EXPECT_EQ(INClassProxy::valueForKey("WTTask"), "WTTask");
-  EXPECT_FALSE(INClassProxy::valueForKey("NSObject").has_value());
 }

@@ -1,6 +1,6 @@
-// The server as strangers on the network meet it: oversized, compressed, slow and header-flooding
-// requests, password guessing aimed at locking the owner out, and sign-ups from other sites. Everything
-// here runs over real sockets on 127.0.0.1.
+// The server as strangers on the network meet it: floods of body bytes, slow requests, password
+// guessing aimed at locking the owner out, and sign-ups from other sites. Everything here runs over
+// real sockets on 127.0.0.1.
 #include "ServerTestSupport.h"
 
 #include <arpa/inet.h>
@@ -63,10 +63,12 @@ std::string requestHead(const std::string& extraHeaders) {
 
 class ServerHardeningTest : public ServerTest {};
 
-TEST_P(ServerHardeningTest, BodiesAreCountedAsTheyArriveWhateverTheFraming) {
+// A body with no announced length is cut off while it still arrives, once its decoded bytes pass the
+// limit, and a sync client still reads the refusal as code 6. (Header and framing caps are checked
+// without sockets in HttpRequestParserTest.)
+TEST_P(ServerHardeningTest, AChunkedFloodIsCutOffWhileItArrives) {
   options.maxBodyBytes = 64 * 1024;
   startServer();
-  // Chunked, no length announced: refused once the decoded bytes pass the limit, as code 6.
   RawConnection chunked(port());
   ASSERT_TRUE(chunked.send(requestHead("Transfer-Encoding: chunked\r\n")));
   const std::string chunk = "4000\r\n" + std::string(0x4000, ' ') + "\r\n";
@@ -75,37 +77,6 @@ TEST_P(ServerHardeningTest, BodiesAreCountedAsTheyArriveWhateverTheFraming) {
   const std::string refused = chunked.readAll();
   EXPECT_EQ(RawConnection::status(refused), 413) << refused.substr(0, 200);
   EXPECT_NE(refused.find("\"code\":6"), std::string::npos) << refused.substr(0, 400);
-
-  // A small chunked request under the limit is read like any other.
-  RawConnection small(port());
-  const std::string body = requestBody("nobody@example.com", "whatever-it-is", "head", 0);
-  char size[16];
-  std::snprintf(size, sizeof size, "%zx", body.size());
-  ASSERT_TRUE(small.send(requestHead("Transfer-Encoding: chunked\r\nConnection: close\r\n") + size + "\r\n" +
-                         body + "\r\n0\r\n\r\n"));
-  const std::string answered = small.readAll();
-  EXPECT_EQ(RawConnection::status(answered), 200) << answered.substr(0, 300);
-  EXPECT_NE(answered.find("\"code\":2"), std::string::npos) << answered;
-
-  // A compressed body could unpack to anything: refused before it is read.
-  RawConnection gzip(port());
-  ASSERT_TRUE(
-      gzip.send(requestHead("Content-Encoding: gzip\r\nContent-Length: 20\r\n") + std::string(20, 'x')));
-  EXPECT_EQ(RawConnection::status(gzip.readAll()), 415);
-}
-
-TEST_P(ServerHardeningTest, HeaderCountLineAndTotalSizeAreCapped) {
-  startServer();
-  std::string many;
-  for (int i = 0; i < 150; ++i) many += "X-Filler-" + std::to_string(i) + ": a\r\n";
-  const std::string longLine = "X-Long: " + std::string(9000, 'a') + "\r\n";
-  std::string large;
-  for (int i = 0; i < 20; ++i) large += "X-Big-" + std::to_string(i) + ": " + std::string(4000, 'b') + "\r\n";
-  for (const std::string& headers : {many, longLine, large}) {
-    RawConnection connection(port());
-    ASSERT_TRUE(connection.send(requestHead(headers + "Content-Length: 2\r\n") + "{}"));
-    EXPECT_EQ(RawConnection::status(connection.readAll()), 431) << headers.substr(0, 40);
-  }
 }
 
 // Connections that send a byte now and then hold no worker, are cut off at the request deadline, and

@@ -1,7 +1,6 @@
-// Undo and redo after the autosave already wrote the change reach the journal file and, through the
-// real server, the other devices, exactly as the user's own delete and insert do.
+// Undo and redo after the autosave already wrote the change reach the other devices through the real
+// server, exactly as the user's own delete and insert do.
 #include "RZSyncCommand.h"
-#include "RZSyncTrack.h"
 
 #include "SyncTestSupport.h"
 #include "WTItem.h"
@@ -13,10 +12,7 @@
 
 #include <memory>
 
-using synctest::snapshot;
-using synctest::snapshotDifference;
 using synctest::SyncClient;
-using synctest::SyncServerProcess;
 
 namespace {
 
@@ -46,14 +42,6 @@ void undoOrRedo(WTObjectContext& context, int steps, bool undo) {
   }
 }
 
-// Every identity the journal names anywhere: inserted, updated or deleted.
-QStringList journaledIds(const RZSyncTrack& track) {
-  QStringList ids = track.deletedIds();
-  for (auto section : {RZSyncTrack::Section::Inserted, RZSyncTrack::Section::Updated})
-    ids += track.entries(section).keys();
-  return ids;
-}
-
 int sync(SyncClient& client) {
   QString out, err;
   QTextStream outStream(&out), errStream(&err);
@@ -65,94 +53,42 @@ int sync(SyncClient& client) {
 
 }  // namespace
 
-// The journal file written after each save: an undone saved insertion is a deletion of its identity, its
-// redo an insertion under the same identity with its values, and nothing is ever journaled without one.
-TEST(RZSyncUndoAcrossSaves, TheJournalFileNamesWhatUndoAndRedoDid) {
-  SyncClient client(QString{});
-  const QStringList made = makeOneOfEach(*client.context);
-  client.save();
-  // As after the server confirmed it: the records are known elsewhere now.
-  client.track().resetChanges();
-
-  undoOrRedo(*client.context, int(made.size()), true);
-  client.save();
-  {
-    const RZSyncTrack file(client.journalPath());
-    QStringList deleted = file.deletedIds();
-    QStringList expected = made;
-    deleted.sort();
-    expected.sort();
-    EXPECT_EQ(deleted, expected);
-    EXPECT_FALSE(journaledIds(file).contains(QString()));
-  }
-
-  undoOrRedo(*client.context, int(made.size()), false);
-  client.save();
-  client.reopen();  // quit and start again
-  const RZSyncTrack& track = client.track();
-  EXPECT_TRUE(track.deletedIds().isEmpty());
-  EXPECT_FALSE(journaledIds(track).contains(QString()));
-  for (const QString& uuid : made) {
-    const QVariantMap inserted = track.entry(RZSyncTrack::Section::Inserted, uuid);
-    EXPECT_EQ(inserted.value("name").toString(), "one " + uuid.section(u'@', -1)) << uuid.toStdString();
-    EXPECT_NE(client.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
-  }
-}
-
-// Two devices of one account on the real server.
-class RZSyncUndoAcrossSavesWithServer : public ::testing::Test {
- protected:
-  void SetUp() override {
-    if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-    ASSERT_TRUE(server.addUser("undo@example.org", "undo across saves"));
-    ASSERT_TRUE(server.start());
-    first = std::make_unique<SyncClient>(server.address(), "undo@example.org", "undo across saves");
-    second = std::make_unique<SyncClient>(server.address(), "undo@example.org", "undo across saves");
-  }
-
-  SyncServerProcess server;
-  std::unique_ptr<SyncClient> first, second;
-};
+class RZSyncUndoAcrossSavesWithServer : public synctest::TwoDevicesTest {};
 
 // With the real server: undo and redo saved between two polls leave the other device as it was; an undo
 // that reaches the server takes the records from the other device too, for good, across restarts.
 TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
-  SyncClient& a = *first;
-  SyncClient& b = *second;
+  const QStringList made = makeOneOfEach(*a->context);
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  for (const QString& uuid : made) ASSERT_NE(b->context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
 
-  const QStringList made = makeOneOfEach(*a.context);
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  for (const QString& uuid : made) ASSERT_NE(b.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
-
-  undoOrRedo(*a.context, int(made.size()), true);
-  a.save();
-  undoOrRedo(*a.context, int(made.size()), false);
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
+  undoOrRedo(*a->context, int(made.size()), true);
+  a->save();
+  undoOrRedo(*a->context, int(made.size()), false);
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
   for (const QString& uuid : made) {
-    WTObject* there = b.context->objectWithUUID(uuid);
+    WTObject* there = b->context->objectWithUUID(uuid);
     ASSERT_NE(there, nullptr) << uuid.toStdString();
     EXPECT_EQ(there->name(), "one " + uuid.section(u'@', -1));
   }
-  auto left = snapshot(*a.context), right = snapshot(*b.context);
-  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+  expectSameStores();
 
-  undoOrRedo(*a.context, int(made.size()), true);
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  a.reopen();
-  b.reopen();
+  undoOrRedo(*a->context, int(made.size()), true);
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  a->reopen();
+  b->reopen();
   for (const QString& uuid : made) {
-    EXPECT_EQ(a.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
-    EXPECT_EQ(b.context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+    EXPECT_EQ(a->context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
+    EXPECT_EQ(b->context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
   }
-  left = snapshot(*a.context), right = snapshot(*b.context);
-  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
-  EXPECT_EQ(b.context->count(), 2);  // the project and task the records were filed under
+  expectSameStores();
+  EXPECT_EQ(b->context->count(), 2);  // the project and task the records were filed under
 }
 
 // The server keeps a deletion for good and drops whatever later names the deleted identity. A task whose
@@ -160,81 +96,74 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
 // its entries and with the time tracked on it afterwards, which the server would otherwise delete with
 // the task it is filed under, here as well.
 TEST_F(RZSyncUndoAcrossSavesWithServer, UndoingADeletionTheServerHeldBringsTheRecordsBackEverywhere) {
-  SyncClient& a = *first;
-  SyncClient& b = *second;
-
-  auto* project = a.context->insertNewObject<WTProject>();
+  auto* project = a->context->insertNewObject<WTProject>();
   project->setName(QStringLiteral("Atlas"));
-  auto* task = a.context->insertNewObject<WTTask>();
+  auto* task = a->context->insertNewObject<WTTask>();
   task->setName(QStringLiteral("Design"));
   task->setProject(project);
-  auto* before = a.context->insertNewObject<WTTime>();
+  auto* before = a->context->insertNewObject<WTTime>();
   before->setName(QStringLiteral("before"));
   before->setTask(task);
-  a.context->processPendingChanges();
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  ASSERT_EQ(b.context->count(), 3);
+  a->context->processPendingChanges();
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  ASSERT_EQ(b->context->count(), 3);
 
-  a.context->deleteObject(task);
-  a.context->processPendingChanges();
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  ASSERT_EQ(b.context->count(), 1) << "the deletion reached the other device";
+  a->context->deleteObject(task);
+  a->context->processPendingChanges();
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  ASSERT_EQ(b->context->count(), 1) << "the deletion reached the other device";
 
-  undoOrRedo(*a.context, 1, true);
-  a.save();
-  auto* after = a.context->insertNewObject<WTTime>();
+  undoOrRedo(*a->context, 1, true);
+  a->save();
+  auto* after = a->context->insertNewObject<WTTime>();
   after->setName(QStringLiteral("after"));
   after->setTask(task);
-  a.context->processPendingChanges();
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  a.reopen();
-  b.reopen();
+  a->context->processPendingChanges();
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  a->reopen();
+  b->reopen();
 
-  for (SyncClient* device : {&a, &b}) {
+  for (SyncClient* device : {a.get(), b.get()}) {
     const QList<WTTask*> tasks = device->context->fetch<WTTask>();
-    ASSERT_EQ(tasks.size(), 1) << (device == &a ? "here" : "there");
+    ASSERT_EQ(tasks.size(), 1) << (device == a.get() ? "here" : "there");
     EXPECT_EQ(tasks.first()->name(), "Design");
     ASSERT_NE(tasks.first()->project(), nullptr);
     EXPECT_EQ(tasks.first()->project()->name(), "Atlas");
     QStringList entries;
     for (const WTItem* item : tasks.first()->items()) entries.append(item->name());
     entries.sort();
-    EXPECT_EQ(entries, QStringList({"after", "before"})) << (device == &a ? "here" : "there");
+    EXPECT_EQ(entries, QStringList({"after", "before"})) << (device == a.get() ? "here" : "there");
   }
-  const auto left = snapshot(*a.context), right = snapshot(*b.context);
-  EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+  expectSameStores();
 }
 
 // Redo of an insertion whose undo reached the server is the same case the other way round.
 TEST_F(RZSyncUndoAcrossSavesWithServer,
        RedoingAnInsertionAfterItsUndoReachedTheServerBringsItBackEverywhere) {
-  SyncClient& a = *first;
-  SyncClient& b = *second;
-
-  auto* project = a.context->insertNewObject<WTProject>();
+  auto* project = a->context->insertNewObject<WTProject>();
   project->setName(QStringLiteral("Atlas"));
-  a.context->processPendingChanges();
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  undoOrRedo(*a.context, 1, true);
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  ASSERT_EQ(b.context->count(), 0);
+  a->context->processPendingChanges();
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  undoOrRedo(*a->context, 1, true);
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  ASSERT_EQ(b->context->count(), 0);
 
-  undoOrRedo(*a.context, 1, false);
-  a.save();
-  ASSERT_EQ(sync(a), 0);
-  ASSERT_EQ(sync(b), 0);
-  const QList<WTProject*> there = b.context->fetch<WTProject>();
+  undoOrRedo(*a->context, 1, false);
+  a->save();
+  ASSERT_EQ(sync(*a), 0);
+  ASSERT_EQ(sync(*b), 0);
+  const QList<WTProject*> there = b->context->fetch<WTProject>();
   ASSERT_EQ(there.size(), 1);
   EXPECT_EQ(there.first()->name(), "Atlas");
   EXPECT_EQ(there.first()->uuid(), project->uuid());
-  EXPECT_EQ(a.context->count(), 1);
+  EXPECT_EQ(a->context->count(), 1);
 }

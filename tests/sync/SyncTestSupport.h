@@ -366,4 +366,25 @@ class SyncServerProcess {
   int port_ = 0;
 };
 
+// One account on the real server and two installations on it.
+class TwoDevicesTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
+    ASSERT_TRUE(server.addUser(kUser, kPassword));
+    ASSERT_TRUE(server.start());
+    a = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
+    b = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
+  }
+  void expectSameStores() const {
+    const auto left = snapshot(*a->context), right = snapshot(*b->context);
+    EXPECT_TRUE(left == right) << snapshotDifference(left, right);
+  }
+
+  const QString kUser = QStringLiteral("ann@example.org");
+  const QString kPassword = QStringLiteral("correct horse battery");
+  SyncServerProcess server;
+  std::unique_ptr<SyncClient> a, b;
+};
+
 }  // namespace synctest

@@ -1,6 +1,6 @@
 #include "WTTemplateCommand.h"
 
-#include "TemplateTestSupport.h"
+#include <gtest/gtest.h>
 
 #include <QFile>
 #include <QTemporaryDir>
@@ -61,38 +61,37 @@ TEST_F(TemplateCommandTest, ErrorsGoToStandardErrorInTheOrderReported) {
                                 "error 6: Finished processing template, but 1 block was left open (for).\n"));
 }
 
-TEST_F(TemplateCommandTest, MissingFilesAndBadJsonExitWithTwo) {
+TEST_F(TemplateCommandTest, RefusalsAreOneLineNamingTheCause) {
   const QString templ = write("t.txt", "x");
-  EXPECT_EQ(run({dir.filePath("missing.txt")}), 2);
-  EXPECT_TRUE(out.isEmpty());
-  EXPECT_TRUE(err.contains(dir.filePath("missing.txt"))) << err.toStdString();
-  EXPECT_EQ(err.count(u'\n'), 1);
-
-  for (const QByteArray& json : {QByteArray("{\"a\": }"), QByteArray("[1, 2]"), QByteArray("")}) {
-    const QString vars = write("bad.json", json);
-    EXPECT_EQ(run({templ, "--vars", vars}), 2) << json.constData();
-    EXPECT_TRUE(err.contains(vars)) << err.toStdString();
-    EXPECT_EQ(err.count(u'\n'), 1) << err.toStdString();
-    EXPECT_TRUE(out.isEmpty());
-  }
-  EXPECT_EQ(run({templ, "--vars", dir.filePath("none.json")}), 2);
-  EXPECT_TRUE(err.contains(dir.filePath("none.json")));
-}
-
-TEST_F(TemplateCommandTest, UnreadableTemplatesGiveNoResult) {
-  EXPECT_EQ(run({write("latin1.txt", QByteArray("Gr\xfc\xdf"
-                                                "e"))}),
-            1);
-  EXPECT_TRUE(out.isEmpty());
-  EXPECT_EQ(run({dir.path()}), 1);  // a folder is no text
-}
-
-TEST_F(TemplateCommandTest, UsageErrorsExitWithTwo) {
-  const QString templ = write("t.txt", "x");
-  for (const QStringList& arguments : {QStringList{}, QStringList{templ, templ}, QStringList{templ, "--vars"},
-                                       QStringList{"--verbose", templ}}) {
-    EXPECT_EQ(run(arguments), 2) << arguments.join(' ').toStdString();
-    EXPECT_TRUE(err.startsWith(QStringLiteral("usage: tessal template"))) << err.toStdString();
+  struct Case {
+    QStringList arguments;
+    int code;  // 2 for what the user typed wrong, 1 when the template gave no result
+    QString says;
+  };
+  const QString bad[] = {write("bad1.json", "{\"a\": }"), write("bad2.json", "[1, 2]"),
+                         write("bad3.json", "")};
+  const Case cases[] = {
+      {{dir.filePath("missing.txt")}, 2, dir.filePath("missing.txt")},
+      {{templ, "--vars", bad[0]}, 2, bad[0]},
+      {{templ, "--vars", bad[1]}, 2, bad[1]},
+      {{templ, "--vars", bad[2]}, 2, bad[2]},
+      {{templ, "--vars", dir.filePath("none.json")}, 2, dir.filePath("none.json")},
+      {{write("latin1.txt", QByteArray("Gr\xfc\xdf"
+                                       "e"))},
+       1,
+       "latin1.txt"},
+      {{dir.path()}, 1, dir.path()},  // a folder is no text
+      {{}, 2, "usage: tessal template"},
+      {{templ, templ}, 2, "usage: tessal template"},
+      {{templ, "--vars"}, 2, "usage: tessal template"},
+      {{"--verbose", templ}, 2, "usage: tessal template"},
+  };
+  for (const Case& c : cases) {
+    const std::string what = c.arguments.join(' ').toStdString();
+    EXPECT_EQ(run(c.arguments), c.code) << what;
+    EXPECT_TRUE(out.isEmpty()) << what;
+    EXPECT_TRUE(err.contains(c.says)) << what << ": " << err.toStdString();
+    EXPECT_EQ(err.count(u'\n'), 1) << what << ": " << err.toStdString();
   }
   EXPECT_EQ(run({"--vars", write("v.json", "{}"), templ}), 0);
   EXPECT_EQ(out, QStringLiteral("x"));
