@@ -1,12 +1,11 @@
 #pragma once
 
+#include <QAbstractItemView>
 #include <QObject>
 #include <QPointer>
 #include <QString>
 
 #include <functional>
-
-class QAbstractItemView;
 
 // Adds a row through a given inserter and starts editing it at once: after the insertion has been
 // arranged and selected (on the next turn of the event loop), the table edits the new row's column
