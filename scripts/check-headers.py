@@ -4,8 +4,8 @@ earlier include happened to bring.
 
 Usage: scripts/check-headers.py BUILD_DIR [FILE...]
 BUILD_DIR is a configured build (any; precompiled headers are stripped from its commands; run its
-*_autogen targets first). Each header is compiled with the flags of a source file in its own folder, or
-of the target that sees the most include folders where its folder has none. A .cpp file named among the
+*_autogen targets first). Each header is compiled with the flags of a source file that includes it, or
+of one in its own folder where nothing includes it. A .cpp file named among the
 FILEs is checked with its own flags. Prints the files that fail; exit status 1 if any does.
 """
 import json
@@ -46,6 +46,13 @@ def main():
     for entry in entries:
         by_folder.setdefault(os.path.dirname(os.path.realpath(entry["file"])), entry)
     widest = max(entries, key=lambda e: len(flags_of(e)))
+    # A header is checked with the flags of a file that includes it: those are the folders it may see.
+    users = {}
+    for entry in entries:
+        with open(entry["file"], errors="replace") as f:
+            for line in f:
+                if line.startswith('#include "'):
+                    users.setdefault(line.split('"')[1], entry)
     headers = sys.argv[2:] or subprocess.run(
         ["git", "-C", root, "ls-files", "*.h"], capture_output=True, text=True, check=True).stdout.split()
     headers = [os.path.realpath(os.path.join(root, h)) for h in headers]
@@ -56,7 +63,7 @@ def main():
             result = subprocess.run(flags_of(entry) + ["-fsyntax-only", header], cwd=entry["directory"],
                                     capture_output=True, text=True)
             return header, result.returncode, result.stderr
-        entry = by_folder.get(os.path.dirname(header), widest)
+        entry = users.get(os.path.basename(header)) or by_folder.get(os.path.dirname(header), widest)
         with tempfile.NamedTemporaryFile("w", suffix=".cpp") as unit:
             unit.write('#include "%s"\n' % header)
             unit.flush()
