@@ -1,8 +1,5 @@
 #include "WTStatusNotifierItem.h"
 
-#include "WTDBusMenu.h"
-#include "WTImages.h"
-
 #include <QCoreApplication>
 #include <QDBusAbstractAdaptor>
 #include <QDBusMetaType>
@@ -10,9 +7,6 @@
 #include <QDBusPendingCallWatcher>
 #include <QDBusPendingReply>
 #include <QDBusServiceWatcher>
-#include <QImage>
-#include <QMenu>
-#include <QtEndian>
 
 #include <atomic>
 
@@ -83,7 +77,7 @@ class WTStatusNotifierItemAdaptor : public QDBusAbstractAdaptor {
   WTStatusNotifierToolTip toolTip() const { return item_->toolTip(); }
   // A click is ours (the task list); the menu is for the other button.
   bool itemIsMenu() const { return false; }
-  QDBusObjectPath menu() const { return QDBusObjectPath(WTDBusMenu::objectPath()); }
+  QDBusObjectPath menu() const { return QDBusObjectPath(WTStatusNotifierItem::menuPath()); }
   QString label() const { return item_->label(); }
   QString labelGuide() const { return item_->labelGuide(); }
   uint orderingIndex() const { return 0; }
@@ -116,44 +110,18 @@ class WTStatusNotifierItemAdaptor : public QDBusAbstractAdaptor {
   WTStatusNotifierItem* item_;
 };
 
-namespace {
-
-// The sizes trays draw at, from a small panel to a large one; the host picks the nearest.
-constexpr int kIconSizes[] = {16, 22, 24, 32, 48};
-
-WTStatusNotifierIconList iconImages(const QString& imageName) {
-  WTStatusNotifierIconList icons;
-  for (int size : kIconSizes) {
-    const QImage image =
-        WTImages::pixmap(imageName, QSize(size, size)).toImage().convertToFormat(QImage::Format_ARGB32);
-    if (image.isNull()) continue;
-    WTStatusNotifierIcon icon{image.width(), image.height(), QByteArray()};
-    icon.pixels.resize(qsizetype(image.width()) * image.height() * 4);
-    auto* out = reinterpret_cast<quint32*>(icon.pixels.data());
-    for (int y = 0; y < image.height(); ++y) {
-      const auto* line = reinterpret_cast<const quint32*>(image.constScanLine(y));
-      for (int x = 0; x < image.width(); ++x) *out++ = qToBigEndian(line[x]);
-    }
-    icons.append(icon);
-  }
-  return icons;
-}
-
-}  // namespace
-
-WTStatusNotifierItem::WTStatusNotifierItem(const QDBusConnection& bus, QMenu* menu, QObject* parent)
-    : QObject(parent), bus_(bus) {
+WTStatusNotifierItem::WTStatusNotifierItem(const QDBusConnection& bus, QObject* menu, QObject* parent)
+    : QObject(parent), bus_(bus), menu_(menu) {
   qDBusRegisterMetaType<WTStatusNotifierIcon>();
   qDBusRegisterMetaType<WTStatusNotifierIconList>();
   qDBusRegisterMetaType<WTStatusNotifierToolTip>();
   adaptor_ = new WTStatusNotifierItemAdaptor(this);
-  dbusMenu_ = std::make_unique<WTDBusMenu>(menu);
 }
 
 WTStatusNotifierItem::~WTStatusNotifierItem() {
   if (!started_ || !bus_.isConnected()) return;
   bus_.unregisterObject(objectPath());
-  bus_.unregisterObject(WTDBusMenu::objectPath());
+  bus_.unregisterObject(menuPath());
   if (nameOwned_) {
     // Sent, not awaited: quitting never waits on the bus. The watcher drops the item with the name.
     QDBusMessage release = QDBusMessage::createMethodCall(
@@ -168,7 +136,7 @@ bool WTStatusNotifierItem::start() {
   if (started_) return true;
   if (!bus_.isConnected()) return false;
   if (!bus_.registerObject(objectPath(), this, QDBusConnection::ExportAdaptors) ||
-      !bus_.registerObject(WTDBusMenu::objectPath(), dbusMenu_.get(), QDBusConnection::ExportAllContents)) {
+      !bus_.registerObject(menuPath(), menu_, QDBusConnection::ExportAllContents)) {
     bus_.unregisterObject(objectPath());
     return false;
   }
@@ -234,10 +202,9 @@ WTStatusNotifierToolTip WTStatusNotifierItem::toolTip() const {
   return WTStatusNotifierToolTip{iconName_, {}, toolTipTitle_, toolTipText_};
 }
 
-void WTStatusNotifierItem::setIcon(const QString& themeName, const QString& imageName) {
-  if (themeName == iconName_ && !iconPixmap_.isEmpty()) return;
+void WTStatusNotifierItem::setIcon(const QString& themeName, const WTStatusNotifierIconList& images) {
   iconName_ = themeName;
-  iconPixmap_ = iconImages(imageName);
+  iconPixmap_ = images;
   emit adaptor_->NewIcon();
 }
 

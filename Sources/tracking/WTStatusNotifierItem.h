@@ -1,17 +1,15 @@
 #pragma once
 
+#include <QByteArray>
 #include <QDBusArgument>
 #include <QDBusConnection>
 #include <QList>
+#include <QMetaType>
 #include <QObject>
 #include <QPoint>
 #include <QString>
 
-#include <memory>
-
 class QDBusServiceWatcher;
-class QMenu;
-class WTDBusMenu;
 class WTStatusNotifierItemAdaptor;
 
 // An image as StatusNotifierItem hosts take it: (iiay), ARGB32 pixels in network byte order.
@@ -45,15 +43,18 @@ Q_DECLARE_METATYPE(WTStatusNotifierToolTip)
 //
 // start() exports the item under "org.kde.StatusNotifierItem-<pid>-<n>" and asks the watcher to show it;
 // a watcher that comes or goes later is followed. Nothing waits: registeredChanged tells the outcome.
-// A click (Activate) is `activated`; the menu is the given QMenu, served as com.canonical.dbusmenu.
+// A click (Activate) is `activated`. The item speaks D-Bus only: its menu and its images are given to it
+// (the interface serves the tray's QMenu as com.canonical.dbusmenu and draws the icons).
 class WTStatusNotifierItem : public QObject {
   Q_OBJECT
  public:
-  // `menu` (not owned) must outlive the item.
-  WTStatusNotifierItem(const QDBusConnection& bus, QMenu* menu, QObject* parent = nullptr);
+  // `menu` (not owned) is exported at menuPath() with its own contents: the object that
+  // answers com.canonical.dbusmenu. It must outlive the item.
+  WTStatusNotifierItem(const QDBusConnection& bus, QObject* menu, QObject* parent = nullptr);
   ~WTStatusNotifierItem() override;
 
   static QString objectPath() { return QStringLiteral("/StatusNotifierItem"); }
+  static QString menuPath() { return QStringLiteral("/MenuBar"); }
   static QString watcherService() { return QStringLiteral("org.kde.StatusNotifierWatcher"); }
 
   // Goes on the bus and registers with the watcher if there is one. False without a bus.
@@ -64,9 +65,9 @@ class WTStatusNotifierItem : public QObject {
   bool isPending() const { return pending_; }
   QString serviceName() const { return serviceName_; }
 
-  // The icon: a name in the desktop's icon theme and an image of ours (SVG in the resources) for when
-  // the theme lacks it.
-  void setIcon(const QString& themeName, const QString& imageName);
+  // The icon: a name in the desktop's icon theme, and our own drawing of it in the sizes trays draw at
+  // for when the theme lacks it.
+  void setIcon(const QString& themeName, const WTStatusNotifierIconList& images);
   // The text beside the icon, and the widest text it will carry, so that the host keeps its width.
   void setLabel(const QString& label, const QString& guide);
   void setToolTip(const QString& title, const QString& text);
@@ -95,7 +96,7 @@ class WTStatusNotifierItem : public QObject {
 
   QDBusConnection bus_;
   WTStatusNotifierItemAdaptor* adaptor_ = nullptr;
-  std::unique_ptr<WTDBusMenu> dbusMenu_;
+  QObject* menu_;
   QDBusServiceWatcher* watcher_ = nullptr;
   QString serviceName_;
   bool started_ = false;

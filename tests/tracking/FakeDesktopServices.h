@@ -3,8 +3,10 @@
 #include <QDBusConnection>
 #include <QDBusContext>
 #include <QDBusMessage>
-#include <QMutex>
+#include <QList>
 #include <QObject>
+#include <QString>
+#include <QVariantMap>
 
 #include <atomic>
 
@@ -59,43 +61,5 @@ class LauncherListener : public QObject {
   void update(const QString& uri, const QVariantMap& props) {
     uris.append(uri);
     properties.append(props);
-  }
-};
-
-// The StatusNotifierWatcher of a desktop's tray: it notes who registered which item, as a host would
-// then go and read it.
-class FakeStatusNotifierWatcher : public QObject, protected QDBusContext {
-  Q_OBJECT
-  Q_CLASSINFO("D-Bus Interface", "org.kde.StatusNotifierWatcher")
- public:
-  // The service names items registered, in order.
-  QStringList registered() const {
-    QMutexLocker lock(&mutex_);
-    return registered_;
-  }
-
- public slots:
-  void RegisterStatusNotifierItem(const QString& service) {
-    QMutexLocker lock(&mutex_);
-    // An item may name itself by its path alone; then it is the sender's.
-    registered_.append(service.startsWith(u'/') ? message().service() : service);
-  }
-
- private:
-  mutable QMutex mutex_;
-  QStringList registered_;
-};
-
-// Hears a tray item's label change.
-class LabelListener : public QObject {
-  Q_OBJECT
- public:
-  QStringList labels;
-  QStringList guides;
-
- public slots:
-  void newLabel(const QString& label, const QString& guide) {
-    labels.append(label);
-    guides.append(guide);
   }
 };

@@ -88,8 +88,21 @@ class TrackingTest : public ModelTest {
 
   QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
 
+  // Ten tasks "T0".."T9"; Tn's last entry ended n hours after 1 March, so T9 ended last. T1 and T4 run.
+  void makeTenTasks() {
+    for (int n = 0; n < 10; ++n) {
+      WTTask* task = makeTask(nullptr, QStringLiteral("T%1").arg(n));
+      makeTime(task, berlin(2026, 3, 1, n), berlin(2026, 3, 1, n, 30));
+      tasks.append(task);
+    }
+    startTimer(tasks[1], berlin(2026, 3, 2, 11));
+    startTimer(tasks[4], berlin(2026, 3, 2, 11, 30));
+    settle();
+  }
+
   SetIdleSource idle;
   ScriptedPresenter presenter;
   std::unique_ptr<WTStopwatchUpdater> updater;
   int ticks = 0;
+  QList<WTTask*> tasks;  // made by makeTenTasks()
 };

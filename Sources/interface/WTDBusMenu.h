@@ -68,7 +68,6 @@ class WTDBusMenu : public QObject {
   // `menu` is not owned.
   explicit WTDBusMenu(QMenu* menu, QObject* parent = nullptr);
 
-  static QString objectPath() { return QStringLiteral("/MenuBar"); }
   static void registerTypes();
 
   uint version() const { return 3; }

@@ -1,9 +1,9 @@
 #include "WTStatusBarPopup.h"
 
 #include "DurationText.h"
-#include "RZLimitedArrayController.h"
 #include "WTImages.h"
 #include "WTProject.h"
+#include "WTRecentTasks.h"
 #include "WTTask.h"
 #include "WTTime.h"
 
@@ -31,7 +31,7 @@ QString elapsedText(const WTTask* task) {
 
 }  // namespace
 
-WTStatusBarPopup::WTStatusBarPopup(RZLimitedArrayController* tasks, QWidget* parent)
+WTStatusBarPopup::WTStatusBarPopup(WTRecentTasks* tasks, QWidget* parent)
     : QFrame(parent, Qt::Popup | Qt::FramelessWindowHint), tasks_(tasks) {
   setObjectName(QStringLiteral("statusBarPopup"));
   setWindowTitle(tr("Tessal — Recent Tasks"));
@@ -53,9 +53,9 @@ WTStatusBarPopup::WTStatusBarPopup(RZLimitedArrayController* tasks, QWidget* par
     emit showMainWindowRequested();
   });
   layout->addWidget(show, 0, Qt::AlignRight);
-  connect(tasks_, &RZLimitedArrayController::arrangedObjectsDidChange, this, [this] {
+  connect(tasks_, &WTRecentTasks::tasksDidChange, this, [this] {
     // An empty list has nothing to offer: the popup goes, as a menu with no items would.
-    if (tasks_->arrangedObjects().isEmpty() && isVisible()) {
+    if (tasks_->tasks().isEmpty() && isVisible()) {
       close();
       return;
     }
@@ -114,7 +114,7 @@ void WTStatusBarPopup::rebuildRows() {
     delete item;
   }
   elapsed_.clear();
-  const QList<WTTask*>& tasks = tasks_->arrangedObjects();
+  const QList<WTTask*>& tasks = tasks_->tasks();
   emptyHint_->setVisible(tasks.isEmpty());
   for (WTTask* task : tasks) {
     auto* row = new QWidget(this);

@@ -1,4 +1,4 @@
-#include "RZLimitedArrayController.h"
+#include "WTRecentTasks.h"
 
 #include "WTObjectContext.h"
 #include "WTTask.h"
@@ -6,23 +6,23 @@
 #include <algorithm>
 #include <optional>
 
-RZLimitedArrayController::RZLimitedArrayController(WTObjectContext* context, int limit, QObject* parent)
+WTRecentTasks::WTRecentTasks(WTObjectContext* context, int limit, QObject* parent)
     : QObject(parent), context_(context), limit_(limit) {
-  connect(context_, &WTObjectContext::objectsDidChange, this, &RZLimitedArrayController::objectsDidChange);
+  connect(context_, &WTObjectContext::objectsDidChange, this, &WTRecentTasks::objectsDidChange);
 }
 
-const QList<WTTask*>& RZLimitedArrayController::arrangedObjects() {
+const QList<WTTask*>& WTRecentTasks::tasks() {
   if (dirty_) rearrangeObjects();
   return arranged_;
 }
 
-void RZLimitedArrayController::setActive(bool active) {
+void WTRecentTasks::setActive(bool active) {
   active_ = active;
-  if (active_ && rearrangeObjects()) emit arrangedObjectsDidChange();
+  if (active_ && rearrangeObjects()) emit tasksDidChange();
 }
 
-void RZLimitedArrayController::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
-                                                const QList<WTObject*>& deleted) {
+void WTRecentTasks::objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
+                                     const QList<WTObject*>& deleted) {
   // Only tasks and their items move a task in this list (a renamed task changes nothing of its place, but
   // its row shows the new name, so it counts as a change too).
   auto concernsTasks = [](const QList<WTObject*>& objects) {
@@ -35,10 +35,10 @@ void RZLimitedArrayController::objectsDidChange(const QList<WTObject*>& inserted
   if (!active_) return;
   rearrangeObjects();
   // Rows show names and buttons that may have changed even where the order did not.
-  emit arrangedObjectsDidChange();
+  emit tasksDidChange();
 }
 
-bool RZLimitedArrayController::rearrangeObjects() {
+bool WTRecentTasks::rearrangeObjects() {
   dirty_ = false;
   struct Candidate {
     WTTask* task;

@@ -2,14 +2,14 @@
 
 #include <QDBusConnection>
 #include <QObject>
-#include <QPointer>
+#include <QRect>
 
 #include <memory>
 
-class QAction;
 class QMenu;
 class QSystemTrayIcon;
-class RZLimitedArrayController;
+class WTDBusMenu;
+class WTRecentTasks;
 class WTObjectContext;
 class WTStatusBarPopup;
 class WTStatusNotifierItem;
@@ -48,7 +48,7 @@ class WTStatusBarController : public QObject {
   // The XEmbed icon, shown only where no StatusNotifierItem watcher took the item.
   QSystemTrayIcon* statusItem() const { return statusItem_; }
   WTStatusNotifierItem* notifierItem() const { return notifierItem_; }
-  RZLimitedArrayController* topTasksArrayController() const { return topTasks_.get(); }
+  WTRecentTasks* recentTasks() const { return recentTasks_.get(); }
 
  signals:
   void showMainWindowRequested();
@@ -62,11 +62,12 @@ class WTStatusBarController : public QObject {
   void checkTray();
 
   WTStopwatchUpdater* updater_;
-  std::unique_ptr<RZLimitedArrayController> topTasks_;
+  std::unique_ptr<WTRecentTasks> recentTasks_;
   WTStatusBarPopup* popup_ = nullptr;  // a window of its own, owned here
   QSystemTrayIcon* statusItem_ = nullptr;
   WTStatusNotifierItem* notifierItem_ = nullptr;
   std::unique_ptr<QMenu> menu_;
+  std::unique_ptr<WTDBusMenu> dbusMenu_;  // menu_ for StatusNotifierItem hosts
   bool activated_ = false;
   bool showingIcon_ = false;
 };

@@ -1,14 +1,17 @@
 #include "WTStatusBarController.h"
 
-#include "RZLimitedArrayController.h"
+#include "WTDBusMenu.h"
 #include "WTImages.h"
+#include "WTRecentTasks.h"
 #include "WTStatusBarPopup.h"
 #include "WTStatusNotifierItem.h"
 #include "WTStopwatchUpdater.h"
 
 #include <QCursor>
+#include <QImage>
 #include <QMenu>
 #include <QSystemTrayIcon>
+#include <QtEndian>
 
 namespace {
 
@@ -20,12 +23,40 @@ struct TrayIcon {
 const TrayIcon kIdleIcon{QStringLiteral("tessal-stopwatch"), QStringLiteral("StopWatch")};
 const TrayIcon kRunningIcon{QStringLiteral("tessal-stopwatch-running"), QStringLiteral("StopWatchRunning")};
 
+// The sizes trays draw at, from a small panel to a large one; the host picks the nearest.
+constexpr int kIconSizes[] = {16, 22, 24, 32, 48};
+
+// Our drawing of an icon as StatusNotifierItem hosts take it.
+WTStatusNotifierIconList notifierImages(const QString& imageName) {
+  WTStatusNotifierIconList icons;
+  for (int size : kIconSizes) {
+    const QImage image =
+        WTImages::pixmap(imageName, QSize(size, size)).toImage().convertToFormat(QImage::Format_ARGB32);
+    if (image.isNull()) continue;
+    WTStatusNotifierIcon icon{image.width(), image.height(), QByteArray()};
+    icon.pixels.resize(qsizetype(image.width()) * image.height() * 4);
+    auto* out = reinterpret_cast<quint32*>(icon.pixels.data());
+    for (int y = 0; y < image.height(); ++y) {
+      const auto* line = reinterpret_cast<const quint32*>(image.constScanLine(y));
+      for (int x = 0; x < image.width(); ++x) *out++ = qToBigEndian(line[x]);
+    }
+    icons.append(icon);
+  }
+  return icons;
+}
+
+// Draws the item's icon only when it changes: a tick must not redraw five images.
+void showNotifierIcon(WTStatusNotifierItem* item, const TrayIcon& icon) {
+  if (item->iconName() == icon.themeName && !item->iconPixmap().isEmpty()) return;
+  item->setIcon(icon.themeName, notifierImages(icon.imageName));
+}
+
 }  // namespace
 
 WTStatusBarController::WTStatusBarController(WTObjectContext* context, WTStopwatchUpdater* updater,
                                              const QDBusConnection& bus, QObject* parent)
-    : QObject(parent), updater_(updater), topTasks_(std::make_unique<RZLimitedArrayController>(context)) {
-  popup_ = new WTStatusBarPopup(topTasks_.get());
+    : QObject(parent), updater_(updater), recentTasks_(std::make_unique<WTRecentTasks>(context)) {
+  popup_ = new WTStatusBarPopup(recentTasks_.get());
   connect(popup_, &WTStatusBarPopup::showMainWindowRequested, this, &WTStatusBarController::showMainWindowRequested);
 
   menu_ = std::make_unique<QMenu>();
@@ -42,8 +73,9 @@ WTStatusBarController::WTStatusBarController(WTObjectContext* context, WTStopwat
     if (reason == QSystemTrayIcon::Trigger || reason == QSystemTrayIcon::DoubleClick) statusBarClicked();
   });
 
-  notifierItem_ = new WTStatusNotifierItem(bus, menu_.get(), this);
-  notifierItem_->setIcon(kIdleIcon.themeName, kIdleIcon.imageName);
+  dbusMenu_ = std::make_unique<WTDBusMenu>(menu_.get());
+  notifierItem_ = new WTStatusNotifierItem(bus, dbusMenu_.get(), this);
+  showNotifierIcon(notifierItem_, kIdleIcon);
   notifierItem_->setToolTip(QStringLiteral("Tessal"), QString());
   connect(notifierItem_, &WTStatusNotifierItem::registeredChanged, this, &WTStatusBarController::checkTray);
   connect(notifierItem_, &WTStatusNotifierItem::activated, this, [this](const QPoint& position) {
@@ -61,6 +93,8 @@ WTStatusBarController::WTStatusBarController(WTObjectContext* context, WTStopwat
 }
 
 WTStatusBarController::~WTStatusBarController() {
+  // The item leaves the bus before the menu it serves goes.
+  delete notifierItem_;
   delete popup_;
 }
 
@@ -94,7 +128,7 @@ void WTStatusBarController::stopwatchDidUpdate() {
 void WTStatusBarController::showRunningTime() {
   const QString total = updater_->badgeLabel();
   const TrayIcon& icon = updater_->times().isEmpty() ? kIdleIcon : kRunningIcon;
-  notifierItem_->setIcon(icon.themeName, icon.imageName);
+  showNotifierIcon(notifierItem_, icon);
   const QIcon image = WTImages::icon(icon.imageName);
   if (statusItem_->icon().cacheKey() != image.cacheKey()) statusItem_->setIcon(image);
   // Beside the icon where the host shows a label; the guide (every digit a zero) keeps the width steady

@@ -8,7 +8,7 @@
 
 class QLabel;
 class QVBoxLayout;
-class RZLimitedArrayController;
+class WTRecentTasks;
 class WTTask;
 
 // The tray's list: the limited controller's tasks, each with its image, name, project, the elapsed time of
@@ -18,7 +18,7 @@ class WTStatusBarPopup : public QFrame {
   Q_OBJECT
  public:
   // `tasks` (not owned) must outlive the popup.
-  explicit WTStatusBarPopup(RZLimitedArrayController* tasks, QWidget* parent = nullptr);
+  explicit WTStatusBarPopup(WTRecentTasks* tasks, QWidget* parent = nullptr);
 
   // Shows the popup beside `anchor` (global coordinates: the tray icon or the button that opened it),
   // below it when there is room, above otherwise, and always inside that screen.
@@ -39,7 +39,7 @@ class WTStatusBarPopup : public QFrame {
  private:
   void rebuildRows();
 
-  RZLimitedArrayController* tasks_;
+  WTRecentTasks* tasks_;
   QVBoxLayout* rows_;
   QWidget* emptyHint_;
   // Each row's task and the label of its elapsed time.

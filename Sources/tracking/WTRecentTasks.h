@@ -13,16 +13,16 @@ class WTTask;
 // While active (the list is on screen) it follows the store and says when the list changed; while not, it
 // only notes that something changed and arranges again when asked, so the store's changes cost nothing
 // while nobody looks.
-class RZLimitedArrayController : public QObject {
+class WTRecentTasks : public QObject {
   Q_OBJECT
  public:
   static constexpr int kDefaultLimit = 5;
 
   // `context` (not owned) must outlive the controller.
-  explicit RZLimitedArrayController(WTObjectContext* context, int limit = kDefaultLimit, QObject* parent = nullptr);
+  explicit WTRecentTasks(WTObjectContext* context, int limit = kDefaultLimit, QObject* parent = nullptr);
 
   // The arranged tasks, arranged afresh first when something changed since.
-  const QList<WTTask*>& arrangedObjects();
+  const QList<WTTask*>& tasks();
   int limit() const { return limit_; }
 
   bool isActive() const { return active_; }
@@ -31,7 +31,7 @@ class RZLimitedArrayController : public QObject {
 
  signals:
   // While active, after a change of the store changed the arranged tasks or their order.
-  void arrangedObjectsDidChange();
+  void tasksDidChange();
 
  private:
   void objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,

@@ -1,0 +1,217 @@
+// The tray's list and popup over the real model and ticker, with real widgets (offscreen).
+#include "FakeTrayHost.h"
+#include "PrivateBus.h"
+#include "TrackingFixture.h"
+#include "WTDBusMenu.h"
+#include "WTImages.h"
+#include "WTStatusBarController.h"
+#include "WTStatusBarPopup.h"
+#include "WTStatusNotifierItem.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <gtest/gtest.h>
+
+#include <QDBusPendingCall>
+#include <QLabel>
+#include <QSignalSpy>
+#include <QSystemTrayIcon>
+#include <QThread>
+#include <QToolButton>
+
+namespace {
+
+class StatusBarTest : public TrackingTest {
+ protected:
+  // Each row of the popup as "TITLE:BUTTON", in order.
+  static QStringList rowsOf(const WTStatusBarPopup& popup) {
+    QStringList rows;
+    for (const QWidget* row : popup.findChildren<QWidget*>(QStringLiteral("taskRow"))) {
+      if (!row->isVisibleTo(&popup)) continue;
+      const QString title = row->findChild<QLabel*>(QStringLiteral("taskTitle"))->text().section(u'\n', 0, 0);
+      rows << title + ":" + row->findChild<QToolButton*>(QStringLiteral("timerButton"))->text();
+    }
+    return rows;
+  }
+};
+
+// A StatusNotifierItem tray on a private bus, its watcher served from a thread of its own.
+class TrayHostTest : public StatusBarTest {
+ protected:
+  void SetUp() override {
+    StatusBarTest::SetUp();
+    ASSERT_FALSE(PrivateBus::instance().address().isEmpty()) << "dbus-daemon did not start";
+    serviceThread.start();
+  }
+  void TearDown() override {
+    PrivateBus::instance().disconnectAll();
+    serviceThread.quit();
+    serviceThread.wait();
+    StatusBarTest::TearDown();
+  }
+
+  QThread serviceThread;
+  FakeStatusNotifierWatcher watcher;
+};
+
+}  // namespace
+
+TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
+  makeTenTasks();
+  WTStatusBarController statusBar(context.get(), updater.get());
+  WTStatusBarPopup& popup = *statusBar.popup();
+  statusBar.statusBarClicked(QRect(600, 0, 24, 24));
+  ASSERT_TRUE(popup.isVisible());
+  EXPECT_EQ(rowsOf(popup), QStringList({"T4:Stop", "T1:Stop", "T9:Start", "T8:Start", "T7:Start"}));
+  EXPECT_GE(popup.y(), 24) << "below the icon it opened from";
+
+  // The button of T8's row starts T8's timer; the list follows with the popup still open.
+  const QList<QToolButton*> buttons = popup.findChildren<QToolButton*>(QStringLiteral("timerButton"));
+  QToolButton* startT8 = nullptr;
+  for (QToolButton* button : buttons)
+    if (button->isVisibleTo(&popup) && rowsOf(popup).size() == 5 &&
+        button->parentWidget()->findChild<QLabel*>(QStringLiteral("taskTitle"))->text() == "T8")
+      startT8 = button;
+  ASSERT_NE(startT8, nullptr);
+  startT8->click();
+  settle();
+  EXPECT_TRUE(tasks[8]->running());
+  EXPECT_EQ(runningTimesOf(tasks[8]).size(), 1);
+  EXPECT_TRUE(popup.isVisible());
+  // Running tasks come first, the latest tracked of them first: T8 last ended after T4 and T1.
+  EXPECT_EQ(rowsOf(popup), QStringList({"T8:Stop", "T4:Stop", "T1:Stop", "T9:Start", "T7:Start"}));
+
+  // A second click on the icon while it is open does nothing; an empty list closes it.
+  statusBar.statusBarClicked(QRect(0, 0, 24, 24));
+  EXPECT_GE(popup.y(), 24);
+  for (WTTask* task : tasks) context->deleteObject(task);
+  settle();
+  EXPECT_FALSE(popup.isVisible());
+}
+
+TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) {
+  WTTask* task = makeTask();
+  WTStatusBarController statusBar(context.get(), updater.get());
+  updater->start();
+  settle();
+  auto iconIs = [&](const char* name) {
+    return statusBar.statusItem()->icon().cacheKey() == WTImages::icon(QLatin1String(name)).cacheKey();
+  };
+  EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal");
+  EXPECT_TRUE(iconIs("StopWatch"));
+  startTimer(task, berlin(2026, 3, 2, 10, 45));  // 75 minutes before the fixture's now
+  settle();
+  EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal — 01:15");
+  EXPECT_TRUE(iconIs("StopWatchRunning"));
+
+  // The list shows the running task's minutes and follows the ticks in place, the rows left as they are.
+  makeTask(nullptr, QStringLiteral("Idle"));
+  statusBar.statusBarClicked(QRect(600, 0, 24, 24));
+  settle();
+  auto labels = [&] {
+    QList<const QLabel*> shown;
+    for (const QLabel* label : statusBar.popup()->findChildren<QLabel*>(QStringLiteral("taskElapsed")))
+      if (label->isVisibleTo(statusBar.popup())) shown << label;
+    return shown;
+  };
+  auto elapsed = [&] {
+    QStringList texts;
+    for (const QLabel* label : labels()) texts << label->text();
+    return texts;
+  };
+  EXPECT_EQ(elapsed(), QStringList({"01:15", ""}));
+  const QList<const QLabel*> before = labels();
+  advance(60);
+  updater->update();
+  settle();
+  EXPECT_EQ(elapsed(), QStringList({"01:16", ""}));
+  EXPECT_EQ(labels(), before);
+
+  task->stopAllTimers();
+  settle();
+  EXPECT_EQ(statusBar.statusItem()->toolTip(), "Tessal");
+  EXPECT_TRUE(iconIs("StopWatch"));
+}
+
+TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeAsItsLabel) {
+  QDBusConnection watcherBus = PrivateBus::instance().connect();
+  watcher.moveToThread(&serviceThread);
+  ASSERT_TRUE(watcherBus.registerObject(QStringLiteral("/StatusNotifierWatcher"), &watcher,
+                                        QDBusConnection::ExportAllSlots));
+  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  WTTask* task = makeTask();
+  startTimer(task, clockNow.addingSeconds(-30 * 60));
+  updater->start();
+  WTStatusBarController statusBar(context.get(), updater.get(), PrivateBus::instance().connect());
+  statusBar.activateStatusMenu();
+  ASSERT_TRUE(waitForBus([&] { return statusBar.isShowingIcon(); })) << "the watcher never took the item";
+  ASSERT_EQ(watcher.registered().size(), 1);
+  const QString item = watcher.registered().front();
+  EXPECT_TRUE(item.startsWith(QStringLiteral("org.kde.StatusNotifierItem-"))) << item.toStdString();
+
+  // The host reads the item as AppIndicator hosts do, and hears its label change.
+  QDBusConnection host = PrivateBus::instance().connect();
+  auto call = [&](const QString& path, const QString& interface, const QString& method,
+                  const QVariantList& args) {
+    QDBusMessage message = QDBusMessage::createMethodCall(item, path, interface, method);
+    message.setArguments(args);
+    QDBusPendingCall pending = host.asyncCall(message);
+    waitForBus([&] { return pending.isFinished(); });
+    return pending.reply();
+  };
+  auto property = [&](const QString& name) {
+    const QDBusMessage reply =
+        call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.freedesktop.DBus.Properties"),
+             QStringLiteral("Get"), {QStringLiteral("org.kde.StatusNotifierItem"), name});
+    return reply.arguments().value(0).value<QDBusVariant>().variant();
+  };
+  LabelListener listener;
+  ASSERT_TRUE(host.connect(item, QStringLiteral("/StatusNotifierItem"),
+                           QStringLiteral("org.kde.StatusNotifierItem"), QStringLiteral("XAyatanaNewLabel"),
+                           &listener, SLOT(newLabel(QString, QString))));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:30"));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabelGuide")).toString(), QStringLiteral("00:00"));
+  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch-running"));
+  const auto icons = qdbus_cast<QList<WTStatusNotifierIcon>>(property(QStringLiteral("IconPixmap")));
+  ASSERT_FALSE(icons.isEmpty());
+  EXPECT_EQ(icons.front().pixels.size(), icons.front().width * icons.front().height * 4);
+
+  advance(60);
+  updater->update();
+  ASSERT_TRUE(waitForBus([&] { return !listener.labels.isEmpty(); }));
+  EXPECT_EQ(listener.labels, QStringList({QStringLiteral("00:31")}));
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:31"));
+
+  task->stopAllTimers();
+  settle();
+  ASSERT_TRUE(waitForBus([&] { return listener.labels.size() >= 2; }));
+  EXPECT_EQ(listener.labels.back(), QString());
+  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QString());
+  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch"));
+
+  // Its menu is the tray menu, and a click on an entry is that entry's.
+  const QDBusMessage layout = call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"),
+                                   QStringLiteral("GetLayout"), {0, -1, QStringList()});
+  ASSERT_EQ(layout.type(), QDBusMessage::ReplyMessage) << layout.errorMessage().toStdString();
+  QStringList labels;
+  for (const WTDBusMenuLayout& entry : qdbus_cast<WTDBusMenuLayout>(layout.arguments().value(1)).children)
+    labels << entry.properties.value(QStringLiteral("label")).toString();
+  EXPECT_EQ(labels, QStringList({"Show Tessal", "Recent Tasks", "", "Quit"}));
+  QSignalSpy showRequested(&statusBar, &WTStatusBarController::showMainWindowRequested);
+  call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"), QStringLiteral("Event"),
+       {1, QStringLiteral("clicked"), QVariant::fromValue(QDBusVariant(QString())), 0u});
+  EXPECT_TRUE(waitForBus([&] { return showRequested.count() == 1; }));
+  // A click on the item opens the list of tasks.
+  call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.kde.StatusNotifierItem"),
+       QStringLiteral("Activate"), {600, 10});
+  EXPECT_TRUE(waitForBus([&] { return statusBar.popup()->isVisible(); }));
+
+  // A tray that restarts (GNOME reloading its extensions) gets the item again.
+  QSignalSpy trayChanged(&statusBar, &WTStatusBarController::trayAvailabilityChanged);
+  ASSERT_TRUE(watcherBus.unregisterService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  ASSERT_TRUE(waitForBus([&] { return !statusBar.isShowingIcon(); }));
+  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  EXPECT_TRUE(waitForBus([&] { return statusBar.isShowingIcon(); }));
+  EXPECT_EQ(watcher.registered(), QStringList({item, item}));
+  EXPECT_EQ(trayChanged.count(), 2);
+}
