@@ -16,7 +16,8 @@ int failure(QTextStream& err, const QString& message) {
 }
 
 QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options) {
-  for (const QString& name : options) parser.addOption(QCommandLineOption(name, QString(), QStringLiteral("value")));
+  for (const QString& name : options)
+    parser.addOption(QCommandLineOption(name, QString(), QStringLiteral("value")));
   parser.setSingleDashWordOptionMode(QCommandLineParser::ParseAsLongOptions);
   if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments)) return parser.errorText();
   if (!parser.positionalArguments().isEmpty())

@@ -142,7 +142,8 @@ Result<T*> named(const QList<T*>& all, const QString& name, const char* kind, co
                   .arg(matches.size())
                   .arg(kinds, quoted(name), names.join(QStringLiteral(", ")));
   } else if (all.isEmpty()) {
-    message = QStringLiteral("no %1 is named %2, and there are no %3").arg(QLatin1String(kind), quoted(name), kinds);
+    message = QStringLiteral("no %1 is named %2, and there are no %3")
+                  .arg(QLatin1String(kind), quoted(name), kinds);
   } else {
     message = QStringLiteral("no %1 is named %2; the %3 are: %4")
                   .arg(QLatin1String(kind), quoted(name), kinds, names.join(QStringLiteral(", ")));
@@ -163,7 +164,8 @@ bool sameName(const QString& a, const QString& b) {
 }  // namespace
 
 Result<WTProject*> project(const WTObjectContext& context, const QString& name) {
-  return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"), describeProject);
+  return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"),
+                          describeProject);
 }
 
 Result<WTClient*> client(const WTObjectContext& context, const QString& name) {
@@ -176,7 +178,8 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
   const QList<WTTask*> candidates = context.fetch<WTTask>([&](const WTTask* task) {
     const WTProject* project = task->project();
     if (!projectName.isNull() && !(project && sameName(project->name(), projectName))) return false;
-    if (!clientName.isNull() && !(project && project->client() && sameName(project->client()->name(), clientName)))
+    if (!clientName.isNull() &&
+        !(project && project->client() && sameName(project->client()->name(), clientName)))
       return false;
     return true;
   });
@@ -190,10 +193,12 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
   QString kinds = QStringLiteral("tasks");
   if (!projectName.isNull()) kinds += QStringLiteral(" of projects named %1").arg(quoted(projectName));
   if (!clientName.isNull())
-    kinds += QStringLiteral("%1 of clients named %2").arg(projectName.isNull() ? "" : ",", quoted(clientName));
+    kinds +=
+        QStringLiteral("%1 of clients named %2").arg(projectName.isNull() ? "" : ",", quoted(clientName));
   return named<WTTask>(candidates, name, "task", kinds, [](const WTTask* task) {
-    return task->project() ? QStringLiteral("%1 in %2").arg(quoted(task->name()), describeProject(task->project()))
-                           : quoted(task->name());
+    return task->project()
+               ? QStringLiteral("%1 in %2").arg(quoted(task->name()), describeProject(task->project()))
+               : quoted(task->name());
   });
 }
 
@@ -276,8 +281,9 @@ Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name,
 
 QString label(const WTTask& task) {
   const QString project = task.project() && !task.project()->name().isEmpty() ? task.project()->name()
-                                                                                : QStringLiteral("(untitled)");
-  return QStringLiteral("%1 › %2").arg(project, task.name().isEmpty() ? QStringLiteral("(untitled)") : task.name());
+                                                                              : QStringLiteral("(untitled)");
+  return QStringLiteral("%1 › %2").arg(project,
+                                       task.name().isEmpty() ? QStringLiteral("(untitled)") : task.name());
 }
 
 }  // namespace WTNamedRecords

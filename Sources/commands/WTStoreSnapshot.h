@@ -21,10 +21,12 @@ class WTStoreSnapshot {
  public:
   // Reads the user's store; on failure writes why to `err` as "tessal: MESSAGE" and gives none.
   // `tasks` as WTStore::loadAll takes them.
-  static std::unique_ptr<WTStoreSnapshot> open(QTextStream& err, WTStore::Records which = WTStore::Records::All,
+  static std::unique_ptr<WTStoreSnapshot> open(QTextStream& err,
+                                               WTStore::Records which = WTStore::Records::All,
                                                const QStringList& tasks = {});
   // Reads the store at `path` with `defaults` (taken over).
-  static Result<std::unique_ptr<WTStoreSnapshot>> open(const QString& path, std::unique_ptr<UserDefaults> defaults,
+  static Result<std::unique_ptr<WTStoreSnapshot>> open(const QString& path,
+                                                       std::unique_ptr<UserDefaults> defaults,
                                                        WTStore::Records which = WTStore::Records::All,
                                                        const QStringList& tasks = {});
   ~WTStoreSnapshot();

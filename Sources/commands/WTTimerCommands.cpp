@@ -154,7 +154,8 @@ WTCommandOutcome failure(const QString& message) {
 
 // Every running entry, oldest first.
 QList<WTTime*> runningTimes(const WTObjectContext& context) {
-  QList<WTTime*> running = context.fetch<WTTime>([](const WTTime* time) { return time->running() && time->task(); });
+  QList<WTTime*> running =
+      context.fetch<WTTime>([](const WTTime* time) { return time->running() && time->task(); });
   std::sort(running.begin(), running.end(), [](const WTTime* a, const WTTime* b) {
     return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
   });
@@ -185,8 +186,9 @@ WTCommandOutcome start(WTObjectContext& context, const Arguments& arguments) {
   task->toggleTimer();
   for (const WTTime* time : runningBefore) {
     if (!time->running())
-      out += QStringLiteral("Stopped %1  %2\n")
-                 .arg(WTNamedRecords::label(*time->task()), DurationText::stringWithMinutes(time->duration()));
+      out +=
+          QStringLiteral("Stopped %1  %2\n")
+              .arg(WTNamedRecords::label(*time->task()), DurationText::stringWithMinutes(time->duration()));
   }
   out += QStringLiteral("Started %1\n").arg(WTNamedRecords::label(*task));
   return {0, out, {}};
@@ -195,7 +197,8 @@ WTCommandOutcome start(WTObjectContext& context, const Arguments& arguments) {
 WTCommandOutcome stop(WTObjectContext& context, const Arguments& arguments) {
   const WTTask* only = nullptr;
   if (!arguments.task.isNull()) {
-    const Result<WTTask*> found = WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client);
+    const Result<WTTask*> found =
+        WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client);
     if (!found) return failure(found.error().message);
     only = found.value();
   }

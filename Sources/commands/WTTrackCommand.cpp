@@ -4,9 +4,9 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
+#include "WTCSVExport.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
-#include "WTCSVExport.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTRangePredicate.h"
@@ -65,8 +65,8 @@ Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
 // Only the records the command needs are read; what changes is saved and written to the sync journal, as
 // the desktop copy would have done, so that the next sync sends it. A command that may make records makes
 // the store when there is none, filled as the desktop copy fills a store it makes.
-int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments, QTextStream& out,
-               QTextStream& err) {
+int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments,
+               QTextStream& out, QTextStream& err) {
   const bool storeIsNew = !QFileInfo::exists(storePath);
   if (storeIsNew && !WTTimerCommands::createsRecords(command, arguments)) {
     // The read-only opening says what is missing in the words every command uses.
@@ -105,7 +105,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   return print(outcome, out, err);
 }
 
-int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
+int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out,
+                       QTextStream& err) {
   const QString storePath = WTStoreSetup::storePath();
   // The lock lives beside the store: a command that may make the store makes its folder first.
   if (WTTimerCommands::createsRecords(command, arguments)) QDir().mkpath(QFileInfo(storePath).path());
@@ -119,18 +120,21 @@ int runChangingCommand(const QString& command, const QStringList& arguments, QTe
         desktop.sendRequest(WTTimerCommands::request(command, arguments), kWriterWaitMs);
     if (forwarded.reached) {
       if (forwarded.reply) return print(WTCommandOutcome::fromJson(*forwarded.reply), out, err);
-      return failure(err, QStringLiteral("the running Tessal did not answer; the change may not have been made"));
+      return failure(err,
+                     QStringLiteral("the running Tessal did not answer; the change may not have been made"));
     }
     if (!QFileInfo::exists(QFileInfo(storePath).path()))
       return failure(err, WTStore::openReadOnly(storePath).error().message);
     QThread::msleep(5);
   } while (!deadline.hasExpired());
-  return failure(err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
+  return failure(
+      err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
 }
 
 }  // namespace
 
-int runTrackCommand(const QString& command, const QStringList& arguments, QTextStream& out, QTextStream& err) {
+int runTrackCommand(const QString& command, const QStringList& arguments, QTextStream& out,
+                    QTextStream& err) {
   if (std::optional<WTCommandOutcome> problem = WTTimerCommands::checkArguments(command, arguments))
     return print(*problem, out, err);
   if (WTTimerCommands::changesData(command)) return runChangingCommand(command, arguments, out, err);
@@ -147,7 +151,8 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
   parser.addOption(QCommandLineOption(QStringLiteral("project"), QString(), QStringLiteral("name")));
   parser.addOption(QCommandLineOption(QStringLiteral("client"), QString(), QStringLiteral("name")));
   parser.addOption(QCommandLineOption(QStringLiteral("qualified")));
-  static const QStringList kinds = {QStringLiteral("tasks"), QStringLiteral("projects"), QStringLiteral("clients")};
+  static const QStringList kinds = {QStringLiteral("tasks"), QStringLiteral("projects"),
+                                    QStringLiteral("clients")};
   QString problem;
   if (!parser.parse(QStringList{QStringLiteral("tessal")} + arguments))
     problem = parser.errorText();
@@ -172,7 +177,8 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     // Qualified, every task has a name of its own that start and stop take back: what a picker needs.
     const bool qualified = parser.isSet(QStringLiteral("qualified"));
     for (const WTTask* task : context.fetch<WTTask>())
-      if (projectPasses(task->project())) names.append(qualified ? WTNamedRecords::label(*task) : task->name());
+      if (projectPasses(task->project()))
+        names.append(qualified ? WTNamedRecords::label(*task) : task->name());
   } else if (kind == QLatin1String("projects")) {
     for (const WTProject* project : context.fetch<WTProject>())
       if (projectPasses(project)) names.append(project->name());
@@ -180,7 +186,8 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     for (const WTClient* client : context.fetch<WTClient>()) names.append(client->name());
   }
   names.removeAll(QString());
-  std::sort(names.begin(), names.end(), [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+  std::sort(names.begin(), names.end(),
+            [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
   names.erase(std::unique(names.begin(), names.end()), names.end());
   for (const QString& name : names) {
     // One name a line: a line break inside a name would read as two.
@@ -194,7 +201,8 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
 int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   constexpr char kUsage[] = "usage: tessal log [--range RANGE] [--project NAME]\n";
   QCommandLineParser parser;
-  QString problem = WTCommandArguments::parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project")});
+  QString problem =
+      WTCommandArguments::parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project")});
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("today");
   const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
@@ -214,12 +222,12 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   Decimal cost;
   for (const WTTime* time : times) {
     const QDateTime start = time->startDate() ? time->startDate()->toQDateTime().toLocalTime() : QDateTime();
-    const QString end = time->running()      ? QStringLiteral("now  ")
-                        : time->endDate()    ? time->endDate()->toQDateTime().toLocalTime().toString(u"HH:mm")
-                                             : QStringLiteral("     ");
+    const QString end = time->running()   ? QStringLiteral("now  ")
+                        : time->endDate() ? time->endDate()->toQDateTime().toLocalTime().toString(u"HH:mm")
+                                          : QStringLiteral("     ");
     const QString task = time->task() ? WTNamedRecords::label(*time->task()) : QStringLiteral("(no task)");
-    out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         ")) << "–"
-        << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
+    out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         "))
+        << "–" << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
         << MoneyFormat::format(time->cost()) << '\n';
     minutes += time->duration();
     cost += time->cost();

@@ -57,7 +57,8 @@ WTStatusBarController::WTStatusBarController(WTObjectContext* context, WTStopwat
                                              const QDBusConnection& bus, QObject* parent)
     : QObject(parent), updater_(updater), recentTasks_(std::make_unique<WTRecentTasks>(context)) {
   popup_ = new WTStatusBarPopup(recentTasks_.get());
-  connect(popup_, &WTStatusBarPopup::showMainWindowRequested, this, &WTStatusBarController::showMainWindowRequested);
+  connect(popup_, &WTStatusBarPopup::showMainWindowRequested, this,
+          &WTStatusBarController::showMainWindowRequested);
 
   menu_ = std::make_unique<QMenu>();
   menu_->addAction(tr("Show Tessal"), this, &WTStatusBarController::showMainWindowRequested);
@@ -139,7 +140,8 @@ void WTStatusBarController::showRunningTime() {
   notifierItem_->setLabel(total, guide);
   notifierItem_->setToolTip(QStringLiteral("Tessal"), total);
   // XEmbed trays show no text beside an icon: there the running time is in the tooltip only.
-  statusItem_->setToolTip(total.isEmpty() ? QStringLiteral("Tessal") : QStringLiteral("Tessal — %1").arg(total));
+  statusItem_->setToolTip(total.isEmpty() ? QStringLiteral("Tessal")
+                                          : QStringLiteral("Tessal — %1").arg(total));
   popup_->updateElapsedTimes();
 }
 

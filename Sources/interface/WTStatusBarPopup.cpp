@@ -76,8 +76,10 @@ void WTStatusBarPopup::popUp(const QRect& anchor) {
   const QRect available = screen ? screen->availableGeometry() : QRect(anchor.topLeft(), size());
   QPoint position(anchor.left(), anchor.bottom() + 1);
   if (position.y() + height() > available.bottom()) position.setY(anchor.top() - height());
-  position.setX(std::clamp(position.x(), available.left(), std::max(available.left(), available.right() - width())));
-  position.setY(std::clamp(position.y(), available.top(), std::max(available.top(), available.bottom() - height())));
+  position.setX(
+      std::clamp(position.x(), available.left(), std::max(available.left(), available.right() - width())));
+  position.setY(
+      std::clamp(position.y(), available.top(), std::max(available.top(), available.bottom() - height())));
   move(position);
   show();
   raise();
@@ -122,7 +124,8 @@ void WTStatusBarPopup::rebuildRows() {
     auto* layout = new QHBoxLayout(row);
     layout->setContentsMargins(2, 2, 2, 2);
     auto* image = new QLabel(row);
-    image->setPixmap(WTImages::pixmap(task->tableImage(), QSize(kImageSize, kImageSize), devicePixelRatioF()));
+    image->setPixmap(
+        WTImages::pixmap(task->tableImage(), QSize(kImageSize, kImageSize), devicePixelRatioF()));
     layout->addWidget(image);
     const QString project = task->project() ? task->project()->name() : QString();
     auto* title = new QLabel(row);
