@@ -284,8 +284,7 @@ void HttpListener::accept() {
     }
     auto connection = std::make_unique<Connection>(
         fd, text,
-        HttpRequestParser::Limits{limits_.maxBodyBytes, limits_.maxHeaderBytes, limits_.maxHeaderLine,
-                                  limits_.maxHeaderCount});
+        limits_.request);
     connection->deadline = Clock::now() + limits_.idleTimeout;
     connections_[fd] = std::move(connection);
     epoll_event event{};

@@ -40,10 +40,7 @@ HttpReply textReply(int status, const std::string& text);
 class HttpListener {
  public:
   struct Limits {
-    size_t maxBodyBytes = 32u << 20;
-    size_t maxHeaderBytes = 64u << 10;  // request line and headers together
-    size_t maxHeaderLine = 8u << 10;
-    size_t maxHeaderCount = 100;
+    HttpRequestParser::Limits request;  // the sizes a request may have
     std::chrono::milliseconds requestTimeout{10000};  // from the first byte to the end of the body
     std::chrono::milliseconds idleTimeout{5000};      // a kept-alive connection between requests
     std::chrono::milliseconds writeTimeout{10000};

@@ -55,7 +55,7 @@ bool SyncServer::start(std::string& error) {
     return false;
   }
   HttpListener::Limits limits = options_.limits;
-  limits.maxBodyBytes = options_.maxBodyBytes;
+  limits.request.maxBodyBytes = options_.maxBodyBytes;
   auto http = std::make_unique<HttpListener>(
       limits, std::max(options_.threads, 2), [this](const HttpRequest& request) { return route(request); },
       &SyncServer::refusal);

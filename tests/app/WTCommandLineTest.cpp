@@ -121,7 +121,7 @@ bool waitUntil(Condition condition, int milliseconds) {
 // store come first, and the keyring is asked only for an account.
 TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
   using fakesecrets::FakeSecretService;
-  const QString address = fakesecrets::PrivateSessionBus::instance().address();
+  const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
   FakeSecretService keyring;
   ASSERT_TRUE(keyring.start(address));
@@ -158,7 +158,7 @@ TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForA
 // store, and nothing else is said; a keyring that does not answer costs a few seconds and is named.
 TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
   using fakesecrets::FakeSecretService;
-  const QString address = fakesecrets::PrivateSessionBus::instance().address();
+  const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
   FakeSecretService keyring;
   ASSERT_TRUE(keyring.start(address));

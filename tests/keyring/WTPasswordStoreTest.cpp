@@ -303,7 +303,7 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
 // last.
 TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsUpTheStore) {
   using fakesecrets::FakeSecretService;
-  const QString address = fakesecrets::PrivateSessionBus::instance().address();
+  const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
   ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
   FakeSecretService service;

@@ -5,6 +5,8 @@
 // prompt being dismissed, never answered or answered late. Secrets travel in the "plain" session.
 // QtDBus hands the calls over on a thread of its own, and the service answers prompts from another, so a
 // client may wait for it on the main thread.
+#include "PrivateBus.h"
+
 #include <QDBusArgument>
 #include <QDBusConnection>
 #include <QDBusMessage>
@@ -12,11 +14,8 @@
 #include <QDBusObjectPath>
 #include <QDBusVariant>
 #include <QDBusVirtualObject>
-#include <QFile>
 #include <QMap>
 #include <QMutex>
-#include <QProcess>
-#include <QTemporaryDir>
 #include <QThread>
 #include <QTimer>
 #include <QUuid>
@@ -53,46 +52,6 @@ Q_DECLARE_METATYPE(fakesecrets::Secret)
 namespace fakesecrets {
 
 using Secrets = QMap<QDBusObjectPath, Secret>;
-
-// A dbus-daemon of the process's own, started on first use and gone with the process. One for the
-// whole process: GLib keeps its connection to the session bus, and libsecret its service, for good.
-class PrivateSessionBus {
- public:
-  static PrivateSessionBus& instance() {
-    static PrivateSessionBus bus;
-    return bus;
-  }
-  QString address() const { return address_; }
-
- private:
-  PrivateSessionBus() {
-    const QString config = dir_.filePath(QStringLiteral("bus.conf"));
-    QFile file(config);
-    if (file.open(QIODevice::WriteOnly)) {
-      file.write(
-          QStringLiteral(
-              "<busconfig><type>session</type><listen>unix:dir=%1</listen>"
-              "<policy context=\"default\"><allow send_destination=\"*\"/><allow receive_sender=\"*\"/>"
-              "<allow own=\"*\"/>"
-              "</policy></busconfig>")
-              .arg(dir_.path())
-              .toUtf8());
-      file.close();
-    }
-    daemon_.start(QStringLiteral("dbus-daemon"),
-                  {QStringLiteral("--config-file=") + config, QStringLiteral("--nofork"),
-                   QStringLiteral("--print-address")});
-    if (daemon_.waitForStarted(5000) && daemon_.waitForReadyRead(5000))
-      address_ = QString::fromUtf8(daemon_.readLine()).trimmed();
-  }
-  ~PrivateSessionBus() {
-    daemon_.kill();
-    daemon_.waitForFinished(2000);
-  }
-  QTemporaryDir dir_;
-  QProcess daemon_;
-  QString address_;
-};
 
 class FakeSecretService final : public QDBusVirtualObject {
  public:
