@@ -1,13 +1,12 @@
 // Tessal's tray icon in a real tray: an X server (Xvfb), a tray host (trayer) and the real desktop copy,
 // driven as a user would, with the pointer and the keyboard.
 #include "CommandLineInstallation.h"
+#include "PrivateXServer.h"
 #include "WTTask.h"
 #include "WTTime.h"
 
 #include <gtest/gtest.h>
 
-#include <QCoreApplication>
-#include <QDir>
 #include <QElapsedTimer>
 #include <QStandardPaths>
 #include <QThread>
@@ -39,41 +38,42 @@ class TrayTest : public ::testing::Test {
   void SetUp() override {
     for (const char* tool : {"Xvfb", "trayer", "xdotool"})
       if (QStandardPaths::findExecutable(tool).isEmpty()) GTEST_SKIP() << tool << " is not installed";
-    // A display number nobody uses.
-    for (int number = 100 + int(QCoreApplication::applicationPid() % 400); number < 1000; ++number) {
-      if (!QFile::exists(QStringLiteral("/tmp/.X11-unix/X%1").arg(number)) &&
-          !QFile::exists(QStringLiteral("/tmp/.X%1-lock").arg(number))) {
-        display = QStringLiteral(":%1").arg(number);
-        break;
-      }
-    }
-    xvfb.start("Xvfb", {display, "-screen", "0", "1280x800x24", "-nolisten", "tcp"});
-    ASSERT_TRUE(waitFor([&] { return QFile::exists("/tmp/.X11-unix/X" + display.mid(1)); })) << "Xvfb did not start";
+    ASSERT_TRUE(x.running()) << "Xvfb did not start";
   }
   void TearDown() override {
     if (tessal) {
       tessal->kill();
       tessal->waitForFinished();
     }
-    for (QProcess* process : {&tray, &xvfb}) {
-      process->kill();
-      process->waitForFinished();
-    }
+    tray.kill();
+    tray.waitForFinished();
   }
 
-  QProcessEnvironment x11() const {
-    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert("DISPLAY", display);
-    return environment;
+  void startTray() {
+    tray.setProcessEnvironment(x.environment());
+    tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
+    ASSERT_TRUE(tray.waitForStarted());
   }
-  // Runs xdotool on the test's display; its output.
-  QString xdotool(const QStringList& arguments) const {
-    QProcess process;
-    process.setProcessEnvironment(x11());
-    process.start("xdotool", arguments);
-    process.waitForFinished(10000);
-    return QString::fromUtf8(process.readAllStandardOutput()).trimmed();
+  // The desktop copy writes to a file: a pipe nobody reads while the test polls would stop it once full.
+  void launchTessal() {
+    tessal = std::make_unique<QProcess>();
+    tessal->setProcessEnvironment(here.environment({{"DISPLAY", x.display()}, {"QT_QPA_PLATFORM", "xcb"}}));
+    tessal->setProcessChannelMode(QProcess::MergedChannels);
+    tessal->setStandardOutputFile(here.path("tessal.log"));
+    tessal->start(QString::fromUtf8(TESSAL_EXE), {});
+    ASSERT_TRUE(tessal->waitForStarted());
   }
+  // What the desktop copy said and whether it still runs, for a failure's message.
+  std::string tessalState() const {
+    QFile log(here.path("tessal.log"));
+    const QString said = log.open(QIODevice::ReadOnly) ? QString::fromUtf8(log.readAll()) : QString();
+    return (tessal->state() == QProcess::Running
+                ? QStringLiteral("Tessal runs; it said: ")
+                : QStringLiteral("Tessal ended (%1); it said: ").arg(tessal->exitCode()))
+        .append(said)
+        .toStdString();
+  }
+  QString xdotool(const QStringList& arguments) const { return x.xdotool(arguments); }
   // The first visible window of the desktop copy whose name matches `pattern` and that `fits`.
   std::optional<Geometry> window(const QString& pattern,
                                  const std::function<bool(const Geometry&)>& fits = [](const Geometry&) { return true; }) const {
@@ -94,8 +94,8 @@ class TrayTest : public ::testing::Test {
   }
 
   Installation here;
-  QString display;
-  QProcess xvfb, tray;
+  PrivateXServer x;
+  QProcess tray;
   std::unique_ptr<QProcess> tessal;
 };
 
@@ -111,18 +111,16 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
     }
     ASSERT_TRUE(context->save());
   }
-  tray.setProcessEnvironment(x11());
-  tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
-  ASSERT_TRUE(tray.waitForStarted());
+  ASSERT_NO_FATAL_FAILURE(startTray());
   QThread::msleep(300);  // the tray claims its selection before Tessal looks for one
-  tessal = here.launch({}, {{"DISPLAY", display}, {"QT_QPA_PLATFORM", "xcb"}});
-  ASSERT_TRUE(tessal->waitForStarted());
+  ASSERT_NO_FATAL_FAILURE(launchTessal());
 
   // The icon is a small window of Tessal's inside the tray's strip at the top right.
   std::optional<Geometry> icon;
   // (The main window is called Tessal too, until the first tick adds the running time.)
   auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
-  ASSERT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); })) << "no icon in the tray";
+  ASSERT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); }))
+      << "no icon in the tray; " << tessalState();
   EXPECT_LE(icon->y + icon->height, 28);
   EXPECT_GE(icon->x, 1280 - 28 * 2);
 
@@ -143,18 +141,17 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
 
 TEST_F(TrayTest, ATrayThatAppearsLaterGetsTheIconAtTheNextTick) {
   // No store yet: the desktop copy makes it, with the first project's task.
-  tessal = here.launch({}, {{"DISPLAY", display}, {"QT_QPA_PLATFORM", "xcb"}});
-  ASSERT_TRUE(tessal->waitForStarted());
+  ASSERT_NO_FATAL_FAILURE(launchTessal());
   auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
-  ASSERT_TRUE(waitFor([&] { return window("^Tessal", [](const Geometry& g) { return g.width > 64; }).has_value(); }))
-      << "the main window did not open";
+  ASSERT_TRUE(waitFor([&] {
+    return window("^Tessal", [](const Geometry& g) { return g.width > 64; }).has_value();
+  })) << "the main window did not open; "
+      << tessalState();
   EXPECT_FALSE(window("^Tessal$", iconSized).has_value());
 
   // As when a desktop's tray extension loads after the applications of the session.
-  tray.setProcessEnvironment(x11());
-  tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
-  ASSERT_TRUE(tray.waitForStarted());
+  ASSERT_NO_FATAL_FAILURE(startTray());
   std::optional<Geometry> icon;
   EXPECT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); }, 12000))
-      << "no icon within two ticks of the tray's arrival";
+      << "no icon within two ticks of the tray's arrival; " << tessalState();
 }

@@ -1,60 +1,20 @@
 #include "WTIdleSourceChain.h"
 #include "WTX11IdleSource.h"
 
+#include "PrivateXServer.h"
+
 #include <gtest/gtest.h>
 
-#include <QCoreApplication>
-#include <QDir>
-#include <QFile>
-#include <QProcess>
-#include <QStandardPaths>
 #include <QThread>
 
 namespace {
 
-// A private X server for the length of one test, on a display number nobody uses.
-class PrivateXServer {
- public:
-  PrivateXServer() {
-    if (QStandardPaths::findExecutable(QStringLiteral("Xvfb")).isEmpty()) return;
-    for (int number = 300 + int(QCoreApplication::applicationPid() % 300); number < 1000; ++number) {
-      if (QFile::exists(QStringLiteral("/tmp/.X11-unix/X%1").arg(number)) ||
-          QFile::exists(QStringLiteral("/tmp/.X%1-lock").arg(number))) {
-        continue;
-      }
-      display = QByteArray(":") + QByteArray::number(number);
-      server.start(QStringLiteral("Xvfb"),
-                   {QString::fromLatin1(display), QStringLiteral("-nolisten"), QStringLiteral("tcp"),
-                    QStringLiteral("-screen"), QStringLiteral("0"), QStringLiteral("320x240x24")});
-      server.waitForStarted(5000);
-      break;
-    }
-    for (int i = 0; i < 100 && server.state() == QProcess::Running; ++i) {
-      if (QFile::exists(QStringLiteral("/tmp/.X11-unix/X") + QString::fromLatin1(display.mid(1)))) return;
-      QThread::msleep(50);
-    }
-    display.clear();
-  }
-  ~PrivateXServer() {
-    server.terminate();
-    server.waitForFinished(5000);
-  }
-  bool running() const { return !display.isEmpty(); }
-
-  // Moves the pointer as a user would, through the server's test extension.
-  bool movePointer(int x, int y) const {
-    QProcess xdotool;
-    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert(QStringLiteral("DISPLAY"), QString::fromLatin1(display));
-    xdotool.setProcessEnvironment(environment);
-    xdotool.start(QStringLiteral("xdotool"),
-                  {QStringLiteral("mousemove"), QString::number(x), QString::number(y)});
-    return xdotool.waitForFinished(10000) && xdotool.exitCode() == 0;
-  }
-
-  QByteArray display;
-  QProcess server;
-};
+// Moves the pointer as a user would, through the server's test extension.
+bool movePointer(const PrivateXServer& x, int px, int py) {
+  x.xdotool({QStringLiteral("mousemove"), QString::number(px), QString::number(py)});
+  return x.xdotool({QStringLiteral("getmouselocation")})
+      .startsWith(QStringLiteral("x:%1 y:%2").arg(px).arg(py));
+}
 
 class Unknowing final : public WTIdleSource {
  public:
@@ -66,23 +26,23 @@ class Unknowing final : public WTIdleSource {
 };
 
 TEST(X11IdleSourceTest, TheServersCounterGrowsWithoutInputAndRestartsWithIt) {
-  PrivateXServer x;
+  PrivateXServer x(QStringLiteral("320x240x24"));
   if (!x.running()) GTEST_SKIP() << "no Xvfb to start";
-  WTX11IdleSource source(x.display);
+  WTX11IdleSource source(x.display().toLatin1());
   ASSERT_TRUE(source.isAvailable());
-  ASSERT_TRUE(x.movePointer(10, 10));
+  ASSERT_TRUE(movePointer(x, 10, 10));
   QThread::msleep(2200);
   const qint64 idle = source.idleSeconds();
   EXPECT_GE(idle, 2);
   EXPECT_LT(idle, 60);
-  ASSERT_TRUE(x.movePointer(100, 100));
+  ASSERT_TRUE(movePointer(x, 100, 100));
   EXPECT_EQ(source.idleSeconds(), 0);
 
   // In a chain, a source that does not know hands over to the next.
   auto* first = new Unknowing;
   WTIdleSourceChain chain;
   chain.append(std::unique_ptr<WTIdleSource>(first));
-  chain.append(std::make_unique<WTX11IdleSource>(x.display));
+  chain.append(std::make_unique<WTX11IdleSource>(x.display().toLatin1()));
   EXPECT_EQ(chain.idleSeconds(), 0);
   EXPECT_EQ(first->asked, 1);
 }

@@ -1,0 +1,60 @@
+#!/usr/bin/env python3
+"""Lines and branches one coverage report (scripts/coverage.sh) covers and another does not.
+
+usage: coverage-compare.py BEFORE.json AFTER.json
+Exits 1 when AFTER misses something BEFORE covered in a line that still holds the same text, so code that
+was deleted or moved is listed apart and does not count as lost.
+"""
+import json
+import sys
+from pathlib import Path
+
+
+def covered(report):
+    lines, branches = {}, {}
+    for entry in json.loads(Path(report).read_text())["files"]:
+        name = entry["file"]
+        for line in entry["lines"]:
+            if line.get("gcovr/noncode"):
+                continue
+            number = line["line_number"]
+            if line["count"] > 0:
+                lines.setdefault(name, set()).add(number)
+            for index, branch in enumerate(line.get("branches", [])):
+                if branch["count"] > 0:
+                    branches.setdefault(name, set()).add((number, index))
+    return lines, branches
+
+
+def main():
+    before_lines, before_branches = covered(sys.argv[1])
+    after_lines, after_branches = covered(sys.argv[2])
+    lost = 0
+    for name in sorted(set(before_lines) | set(before_branches)):
+        path = Path(name)
+        text = path.read_text(errors="replace").splitlines() if path.exists() else None
+        missing_lines = sorted(before_lines.get(name, set()) - after_lines.get(name, set()))
+        missing_branches = sorted(before_branches.get(name, set()) - after_branches.get(name, set()))
+        if not missing_lines and not missing_branches:
+            continue
+        if text is None:
+            print(f"{name}: gone (deleted or moved)")
+            continue
+        for number in missing_lines:
+            lost += 1
+            source = text[number - 1].strip() if number <= len(text) else "?"
+            print(f"{name}:{number}: line no longer covered: {source}")
+        for number, index in missing_branches:
+            if number in missing_lines:
+                continue
+            lost += 1
+            source = text[number - 1].strip() if number <= len(text) else "?"
+            print(f"{name}:{number}: branch {index} no longer taken: {source}")
+    total = lambda sets: sum(len(s) for s in sets.values())
+    print(f"before: {total(before_lines)} lines, {total(before_branches)} branches covered; "
+          f"after: {total(after_lines)} lines, {total(after_branches)} branches; {lost} lost")
+    return 1 if lost else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
