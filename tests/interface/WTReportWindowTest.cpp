@@ -1,4 +1,4 @@
-#include "../model/ModelFixture.h"
+#include "ModelFixture.h"
 
 #include "LogCapture.h"
 #include "WTCustomRangeDialog.h"
