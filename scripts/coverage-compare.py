@@ -1,7 +1,9 @@
 #!/usr/bin/env python3
 """Lines and branches one coverage report (scripts/coverage.sh) covers and another does not.
 
-usage: coverage-compare.py BEFORE.json AFTER.json
+usage: coverage-compare.py BEFORE.json AFTER.json [OTHER.json...]
+What the OTHER reports cover counts as covered after (the suites of other test binaries, when AFTER is
+the report of some binaries only).
 Exits 1 when AFTER misses something BEFORE covered in a line that still holds the same text, so code that
 was deleted or moved is listed apart and does not count as lost.
 """
@@ -29,6 +31,12 @@ def covered(report):
 def main():
     before_lines, before_branches = covered(sys.argv[1])
     after_lines, after_branches = covered(sys.argv[2])
+    for other in sys.argv[3:]:
+        other_lines, other_branches = covered(other)
+        for name, numbers in other_lines.items():
+            after_lines.setdefault(name, set()).update(numbers)
+        for name, pairs in other_branches.items():
+            after_branches.setdefault(name, set()).update(pairs)
     lost = 0
     for name in sorted(set(before_lines) | set(before_branches)):
         path = Path(name)
