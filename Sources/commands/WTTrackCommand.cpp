@@ -75,6 +75,7 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   // A few records change and a failed save is reported at once: no need to read the whole file first.
   Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
   if (!store) return failure(err, store.error().message);
+  store.value()->keepLogOnClose();
   WTStore::Records which = WTStore::Records::Timers;
   QStringList tasks;
   if (const QString name = WTTimerCommands::taskWithItems(command, arguments); !name.isNull()) {

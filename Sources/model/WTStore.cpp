@@ -442,6 +442,8 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   return store;
 }
 
+void WTStore::keepLogOnClose() { sqlite3_db_config(db_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr); }
+
 Result<void> WTStore::prepareStatements() {
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
       {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},

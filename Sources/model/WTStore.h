@@ -55,6 +55,12 @@ class WTStore {
 
   QString path() const { return path_; }
 
+  // For a process that saves once and ends (a command): its close leaves the write-ahead log as it is
+  // instead of folding it into the file, which costs two more waits for the disk on every command. The
+  // log is as durable as the file; SQLite folds it in as it grows, and a process that closes without
+  // this (the desktop copy) folds in what is left.
+  void keepLogOnClose();
+
   enum class Records {
     All,
     // The clients, projects and tasks, and of the items only the running time entries: all that starting
