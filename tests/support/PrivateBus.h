@@ -10,6 +10,8 @@
 #include <QThread>
 #include <QUuid>
 
+#include <gtest/gtest.h>
+
 #include <functional>
 
 // A private bus daemon for the binary: no test touches the developer's session or system bus. It has no
@@ -73,3 +75,32 @@ inline bool waitForBus(const std::function<bool()>& done, int ms = 3000) {
   }
   return done();
 }
+
+// A test over the private bus, with a thread that serves the test's own services so that a caller
+// blocking on a reply is still answered. `Base` is the suite's own fixture.
+template <class Base>
+class PrivateBusTest : public Base {
+ protected:
+  void SetUp() override {
+    Base::SetUp();
+    ASSERT_FALSE(PrivateBus::instance().address().isEmpty()) << "dbus-daemon did not start";
+    serviceThread.start();
+  }
+  void TearDown() override {
+    PrivateBus::instance().disconnectAll();
+    serviceThread.quit();
+    serviceThread.wait();
+    Base::TearDown();
+  }
+  // Serves `service` at `path` under the well-known `name`, from the service thread.
+  template <class Service>
+  void serve(Service& service, const QString& name, const QString& path) {
+    QDBusConnection bus = PrivateBus::instance().connect();
+    ASSERT_TRUE(bus.isConnected());
+    service.moveToThread(&serviceThread);
+    ASSERT_TRUE(bus.registerObject(path, &service, QDBusConnection::ExportAllSlots));
+    ASSERT_TRUE(bus.registerService(name));
+  }
+
+  QThread serviceThread;
+};

@@ -13,28 +13,8 @@
 namespace {
 
 // Services registered by the test under the desktop's real names, served from a thread of their own.
-class DesktopBusTest : public TrackingTest {
+class DesktopBusTest : public PrivateBusTest<TrackingTest> {
  protected:
-  void SetUp() override {
-    TrackingTest::SetUp();
-    ASSERT_FALSE(PrivateBus::instance().address().isEmpty()) << "dbus-daemon did not start";
-    serviceThread.start();
-  }
-  void TearDown() override {
-    PrivateBus::instance().disconnectAll();
-    serviceThread.quit();
-    serviceThread.wait();
-    TrackingTest::TearDown();
-  }
-
-  template <class Service>
-  void serve(Service& service, const QString& name, const QString& path) {
-    QDBusConnection bus = PrivateBus::instance().connect();
-    ASSERT_TRUE(bus.isConnected());
-    service.moveToThread(&serviceThread);
-    ASSERT_TRUE(bus.registerObject(path, &service, QDBusConnection::ExportAllSlots));
-    ASSERT_TRUE(bus.registerService(name));
-  }
   void serveMutter() {
     serve(mutter, QStringLiteral("org.gnome.Mutter.IdleMonitor"),
           QStringLiteral("/org/gnome/Mutter/IdleMonitor/Core"));
@@ -44,7 +24,6 @@ class DesktopBusTest : public TrackingTest {
           QStringLiteral("/org/freedesktop/ScreenSaver"));
   }
 
-  QThread serviceThread;
   FakeMutterIdleMonitor mutter;
   FakeScreenSaver screenSaver;
 };

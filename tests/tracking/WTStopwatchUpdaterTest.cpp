@@ -125,60 +125,37 @@ TEST_F(TrackingTest, RunningSetFollowsRestartsOfSavedEntriesDeletionAndUndo) {
   EXPECT_EQ(updater->times(), QList<WTTime*>{undone});
 }
 
-TEST_F(TrackingTest, IdleThresholdIsTheMinutesSettingOrFiveMinutesWhenZeroOrLess) {
-  struct Case {
-    int minutes;
-    qint64 below;
-    qint64 at;
-  };
-  for (const Case& c : {Case{0, 299, 300}, Case{-4, 299, 300}, Case{2, 119, 120}, Case{10, 599, 600}}) {
-    SCOPED_TRACE(c.minutes);
-    turnIdleHandlingOn(c.minutes);
-    presenter.shown.clear();
-    WTTask* task = makeTask();
-    startTimer(task, clockNow.addingSeconds(-3600));
-    idle.seconds = c.below;
-    updater->start();
-    updater->update();
-    EXPECT_TRUE(presenter.shown.empty());
-    idle.seconds = c.at;
-    updater->update();
-    EXPECT_EQ(presenter.shown.size(), 1u);
-    task->stopAllTimers();
-    settle();
-  }
-}
+// Whether a tick asks about idle time: only with the handling on, something running and the desktop's
+// idle seconds at the threshold (the minutes setting, five when zero or less). Answered "No", the entry
+// runs on with the idle time in it, and the next tick asks again.
+struct IdleRow {
+  const char* name;
+  std::optional<bool> shouldIdle;  // unset: the registered default, off
+  int minutes;
+  qint64 idleSeconds;  // -1: the idle source failed
+  bool running;
+  bool asks;
+};
 
-TEST_F(TrackingTest, NoIdleQuestionWhenHandlingIsOffNothingRunsOrTheIdleTimeIsUnknown) {
+class IdleQuestionTest : public TrackingTest, public ::testing::WithParamInterface<IdleRow> {};
+
+TEST_P(IdleQuestionTest, AsksOnlyAtTheThresholdAndNoKeepsTheIdleTime) {
+  const IdleRow& row = GetParam();
+  if (row.shouldIdle) defaults->setValue(QStringLiteral("WTShouldIdle"), *row.shouldIdle);
+  defaults->setValue(QStringLiteral("WTIdleTime"), row.minutes);
   WTTask* task = makeTask();
-  idle.seconds = 100000;
+  WTTime* time = row.running ? startTimer(task, clockNow.addingSeconds(-3600)) : nullptr;
+  idle.seconds = row.idleSeconds;
+  presenter.answers = {Answer::Default};
   updater->start();
-  startTimer(task, clockNow.addingSeconds(-3600));
   settle();
-  EXPECT_TRUE(presenter.shown.empty()) << "\"WTShouldIdle\" is off until the user turns it on";
-  defaults->setValue(QStringLiteral("WTShouldIdle"), false);
-  updater->update();
-  EXPECT_TRUE(presenter.shown.empty());
-
-  defaults->setValue(QStringLiteral("WTShouldIdle"), true);
-  idle.seconds = -1;
-  updater->update();
-  EXPECT_TRUE(presenter.shown.empty()) << "an idle source that failed asks nothing";
-
-  idle.seconds = 100000;
-  task->stopAllTimers();
-  settle();
-  const int asked = idle.asked;
-  updater->update();
-  EXPECT_TRUE(presenter.shown.empty());
-  EXPECT_EQ(idle.asked, asked) << "with nothing running the desktop is not even asked";
-}
-
-TEST_F(TrackingTest, IdleAlertTextsAndButtons) {
-  turnIdleHandlingOn(5);
-  startTimer(makeTask(), clockNow.addingSeconds(-3600));
-  idle.seconds = 659;
-  updater->start();
+  if (!row.asks) {
+    EXPECT_TRUE(presenter.shown.empty());
+    if (!row.running) {
+      EXPECT_EQ(idle.asked, 0) << "with nothing running the desktop is not even asked";
+    }
+    return;
+  }
   ASSERT_EQ(presenter.shown.size(), 1u);
   const WTTrackingAlert& alert = presenter.shown.front();
   EXPECT_EQ(alert.messageText, QStringLiteral("Idle time"));
@@ -186,8 +163,37 @@ TEST_F(TrackingTest, IdleAlertTextsAndButtons) {
             QStringLiteral("Would you like to substract the idle time and restart the timers?"));
   EXPECT_EQ(alert.defaultButton, QStringLiteral("No"));
   EXPECT_EQ(alert.alternateButton, QStringLiteral("Yes"));
+  EXPECT_TRUE(time->running());
+  EXPECT_FALSE(time->endDate());
+  EXPECT_EQ(task->times().size(), 1);
+  EXPECT_EQ(updater->totalActiveDuration(), 60);
+  advance(5);
+  updater->update();
+  EXPECT_EQ(presenter.shown.size(), 2u);
+}
 
-  // A translation that shows the minutes gets the whole minutes of the idle time.
+INSTANTIATE_TEST_SUITE_P(Rows, IdleQuestionTest,
+                         ::testing::Values(IdleRow{"ZeroMeansFiveBelow", true, 0, 299, true, false},
+                                           IdleRow{"ZeroMeansFiveAt", true, 0, 300, true, true},
+                                           IdleRow{"NegativeMeansFiveBelow", true, -4, 299, true, false},
+                                           IdleRow{"NegativeMeansFiveAt", true, -4, 300, true, true},
+                                           IdleRow{"TwoBelow", true, 2, 119, true, false},
+                                           IdleRow{"TwoAt", true, 2, 120, true, true},
+                                           IdleRow{"TenBelow", true, 10, 599, true, false},
+                                           IdleRow{"TenAt", true, 10, 600, true, true},
+                                           IdleRow{"OffUntilTurnedOn", std::nullopt, 5, 100000, true, false},
+                                           IdleRow{"TurnedOff", false, 5, 100000, true, false},
+                                           IdleRow{"IdleSourceFailed", true, 5, -1, true, false},
+                                           IdleRow{"NothingRuns", true, 5, 100000, false, false}),
+                         [](const ::testing::TestParamInfo<IdleRow>& info) {
+                           return std::string(info.param.name);
+                         });
+
+// A translation that shows the minutes gets the whole minutes of the idle time.
+TEST_F(TrackingTest, TheIdleQuestionCanNameTheMinutes) {
+  turnIdleHandlingOn(5);
+  startTimer(makeTask(), clockNow.addingSeconds(-3600));
+  idle.seconds = 659;
   class Translator final : public QTranslator {
    public:
     QString translate(const char*, const char* source, const char*, int) const override {
@@ -197,29 +203,10 @@ TEST_F(TrackingTest, IdleAlertTextsAndButtons) {
     bool isEmpty() const override { return false; }
   } translator;
   QCoreApplication::installTranslator(&translator);
-  updater->update();
-  QCoreApplication::removeTranslator(&translator);
-  ASSERT_EQ(presenter.shown.size(), 2u);
-  EXPECT_EQ(presenter.shown.back().messageText, QStringLiteral("Untätig seit 10 Minuten"));
-}
-
-TEST_F(TrackingTest, AnsweringNoKeepsTheIdleTimeAndAsksAgainAtTheNextTick) {
-  turnIdleHandlingOn(5);
-  WTTask* task = makeTask();
-  WTTime* time = startTimer(task, clockNow.addingSeconds(-3600));
-  idle.seconds = 900;
-  presenter.answers = {Answer::Default};
   updater->start();
-  settle();
+  QCoreApplication::removeTranslator(&translator);
   ASSERT_EQ(presenter.shown.size(), 1u);
-  EXPECT_TRUE(time->running());
-  EXPECT_FALSE(time->endDate());
-  EXPECT_EQ(task->times().size(), 1);
-  EXPECT_EQ(updater->totalActiveDuration(), 60);
-
-  advance(5);
-  updater->update();
-  EXPECT_EQ(presenter.shown.size(), 2u);
+  EXPECT_EQ(presenter.shown.back().messageText, QStringLiteral("Untätig seit 10 Minuten"));
 }
 
 TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestartsEachTaskOnce) {
