@@ -6,8 +6,6 @@
 #include <QColor>
 #include <QDateTime>
 
-#include <unicode/locid.h>
-
 namespace {
 
 class FilterTest : public TemplateTest {
@@ -17,18 +15,7 @@ class FilterTest : public TemplateTest {
   }
 };
 
-// Date texts depend on the locale: fix it before any test.
-const bool kLocaleFixed = [] {
-  UErrorCode status = U_ZERO_ERROR;
-  icu::Locale::setDefault(icu::Locale("en_US"), status);
-  return U_SUCCESS(status);
-}();
-
-TEST_F(FilterTest, CaseFiltersWorkOnTheValuesText) {
-  EXPECT_EQ(filtered(12, QStringLiteral("uppercase")), QStringLiteral("12"));
-  EXPECT_EQ(filtered(true, QStringLiteral("uppercase")), QStringLiteral("1"));
-  EXPECT_EQ(filtered(QStringLiteral("Straße"), QStringLiteral("uppercase")), QStringLiteral("STRASSE"));
-  EXPECT_EQ(filtered(QStringLiteral("ÀB c"), QStringLiteral("lowercase")), QStringLiteral("àb c"));
+TEST(FilterFunctions, CapitalizedStartsEveryWord) {
   struct Case {
     const char* text;
     const char* capitalized;
@@ -41,26 +28,6 @@ TEST_F(FilterTest, CaseFiltersWorkOnTheValuesText) {
               QString::fromUtf8(c.capitalized))
         << c.text;
   }
-  EXPECT_EQ(filtered(QStringLiteral("a b"), QStringLiteral("capitalized")), QStringLiteral("A B"));
-}
-
-TEST_F(FilterTest, DateFormatNeedsADateAndOnePattern) {
-  ASSERT_TRUE(kLocaleFixed);
-  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
-  const QVariant date =
-      QVariant::fromValue(Date::fromQDateTime(QDateTime(QDate(2024, 3, 31), QTime(22, 30), Qt::UTC)));
-  const QVariantMap vars{{"d", date}, {"t", QStringLiteral("text")}};
-  // 22:30 UTC is already 1 April in Berlin (summer time).
-  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"dd.MM.yyyy HH:mm\" }}"), vars),
-            QStringLiteral("01.04.2024 00:30"));
-  EXPECT_EQ(render(QStringLiteral("{{ d | date_format:'EEE, d MMM' }}"), vars), QStringLiteral("Mon, 1 Apr"));
-  EXPECT_EQ(render(QStringLiteral("{{ t | date_format: yyyy }}"), vars), QStringLiteral("text"));
-  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: yyyy MM }}|{{ d | date_format }}"), vars),
-            QStringLiteral("2024-03-31 22:30:00 +0000|2024-03-31 22:30:00 +0000"));
-  const QDateTime qt(QDate(2024, 12, 24), QTime(8, 0), Qt::UTC);
-  EXPECT_EQ(render(QStringLiteral("{{ q | date_format: \"yyyy-MM-dd\" }}"), {{"q", qt}}),
-            QStringLiteral("2024-12-24"));
-  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
 }
 
 TEST_F(FilterTest, DateTextsOfOneDayComeFromTheRightDay) {
@@ -89,7 +56,7 @@ TEST_F(FilterTest, DateTextsOfOneDayComeFromTheRightDay) {
   RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
 }
 
-TEST_F(FilterTest, OnlyPatternsOfDayFieldsShareADaysText) {
+TEST(FilterFunctions, OnlyPatternsOfDayFieldsShareADaysText) {
   for (const char* pattern : {"yyyy-MM-dd", "EEEE d. MMMM y 'um' QQQ", "w/W D F g e c", "'HH:mm' yy"}) {
     EXPECT_TRUE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
   }
