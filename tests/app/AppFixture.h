@@ -6,11 +6,13 @@
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
+#include "WTMainWindowController.h"
 
 #include <gtest/gtest.h>
 
 #include <QStringList>
 #include <QTemporaryDir>
+#include <QTest>
 
 #include <memory>
 
@@ -54,4 +56,25 @@ class AppTest : public ::testing::Test {
   QByteArray previousData;
   std::unique_ptr<UserDefaults> defaults;
   RecordingPresenter presenter;
+};
+
+// The main window over its own delegate, shown; opened again by open() after a reset.
+class WindowTest : public AppTest {
+ protected:
+  void TearDown() override {
+    window.reset();
+    delegate.reset();
+    AppTest::TearDown();
+  }
+  void open() {
+    if (!delegate) delegate = makeDelegate();
+    window = std::make_unique<WTMainWindowController>(*delegate);
+    window->show();
+    window->activateWindow();
+    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+  }
+  QAction* action(const char* name) { return window->findChild<QAction*>(name); }
+
+  std::unique_ptr<WTAppDelegate> delegate;
+  std::unique_ptr<WTMainWindowController> window;
 };

@@ -1,8 +1,12 @@
 #pragma once
 // One installation of Tessal for tests that run the real `tessal` executable as a user's shell would:
 // a separate process with its own data, settings and runtime folders and no display.
+#include "WTClient.h"
 #include "WTObjectContext.h"
+#include "WTProject.h"
 #include "WTStore.h"
+#include "WTTask.h"
+#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
@@ -50,9 +54,17 @@ class Installation {
     }
     return context;
   }
+  // What the store file holds now, read as a later run of `tessal` would read it.
+  std::unique_ptr<WTObjectContext> readStore() const {
+    auto context = std::make_unique<WTObjectContext>();
+    auto store = WTStore::openReadOnly(storePath());
+    EXPECT_TRUE(store && context->attachStore(std::move(store.value())));
+    return context;
+  }
   // `tessal` with `arguments`, started but not waited for; `extra` adds to or replaces what the process
   // inherits.
-  std::unique_ptr<QProcess> launch(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
+  std::unique_ptr<QProcess> launch(const QStringList& arguments,
+                                   const QMap<QString, QString>& extra = {}) const {
     auto process = std::make_unique<QProcess>();
     process->setProcessEnvironment(environment(extra));
     process->start(QString::fromUtf8(TESSAL_EXE), arguments);
@@ -97,5 +109,26 @@ class Installation {
  private:
   QTemporaryDir home_;
 };
+
+// Records as a user makes them.
+inline WTProject* project(WTObjectContext& context, const QString& name, WTClient* client = nullptr) {
+  auto* project = WTProject::insertNewObject(&context);
+  project->setName(name);
+  project->setClient(client);
+  return project;
+}
+inline WTTask* task(WTObjectContext& context, WTProject* project, const QString& name) {
+  auto* task = WTTask::insertNewObject(&context);
+  task->setName(name);
+  task->setProject(project);
+  return task;
+}
+inline WTTime* addTime(WTObjectContext& context, WTTask* task, Date start, Date end) {
+  auto* time = WTTime::insertNewObject(&context);
+  time->setTask(task);
+  time->setStartDate(start);
+  time->setEndDate(end);
+  return time;
+}
 
 }  // namespace commandtest

@@ -1,8 +1,5 @@
 // The bash completion the package installs, run by a real bash against the real `tessal` and store.
 #include "CommandLineInstallation.h"
-#include "WTClient.h"
-#include "WTProject.h"
-#include "WTTask.h"
 
 #include <gtest/gtest.h>
 
@@ -30,33 +27,20 @@ class BashCompletion : public ::testing::Test {
     acme->setName("Acme Corp");
     auto* other = WTClient::insertNewObject(context.get());
     other->setName("Other");
-    auto project = [&](const QString& name, WTClient* client) {
-      auto* project = WTProject::insertNewObject(context.get());
-      project->setName(name);
-      project->setClient(client);
-      return project;
-    };
-    auto task = [&](WTProject* project, const QString& name) {
-      auto* task = WTTask::insertNewObject(context.get());
-      task->setName(name);
-      task->setProject(project);
-    };
-    WTProject* atlas = project("Atlas", acme);
-    WTProject* beacon = project("Beacon", other);
-    task(atlas, "Build \"it\" now");
-    task(atlas, "Design");
-    task(beacon, "Build pipeline");
-    task(beacon, "Fix: it's late");
+    using commandtest::project;
+    using commandtest::task;
+    WTProject* atlas = project(*context, "Atlas", acme);
+    WTProject* beacon = project(*context, "Beacon", other);
+    task(*context, atlas, "Build \"it\" now");
+    task(*context, atlas, "Design");
+    task(*context, beacon, "Build pipeline");
+    task(*context, beacon, "Fix: it's late");
     ASSERT_TRUE(context->save());
   }
 
-  // What completing the last of `words` (after "tessal") offers, one a line, in order.
-  QStringList complete(const QStringList& words) const {
-    return completeAsBash("tessal " + words.join(' '), words, words.last());
-  }
-  // The same for the typed `line` as bash hands it over: cut into `words` (also at '=' and ':', quotes
-  // kept), and `replaced`, the end of the last word readline puts the completion in place of (after a
-  // quote still open, without the quote).
+  // What completing the typed `line` offers, sorted: bash hands it over cut into `words` (also at '=' and
+  // ':', quotes kept), and `replaced`, the end of the last word readline puts the completion in place of
+  // (after a quote still open, without the quote).
   QStringList completeAsBash(const QString& line, const QStringList& words, const QString& replaced) const {
     QProcess bash;
     QProcessEnvironment environment = here.environment();
@@ -83,63 +67,66 @@ class BashCompletion : public ::testing::Test {
 
 }  // namespace
 
-TEST_F(BashCompletion, OffersCommandsOptionsAndValues) {
+// Commands, options and values; names quoted so the shell reads them back, narrowed by the options already
+// typed and matched in any case. Readline puts a completion in place of its own part of the word only
+// (after an open quote, after "--option=" or after a colon): what it puts there must finish the word.
+TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
   makeStore();
-  EXPECT_EQ(complete({"st"}), QStringList({"start", "status", "stop"}));
-  EXPECT_EQ(complete({"report", "--"}),
-            QStringList({"--client", "--mode", "--out", "--project", "--template"}));
-  EXPECT_EQ(complete({"export", "--range", "last-"}), QStringList({"last-month", "last-week", "last-year"}));
-  EXPECT_EQ(complete({"report", "--mode", ""}), QStringList({"0", "1", "2", "3"}));
-  EXPECT_EQ(complete({"list", "p"}), QStringList({"projects"}));
-  EXPECT_EQ(complete({"a"}), QStringList({"add"}));
-  EXPECT_EQ(complete({"add", "--"}), QStringList({"--client", "--create", "--date", "--note", "--project"}));
-  EXPECT_EQ(complete({"add", "--date", "y"}), QStringList({"yesterday"}));
-  EXPECT_EQ(complete({"add", "Design", "0:45", "--c"}), QStringList({"--client", "--create"}));
-  EXPECT_EQ(complete({"start", "--c"}), QStringList({"--client", "--create"}));
-}
-
-TEST_F(BashCompletion, NamesComeQuotedAndNarrowedByTheOptionsAlreadyTyped) {
-  makeStore();
-  // A name with spaces and quotes becomes one word the shell reads back as the name.
-  EXPECT_EQ(complete({"start", "Build"}), QStringList({"Build\\ \\\"it\\\"\\ now", "Build\\ pipeline"}));
-  EXPECT_EQ(complete({"start", "Build\\ \\\""}), QStringList({"Build\\ \\\"it\\\"\\ now"}));
-  EXPECT_EQ(complete({"start", "--project", "atlas", "B"}), QStringList({"Build\\ \\\"it\\\"\\ now"}));
-  EXPECT_EQ(complete({"stop", "--client", "\"Acme Corp\"", "Bu"}), QStringList({"Build\\ \\\"it\\\"\\ now"}));
-  EXPECT_EQ(complete({"start", "Design", ""}), QStringList()) << "one task a command";
-  EXPECT_EQ(complete({"report", "--client", "A"}), QStringList({"Acme\\ Corp"}));
-  EXPECT_EQ(complete({"report", "--client", "Other", "--project", ""}), QStringList({"Beacon"}));
-  // Names are matched in any case, as tessal itself matches them, and come back as they are spelt.
-  EXPECT_EQ(complete({"start", "build\\ p"}), QStringList({"Build\\ pipeline"}));
-  EXPECT_EQ(complete({"report", "--client", "ACME"}), QStringList({"Acme\\ Corp"}));
-}
-
-// Readline puts a completion in place of its own part of the word only: after an open quote, after
-// "--option=" or after a colon. What it puts there must finish the word so that it reads as the name.
-TEST_F(BashCompletion, FinishesWordsBegunInQuotesAfterAnEqualsSignOrAColon) {
-  makeStore();
-  EXPECT_EQ(completeAsBash("tessal start \"Bu", {"start", "\"Bu"}, "Bu"),
-            QStringList({"Build \\\"it\\\" now", "Build pipeline"}))
-      << "inside double quotes only \\ \" $ ` are escaped";
-  EXPECT_EQ(completeAsBash("tessal start 'Fix: it", {"start", "'Fix: it"}, "Fix: it"),
-            QStringList({"Fix: it'\\''s late"}));
-  EXPECT_EQ(completeAsBash("tessal start Fix:", {"start", "Fix", ":"}, ""), QStringList({"\\ it\\'s\\ late"}))
-      << "\"Fix:\" stays on the line";
-  EXPECT_EQ(
-      completeAsBash("tessal start --project=beacon B", {"start", "--project", "=", "beacon", "B"}, "B"),
-      QStringList({"Build\\ pipeline"}));
-  EXPECT_EQ(completeAsBash("tessal report --client=Other --project=",
-                           {"report", "--client", "=", "Other", "--project", "="}, ""),
-            QStringList({"Beacon"}));
-  EXPECT_EQ(completeAsBash("tessal start fix:", {"start", "fix", ":"}, ""), QStringList({"\\ it\\'s\\ late"}))
-      << "\"fix:\" stays as typed; tessal reads it in any case";
-  EXPECT_EQ(completeAsBash("tessal start \"bu", {"start", "\"bu"}, "bu"),
-            QStringList({"Build \\\"it\\\" now", "Build pipeline"}));
-  EXPECT_EQ(completeAsBash("tessal export --range=this-", {"export", "--range", "=", "this-"}, "this-"),
-            QStringList({"this-month", "this-week", "this-year"}));
+  const struct {
+    QStringList words;
+    QStringList offered;
+    const char* line = nullptr;      // null: "tessal " and the words
+    const char* replaced = nullptr;  // null: the last word
+  } cases[] = {
+      {{"st"}, {"start", "status", "stop"}},
+      {{"report", "--"}, {"--client", "--mode", "--out", "--project", "--template"}},
+      {{"export", "--range", "last-"}, {"last-month", "last-week", "last-year"}},
+      {{"report", "--mode", ""}, {"0", "1", "2", "3"}},
+      {{"list", "p"}, {"projects"}},
+      {{"a"}, {"add"}},
+      {{"add", "--"}, {"--client", "--create", "--date", "--note", "--project"}},
+      {{"add", "--date", "y"}, {"yesterday"}},
+      {{"add", "Design", "0:45", "--c"}, {"--client", "--create"}},
+      {{"start", "--c"}, {"--client", "--create"}},
+      {{"start", "Build"}, {"Build\\ \\\"it\\\"\\ now", "Build\\ pipeline"}},
+      {{"start", "Build\\ \\\""}, {"Build\\ \\\"it\\\"\\ now"}},
+      {{"start", "--project", "atlas", "B"}, {"Build\\ \\\"it\\\"\\ now"}},
+      {{"stop", "--client", "\"Acme Corp\"", "Bu"}, {"Build\\ \\\"it\\\"\\ now"}},
+      {{"start", "Design", ""}, {}},  // one task a command
+      {{"report", "--client", "A"}, {"Acme\\ Corp"}},
+      {{"report", "--client", "Other", "--project", ""}, {"Beacon"}},
+      {{"start", "build\\ p"}, {"Build\\ pipeline"}},
+      {{"report", "--client", "ACME"}, {"Acme\\ Corp"}},
+      // Inside double quotes only \ " $ ` are escaped.
+      {{"start", "\"Bu"}, {"Build \\\"it\\\" now", "Build pipeline"}, "tessal start \"Bu", "Bu"},
+      {{"start", "'Fix: it"}, {"Fix: it'\\''s late"}, "tessal start 'Fix: it", "Fix: it"},
+      // "Fix:" stays on the line as typed; tessal reads it in any case.
+      {{"start", "Fix", ":"}, {"\\ it\\'s\\ late"}, "tessal start Fix:", ""},
+      {{"start", "fix", ":"}, {"\\ it\\'s\\ late"}, "tessal start fix:", ""},
+      {{"start", "--project", "=", "beacon", "B"},
+       {"Build\\ pipeline"},
+       "tessal start --project=beacon B",
+       "B"},
+      {{"report", "--client", "=", "Other", "--project", "="},
+       {"Beacon"},
+       "tessal report --client=Other --project=",
+       ""},
+      {{"start", "\"bu"}, {"Build \\\"it\\\" now", "Build pipeline"}, "tessal start \"bu", "bu"},
+      {{"export", "--range", "=", "this-"},
+       {"this-month", "this-week", "this-year"},
+       "tessal export --range=this-",
+       "this-"},
+  };
+  for (const auto& c : cases) {
+    const QString line = c.line ? QString::fromUtf8(c.line) : "tessal " + c.words.join(' ');
+    EXPECT_EQ(completeAsBash(line, c.words, c.replaced ? QString::fromUtf8(c.replaced) : c.words.last()),
+              c.offered)
+        << line.toStdString();
+  }
 }
 
 TEST_F(BashCompletion, WithoutAStoreOffersNoNamesAndSaysNothing) {
-  EXPECT_EQ(complete({"start", ""}), QStringList());
-  EXPECT_EQ(complete({"report", "--project", ""}), QStringList());
+  EXPECT_EQ(completeAsBash("tessal start ", {"start", ""}, ""), QStringList());
+  EXPECT_EQ(completeAsBash("tessal report --project ", {"report", "--project", ""}, ""), QStringList());
   EXPECT_FALSE(QFileInfo::exists(here.storePath()));
 }

@@ -15,31 +15,18 @@
 
 namespace {
 
-class WTHelpMenuTest : public AppTest {
+class WTHelpMenuTest : public WindowTest {
  protected:
   void SetUp() override {
-    AppTest::SetUp();
-    presenter.quitAnyway = true;
-    delegate = makeDelegate();
-    window = std::make_unique<WTMainWindowController>(*delegate);
-    window->show();
-    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
+    WindowTest::SetUp();
+    open();
   }
-  void TearDown() override {
-    window.reset();
-    delegate.reset();
-    AppTest::TearDown();
-  }
-  QAction* action(const char* name) { return window->findChild<QAction*>(name); }
   static bool lists(const QList<WTHelpDialogs::Shortcut>& all, const QString& menu, const QString& command,
                     const QString& keys) {
     return std::any_of(all.begin(), all.end(), [&](const WTHelpDialogs::Shortcut& shortcut) {
       return shortcut.menu == menu && shortcut.action == command && shortcut.keys == keys;
     });
   }
-
-  std::unique_ptr<WTAppDelegate> delegate;
-  std::unique_ptr<WTMainWindowController> window;
 };
 
 TEST_F(WTHelpMenuTest, AboutNamesTheBuiltVersionAndTheLicence) {

@@ -1,11 +1,7 @@
 // `tessal report` and `tessal export` as a user's shell runs them: the real executable over a real store
 // file, without a display, beside a desktop copy or not.
 #include "CommandLineInstallation.h"
-#include "WTClient.h"
-#include "WTProject.h"
 #include "WTSingleInstance.h"
-#include "WTTask.h"
-#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
@@ -14,13 +10,17 @@
 
 namespace {
 
+using commandtest::addTime;
 using commandtest::Installation;
 using commandtest::Outcome;
+using commandtest::project;
+using commandtest::task;
 
 const QMap<QString, QString> kBerlin = {{"TZ", "Europe/Berlin"}, {"LANG", "C.UTF-8"}};
 
 Date berlin(int month, int day, int hour, int minute = 0) {
-  return Date::fromQDateTime(QDateTime(QDate(2026, month, day), QTime(hour, minute), QTimeZone("Europe/Berlin")));
+  return Date::fromQDateTime(
+      QDateTime(QDate(2026, month, day), QTime(hour, minute), QTimeZone("Europe/Berlin")));
 }
 
 QByteArray bytesOf(const QString& path) {
@@ -39,39 +39,18 @@ class ReportCommand : public ::testing::Test {
     acme->setRate(Decimal::fromString(u"80"));
     auto* other = WTClient::insertNewObject(context.get());
     other->setName("Other");
-    atlas = project("Atlas", acme);
-    beacon = project("Beacon", acme);
-    project("atlas", other);
-    WTTask* design = task(atlas, "Design \"v2\", final");
-    time(design, berlin(3, 3, 0, 30), berlin(3, 3, 2));      // 90 minutes: 120.00
-    time(design, berlin(3, 3, 23, 30), berlin(3, 4, 0, 15));  // 45 minutes: 60.00
-    time(task(beacon, "Build"), berlin(3, 4, 10), berlin(3, 4, 11));
+    WTProject* atlas = project(*context, "Atlas", acme);
+    WTProject* beacon = project(*context, "Beacon", acme);
+    project(*context, "atlas", other);
+    WTTask* design = task(*context, atlas, "Design \"v2\", final");
+    addTime(*context, design, berlin(3, 3, 0, 30), berlin(3, 3, 2));       // 90 minutes: 120.00
+    addTime(*context, design, berlin(3, 3, 23, 30), berlin(3, 4, 0, 15));  // 45 minutes: 60.00
+    addTime(*context, task(*context, beacon, "Build"), berlin(3, 4, 10), berlin(3, 4, 11));
     ASSERT_TRUE(context->save());
-  }
-
-  WTProject* project(const QString& name, WTClient* client) {
-    auto* project = WTProject::insertNewObject(context.get());
-    project->setName(name);
-    project->setClient(client);
-    return project;
-  }
-  WTTask* task(WTProject* project, const QString& name) {
-    auto* task = WTTask::insertNewObject(context.get());
-    task->setName(name);
-    task->setProject(project);
-    return task;
-  }
-  void time(WTTask* task, Date start, Date end) {
-    auto* time = WTTime::insertNewObject(context.get());
-    time->setTask(task);
-    time->setStartDate(start);
-    time->setEndDate(end);
   }
 
   Installation here;
   std::unique_ptr<WTObjectContext> context;  // stays open, as a desktop copy's would
-  WTProject* atlas = nullptr;
-  WTProject* beacon = nullptr;
 };
 
 TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsv) {
@@ -94,7 +73,8 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsv) {
   EXPECT_EQ(QString::fromUtf8(bytesOf(csvFile)),
             "\"Atlas\",\"Design \\\"v2\\\", final\",\"02:15\",\"180.00\"\n"
             "\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
-  const Outcome days = here.tessal({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, kBerlin);
+  const Outcome days =
+      here.tessal({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, kBerlin);
   EXPECT_EQ(days.code, 1) << "a trailing space is part of the name";
   ASSERT_EQ(here.tessal({"report", "--project", "Beacon", "--mode", "2", "--out", csvFile}, kBerlin).code, 0);
   EXPECT_EQ(QString::fromUtf8(bytesOf(csvFile)), "\"Beacon\",\"Build\",\"2026-03-04\",\"01:00\",\"80.00\"\n");
@@ -114,48 +94,43 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsv) {
   EXPECT_TRUE(pages.contains("Acme")) << pages.toStdString();
 }
 
-TEST_F(ReportCommand, NamesTheCandidatesWhenANameIsAmbiguousOrUnknown) {
-  const Outcome ambiguous = here.tessal({"report", "--project", "ATLAS"});
-  EXPECT_EQ(ambiguous.code, 1);
-  EXPECT_EQ(ambiguous.out, "");
-  EXPECT_TRUE(ambiguous.err.contains("2 projects are named “ATLAS”")) << ambiguous.err.toStdString();
-  EXPECT_TRUE(ambiguous.err.contains("“Atlas” (Acme)")) << ambiguous.err.toStdString();
-  EXPECT_TRUE(ambiguous.err.contains("“atlas” (Other)")) << ambiguous.err.toStdString();
-
-  const Outcome unknown = here.tessal({"export", "--project", "Nowhere"});
-  EXPECT_EQ(unknown.code, 1);
-  EXPECT_TRUE(unknown.err.contains("no project is named “Nowhere”")) << unknown.err.toStdString();
-  EXPECT_TRUE(unknown.err.contains("“Beacon” (Acme)")) << unknown.err.toStdString();
-
-  const Outcome client = here.tessal({"report", "--client", "Initech"});
-  EXPECT_EQ(client.code, 1);
-  EXPECT_TRUE(client.err.contains("“Acme”, “Other”")) << client.err.toStdString();
-}
-
-TEST_F(ReportCommand, RefusesBadArgumentsAndBrokenTemplatesWritingNothing) {
+// Refused arguments (2) and names that fit no record or several (1, naming the candidates) write nothing.
+TEST_F(ReportCommand, RefusesBadArgumentsNamesAndBrokenTemplatesWritingNothing) {
   const QString out = here.path("never.html");
-  const QList<QStringList> bad = {
-      {"report"},
-      {"report", "--project", "Beacon", "--client", "Acme"},
-      {"report", "--project", "Beacon", "--mode", "4"},
-      {"report", "--project", "Beacon", "--mode", "one"},
-      {"report", "--project", "Beacon", "--out", here.path("report.doc")},
-      {"report", "--project", "Beacon", "--template", here.path("missing.txt")},
-      {"report", "--project", "Beacon", "--project", "Atlas"},
-      {"report", "--project", "Beacon", "stray"},
-      {"report", "--projects", "Beacon"},
-      {"export", "--range", "fortnight"},
-      {"export", "--range", "2026-03-04..2026-03-03"},
-      {"export", "--range", "2026-02-30..2026-03-03"},
+  const struct {
+    QStringList arguments;
+    int code;
+    QStringList says;
+  } cases[] = {
+      {{"report"}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--client", "Acme"}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--mode", "4"}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--mode", "one"}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--out", here.path("report.doc")}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--template", here.path("missing.txt")},
+       2,
+       {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "--project", "Atlas"}, 2, {"usage: tessal report"}},
+      {{"report", "--project", "Beacon", "stray"}, 2, {"usage: tessal report"}},
+      {{"report", "--projects", "Beacon"}, 2, {"usage: tessal report"}},
+      {{"export", "--range", "fortnight"}, 2, {"usage: tessal export"}},
+      {{"export", "--range", "2026-03-04..2026-03-03"}, 2, {"usage: tessal export"}},
+      {{"export", "--range", "2026-02-30..2026-03-03"}, 2, {"usage: tessal export"}},
+      {{"report", "--project", "ATLAS"},
+       1,
+       {"2 projects are named “ATLAS”", "“Atlas” (Acme)", "“atlas” (Other)"}},
+      {{"export", "--project", "Nowhere"}, 1, {"no project is named “Nowhere”", "“Beacon” (Acme)"}},
+      {{"report", "--client", "Initech"}, 1, {"“Acme”, “Other”"}},
   };
-  for (const QStringList& arguments : bad) {
-    const Outcome run = here.tessal(arguments);
-    EXPECT_EQ(run.code, 2) << arguments.join(' ').toStdString() << ": " << run.err.toStdString();
-    EXPECT_TRUE(run.err.contains("usage: tessal " + arguments[0])) << run.err.toStdString();
+  for (const auto& c : cases) {
+    const Outcome run = here.tessal(c.arguments);
+    EXPECT_EQ(run.code, c.code) << c.arguments.join(' ').toStdString() << ": " << run.err.toStdString();
+    for (const QString& said : c.says) EXPECT_TRUE(run.err.contains(said)) << run.err.toStdString();
     EXPECT_EQ(run.out, "");
   }
 
-  const QString broken = here.file("broken.txt", "{% for p in projects %}{{ p.name }}{% /if %}\n{{ nowhere }}");
+  const QString broken =
+      here.file("broken.txt", "{% for p in projects %}{{ p.name }}{% /if %}\n{{ nowhere }}");
   const Outcome run = here.tessal({"report", "--project", "Beacon", "--template", broken, "--out", out});
   EXPECT_EQ(run.code, 1);
   EXPECT_TRUE(run.err.startsWith("error ")) << run.err.toStdString();
@@ -177,7 +152,8 @@ TEST_F(ReportCommand, ExportsTheTimeEntriesOfARange) {
   ASSERT_EQ(day.code, 0) << day.err.toStdString();
   const QStringList lines = day.out.split('\n', Qt::SkipEmptyParts);
   ASSERT_EQ(lines.size(), 2) << day.out.toStdString();
-  for (const QString& line : lines) EXPECT_TRUE(line.startsWith("\"Atlas\",\"Design \\\"v2\\\", final\",")) << line.toStdString();
+  for (const QString& line : lines)
+    EXPECT_TRUE(line.startsWith("\"Atlas\",\"Design \\\"v2\\\", final\",")) << line.toStdString();
 
   const Outcome all = here.tessal({"export"}, kBerlin);
   EXPECT_EQ(all.out.count('\n'), 3);
@@ -187,7 +163,8 @@ TEST_F(ReportCommand, ExportsTheTimeEntriesOfARange) {
   EXPECT_TRUE(beacon.out.startsWith("\"Beacon\",\"Build\",")) << beacon.out.toStdString();
 
   const QString file = here.path("times.csv");
-  const Outcome written = here.tessal({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, kBerlin);
+  const Outcome written =
+      here.tessal({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, kBerlin);
   ASSERT_EQ(written.code, 0) << written.err.toStdString();
   EXPECT_EQ(written.out, "");
   EXPECT_EQ(bytesOf(file), day.out.toUtf8());
@@ -203,7 +180,7 @@ TEST_F(ReportCommand, ReadsBesideARunningDesktopCopyAndChangesNothing) {
   WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
   ASSERT_TRUE(desktop.start());
   // Saved by the running copy a moment ago: still in its write-ahead log.
-  project("Late", nullptr);
+  project(*context, "Late");
   ASSERT_TRUE(context->save());
   const QByteArray store = bytesOf(here.storePath());
   const QByteArray log = bytesOf(here.storePath() + "-wal");
@@ -217,7 +194,7 @@ TEST_F(ReportCommand, ReadsBesideARunningDesktopCopyAndChangesNothing) {
 
   EXPECT_EQ(bytesOf(here.storePath()), store);
   EXPECT_EQ(bytesOf(here.storePath() + "-wal"), log);
-  project("Later", nullptr);
+  project(*context, "Later");
   EXPECT_TRUE(context->save()) << "the running copy still writes";
 }
 

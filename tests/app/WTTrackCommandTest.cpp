@@ -1,11 +1,7 @@
 // `tessal start`, `stop`, `status` and `log` as a user's shell and key bindings run them: the real
 // executable over a real store file, on its own or while a desktop copy (offscreen) holds the store.
 #include "CommandLineInstallation.h"
-#include "WTClient.h"
-#include "WTProject.h"
 #include "WTSingleInstance.h"
-#include "WTTask.h"
-#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
@@ -22,8 +18,11 @@
 
 namespace {
 
+using commandtest::addTime;
 using commandtest::Installation;
 using commandtest::Outcome;
+using commandtest::project;
+using commandtest::task;
 
 const QString kQuoted = QStringLiteral("Build \"it\" now");
 
@@ -37,30 +36,15 @@ class TrackCommand : public ::testing::Test {
     acme->setName("Acme");
     acme->setRate(Decimal::fromString(u"80"));
     WTProject* atlas = project(*context, "Atlas", acme);
-    WTProject* hermes = project(*context, "Hermes", nullptr);
+    WTProject* hermes = project(*context, "Hermes");
     hermes->setRate(Decimal::fromString(u"100"));
     task(*context, atlas, "Design")->setColor(QColor(255, 0, 0, 128));
     task(*context, atlas, kQuoted);
     task(*context, hermes, "Design");
-    WTTask* old = task(*context, hermes, "Review");
-    auto* time = WTTime::insertNewObject(context.get());
-    time->setTask(old);
-    time->setStartDate(Date::fromQDateTime(QDateTime(QDate(2026, 3, 3), QTime(9, 0), QTimeZone("Europe/Berlin"))));
-    time->setEndDate(time->startDate()->addingSeconds(75 * 60));
+    const Date nine =
+        Date::fromQDateTime(QDateTime(QDate(2026, 3, 3), QTime(9, 0), QTimeZone("Europe/Berlin")));
+    addTime(*context, task(*context, hermes, "Review"), nine, nine.addingSeconds(75 * 60));
     ASSERT_TRUE(context->save());
-  }
-
-  static WTProject* project(WTObjectContext& context, const QString& name, WTClient* client) {
-    auto* project = WTProject::insertNewObject(&context);
-    project->setName(name);
-    project->setClient(client);
-    return project;
-  }
-  static WTTask* task(WTObjectContext& context, WTProject* project, const QString& name) {
-    auto* task = WTTask::insertNewObject(&context);
-    task->setName(name);
-    task->setProject(project);
-    return task;
   }
 
   // What the store file holds now: "PROJECT/TASK" of each running entry, sorted, the number of entries,
@@ -72,18 +56,15 @@ class TrackCommand : public ::testing::Test {
   };
   Stored stored() const {
     Stored result;
-    auto store = WTStore::openReadOnly(here.storePath());
-    EXPECT_TRUE(store);
-    if (!store) return result;
-    WTObjectContext context;
-    EXPECT_TRUE(context.attachStore(std::move(store.value())));
-    const QList<WTTime*> times = context.fetch<WTTime>();
+    const std::unique_ptr<WTObjectContext> context = here.readStore();
+    const QList<WTTime*> times = context->fetch<WTTime>();
     result.times = times.size();
     for (const WTTime* time : times) {
-      if (time->running()) result.running.append(time->task()->project()->name() + "/" + time->task()->name());
+      if (time->running())
+        result.running.append(time->task()->project()->name() + "/" + time->task()->name());
     }
     result.running.sort();
-    for (const WTTask* task : context.fetch<WTTask>()) {
+    for (const WTTask* task : context->fetch<WTTask>()) {
       if (task->color().isNull()) continue;
       const QString color = WTObject::colorText(task->color());
       result.colors.append(task->project()->name() + "/" + task->name() + " " + color);
@@ -113,7 +94,8 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
 
   run = here.tessal({"start", "design"});
   EXPECT_EQ(run.code, 1);
-  EXPECT_TRUE(run.err.contains("2 tasks are named “design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"))
+  EXPECT_TRUE(
+      run.err.contains("2 tasks are named “design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"))
       << run.err.toStdString();
   EXPECT_EQ(stored().times, 1) << "an ambiguous name starts nothing";
 
@@ -158,7 +140,8 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
   // The entries wait in the sync journal, as the desktop copy's own changes do.
   QFile journal(here.journalPath());
   ASSERT_TRUE(journal.open(QIODevice::ReadOnly));
-  const QJsonObject inserted = QJsonDocument::fromJson(journal.readAll()).object()["track"].toObject()["i"].toObject();
+  const QJsonObject inserted =
+      QJsonDocument::fromJson(journal.readAll()).object()["track"].toObject()["i"].toObject();
   EXPECT_EQ(inserted.size(), 2);
 }
 
@@ -236,31 +219,10 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   EXPECT_EQ(stored().running, QStringList({"Hermes/Review"}));
 }
 
-TEST_F(TrackCommand, RefusesArgumentsItDoesNotUnderstandChangingNothing) {
-  for (const QStringList& arguments : {QStringList{"start"},
-                                       {"start", "Design", "Review"},
-                                       {"start", "Review", "--bogus"},
-                                       {"stop", "--project", "Atlas"},
-                                       {"status", "Design"},
-                                       {"log", "--range", "soon"},
-                                       {"start", "Review", "--project", "a", "--project", "b"},
-                                       {"stop", "--create"},
-                                       {"add", "Review"},
-                                       {"add", "Review", "soon"},
-                                       {"add", "Review", "0"},
-                                       {"add", "Review", "24:00-25:00"},
-                                       {"add", "Review", "0:45", "--date", "someday"},
-                                       {"add", "Review", "9:00-10:00", "--note", "a", "--note", "b"}}) {
-    const Outcome run = here.tessal(arguments);
-    EXPECT_EQ(run.code, 2) << arguments.join(' ').toStdString();
-    EXPECT_TRUE(run.err.contains("usage: tessal " + arguments.first())) << run.err.toStdString();
-  }
-  EXPECT_EQ(stored().times, 1);
-}
-
-TEST_F(TrackCommand, AddsFinishedEntriesAndRefusesWhatCannotBe) {
+// Each run in turn over the same store: its exit code and what it says (stdout on success, else stderr).
+// Refused arguments (2) change nothing; refusals of what cannot be (1) add nothing.
+TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   // Review has 09:00–10:15 on 2026-03-03 (Berlin).
-  const QMap<QString, QString> berlin = {{"TZ", "Europe/Berlin"}};
   const QString tomorrow = QDateTime::currentDateTime()
                                .toTimeZone(QTimeZone("Europe/Berlin"))
                                .date()
@@ -269,8 +231,22 @@ TEST_F(TrackCommand, AddsFinishedEntriesAndRefusesWhatCannotBe) {
   const struct {
     QStringList arguments;
     int code;
-    QString says;  // in stdout when it succeeds, else in stderr
+    QString says;
   } cases[] = {
+      {{"start"}, 2, "usage: tessal start"},
+      {{"start", "Design", "Review"}, 2, "usage: tessal start"},
+      {{"start", "Review", "--bogus"}, 2, "usage: tessal start"},
+      {{"stop", "--project", "Atlas"}, 2, "usage: tessal stop"},
+      {{"status", "Design"}, 2, "usage: tessal status"},
+      {{"log", "--range", "soon"}, 2, "usage: tessal log"},
+      {{"start", "Review", "--project", "a", "--project", "b"}, 2, "usage: tessal start"},
+      {{"stop", "--create"}, 2, "usage: tessal stop"},
+      {{"add", "Review"}, 2, "usage: tessal add"},
+      {{"add", "Review", "soon"}, 2, "usage: tessal add"},
+      {{"add", "Review", "0"}, 2, "usage: tessal add"},
+      {{"add", "Review", "24:00-25:00"}, 2, "usage: tessal add"},
+      {{"add", "Review", "0:45", "--date", "someday"}, 2, "usage: tessal add"},
+      {{"add", "Review", "9:00-10:00", "--note", "a", "--note", "b"}, 2, "usage: tessal add"},
       {{"add", "review", "10:15-11:00", "--date", "2026-03-03", "--note", "Call"},
        0,
        "Added Hermes › Review  2026-03-03 10:15–11:00  00:45\n"},
@@ -285,34 +261,6 @@ TEST_F(TrackCommand, AddsFinishedEntriesAndRefusesWhatCannotBe) {
       {{"add", "Design", "0:30"}, 1, "2 tasks are named “Design”"},
       {{"add", "Design", "45", "--project", "Atlas"}, 0, "Added Atlas › Design  "},
       {{"add", "Design", "0:10", "--project", "Atlas"}, 1, "overlaps the entry "},
-  };
-  for (const auto& c : cases) {
-    const Outcome run = here.tessal(c.arguments, berlin);
-    EXPECT_EQ(run.code, c.code) << c.arguments.join(' ').toStdString() << ": " << run.err.toStdString();
-    EXPECT_TRUE((c.code == 0 ? run.out : run.err).contains(c.says))
-        << c.arguments.join(' ').toStdString() << ": " << run.out.toStdString() << run.err.toStdString();
-  }
-  // Exactly the two accepted entries were added: 45 minutes ending this minute, and the noted call.
-  auto store = WTStore::openReadOnly(here.storePath());
-  ASSERT_TRUE(store);
-  WTObjectContext context;
-  ASSERT_TRUE(context.attachStore(std::move(store.value())));
-  const QList<WTTime*> times = context.fetch<WTTime>();
-  ASSERT_EQ(times.size(), 3);
-  const QList<WTTime*> endingNow = context.fetch<WTTime>([](const WTTime* time) {
-    return time->task()->project()->name() == "Atlas" && time->duration() == 45 &&
-           std::abs(time->endDate()->timeIntervalSince(Date::now())) < 120;
-  });
-  EXPECT_EQ(endingNow.size(), 1);
-  EXPECT_EQ(context.fetch<WTTime>([](const WTTime* time) { return time->name() == "Call"; }).size(), 1);
-}
-
-TEST_F(TrackCommand, CreateMakesTheTaskAndWhatHoldsItWhenMissing) {
-  const struct {
-    QStringList arguments;
-    int code;
-    QString says;
-  } cases[] = {
       {{"start", "Write"}, 1, "no task is named “Write”"},
       {{"start", "Write", "--create"},
        1,
@@ -329,18 +277,28 @@ TEST_F(TrackCommand, CreateMakesTheTaskAndWhatHoldsItWhenMissing) {
        "Created task Atlas › Plan\nAdded Atlas › Plan  "},
       {{"start", "Design", "--create"}, 1, "2 tasks are named “Design”"},
   };
+  const QMap<QString, QString> berlin = {{"TZ", "Europe/Berlin"}, {"LANG", "C.UTF-8"}};
   for (const auto& c : cases) {
-    const Outcome run = here.tessal(c.arguments);
+    const Outcome run = here.tessal(c.arguments, berlin);
     EXPECT_EQ(run.code, c.code) << c.arguments.join(' ').toStdString() << ": " << run.err.toStdString();
     EXPECT_TRUE((c.code == 0 ? run.out : run.err).contains(c.says))
         << c.arguments.join(' ').toStdString() << ": " << run.out.toStdString() << run.err.toStdString();
   }
-  const QMap<QString, QString> c = {{"LANG", "C.UTF-8"}};
-  EXPECT_EQ(here.tessal({"list", "tasks", "--qualified"}, c).out.toStdString(),
+  EXPECT_EQ(here.tessal({"list", "tasks", "--qualified"}, berlin).out.toStdString(),
             "Atlas › Build \"it\" now\nAtlas › Design\nAtlas › Plan\nHermes › Design\nHermes › Review\nZeus "
             "› Write\n");
-  EXPECT_EQ(here.tessal({"list", "projects", "--client", "olymp"}, c).out.toStdString(), "Zeus\n");
+  EXPECT_EQ(here.tessal({"list", "projects", "--client", "olymp"}, berlin).out.toStdString(), "Zeus\n");
   EXPECT_EQ(stored().running, QStringList({"Zeus/Write"}));
+  // Exactly the accepted entries were added: 45 minutes ending this minute, the noted call, two on 4 March
+  // and the running one.
+  const std::unique_ptr<WTObjectContext> context = here.readStore();
+  EXPECT_EQ(context->fetch<WTTime>().size(), 6);
+  const QList<WTTime*> endingNow = context->fetch<WTTime>([](const WTTime* time) {
+    return time->task()->project()->name() == "Atlas" && time->duration() == 45 && time->endDate() &&
+           std::abs(time->endDate()->timeIntervalSince(Date::now())) < 120;
+  });
+  EXPECT_EQ(endingNow.size(), 1);
+  EXPECT_EQ(context->fetch<WTTime>([](const WTTime* time) { return time->name() == "Call"; }).size(), 1);
 }
 
 TEST_F(TrackCommand, LogsTheEntriesOfARangeWithTheirTotals) {
@@ -361,7 +319,8 @@ TEST_F(TrackCommand, ListsEachNameOnceForPickersAndCompletion) {
   const QMap<QString, QString> c = {{"LANG", "C.UTF-8"}};
   EXPECT_EQ(here.tessal({"list", "tasks"}, c).out.toStdString(), "Build \"it\" now\nDesign\nReview\n");
   EXPECT_EQ(here.tessal({"list", "tasks", "--project", "HERMES"}, c).out.toStdString(), "Design\nReview\n");
-  EXPECT_EQ(here.tessal({"list", "tasks", "--client", "acme"}, c).out.toStdString(), "Build \"it\" now\nDesign\n");
+  EXPECT_EQ(here.tessal({"list", "tasks", "--client", "acme"}, c).out.toStdString(),
+            "Build \"it\" now\nDesign\n");
   EXPECT_EQ(here.tessal({"list", "projects", "--client", "Acme"}, c).out.toStdString(), "Atlas\n");
   EXPECT_EQ(here.tessal({"list", "clients"}, c).out.toStdString(), "Acme\n");
   EXPECT_EQ(here.tessal({"list", "notes"}).code, 2);

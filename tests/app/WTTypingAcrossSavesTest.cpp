@@ -25,20 +25,8 @@
 
 namespace {
 
-class WTTypingAcrossSavesTest : public AppTest {
+class WTTypingAcrossSavesTest : public WindowTest {
  protected:
-  void TearDown() override {
-    window.reset();
-    delegate.reset();
-    AppTest::TearDown();
-  }
-  void open() {
-    delegate = makeDelegate();
-    window = std::make_unique<WTMainWindowController>(*delegate);
-    window->show();
-    window->activateWindow();
-    ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
-  }
   // A new client with its name editor open, as Ctrl+2 then Ctrl+N leave it.
   QLineEdit* newClientEditor() {
     window->showClients();
@@ -63,9 +51,6 @@ class WTTypingAcrossSavesTest : public AppTest {
       names << client->name();
     return names;
   }
-
-  std::unique_ptr<WTAppDelegate> delegate;
-  std::unique_ptr<WTMainWindowController> window;
 };
 
 TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChanges) {
@@ -135,7 +120,8 @@ TEST_F(WTTypingAcrossSavesTest, AnEditorFollowsItsRowWhenTheCommittedNameReorder
   EXPECT_EQ(names, QStringList({"Mia", "Zedta"}));
 }
 
-TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave) {
+// In a project's outline: the rate field with the focus, then a new task's name editor.
+TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorAcrossASave) {
   open();
   WTProject* project = window->fetchProjects().value(0);
   ASSERT_TRUE(project);
@@ -146,7 +132,6 @@ TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave)
   ASSERT_TRUE(QTest::qWaitFor([&] { return rate->hasFocus(); }, 2000));
   QTest::keyClicks(rate, "125");
   rate->setCursorPosition(1);
-
   changeSomethingElse("merged elsewhere");
   ASSERT_TRUE(delegate->saveChanges());
   EXPECT_EQ(QApplication::focusWidget(), rate);
@@ -154,13 +139,7 @@ TEST_F(WTTypingAcrossSavesTest, AFocusedFieldKeepsFocusTextAndCursorAcrossASave)
   EXPECT_EQ(rate->cursorPosition(), 1);
   ASSERT_TRUE(project->storedRate());
   EXPECT_EQ(project->storedRate()->toString(), "125");
-}
 
-TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
-  open();
-  WTProject* project = window->fetchProjects().value(0);
-  ASSERT_TRUE(project);
-  WTItemsViewController* items = openOutline(project);
   items->addObject();  // a new task, its name editor open
   QPointer<QLineEdit> editor = qobject_cast<QLineEdit*>(QApplication::focusWidget());
   ASSERT_TRUE(editor);
@@ -168,8 +147,7 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
   editor->selectAll();
   QTest::keyClicks(editor, "Deploy");
   editor->setSelection(6, -3);  // "loy", cursor before it
-
-  changeSomethingElse("merged elsewhere");
+  changeSomethingElse("merged again");
   ASSERT_TRUE(delegate->saveChanges());
   ASSERT_TRUE(editor);
   EXPECT_EQ(QApplication::focusWidget(), editor.data());
@@ -187,7 +165,7 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenOutlineEditorSurvivesASave) {
 // Undo and Redo take back typing where it was typed, and records with the keyboard focus kept where it was.
 TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
   open();
-  auto* undo = window->findChild<QAction*>("undo");
+  auto* undo = action("undo");
   ASSERT_TRUE(undo);
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
@@ -200,7 +178,7 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
   EXPECT_EQ(editor->text(), "");
   EXPECT_EQ(WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size(), 1);
 
-  auto* redo = window->findChild<QAction*>("redo");
+  auto* redo = action("redo");
   ASSERT_TRUE(redo);
   redo->trigger();
   ASSERT_TRUE(editor);
@@ -210,7 +188,7 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
 
 TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   open();
-  auto* undo = window->findChild<QAction*>("undo");
+  auto* undo = action("undo");
   ASSERT_TRUE(undo);
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
@@ -245,7 +223,7 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   view->edit(view->currentIndex());
   untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
   ASSERT_TRUE(untouched);
-  window->findChild<QAction*>("redo")->trigger();
+  action("redo")->trigger();
   EXPECT_EQ(client->name(), "Beta");
   EXPECT_TRUE(!untouched || !untouched->isVisible());
   EXPECT_EQ(QApplication::focusWidget(), list);

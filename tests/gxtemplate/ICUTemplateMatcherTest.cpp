@@ -104,33 +104,6 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
 }
 
-TEST_F(MatcherTest, AMarkerBrokenOverTwoLinesIsNotFound) {
-  EXPECT_FALSE(first(QStringLiteral("{% for x\nin items %}")));
-  EXPECT_FALSE(first(QStringLiteral("{{ a\nb }}")));
-  EXPECT_FALSE(first(QStringLiteral("{{ a | b\nc }}")));
-  EXPECT_FALSE(first(QStringLiteral("no markers at all")));
-}
-
-TEST_F(MatcherTest, DelimitersAreTakenLiterally) {
-  engine.setMarkerStartDelimiter(QStringLiteral("$("));
-  engine.setMarkerEndDelimiter(QStringLiteral(")*"));
-  engine.setExpressionStartDelimiter(QStringLiteral("[["));
-  engine.setExpressionEndDelimiter(QStringLiteral("]]"));
-  engine.setFilterDelimiter(QStringLiteral("."));
-  const std::shared_ptr<const GXTemplateMatch> marker = first(QStringLiteral("x $( if a . upper )* y"));
-  ASSERT_TRUE(marker);
-  EXPECT_EQ(marker->type, QStringLiteral("marker"));
-  EXPECT_EQ(marker->name, QStringLiteral("if"));
-  EXPECT_EQ(marker->args, QStringList{"a"});
-  EXPECT_EQ(marker->filter, QStringLiteral("upper"));
-  const std::shared_ptr<const GXTemplateMatch> expression = first(QStringLiteral("{{ a }} [[b]]"));
-  ASSERT_TRUE(expression);
-  EXPECT_EQ(expression->range, (GXRange{8, 5}));
-  EXPECT_EQ(expression->name, QStringLiteral("b"));
-  EXPECT_EQ(matcher.markerStart(), QStringLiteral("$("));
-  EXPECT_EQ(matcher.filterDelimiter(), QStringLiteral("."));
-}
-
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {
   // The matcher starts its search where a match can begin; over random texts made of the pattern's own
   // pieces, every position must give exactly what the plain search from that position gives.
@@ -184,14 +157,6 @@ TEST(MatcherCharacterClasses, AreThoseOfTheRegularExpressions) {
     if (dot == ICUTemplateMatcher::isPatternLineEnd(char16_t(c))) ++differences;
   }
   EXPECT_EQ(differences, 0);
-}
-
-TEST_F(MatcherTest, ThePatternFollowsTheDelimiters) {
-  use(QString());
-  EXPECT_EQ(matcher.regex(),
-            QStringLiteral(R"((?m)(?:(\Q{%\E)(?:\s+)?(.*?)(?:(?:\s+)?\Q|\E(?:\s+)?(.*?))?(?:\s+)?\Q%}\E|)"
-                           R"((\Q{{\E)(?:\s+)?(.*?)(?:(?:\s+)?\Q|\E(?:\s+)?(.*?))?(?:\s+)?\Q}}\E))"));
-  EXPECT_EQ(RXRegex::captureCountForRegex(matcher.regex()), 6);
 }
 
 }  // namespace
