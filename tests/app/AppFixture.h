@@ -6,7 +6,10 @@
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
+#include "WTItemsViewController.h"
 #include "WTMainWindowController.h"
+#include "WTNavigationController.h"
+#include "WTProjectsViewController.h"
 
 #include <gtest/gtest.h>
 
@@ -74,6 +77,13 @@ class WindowTest : public AppTest {
     ASSERT_TRUE(QTest::qWaitForWindowExposed(window.get()));
   }
   QAction* action(const char* name) { return window->findChild<QAction*>(name); }
+  // The project's outline, opened the way its row's button opens it.
+  WTItemsViewController* openOutline(WTProject* project) {
+    window->projectsViewController()->openProject(project);
+    EXPECT_TRUE(QTest::qWaitFor(
+        [&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+    return window->projectsViewController()->itemsViewController();
+  }
 
   std::unique_ptr<WTAppDelegate> delegate;
   std::unique_ptr<WTMainWindowController> window;

@@ -83,9 +83,7 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
   EXPECT_EQ(window->currentNavigationController(), window->projectsNavigationController());
 
-  window->projectsViewController()->openProject(window->fetchProjects()[0]);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  ASSERT_TRUE(openOutline(window->fetchProjects()[0]));
   window->showClients();
   EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
   EXPECT_EQ(window->topViewController(), window->clientsViewController());
@@ -132,9 +130,7 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsO
   EXPECT_FALSE(validate("toggleTimer"));  // no task to time in the lists
 
   // With the outline on top the label follows the project itself.
-  window->projectsViewController()->openProject(active);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  ASSERT_TRUE(openOutline(active));
   active->setArchived(true);
   EXPECT_TRUE(validate("archive"));
   EXPECT_EQ(item("archive")->text(), "Unarchive");
@@ -187,10 +183,8 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
   WTProject* project = window->fetchProjects().front();
   WTTask* task = project->tasks().front();
   task->toggleTimer();
-  window->projectsViewController()->openProject(project);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
-  WTItemsViewController* items = window->projectsViewController()->itemsViewController();
+  WTItemsViewController* items = openOutline(project);
+  ASSERT_TRUE(items);
   WTOutlineView* outline = items->outlineView();
   auto selected = [&] {
     QList<WTObject*> objects;
@@ -264,9 +258,7 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   EXPECT_EQ(window->selectedProject(), other);
   WTProject* first =
       window->fetchProjects().value(0) == other ? window->fetchProjects()[1] : window->fetchProjects()[0];
-  window->projectsViewController()->openProject(first);
-  ASSERT_TRUE(
-      QTest::qWaitFor([&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
+  ASSERT_TRUE(openOutline(first));
   EXPECT_EQ(window->selectedProject(), first);
 
   QAction* exportAction = action("export");

@@ -33,13 +33,6 @@ class WTTypingAcrossSavesTest : public WindowTest {
     window->clientsViewController()->addObject();
     return qobject_cast<QLineEdit*>(QApplication::focusWidget());
   }
-  // The project's outline, opened the way its row's button opens it.
-  WTItemsViewController* openOutline(WTProject* project) {
-    window->projectsViewController()->openProject(project);
-    EXPECT_TRUE(QTest::qWaitFor(
-        [&] { return window->projectsNavigationController()->viewControllers().size() == 2; }));
-    return window->projectsViewController()->itemsViewController();
-  }
   // Another record changes, as a merge or another window would change it, so that the save has work.
   void changeSomethingElse(const QString& name) {
     WTProject::insertNewObject(delegate->managedObjectContext())->setName(name);

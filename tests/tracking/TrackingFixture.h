@@ -88,6 +88,14 @@ class TrackingTest : public ModelTest {
 
   QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
 
+  // The updater's saves go to the store file, counted in `saves`.
+  void countSaves() {
+    updater->setSaveCallback([this] {
+      ++saves;
+      return context->save().ok();
+    });
+  }
+
   // Ten tasks "T0".."T9"; Tn's last entry ended n hours after 1 March, so T9 ended last. T1 and T4 run.
   void makeTenTasks() {
     for (int n = 0; n < 10; ++n) {
@@ -104,5 +112,6 @@ class TrackingTest : public ModelTest {
   ScriptedPresenter presenter;
   std::unique_ptr<WTStopwatchUpdater> updater;
   int ticks = 0;
+  int saves = 0;
   QList<WTTask*> tasks;  // made by makeTenTasks()
 };

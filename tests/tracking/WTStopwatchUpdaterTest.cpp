@@ -344,11 +344,7 @@ TEST_F(TrackingTest, AWakeNobodyAnnouncedIsFoundFromTheLateTick) {
 }
 
 TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
-  int saves = 0;
-  updater->setSaveCallback([&] {
-    ++saves;
-    return context->save().ok();
-  });
+  countSaves();
   updater->start();
   updater->applicationWillTerminate();
   EXPECT_TRUE(presenter.shown.empty()) << "nothing runs: nothing to ask";
@@ -376,10 +372,7 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
   EXPECT_TRUE(kept->running()) << "kept running across the quit";
 
   makeUpdater();
-  updater->setSaveCallback([&] {
-    ++saves;
-    return context->save().ok();
-  });
+  countSaves();
   updater->start();
   advance(90);
   presenter.answers = {Answer::Default};
@@ -395,11 +388,7 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
 }
 
 TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
-  int saves = 0;
-  updater->setSaveCallback([&] {
-    ++saves;
-    return context->save().ok();
-  });
+  countSaves();
   updater->start();
   updater->sessionWillEnd();
   EXPECT_EQ(saves, 0) << "nothing runs: nothing to keep";
