@@ -5,6 +5,7 @@
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
+#include "WTItemsModel.h"
 #include "WTMainWindowController.h"
 #include "WTObjectContext.h"
 #include "WTPreferencesWindowController.h"
@@ -45,6 +46,13 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     EXPECT_EQ(projects[0]->name(), "Default Project");
     ASSERT_EQ(projects[0]->tasks().size(), 1);
     EXPECT_EQ(projects[0]->tasks()[0]->name(), "Default Task");
+    // Opened before the window shows, the outline lists its task.
+    window.projectsViewController()->openProject(projects[0]);
+    ASSERT_TRUE(QTest::qWaitFor(
+        [&] { return window.projectsNavigationController()->viewControllers().size() == 2; }));
+    WTItemsModel* outline = window.projectsViewController()->itemsViewController()->treeController();
+    ASSERT_EQ(outline->rowCount(), 1);
+    EXPECT_EQ(outline->index(0, 0).data(WTItemsModel::NameRole).toString(), "Default Task");
 
     EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
     EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());

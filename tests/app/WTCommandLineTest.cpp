@@ -110,6 +110,7 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
     QString bus;  // empty: none at all
     QString password;
     QString said;
+    QString server = {};  // empty: none set
   };
   const Row rows[] = {
       {"no session bus", {}, "a password", "Using the password in the settings file ("},
@@ -119,12 +120,19 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
        "The secret service gave no password (The secret service did not answer within 5 seconds); the "
        "settings "
        "file ("},
+      // The password is read once for the whole exchange, even one that fails at once.
+      {"a server that refuses",
+       {},
+       "a password",
+       "Using the password in the settings file (",
+       "http://127.0.0.1:1"},
   };
   for (const Row& row : rows) {
     SCOPED_TRACE(row.name);
     Installation here;
     here.setSetting("WTSyncUser", "ann@example.org");
     if (!row.password.isEmpty()) here.setSetting("WTSyncPassword", row.password);
+    if (!row.server.isEmpty()) here.setSetting("WTSyncServer", row.server);
     QProcess sync;
     QProcessEnvironment environment = here.environment();
     if (row.bus.isEmpty())
@@ -132,9 +140,9 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
     else
       environment.insert("DBUS_SESSION_BUS_ADDRESS", row.bus);
     sync.setProcessEnvironment(environment);
-    sync.start(QString::fromUtf8(TESSAL_EXE), {"sync"});
+    sync.start(QString::fromUtf8(TESSAL_EXE), {"sync", "--timeout", "5"});
     const Outcome run = Installation::finish(sync);
-    EXPECT_EQ(run.code, 1) << "no server is set";
+    EXPECT_EQ(run.code, 1) << "no server is set, or it refuses";
     EXPECT_EQ(run.err.count(row.said), 1) << run.err.toStdString();
     EXPECT_FALSE(run.err.contains("No secret service")) << run.err.toStdString();
     EXPECT_FALSE(run.err.contains("D-Bus")) << run.err.toStdString();

@@ -29,16 +29,14 @@ class WTHelpMenuTest : public WindowTest {
   }
 };
 
-TEST_F(WTHelpMenuTest, AboutNamesTheBuiltVersionAndTheLicence) {
+TEST_F(WTHelpMenuTest, AboutNamesTheLicence) {
   QAction* about = action("about");
   ASSERT_NE(about, nullptr);
-  EXPECT_EQ(about->text(), "&About Tessal");
   about->trigger();
   auto* dialog = window->findChild<QDialog*>("aboutDialog");
   ASSERT_NE(dialog, nullptr);
   EXPECT_TRUE(dialog->isVisible());
   const QString text = dialog->findChild<QLabel*>("aboutText")->text();
-  EXPECT_TRUE(text.startsWith(QStringLiteral("Tessal " TESSAL_VERSION "\n"))) << text.toStdString();
   EXPECT_TRUE(text.contains("GNU General Public License")) << text.toStdString();
   dialog->close();
 }

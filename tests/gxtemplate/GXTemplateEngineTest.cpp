@@ -55,6 +55,12 @@ TEST(TemplateGolden, EverySeedRendersItsGoldenOutput) {
   ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
   const Date fixed = Date::fromQDateTime(QDateTime(QDate(2031, 7, 4), QTime(12, 0), Qt::UTC));
   Date::setClockForTesting([fixed] { return fixed; });
+  struct Restore {
+    ~Restore() {
+      Date::setClockForTesting({});
+      RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
+    }
+  } restore;
   const QVariantMap variables = templatefuzz::variables();
   const QDir corpus(QStringLiteral(TESSAL_TEST_DATA_DIR "/../fuzz/corpus"));
   const QStringList names = corpus.entryList(QDir::Files);
@@ -79,8 +85,6 @@ TEST(TemplateGolden, EverySeedRendersItsGoldenOutput) {
       EXPECT_EQ(output, expected) << name.toStdString() << ", run " << run;
     }
   }
-  Date::setClockForTesting({});
-  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
 }
 
 TEST_F(EngineRunTest, EmptyTemplateGivesAnEmptyTextNotNone) {

@@ -102,6 +102,8 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   EXPECT_FALSE(at(10, 10));
   EXPECT_FALSE(at(21, 3));
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
+  EXPECT_EQ(matcher.markerStart(), QStringLiteral("{%"));
+  EXPECT_EQ(matcher.filterDelimiter(), QStringLiteral("|"));
 }
 
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {

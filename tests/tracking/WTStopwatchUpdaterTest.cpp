@@ -8,7 +8,7 @@ namespace {
 
 using Answer = WTTrackingAlertAnswer;
 
-TEST_F(TrackingTest, TickTotalsRunningEntriesSetsTheBadgeAndSchedulesOneTickInFiveSeconds) {
+TEST_F(TrackingTest, TickTotalsRunningEntriesSetsTheBadgeAndSchedulesTheNextTick) {
   WTTask* task = makeTask();
   WTTask* other = makeTask(nullptr, QStringLiteral("Other"));
   startTimer(task, clockNow.addingSeconds(-45 * 60));
@@ -26,7 +26,6 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesSetsTheBadgeAndSchedulesOneTickInFi
   EXPECT_EQ(badge.at(0).at(0).toString(), QStringLiteral("01:15"));
   EXPECT_EQ(ticks, 1);
   EXPECT_TRUE(updater->isTicking());
-  EXPECT_EQ(updater->tickInterval(), 5000);
 
   // A tick with nothing new keeps the badge and still reschedules.
   updater->update();
