@@ -136,6 +136,10 @@ struct IdleRow {
   bool asks;
 };
 
+void PrintTo(const IdleRow& row, std::ostream* os) {
+  *os << row.name;
+}
+
 class IdleQuestionTest : public TrackingTest, public ::testing::WithParamInterface<IdleRow> {};
 
 TEST_P(IdleQuestionTest, AsksOnlyAtTheThresholdAndNoKeepsTheIdleTime) {
