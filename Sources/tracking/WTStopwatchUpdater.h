@@ -62,7 +62,6 @@ class WTStopwatchUpdater : public QObject {
   QString windowTitle(const QString& base) const;
   // Whether a tick is pending (false while asleep, before start() and inside a tick).
   bool isTicking() const { return timer_.isActive(); }
-  int tickInterval() const { return timer_.interval(); }
 
  public slots:
   // One tick.
