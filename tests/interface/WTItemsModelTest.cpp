@@ -289,6 +289,8 @@ TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
     bool taken;
   } rows[] = {
       {flat, "45", WTItemsModel::DurationEditRole, true},
+      {flat, "1.5", WTItemsModel::DurationEditRole, false},  // never a fraction cut to whole minutes
+      {flat, "0:1,5", WTItemsModel::DurationEditRole, false},
       {expense, "12.50", WTItemsModel::AmountEditRole, true},
       {expense, "twelve", WTItemsModel::AmountEditRole, false},
       {expense, "1:00", WTItemsModel::DurationEditRole, false},
