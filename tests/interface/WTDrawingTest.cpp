@@ -39,7 +39,7 @@ TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
   const QImage groove = paintRow(plain, false);
   EXPECT_EQ(at(groove, 0, 18), at(groove, 99, 18));
   EXPECT_EQ(at(groove, 0, 19), at(groove, 99, 19));
-  EXPECT_NE(at(groove, 0, 18), at(groove, 0, 19));
+  EXPECT_LT(qGray(at(groove, 0, 18)), qGray(at(groove, 0, 19)));  // a dark line above a light one
   for (const WTTableRowView* row : {&plain, &header, &custom}) {
     for (const bool selected : {false, true}) {
       const QImage image = paintRow(*row, selected);

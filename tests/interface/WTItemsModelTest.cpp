@@ -272,6 +272,7 @@ TEST_F(WTItemsModelTest, RowsAreFoundAgainByTheirPersistentIdentity) {
   }
   EXPECT_FALSE(other.indexForPersistentIdentity(design->uuid() + "|12345").isValid());
   EXPECT_FALSE(other.indexForPersistentIdentity("nobody@WTTask").isValid());
+  EXPECT_FALSE(other.indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
 }
 
 TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {

@@ -75,6 +75,8 @@ TEST_F(WTItemsViewControllerTest, TheTimerButtonStartsAndSelectsThenStops) {
 TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsAndEditableFieldsNotToTheWholeRow) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
+  controller->expandContainerOfItem(time);  // its day is not shown yet: only its task opens
+  EXPECT_TRUE(outline()->isExpanded(rowOf(design)));
   endTurn();
   controller->expandContainerOfItem(time);
   ASSERT_FALSE(design->buttonTitle().isEmpty());

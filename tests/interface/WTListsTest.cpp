@@ -259,6 +259,8 @@ TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLast
   projects->toggleArchive();
   EXPECT_TRUE(c->archived());
   EXPECT_FALSE(a->archived());
+  endTurn();  // drawn archived and selected, still listed
+  EXPECT_GE(rowOf(c), 0);
   projects->tableView()->selectionModel()->clearSelection();
   projects->toggleArchive();  // nothing selected: nothing happens
   EXPECT_FALSE(a->archived());
@@ -333,6 +335,7 @@ TEST_F(WTListControllerTest, TheClientChooserSetsTheProjectsClientAndClientsAreA
   clients.addObject();
   EXPECT_EQ(context->fetch<WTClient>().size(), 3);
   EXPECT_TRUE(clients.tableView()->isEditing());
+  EXPECT_TRUE(clients.respondsTo(WTViewController::Command::AddObject));
   EXPECT_FALSE(clients.respondsTo(WTViewController::Command::ToggleTimer));
 }
 
