@@ -44,6 +44,8 @@ TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
     for (const bool selected : {false, true}) {
       const QImage image = paintRow(*row, selected);
       EXPECT_EQ(at(image, 50, 17), at(image, 50, 5));  // the body reaches down to the groove
+      EXPECT_NE(at(image, 50, 18), at(image, 50, 5));
+      EXPECT_NE(at(image, 50, 19), at(image, 50, 5));
       EXPECT_EQ(at(image, 50, 18), at(groove, 50, 18));
       EXPECT_EQ(at(image, 50, 19), at(groove, 50, 19));
     }
