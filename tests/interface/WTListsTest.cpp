@@ -59,6 +59,7 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_EQ(shows(row, WTObjectListModel::SubtitleRole), "ACME Ltd");
   EXPECT_EQ(shows(row, WTObjectListModel::ImageRole), "folder_32_dis");
   EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
+  EXPECT_FALSE(row.data(Qt::ToolTipRole).isValid());  // archived, but no timer runs in it
   EXPECT_EQ(shows(clientRow, WTObjectListModel::SubtitleRole), "1 project · 120.00 an hour");
 }
 
@@ -90,7 +91,9 @@ TEST_F(WTObjectListModelTest, AFilteredListFollowsChangesRowByRowAndShowsAnArchi
   const QModelIndex row = model.indexOfObject(gamma);
   EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
   EXPECT_TRUE(row.data(WTObjectListModel::RunningRole).toBool());
+  EXPECT_EQ(row.data(Qt::ToolTipRole).toString(), "Archived, listed while a timer runs in it");
   EXPECT_FALSE(model.index(0, 0).data(WTObjectListModel::RunningRole).toBool());
+  EXPECT_FALSE(model.index(0, 0).data(Qt::ToolTipRole).isValid());
   EXPECT_TRUE(gamma->archived());
   task->toggleTimer();
   endTurn();

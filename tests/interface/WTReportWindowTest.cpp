@@ -363,7 +363,7 @@ TEST_F(ReportWindowTest, TheWindowClosesWhenItsContextGoes) {
 // The range chooser and the export dialog.
 class RangeAndExportTest : public ReportWindowTest {};
 
-TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndCustomCoversItsEndDayWhole) {
+TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDaysShown) {
   WTRangePopUpButton button(defaults.get());
   QStringList titles;
   for (int i = 0; i < button.count(); ++i) titles << button.itemText(i);
