@@ -35,11 +35,7 @@ class LabelListener : public QObject {
   Q_OBJECT
  public:
   QStringList labels;
-  QStringList guides;
 
  public slots:
-  void newLabel(const QString& label, const QString& guide) {
-    labels.append(label);
-    guides.append(guide);
-  }
+  void newLabel(const QString& label, const QString&) { labels.append(label); }
 };

@@ -1,27 +1,20 @@
 #pragma once
 
-#include "Date.h"
-#include "RZDate.h"
-#include "UserDefaults.h"
-#include "WTExpense.h"
-#include "WTFlat.h"
+#include "ModelFixture.h"
+#include "WTItemsModel.h"
 #include "WTItemsViewController.h"
-#include "WTNote.h"
-#include "WTObjectContext.h"
-#include "WTProject.h"
-#include "WTTask.h"
-#include "WTTime.h"
-#include "WTToDo.h"
+#include "WTNavigationController.h"
+#include "WTOutlineView.h"
+#include "WTProjectsViewController.h"
 #include "WTViewController.h"
 
-#include <gtest/gtest.h>
-
 #include <QAbstractItemModelTester>
-#include <QDateTime>
+#include <QApplication>
+#include <QHelpEvent>
+#include <QLineEdit>
 #include <QMainWindow>
-#include <QTemporaryDir>
 #include <QTest>
-#include <QTimeZone>
+#include <QToolTip>
 
 #include <memory>
 
@@ -55,59 +48,76 @@ struct ShownOutline {
     controller.willDisplayView();
   }
   ~ShownOutline() { window.takeCentralWidget(); }
+
+  WTOutlineView* outline() { return controller.outlineView(); }
+  QModelIndex rowOf(const WTObject* object) { return controller.treeController()->indexOfObject(object); }
+  // The middle of one part of a record's row, in the outline's viewport.
+  QPoint centreOf(const WTObject* object, WTTableCellView::Part part) {
+    const QModelIndex index = rowOf(object);
+    const QRect visual = outline()->visualRect(index);
+    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
+    return controller.cellViewPrototypeForIndex(index).partRect(part, row).center().toPoint();
+  }
+  // The tip shown over a point of the viewport, or nothing.
+  QString tipAt(QPoint point) {
+    QToolTip::hideText();  // fades out: wait until it is gone
+    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
+    QHelpEvent help(QEvent::ToolTip, point, outline()->viewport()->mapToGlobal(point));
+    QApplication::sendEvent(outline()->viewport(), &help);
+    return QToolTip::isVisible() ? QToolTip::text() : QString();
+  }
+  // The one line editor open in the outline once closed ones are gone, else nothing.
+  QLineEdit* openEditor() {
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    QApplication::processEvents();
+    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
+    return editors.size() == 1 ? editors.first() : nullptr;
+  }
+
   WTItemsViewController controller;
   TestHostWindow window;
 };
 
-// A context without a store (records live in memory), its own settings file, a fixed zone and a
-// clock that tests move by hand.
-class UiTest : public ::testing::Test {
+// The projects list on its navigation stack in a host window, as the main window shows it.
+struct ShownProjects {
+  explicit ShownProjects(WTObjectContext* context) : projects(context) {
+    window.stack = &stack;
+    window.setCentralWidget(stack.view());
+    window.resize(800, 500);
+    stack.pushViewController(&projects);
+    window.show();
+    EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
+  }
+  ~ShownProjects() { window.takeCentralWidget(); }
+  WTNavigationController stack;
+  WTProjectsViewController projects;
+  TestHostWindow window;
+};
+
+// The model's world (a real store file, its own settings, Europe/Berlin) with the clock at
+// 14 March 2024 10:00 until a test moves `clockNow`.
+class UiTest : public ModelTest {
  protected:
   void SetUp() override {
-    ASSERT_TRUE(dir.isValid());
-    previousZone = QString::fromUtf8(QTimeZone::systemTimeZoneId());
-    ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
-    defaults = std::make_unique<UserDefaults>(dir.filePath(QStringLiteral("settings.conf")));
-    context = std::make_unique<WTObjectContext>(defaults.get());
-    WTObjectContext::setDefaultContext(context.get());
-    now = at(2024, 3, 14, 10, 0);
-    Date::setClockForTesting([this] { return now; });
-  }
-  void TearDown() override {
-    Date::setClockForTesting({});
-    WTObjectContext::setDefaultContext(nullptr);
-    context.reset();
-    RZDate::setDefaultTimeZone(previousZone);
+    ModelTest::SetUp();
+    setNow(at(2024, 3, 14, 10, 0));
   }
 
   static Date at(int year, int month, int day, int hour = 12, int minute = 0) {
-    RZDate::DateComponents components;
-    components.year = year;
-    components.month = month;
-    components.day = day;
-    components.hour = hour;
-    components.minute = minute;
-    components.second = 0;
-    return RZDate::dateFromComponents(components);
+    return berlin(year, month, day, hour, minute);
   }
-
   WTProject* makeProject(const QString& name) {
     auto* project = WTProject::insertNewObject(context.get());
     project->setName(name);
     return project;
   }
-  WTTask* makeTask(WTProject* project, const QString& name) {
-    auto* task = WTTask::insertNewObject(context.get());
-    task->setName(name);
-    task->setProject(project);
-    return task;
-  }
+  using ModelTest::makeItem;
+  // A named item; a time entry lasts half an hour.
   template <class T>
   T* makeItem(WTTask* task, const QString& name, Date date) {
-    auto* item = T::insertNewObject(context.get());
+    T* item = makeItem<T>(task, date);
     item->setName(name);
-    item->setTask(task);
-    item->setStartDate(date);
     if constexpr (std::is_same_v<T, WTTime>) item->setEndDate(date.addingSeconds(30 * 60));
     return item;
   }
@@ -116,10 +126,36 @@ class UiTest : public ::testing::Test {
     context->processPendingChanges();
     QCoreApplication::processEvents();
   }
+};
 
-  QTemporaryDir dir;
-  QString previousZone;
-  std::unique_ptr<UserDefaults> defaults;
-  std::unique_ptr<WTObjectContext> context;
-  Date now;
+// A project "Website" with the tasks Design and Build, shown in its outline, the outline's model under
+// Qt's model checker.
+class OutlineTest : public UiTest {
+ protected:
+  void SetUp() override {
+    UiTest::SetUp();
+    project = makeProject("Website");
+    design = makeTask(project, "Design");
+    build = makeTask(project, "Build");
+    shown = std::make_unique<ShownOutline>(context.get(), project);
+    controller = &shown->controller;
+    tester = std::make_unique<QAbstractItemModelTester>(
+        model(), QAbstractItemModelTester::FailureReportingMode::Fatal);
+  }
+  void TearDown() override {
+    tester.reset();
+    shown.reset();
+    UiTest::TearDown();
+  }
+
+  WTOutlineView* outline() { return controller->outlineView(); }
+  WTItemsModel* model() { return controller->treeController(); }
+  QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
+
+  WTProject* project = nullptr;
+  WTTask* design = nullptr;
+  WTTask* build = nullptr;
+  std::unique_ptr<ShownOutline> shown;
+  WTItemsViewController* controller = nullptr;
+  std::unique_ptr<QAbstractItemModelTester> tester;
 };

@@ -21,75 +21,82 @@ QImage paintRow(const WTTableRowView& row, bool selected) {
   return image;
 }
 
-int grey(const QImage& image, int x, int y) {
-  const QColor colour = image.pixelColor(x, y);
-  EXPECT_EQ(colour.red(), colour.green());
-  EXPECT_EQ(colour.green(), colour.blue());
-  return colour.red();
+QRgb at(const QImage& image, int x, int y) {
+  return image.pixel(x, y);
 }
 
-TEST(WTTableRowViewTest, FlatGreyTonesAndTheGroove) {
-  struct Case {
-    const char* what;
-    WTTableRowView row;
-    bool selected;
-    int body;
-  };
-  WTTableRowView plain;
-  WTTableRowView header = WTTableRowView::initWithHeaderColors();
-  WTTableRowView custom =
-      WTTableRowView::initWithBgColor(RZColor::calibratedWhite(0.5), RZColor::calibratedWhite(0.3));
-  const Case cases[] = {
-      {"background", plain, false, 230},  // white 0.9
-      {"selected", plain, true, 214},     // white 0.84
-      {"header", header, false, 166},     // white 0.65
-      {"header selected", header, true, 166},
-      {"own colours", custom, false, 128},
-      {"own colours selected", custom, true, 77},
-  };
-  for (const Case& c : cases) {
-    const QImage image = paintRow(c.row, c.selected);
-    EXPECT_EQ(grey(image, 50, 5), c.body) << c.what;
-    // The groove: white 0.8 then white 0.95 along the bottom, across the whole width.
-    EXPECT_EQ(grey(image, 0, 18), 204) << c.what;
-    EXPECT_EQ(grey(image, 99, 19), 242) << c.what;
-    EXPECT_EQ(grey(image, 50, 17), c.body) << c.what;
+// The body takes the row's colours, selected or not (a header looks the same either way); the groove's
+// two lines run along the bottom across the whole width in tones of their own.
+TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
+  const QColor own = RZColor::calibratedWhite(0.5), ownSelected = RZColor::calibratedWhite(0.3);
+  const WTTableRowView plain, header = WTTableRowView::initWithHeaderColors(),
+                              custom = WTTableRowView::initWithBgColor(own, ownSelected);
+  EXPECT_EQ(at(paintRow(custom, false), 50, 5), own.rgb());
+  EXPECT_EQ(at(paintRow(custom, true), 50, 5), ownSelected.rgb());
+  EXPECT_NE(at(paintRow(plain, true), 50, 5), at(paintRow(plain, false), 50, 5));
+  EXPECT_EQ(at(paintRow(header, true), 50, 5), at(paintRow(header, false), 50, 5));
+  EXPECT_NE(at(paintRow(header, false), 50, 5), at(paintRow(plain, false), 50, 5));
+  const QImage groove = paintRow(plain, false);
+  EXPECT_EQ(at(groove, 0, 18), at(groove, 99, 18));
+  EXPECT_EQ(at(groove, 0, 19), at(groove, 99, 19));
+  EXPECT_LT(qGray(at(groove, 0, 18)), qGray(at(groove, 0, 19)));  // a dark line above a light one
+  for (const WTTableRowView* row : {&plain, &header, &custom}) {
+    for (const bool selected : {false, true}) {
+      const QImage image = paintRow(*row, selected);
+      EXPECT_EQ(at(image, 50, 17), at(image, 50, 5));  // the body reaches down to the groove
+      EXPECT_NE(at(image, 50, 18), at(image, 50, 5));
+      EXPECT_NE(at(image, 50, 19), at(image, 50, 5));
+      EXPECT_EQ(at(image, 50, 18), at(groove, 50, 18));
+      EXPECT_EQ(at(image, 50, 19), at(groove, 50, 19));
+    }
   }
   WTTableRowView bare;
   bare.setDrawsBackground(false);
   bare.setDrawsSeparator(false);
   const QImage untouched = paintRow(bare, false);
-  EXPECT_EQ(untouched.pixelColor(50, 5), QColor(Qt::red));
-  EXPECT_EQ(untouched.pixelColor(50, 19), QColor(Qt::red));
+  EXPECT_EQ(at(untouched, 50, 5), QColor(Qt::red).rgb());
+  EXPECT_EQ(at(untouched, 50, 19), QColor(Qt::red).rgb());
 }
 
+// An odd tag draws dark (on a light row), an even one white; a tag that is a multiple of 3 puts the
+// arrows against the right edge, the others at the left.
 TEST(WTPopUpButtonCellTest, TheTagChoosesColourAndSide) {
-  EXPECT_EQ(WTPopUpButtonCell::colorForTag(1), RZColor::calibratedWhite(0.1));
-  EXPECT_EQ(WTPopUpButtonCell::colorForTag(0), QColor(Qt::white));
-  EXPECT_EQ(WTPopUpButtonCell::colorForTag(4), QColor(Qt::white));
-  // Multiples of 3: against the right edge; others at 4 points from the left.
-  EXPECT_DOUBLE_EQ(WTPopUpButtonCell::arrowX(3, 200, 50), 135);
-  EXPECT_DOUBLE_EQ(WTPopUpButtonCell::arrowX(0, 200, 50), 135);
-  EXPECT_DOUBLE_EQ(WTPopUpButtonCell::arrowX(1, 200, 50), 4);
-  EXPECT_DOUBLE_EQ(WTPopUpButtonCell::titleRect(1, QRectF(10, 0, 200, 20), 50, 14).x(), 26);
-
-  // Drawn: near-black arrows for tag 1 near the left edge, nothing at the right.
-  QImage image(200, 20, QImage::Format_RGB32);
-  image.fill(Qt::white);
-  QPainter painter(&image);
-  WTPopUpButtonCell::drawWithFrame(painter, QRectF(0, 0, 200, 20), "x", QApplication::font(), 1);
-  painter.end();
-  EXPECT_LT(image.pixelColor(7, 7).lightness(), 100);
-  EXPECT_EQ(image.pixelColor(190, 7), QColor(Qt::white));
+  const struct {
+    int tag;
+    bool dark;
+    bool right;
+  } rows[] = {{1, true, false}, {3, true, true}, {0, false, true}, {4, false, false}};
+  for (const auto& row : rows) {
+    QImage image(200, 20, QImage::Format_RGB32);
+    image.fill(row.dark ? Qt::white : Qt::black);
+    QPainter painter(&image);
+    WTPopUpButtonCell::drawWithFrame(painter, QRectF(0, 0, 200, 20), "x", QApplication::font(), row.tag);
+    painter.end();
+    const QColor background(row.dark ? Qt::white : Qt::black);
+    int leftmost = image.width(), extreme = background.lightness();
+    for (int y = 0; y < image.height(); ++y) {
+      for (int x = 0; x < image.width(); ++x) {
+        const QColor colour = image.pixelColor(x, y);
+        if (colour == background) continue;
+        leftmost = std::min(leftmost, x);
+        extreme = row.dark ? std::min(extreme, colour.lightness()) : std::max(extreme, colour.lightness());
+      }
+    }
+    EXPECT_TRUE(row.right ? leftmost > 100 : leftmost < 10) << row.tag << " from " << leftmost;
+    EXPECT_TRUE(row.dark ? extreme < 100 : extreme > 155) << row.tag << ": " << extreme;
+  }
 }
 
 TEST(RZColorTest, HexRGB) {
-  EXPECT_EQ(RZColor::colorFromHexRGB("FF8000"), QColor::fromRgbF(1.0f, 128 / 255.0f, 0.0f));
-  EXPECT_EQ(RZColor::colorFromHexRGB("1FF8000"), RZColor::colorFromHexRGB("FF8000"));
-  EXPECT_EQ(RZColor::colorFromHexRGB("0x0000ff"), QColor(0, 0, 255));
+  const std::pair<const char*, QColor> rows[] = {
+      {"FF8000", QColor::fromRgbF(1.0f, 128 / 255.0f, 0.0f)},
+      {"1FF8000", QColor::fromRgbF(1.0f, 128 / 255.0f, 0.0f)},
+      {"0x0000ff", QColor(0, 0, 255)},
+      {"", QColor(Qt::black)},
+      {"not hex", QColor(Qt::black)},
+  };
+  for (const auto& [hex, colour] : rows) EXPECT_EQ(RZColor::colorFromHexRGB(hex), colour) << hex;
   EXPECT_EQ(RZColor::colorFromHexRGB(QString()), QColor(Qt::black));
-  EXPECT_EQ(RZColor::colorFromHexRGB("not hex"), QColor(Qt::black));
-  EXPECT_EQ(RZColor::colorFromHexRGB("FF8000").alpha(), 255);
 }
 
 TEST(RZBackgroundViewTest, ArchivedSettingsComeBack) {
@@ -201,20 +208,17 @@ TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   EXPECT_FALSE(time.partRect(WTTableCellView::Part::DateButton, row).isEmpty());
 }
 
+// Every image the windows name is drawn at the size and scale asked; a name of none gives nothing.
 TEST(WTImagesTest, EveryNamedImageExists) {
   for (const char* name :
        {"StopWatch", "StopWatchRunning", "play_32", "stop_32", "notepad_32", "notepad_clock_32", "folder_32",
         "folder_32_dis", "admin_2_32", "admin_2_32_dis", "tessal"}) {
     EXPECT_TRUE(WTImages::contains(name)) << name;
-    const QPixmap pixmap = WTImages::pixmap(name, QSize(32, 32), 2.0);
-    ASSERT_FALSE(pixmap.isNull()) << name;
-    EXPECT_EQ(pixmap.size(), QSize(64, 64)) << name;
-    // Something is drawn: not every pixel is transparent.
-    const QImage image = pixmap.toImage();
+    const QImage image = WTImages::pixmap(name, QSize(32, 32), 2.0).toImage();
+    ASSERT_EQ(image.size(), QSize(64, 64)) << name;
     bool drawn = false;
-    for (int y = 0; y < image.height() && !drawn; ++y) {
-      for (int x = 0; x < image.width() && !drawn; ++x) drawn = image.pixelColor(x, y).alpha() > 0;
-    }
+    for (int y = 0; y < image.height(); ++y)
+      for (int x = 0; x < image.width(); ++x) drawn = drawn || image.pixelColor(x, y).alpha() > 0;
     EXPECT_TRUE(drawn) << name;
   }
   EXPECT_FALSE(WTImages::contains("NSComputer"));

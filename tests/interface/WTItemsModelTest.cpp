@@ -27,25 +27,21 @@ class WTItemsModelTest : public UiTest {
   }
 
   // The tree as text: "Task[Group[item,item],Group[...]]" per task, tasks joined by " ".
-  QString shape() {
-    QStringList tasks;
-    for (int t = 0; t < model->rowCount(); ++t) {
-      const QModelIndex task = model->index(t, 0);
-      QStringList groups;
-      for (int g = 0; g < model->rowCount(task); ++g) {
-        const QModelIndex group = model->index(g, 0, task);
-        QStringList items;
-        for (int i = 0; i < model->rowCount(group); ++i) {
-          items << model->index(i, 0, group).data(WTItemsModel::NameRole).toString();
-        }
-        const auto container = model->containerAt(group);
-        const QString title =
-            container->date() ? RZDate::stringWithPattern(*container->date(), "MM-dd") : "Pending";
-        groups << title + "[" + items.join(',') + "]";
+  QString shape(const QModelIndex& parent = {}) {
+    QStringList rows;
+    for (int r = 0; r < model->rowCount(parent); ++r) {
+      const QModelIndex row = model->index(r, 0, parent);
+      if (model->isItemIndex(row)) {
+        rows << row.data(WTItemsModel::NameRole).toString();
+        continue;
       }
-      tasks << task.data(WTItemsModel::NameRole).toString() + "[" + groups.join(',') + "]";
+      const auto group = model->isContainerIndex(row) ? model->containerAt(row) : nullptr;
+      const QString title = !group          ? row.data(WTItemsModel::NameRole).toString()
+                            : group->date() ? RZDate::stringWithPattern(*group->date(), "MM-dd")
+                                            : QStringLiteral("Pending");
+      rows << title + "[" + shape(row) + "]";
     }
-    return tasks.join(' ');
+    return rows.join(parent.isValid() ? QStringLiteral(",") : QStringLiteral(" "));
   }
 
   // Drag of the rows of these records, as the view would start it.
@@ -73,12 +69,11 @@ TEST_F(WTItemsModelTest, TasksInStoredOrderThenPendingThenDaysNewestFirst) {
   model->setProject(project);
   EXPECT_EQ(shape(), "Design[Pending[newer todo,older todo],03-13[ticket],03-11[note,done,morning]] Build[]");
   // Groups are headers: never selected, but a drop target; tasks and items are both.
-  const QModelIndex task = model->index(0, 0);
-  const QModelIndex pending = model->index(0, 0, task);
-  EXPECT_FALSE(model->flags(pending) & Qt::ItemIsSelectable);
-  EXPECT_TRUE(model->flags(pending) & Qt::ItemIsDropEnabled);
-  EXPECT_TRUE(model->flags(task) & Qt::ItemIsSelectable);
-  EXPECT_TRUE(model->flags(model->index(0, 0, pending)) & Qt::ItemIsSelectable);
+  const QModelIndex task = model->index(0, 0), pending = model->index(0, 0, task);
+  const Qt::ItemFlags selectable(Qt::ItemIsSelectable), dropTarget(Qt::ItemIsDropEnabled);
+  EXPECT_EQ(model->flags(pending) & (selectable | dropTarget), dropTarget);
+  EXPECT_EQ(model->flags(task) & selectable, selectable);
+  EXPECT_EQ(model->flags(model->index(0, 0, pending)) & selectable, selectable);
   EXPECT_EQ(pending.data(WTItemsModel::NameRole).toString(), "Pending");
 }
 
@@ -87,15 +82,13 @@ TEST_F(WTItemsModelTest, DayHeadingsNameTheWeekdayAndTheDateInTheUsersLocale) {
   model->setProject(project);
   const QModelIndex day = model->index(0, 0, model->index(0, 0));
   const icu::Locale previous = icu::Locale::getDefault();
-  auto headingIn = [&](const char* name) {
+  for (const auto& [name, heading] :
+       {std::pair{"en_GB", "Tue, 24 Nov 2026"}, std::pair{"en_US", "Tue, Nov 24, 2026"},
+        std::pair{"de_DE", "Di., 24. Nov. 2026"}}) {
     UErrorCode status = U_ZERO_ERROR;
     icu::Locale::setDefault(icu::Locale(name), status);
-    EXPECT_TRUE(U_SUCCESS(status));
-    return day.data(WTItemsModel::NameRole).toString().toStdString();
-  };
-  EXPECT_EQ(headingIn("en_GB"), "Tue, 24 Nov 2026");
-  EXPECT_EQ(headingIn("en_US"), "Tue, Nov 24, 2026");
-  EXPECT_EQ(headingIn("de_DE"), "Di., 24. Nov. 2026");
+    EXPECT_EQ(day.data(WTItemsModel::NameRole).toString().toStdString(), heading) << name;
+  }
   UErrorCode status = U_ZERO_ERROR;
   icu::Locale::setDefault(previous, status);
 }
@@ -155,7 +148,7 @@ TEST_F(WTItemsModelTest, ARunningTimersTickRepaintsOnlyItsRowItsGroupAndItsTask)
   int projectChanges = 0;
   QObject::connect(model.get(), &WTItemsModel::projectChanged, [&] { ++projectChanges; });
 
-  now = now.addingSeconds(61);
+  clockNow = clockNow.addingSeconds(61);
   ASSERT_TRUE(running->peek());
   QCoreApplication::processEvents();
 
@@ -173,45 +166,31 @@ TEST_F(WTItemsModelTest, ARunningTimersTickRepaintsOnlyItsRowItsGroupAndItsTask)
 
   // A peek within the same minute disturbs nobody.
   changed.clear();
-  now = now.addingSeconds(5);
+  clockNow = clockNow.addingSeconds(5);
   EXPECT_FALSE(running->peek());
   QCoreApplication::processEvents();
   EXPECT_EQ(changed.count(), 0);
 }
 
-TEST_F(WTItemsModelTest, ThePasteboardCarriesUuidsInOutlineOrderAndTheTaskFlag) {
-  auto* older = makeItem<WTNote>(design, "older", at(2024, 3, 10));
-  auto* newer = makeItem<WTNote>(design, "newer", at(2024, 3, 12));
-  model->setProject(project);
-  // Handed over in selection order, written in outline order.
-  auto items = dragOf({older, newer});
-  ASSERT_TRUE(items);
-  EXPECT_EQ(WTItemsModel::objectUUIDs(items.get()), (QStringList{newer->uuid(), older->uuid()}));
-  EXPECT_FALSE(WTItemsModel::containsTasks(items.get()));
-  EXPECT_TRUE(items->hasFormat("WTObjectUUIDs"));
-  EXPECT_TRUE(items->hasFormat("WTContainsTasks"));
-
-  auto mixed = dragOf({older, build});
-  EXPECT_EQ(WTItemsModel::objectUUIDs(mixed.get()), (QStringList{older->uuid(), build->uuid()}));
-  EXPECT_TRUE(WTItemsModel::containsTasks(mixed.get()));
-
-  // Only group rows: nothing to drag.
-  const QModelIndex group = model->index(0, 0, model->index(0, 0));
-  EXPECT_EQ(model->mimeData({group}), nullptr);
-}
-
-TEST_F(WTItemsModelTest, DropValidation) {
+// A drag carries the uuids in outline order, whatever the selection's, and says whether tasks go with it;
+// where it may land depends on that.
+TEST_F(WTItemsModelTest, DragsCarryUuidsInOutlineOrderAndLandOnlyWhereTheyFit) {
   auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
   auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11));
   model->setProject(project);
+  auto items = dragOf({time, todo});
+  auto tasks = dragOf({time, build});
+  ASSERT_TRUE(items && tasks);
+  EXPECT_EQ(WTItemsModel::objectUUIDs(items.get()), (QStringList{todo->uuid(), time->uuid()}));
+  EXPECT_EQ(WTItemsModel::objectUUIDs(tasks.get()), (QStringList{time->uuid(), build->uuid()}));
+  EXPECT_FALSE(WTItemsModel::containsTasks(items.get()));
+  EXPECT_TRUE(WTItemsModel::containsTasks(tasks.get()));
+  EXPECT_EQ(model->mimeData({model->index(0, 0, model->index(0, 0))}), nullptr);  // only a group row
   const QModelIndex designRow = model->indexOfObject(design);
   const QModelIndex pendingRow = model->indexOfContainer(design, std::nullopt);
   const QModelIndex dayRow = model->indexOfContainer(design, at(2024, 3, 11, 0));
   const QModelIndex itemRow = model->indexOfObject(time);
   ASSERT_TRUE(pendingRow.isValid() && dayRow.isValid());
-
-  auto items = dragOf({todo, time});
-  auto tasks = dragOf({build, time});
   QMimeData foreign;
   foreign.setText("not ours");
   QMimeData onlyFlag;
@@ -293,6 +272,7 @@ TEST_F(WTItemsModelTest, RowsAreFoundAgainByTheirPersistentIdentity) {
   }
   EXPECT_FALSE(other.indexForPersistentIdentity(design->uuid() + "|12345").isValid());
   EXPECT_FALSE(other.indexForPersistentIdentity("nobody@WTTask").isValid());
+  EXPECT_FALSE(other.indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
 }
 
 TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
@@ -302,18 +282,28 @@ TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
   model->setProject(project);
   EXPECT_TRUE(model->setData(model->indexOfObject(time), "1:30", WTItemsModel::DurationEditRole));
   EXPECT_EQ(time->duration(), 90);
-  EXPECT_TRUE(model->setData(model->indexOfObject(flat), "45", WTItemsModel::DurationEditRole));
+  time->setRunning(true);  // a running entry's length belongs to the clock
+  const struct {
+    const WTObject* row;
+    const char* typed;
+    int role;
+    bool taken;
+  } rows[] = {
+      {flat, "45", WTItemsModel::DurationEditRole, true},
+      {flat, "1.5", WTItemsModel::DurationEditRole, false},  // never a fraction cut to whole minutes
+      {flat, "0:1,5", WTItemsModel::DurationEditRole, false},
+      {expense, "12.50", WTItemsModel::AmountEditRole, true},
+      {expense, "twelve", WTItemsModel::AmountEditRole, false},
+      {expense, "1:00", WTItemsModel::DurationEditRole, false},
+      {time, "2:00", WTItemsModel::DurationEditRole, false},
+      {design, "Design & UX", WTItemsModel::NameRole, true},
+      {flat, "line one\nline two", WTItemsModel::NotesRole, true},
+  };
+  for (const auto& row : rows)
+    EXPECT_EQ(model->setData(model->indexOfObject(row.row), row.typed, row.role), row.taken) << row.typed;
   EXPECT_EQ(flat->duration(), 45);
-  EXPECT_TRUE(model->setData(model->indexOfObject(expense), "12.50", WTItemsModel::AmountEditRole));
   EXPECT_EQ(expense->expense(), Decimal::fromString(u"12.5"));
-  EXPECT_FALSE(model->setData(model->indexOfObject(expense), "twelve", WTItemsModel::AmountEditRole));
-  EXPECT_FALSE(model->setData(model->indexOfObject(expense), "1:00", WTItemsModel::DurationEditRole));
-  // A running entry's length belongs to the clock.
-  time->setRunning(true);
-  EXPECT_FALSE(model->setData(model->indexOfObject(time), "2:00", WTItemsModel::DurationEditRole));
-  EXPECT_TRUE(model->setData(model->indexOfObject(design), "Design & UX", WTItemsModel::NameRole));
   EXPECT_EQ(design->name(), "Design & UX");
-  EXPECT_TRUE(model->setData(model->indexOfObject(flat), "line one\nline two", WTItemsModel::NotesRole));
   EXPECT_EQ(flat->notes(), "line one\nline two");
 }
 

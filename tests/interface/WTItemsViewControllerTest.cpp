@@ -2,54 +2,31 @@
 #include "WTDatePopover.h"
 #include "WTItemCellDelegate.h"
 #include "WTItemContainer.h"
-#include "WTItemsModel.h"
-#include "WTItemsViewController.h"
 #include "WTNavigationController.h"
 #include "WTNotesTextView.h"
-#include "WTOutlineView.h"
 
-#include <QApplication>
-#include <QCalendarWidget>
-#include <QHelpEvent>
 #include <QLabel>
-#include <QLineEdit>
 #include <QMenu>
 #include <QScrollBar>
-#include <QToolTip>
 
 namespace {
 
-class WTItemsViewControllerTest : public UiTest {
+using Part = WTTableCellView::Part;
+
+class WTItemsViewControllerTest : public OutlineTest {
  protected:
-  void SetUp() override {
-    UiTest::SetUp();
-    project = makeProject("Website");
-    design = makeTask(project, "Design");
-    build = makeTask(project, "Build");
-    shown = std::make_unique<ShownOutline>(context.get(), project);
-    controller = &shown->controller;
-    window = &shown->window;
-    tester = std::make_unique<QAbstractItemModelTester>(
-        controller->treeController(), QAbstractItemModelTester::FailureReportingMode::Fatal);
-  }
-  void TearDown() override {
-    tester.reset();
-    shown.reset();
-    UiTest::TearDown();
-  }
-
-  WTOutlineView* outline() { return controller->outlineView(); }
-  WTItemsModel* model() { return controller->treeController(); }
   bool isEditing() { return outline()->isEditing(); }
-  QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
-
-  WTProject* project = nullptr;
-  WTTask* design = nullptr;
-  WTTask* build = nullptr;
-  std::unique_ptr<ShownOutline> shown;
-  WTItemsViewController* controller = nullptr;
-  TestHostWindow* window = nullptr;
-  std::unique_ptr<QAbstractItemModelTester> tester;
+  void selectOnly(const WTObject* object) {
+    outline()->selectionModel()->select(rowOf(object),
+                                        QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  }
+  QList<const WTObject*> selected() {
+    QList<const WTObject*> objects;
+    for (const QModelIndex& index : outline()->selectionModel()->selectedRows())
+      objects.append(model()->objectAt(index));
+    return objects;
+  }
+  QLabel* label(const char* name) { return controller->view()->findChild<QLabel*>(name); }
 };
 
 TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpenRows) {
@@ -93,25 +70,37 @@ TEST_F(WTItemsViewControllerTest, TheTimerButtonStartsAndSelectsThenStops) {
   EXPECT_FALSE(design->running());
 }
 
-// The tip names the button under the mouse; a row's text has none (it once said "Start" everywhere).
-TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsNotToTheWholeRow) {
-  const QModelIndex task = rowOf(design);
-  const QRect visual = outline()->visualRect(task);
-  const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-  const WTTableCellView& cell = controller->cellViewPrototypeForIndex(task);
-  auto tipAt = [&](const QPointF& point) {
-    QToolTip::hideText();  // fades out: wait until it is gone
-    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
-    QHelpEvent help(QEvent::ToolTip, point.toPoint(), outline()->viewport()->mapToGlobal(point.toPoint()));
-    QApplication::sendEvent(outline()->viewport(), &help);
-    return QToolTip::isVisible() ? QToolTip::text() : QString();
+// A tip names the button or field under the mouse and what an edit of it does; a row's text has none
+// (it once said "Start" everywhere), nor has a time's cost, which follows from the time.
+TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsAndEditableFieldsNotToTheWholeRow) {
+  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
+  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
+  controller->expandContainerOfItem(time);  // its day is not shown yet: only its task opens
+  EXPECT_TRUE(outline()->isExpanded(rowOf(design)));
+  endTurn();
+  controller->expandContainerOfItem(time);
+  ASSERT_FALSE(design->buttonTitle().isEmpty());
+  const struct {
+    const WTObject* object;
+    Part part;
+    QString says;  // all of it for a task's tip, else a part of it; empty: no tip
+  } rows[] = {
+      {design, Part::TimerButton, design->buttonTitle()},
+      {design, Part::Name, {}},
+      {time, Part::Label, "the end stays"},
+      {time, Part::End, "the start stays"},
+      {time, Part::Duration, "the end moves"},
+      {time, Part::Cost, {}},
+      {expense, Part::Cost, "double-click"},
   };
-  const QRectF button = cell.partRect(WTTableCellView::Part::TimerButton, row);
-  ASSERT_FALSE(button.isEmpty());
-  EXPECT_EQ(tipAt(button.center()), design->buttonTitle());
-  EXPECT_FALSE(design->buttonTitle().isEmpty());
-  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
-  EXPECT_EQ(tipAt(name.center()), QString());
+  for (const auto& row : rows) {
+    const QString tip = shown->tipAt(shown->centreOf(row.object, row.part));
+    if (row.says.isEmpty() || row.object == design) {
+      EXPECT_EQ(tip, row.says) << row.object->name().toStdString() << ' ' << int(row.part);
+    } else {
+      EXPECT_TRUE(tip.contains("double-click") && tip.contains(row.says)) << tip.toStdString();
+    }
+  }
   QToolTip::hideText();
 }
 
@@ -120,16 +109,12 @@ TEST_F(WTItemsViewControllerTest, TickingAToDosBoxCompletesItIntoItsDaysOpenGrou
   endTurn();
   controller->expandContainerOfItem(todo);
   auto tick = [&] {
-    const QRect visual = outline()->visualRect(rowOf(todo));
-    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    const QRectF box =
-        controller->cellViewPrototypeForIndex(rowOf(todo)).partRect(WTTableCellView::Part::Checkbox, row);
-    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, box.center().toPoint());
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, shown->centreOf(todo, Part::Checkbox));
   };
   tick();
   EXPECT_TRUE(todo->completed());
   EXPECT_EQ(context->undoManager().undoActionName(), "Complete To-Do");
-  const QModelIndex today = model()->indexOfContainer(design, RZDate::midnight(now));
+  const QModelIndex today = model()->indexOfContainer(design, RZDate::midnight(clockNow));
   ASSERT_TRUE(today.isValid());
   EXPECT_EQ(model()->indexOfContainerOfItem(todo), today);
   EXPECT_TRUE(outline()->isExpanded(today));
@@ -155,41 +140,15 @@ TEST_F(WTItemsViewControllerTest, TheDatePopoverMovesTheItemToThePickedDay) {
   popover->setDate(QDate(2024, 3, 9));
   popover->hide();
   EXPECT_EQ(controller->currentItem(), nullptr);
-  EXPECT_EQ(RZDate::stringWithPattern(*time->startDate(), "yyyy-MM-dd HH:mm"), "2024-03-09 09:15");
-  EXPECT_EQ(time->duration(), 30);
+  EXPECT_EQ(time->startDate(), at(2024, 3, 9, 9, 15));
   const QModelIndex day = model()->indexOfContainer(design, at(2024, 3, 9, 0));
   ASSERT_TRUE(day.isValid());
   EXPECT_TRUE(outline()->isExpanded(day));
 
   // Closed without another day chosen: the item is left alone.
   controller->openDatePicker(other, QRect(0, 0, 20, 20));
-  const Date before = *other->startDate();
   popover->hide();
-  EXPECT_EQ(*other->startDate(), before);
-}
-
-TEST_F(WTItemsViewControllerTest, RowHeightsFollowTheKindAndTheNotes) {
-  auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 14));
-  controller->expandContainerOfItem(note);
-  endTurn();
-  const QModelIndex task = rowOf(design);
-  const QModelIndex group = model()->indexOfContainerOfItem(note);
-  const QModelIndex item = rowOf(note);
-  // Tasks and groups take their cell's height exactly; items never less than 30 points.
-  EXPECT_EQ(controller->heightOfRow(task),
-            controller->cellViewPrototypeForIndex(task).requestedHeight(false));
-  EXPECT_LT(controller->heightOfRow(group), 30);
-  EXPECT_EQ(controller->heightOfRow(item), 30);
-
-  // Notes put their field under the main line: at least 20 points, at most 300.
-  note->setNotes("one line");
-  const qreal oneLine = controller->heightOfRow(item);
-  EXPECT_GE(oneLine, 30 + WTTableCellView::kMinimumNotesHeight);
-  note->setNotes(QString("a line of notes\n").repeated(200));
-  EXPECT_EQ(controller->heightOfRow(item),
-            30 + WTTableCellView::kMaximumNotesHeight + WTTableCellView::kNotesBottomMargin);
-  note->setNotes(QString());
-  EXPECT_EQ(controller->heightOfRow(item), 30);
+  EXPECT_EQ(other->startDate(), at(2024, 3, 2));
 }
 
 TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksItWhenLeft) {
@@ -197,38 +156,34 @@ TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksIt
   endTurn();
   controller->expandContainerOfItem(flat);
   QTest::qWait(10);  // the outline lays out its rows
-  const QModelIndex row = rowOf(flat);
-  const qreal plain = outline()->visualRect(row).height();
+  auto height = [&] {
+    QTest::qWait(10);
+    return outline()->visualRect(rowOf(flat)).height();
+  };
+  const qreal plain = height();
   EXPECT_EQ(plain, 30);
 
   controller->showNotes(flat);
   WTNotesTextView* editor = controller->cellDelegate()->notesEditor();
   ASSERT_NE(editor, nullptr);
-  QCoreApplication::processEvents();
-  const qreal open = outline()->visualRect(row).height();
+  const qreal open = height();
   EXPECT_GE(open, plain + WTTableCellView::kMinimumNotesHeight);  // shown while edited, though empty
-
   editor->setPlainText("first\nsecond\nthird\nfourth");
-  QTest::qWait(10);
-  const qreal grown = outline()->visualRect(row).height();
-  EXPECT_GT(grown, open);
+  EXPECT_GT(height(), open);
   EXPECT_EQ(flat->notes(), QString());  // stored only when editing ends
 
   // Cleared while still edited: the field stays until it is left.
   editor->clear();
-  QTest::qWait(10);
-  EXPECT_GE(outline()->visualRect(row).height(), plain + WTTableCellView::kMinimumNotesHeight);
+  EXPECT_GE(height(), plain + WTTableCellView::kMinimumNotesHeight);
   outline()->setFocus();
-  QTest::qWait(10);
+  EXPECT_EQ(height(), plain);
   EXPECT_EQ(controller->cellDelegate()->notesEditor(), nullptr);
-  EXPECT_EQ(outline()->visualRect(row).height(), plain);
 
   controller->showNotes(flat);
   controller->cellDelegate()->notesEditor()->setPlainText("kept");
   outline()->setFocus();
-  QTest::qWait(10);
+  EXPECT_GT(height(), plain);
   EXPECT_EQ(flat->notes(), "kept");
-  EXPECT_GT(outline()->visualRect(row).height(), plain);
 }
 
 TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
@@ -269,7 +224,6 @@ TEST_F(WTItemsViewControllerTest, WindowCommandsActOnTheProjectAndTheSelection) 
   ASSERT_EQ(project->tasks().size(), 3);
   WTTask* fresh = project->tasks().last();
   EXPECT_EQ(outline()->currentIndex(), rowOf(fresh));
-  EXPECT_TRUE(isEditing());
   auto* editor = outline()->findChild<QLineEdit*>("nameEditor");
   ASSERT_NE(editor, nullptr);
   editor->setText("Deploy");
@@ -281,75 +235,39 @@ TEST_F(WTItemsViewControllerTest, WindowCommandsActOnTheProjectAndTheSelection) 
   controller->selectItem(note);
   outline()->selectionModel()->select(rowOf(build), QItemSelectionModel::Select | QItemSelectionModel::Rows);
   controller->removeSelectedObjects();
-  EXPECT_TRUE(note->isDeleted() || !context->fetch<WTNote>().contains(note));
+  EXPECT_FALSE(context->fetch<WTNote>().contains(note));
   EXPECT_EQ(project->tasks(), (QList<WTTask*>{design, fresh}));
   EXPECT_EQ(model()->rowCount(), 2);
 }
 
-TEST_F(WTItemsViewControllerTest, AnEmptyRateFieldInherits) {
-  QLineEdit* rate = controller->rateField();
-  rate->setText("120");
-  controller->projectRateAction();
-  EXPECT_EQ(project->storedRate(), Decimal(120));
-  rate->clear();
-  controller->projectRateAction();
-  EXPECT_EQ(project->storedRate(), std::nullopt);
-  EXPECT_EQ(rate->placeholderText(), "Inherited: 50.00");
-}
-
-}  // namespace
-
-namespace {
-
+// What undo brings back is opened and selected: an item in its day, a whole task as its own row; a
+// change that is not undo leaves the selection alone.
 TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
   WTNote* kept = makeItem<WTNote>(build, "kept", at(2024, 3, 13));
   WTNote* note = makeItem<WTNote>(build, "gone", at(2024, 3, 12));
   endTurn();
-  auto selectOnly = [&](const WTObject* object) {
-    outline()->selectionModel()->select(rowOf(object),
-                                        QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
-  };
-  auto selected = [&] {
-    QList<const WTObject*> objects;
-    for (const QModelIndex& index : outline()->selectionModel()->selectedRows()) {
-      objects.append(model()->objectAt(index));
-    }
-    return objects;
-  };
-
   controller->expandContainerOfItem(note);
-  selectOnly(note);
-  controller->removeSelectedObjects();
-  endTurn();
-  outline()->collapseAll();
-  selectOnly(design);
-  context->undoManager().undo();
-  endTurn();
-  ASSERT_TRUE(rowOf(note).isValid());
+  auto removeAndUndo = [&](const WTObject* removed) {
+    selectOnly(removed);
+    controller->removeSelectedObjects();
+    endTurn();
+    outline()->collapseAll();
+    selectOnly(design);
+    context->undoManager().undo();
+    endTurn();
+    ASSERT_TRUE(rowOf(removed).isValid());
+    EXPECT_EQ(selected(), (QList<const WTObject*>{removed}));
+    EXPECT_EQ(outline()->currentIndex(), rowOf(removed));
+  };
+  removeAndUndo(note);
   EXPECT_TRUE(outline()->isExpanded(rowOf(build)));
   EXPECT_TRUE(outline()->isExpanded(rowOf(note).parent()));
   EXPECT_FALSE(outline()->isExpanded(model()->indexOfContainerOfItem(kept)));
-  EXPECT_EQ(selected(), (QList<const WTObject*>{note}));
-  EXPECT_EQ(outline()->currentIndex(), rowOf(note));
-
-  // A whole task comes back as itself: its row is selected, not each of its items.
-  selectOnly(build);
-  controller->removeSelectedObjects();
-  endTurn();
-  selectOnly(design);
-  context->undoManager().undo();
-  endTurn();
-  EXPECT_EQ(selected(), (QList<const WTObject*>{build}));
-
-  // A change that is not undo leaves the selection alone.
+  removeAndUndo(build);
   makeItem<WTNote>(design, "new", at(2024, 3, 14));
   endTurn();
   EXPECT_EQ(selected(), (QList<const WTObject*>{build}));
 }
-
-}  // namespace
-
-namespace {
 
 // The header's name, rate and totals share its width without covering one another, at the narrowest
 // window and with or without a vertical scroll bar beside the rows.
@@ -357,32 +275,28 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCost
   project->setName("The new website of the regional library and its branches");
   for (int day = 1; day <= 25; ++day) makeItem<WTTime>(design, "Sketches", at(2024, 3, day));
   endTurn();
-  auto* title = controller->view()->findChild<QLabel*>("projectTitle");
-  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
-  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
-  ASSERT_NE(title, nullptr);
-  ASSERT_NE(duration, nullptr);
-  ASSERT_NE(cost, nullptr);
+  QLabel* title = label("projectTitle");
+  QLabel* duration = label("projectDuration");
+  QLabel* cost = label("projectCost");
+  ASSERT_TRUE(title && duration && cost);
   QLineEdit* rate = controller->rateField();
   EXPECT_EQ(duration->text(), "12:30");
   for (const bool scrolls : {false, true}) {
     if (scrolls) outline()->expandAll();
     for (const QSize size : {QSize(620, 600), QSize(900, 600), QSize(1200, 600)}) {
-      window->resize(size);
+      shown->window.resize(size);
       QApplication::processEvents();
       SCOPED_TRACE(testing::Message() << size.width() << (scrolls ? " with a scroll bar" : ""));
       ASSERT_EQ(outline()->verticalScrollBar()->isVisible(), scrolls);
       EXPECT_EQ(controller->view()->width(), size.width());  // the header does not widen the window
       const QRect row = outline()->visualRect(rowOf(design));
       const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
-      WTTableCellView& cell = controller->cellViewPrototypeForIndex(rowOf(design));
-      for (const auto& [label, part] : {std::pair{duration, WTTableCellView::Part::Duration},
-                                        std::pair{cost, WTTableCellView::Part::Cost}}) {
-        const QRect column = cell.partRect(part, line).toRect();
-        const QPoint columnLeft = outline()->viewport()->mapToGlobal(column.topLeft());
-        const QPoint labelLeft = label->mapToGlobal(QPoint(0, 0));
-        EXPECT_EQ(labelLeft.x(), columnLeft.x());
-        EXPECT_EQ(label->width(), column.width());
+      for (const auto& [shownIn, part] : {std::pair{duration, Part::Duration}, std::pair{cost, Part::Cost}}) {
+        const QRect column =
+            controller->cellViewPrototypeForIndex(rowOf(design)).partRect(part, line).toRect();
+        EXPECT_EQ(shownIn->mapToGlobal(QPoint(0, 0)).x(),
+                  outline()->viewport()->mapToGlobal(column.topLeft()).x());
+        EXPECT_EQ(shownIn->width(), column.width());
       }
       EXPECT_LT(rate->geometry().right(), duration->geometry().left());
       EXPECT_LT(title->geometry().right(), rate->geometry().left());
@@ -399,37 +313,29 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCost
 TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRateAtOnce) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
-  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
-  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
   ASSERT_TRUE(model()->setData(rowOf(time), "11:45", WTItemsModel::StartTimeEditRole));
-  EXPECT_EQ(duration->text(), "00:45");
-  EXPECT_EQ(cost->text().right(5), "37.50");  // at the inherited 50
+  EXPECT_EQ(label("projectDuration")->text(), "00:45");
+  EXPECT_EQ(label("projectCost")->text().right(5), "37.50");  // at the inherited 50
   endTurn();
   design->setRate(Decimal(80));
   endTurn();
-  EXPECT_EQ(cost->text().right(5), "60.00");
+  EXPECT_EQ(label("projectCost")->text().right(5), "60.00");
   context->undoManager().undo();
-  EXPECT_EQ(cost->text().right(5), "37.50");
+  EXPECT_EQ(label("projectCost")->text().right(5), "37.50");
   context->undoManager().undo();  // the start
-  EXPECT_EQ(duration->text(), "00:30");
+  EXPECT_EQ(label("projectDuration")->text(), "00:30");
 }
-
-}  // namespace
-
-namespace {
 
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));
   QAction* spent = nullptr;
-  for (QAction* action : menu->actions()) {
+  for (QAction* action : menu->actions())
     if (action->text().startsWith("New Time Entry")) spent = action;
-  }
   ASSERT_NE(spent, nullptr);
   spent->trigger();
-  const QList<WTItem*> items = build->items();
-  ASSERT_EQ(items.size(), 1);
-  ASSERT_EQ(items.first()->entity(), WTEntity::Time);
-  auto* time = static_cast<WTTime*>(items.first());
+  ASSERT_EQ(build->items().size(), 1);
+  ASSERT_EQ(build->items().first()->entity(), WTEntity::Time);
+  auto* time = static_cast<WTTime*>(build->items().first());
   EXPECT_FALSE(time->running());
   ASSERT_TRUE(isEditing());
   auto* editor = outline()->viewport()->findChild<QLineEdit*>("durationEditor");
@@ -437,146 +343,72 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   editor->setText("1:30");
   outline()->endEditing();
   endTurn();
-  EXPECT_EQ(time->duration(), 90);
   EXPECT_FALSE(time->running());
   // Spent already: it ends now, not an hour and a half from now.
-  EXPECT_EQ(time->endDate(), now);
-  EXPECT_EQ(time->startDate(), now.addingSeconds(-90 * 60));
+  EXPECT_EQ(time->endDate(), clockNow);
+  EXPECT_EQ(time->startDate(), clockNow.addingSeconds(-90 * 60));
   EXPECT_EQ(rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30");
   EXPECT_EQ(rowOf(time).data(WTItemsModel::EndTimeEditRole).toString(), "10:00");
 }
 
-TEST_F(WTItemsViewControllerTest, DurationsAndAmountsSayTheyCanBeChanged) {
-  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
-  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
-  endTurn();
-  controller->expandContainerOfItem(time);
-  auto tipAt = [&](const WTObject* object, WTTableCellView::Part part) {
-    const QModelIndex index = rowOf(object);
-    const QRect visual = outline()->visualRect(index);
-    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    const QPoint point = controller->cellViewPrototypeForIndex(index).partRect(part, row).center().toPoint();
-    QToolTip::hideText();
-    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
-    QHelpEvent help(QEvent::ToolTip, point, outline()->viewport()->mapToGlobal(point));
-    QApplication::sendEvent(outline()->viewport(), &help);
-    return QToolTip::isVisible() ? QToolTip::text() : QString();
-  };
-  // Each of an entry's fields says what an edit of it moves and what stays.
-  const std::pair<WTTableCellView::Part, const char*> timeTips[] = {
-      {WTTableCellView::Part::Label, "the end stays"},
-      {WTTableCellView::Part::End, "the start stays"},
-      {WTTableCellView::Part::Duration, "the end moves"},
-  };
-  for (const auto& [part, says] : timeTips) {
-    const QString tip = tipAt(time, part);
-    EXPECT_TRUE(tip.contains("double-click") && tip.contains(says)) << tip.toStdString();
-  }
-  EXPECT_TRUE(tipAt(expense, WTTableCellView::Part::Cost).contains("double-click"));
-  EXPECT_EQ(tipAt(time, WTTableCellView::Part::Cost), QString());  // a time's cost follows from it
-  QToolTip::hideText();
-}
-
-}  // namespace
-
-namespace {
-
-TEST_F(WTItemsViewControllerTest, AnEntrysStartAndEndAreChangedInItsRowEachKeepingTheOther) {
+// A double-click opens a field, and what is refused leaves the entry as it was; Tab walks on through start,
+// end, duration and name, committing each on the way, and Shift+Tab walks back.
+TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingTheOthers) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();
   controller->expandContainerOfItem(time);
-  const Date end = *time->endDate();
-  auto typeInto = [&](WTTableCellView::Part part, const char* editorName, const char* text) {
-    const QModelIndex index = rowOf(time);
-    const QRect visual = outline()->visualRect(index);
-    const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    const QRectF field = controller->cellViewPrototypeForIndex(index).partRect(part, row);
-    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
-    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, field.center().toPoint());
-    auto* editor = outline()->viewport()->findChild<QLineEdit*>(editorName);
-    if (!editor) return QString("no editor");
-    const QString shown = editor->text();
-    editor->setText(text);
+  const struct {
+    Part part;
+    const char* typed;
+    const char* shownBefore;
+    int startHour, startMinute, endHour, endMinute;
+  } rows[] = {
+      {Part::Label, "11:45", "12:00", 11, 45, 12, 30}, {Part::Label, "12:40", "11:45", 11, 45, 12, 30},
+      {Part::Label, "25:00", "11:45", 11, 45, 12, 30}, {Part::Label, "noon", "11:45", 11, 45, 12, 30},
+      {Part::Label, "9:7", "11:45", 11, 45, 12, 30},   {Part::Label, "9", "11:45", 9, 0, 12, 30},
+      {Part::End, "17:20", "12:30", 9, 0, 17, 20},     {Part::End, "8:59", "17:20", 9, 0, 17, 20},
+      {Part::End, "24:00", "17:20", 9, 0, 17, 20},     {Part::End, "later", "17:20", 9, 0, 17, 20},
+  };
+  for (const auto& row : rows) {
+    const QPoint field = shown->centreOf(time, row.part);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, field);
+    QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, field);
+    QLineEdit* editor = shown->openEditor();
+    ASSERT_NE(editor, nullptr) << row.typed;
+    EXPECT_EQ(editor->objectName(), row.part == Part::End ? "endEditor" : "startEditor");
+    EXPECT_EQ(editor->text(), row.shownBefore) << row.typed;
+    editor->setText(row.typed);
     outline()->endEditing();
     endTurn();
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);  // the closed editor goes
-    return shown;
-  };
-  auto typeStart = [&](const char* text) {
-    return typeInto(WTTableCellView::Part::Label, "startEditor", text);
-  };
-  auto typeEnd = [&](const char* text) { return typeInto(WTTableCellView::Part::End, "endEditor", text); };
-  EXPECT_EQ(typeStart("11:45"), "12:00");
-  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45));
-  EXPECT_EQ(time->endDate(), end);
-  EXPECT_EQ(time->duration(), 45);
-  for (const char* refused : {"12:40", "25:00", "noon", "9:7"}) {
-    EXPECT_EQ(typeStart(refused), "11:45") << refused;
-    EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 45)) << refused;
+    EXPECT_EQ(time->startDate(), at(2024, 3, 13, row.startHour, row.startMinute)) << row.typed;
+    EXPECT_EQ(time->endDate(), at(2024, 3, 13, row.endHour, row.endMinute)) << row.typed;
   }
-  EXPECT_EQ(typeStart("9"), "11:45");
-  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
-  EXPECT_EQ(time->duration(), 210);
 
-  EXPECT_EQ(typeEnd("17:20"), "12:30");
-  EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));
-  EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20));
-  EXPECT_EQ(time->duration(), 500);
-  for (const char* refused : {"8:59", "24:00", "later"}) {
-    EXPECT_EQ(typeEnd(refused), "17:20") << refused;
-    EXPECT_EQ(time->endDate(), at(2024, 3, 13, 17, 20)) << refused;
-  }
-}
-
-}  // namespace
-
-namespace {
-
-TEST_F(WTItemsViewControllerTest, TabWalksThroughAnEntrysFieldsInTheirOrder) {
-  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));
-  endTurn();
-  controller->expandContainerOfItem(time);
-  const QModelIndex index = rowOf(time);
-  outline()->setCurrentIndex(index);
   controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Start);
-  outline()->edit(index);
-  auto openEditor = [&] {
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-    QApplication::processEvents();
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-    const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
-    return editors.size() == 1 ? editors.first() : nullptr;
-  };
-  QLineEdit* editor = openEditor();
-  ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "startEditor");
-  // Start, end, duration, name; each is committed on the way.
-  const std::pair<const char*, const char*> typed[] = {
-      {"startEditor", "11:00"}, {"endEditor", "12:15"}, {"durationEditor", "1:45"}};
+  outline()->edit(rowOf(time));
+  const std::pair<const char*, const char*> typed[] = {{"startEditor", "11:00"},
+                                                       {"endEditor", "12:15"},
+                                                       {"durationEditor", "1:45"},
+                                                       {"nameEditor", "Drawings"}};
   for (const auto& [name, text] : typed) {
+    QLineEdit* editor = shown->openEditor();
     ASSERT_NE(editor, nullptr) << name;
     EXPECT_EQ(editor->objectName(), name);
     editor->setText(text);
+    if (editor->objectName() == "nameEditor") break;
     QTest::keyClick(editor, Qt::Key_Tab);
-    editor = openEditor();
   }
-  ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "nameEditor");
-  editor->setText("Drawings");
   outline()->endEditing();
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 11, 0));
   EXPECT_EQ(time->endDate(), at(2024, 3, 13, 12, 45));
   EXPECT_EQ(time->name(), "Drawings");
   EXPECT_EQ(outline()->currentIndex(), rowOf(time));
-  // Back from the name to the duration.
   controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::Name);
   outline()->edit(rowOf(time));
-  editor = openEditor();
-  ASSERT_NE(editor, nullptr);
-  QTest::keyClick(editor, Qt::Key_Backtab, Qt::ShiftModifier);
-  editor = openEditor();
-  ASSERT_NE(editor, nullptr);
-  EXPECT_EQ(editor->objectName(), "durationEditor");
+  ASSERT_NE(shown->openEditor(), nullptr);
+  QTest::keyClick(shown->openEditor(), Qt::Key_Backtab, Qt::ShiftModifier);
+  ASSERT_NE(shown->openEditor(), nullptr);
+  EXPECT_EQ(shown->openEditor()->objectName(), "durationEditor");
   outline()->endEditing();
 }
 

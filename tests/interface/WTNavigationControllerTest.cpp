@@ -1,5 +1,4 @@
 #include "UiFixture.h"
-#include "WTNavigationController.h"
 
 #include <QLabel>
 
@@ -18,39 +17,41 @@ class Page : public WTViewController {
   QString name_;
 };
 
-QList<QWidget*> visibleChildren(QWidget* parent) {
-  QList<QWidget*> result;
-  for (QWidget* child : parent->findChildren<QWidget*>(Qt::FindDirectChildrenOnly)) {
-    if (child->isVisible()) result << child;
+// A stack in a host window, with a root page and a detail page to push.
+struct WTNavigationControllerTest : ::testing::Test {
+  WTNavigationControllerTest() {
+    window.stack = &stack;
+    window.setCentralWidget(stack.view());
+    window.resize(400, 300);
   }
-  return result;
-}
-
-TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
+  QList<QWidget*> visibleViews() {
+    QList<QWidget*> result;
+    for (QWidget* child : stack.view()->findChildren<QWidget*>(Qt::FindDirectChildrenOnly))
+      if (child->isVisible()) result << child;
+    return result;
+  }
   TestHostWindow window;
   WTNavigationController stack;
-  window.stack = &stack;
-  window.setCentralWidget(stack.view());
-  window.resize(400, 300);
+  Page root{"root"}, detail{"detail"};
+};
+
+TEST_F(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   window.show();
   ASSERT_TRUE(QTest::qWaitForWindowExposed(&window));
-
-  Page root("root"), detail("detail");
   stack.pushViewController(&root);
   EXPECT_FALSE(stack.isAnimating());  // onto an empty stack: at once
   EXPECT_EQ(root.displayed, 1);
-  EXPECT_EQ(visibleChildren(stack.view()), QList<QWidget*>{root.view()});
+  EXPECT_EQ(visibleViews(), QList<QWidget*>{root.view()});
   EXPECT_EQ(root.view()->geometry(), stack.view()->rect());
 
   stack.pushViewController(&detail);
   EXPECT_TRUE(stack.isAnimating());
   EXPECT_EQ(detail.displayed, 1);
   EXPECT_EQ(stack.viewControllers(), (QList<WTViewController*>{&root, &detail}));
-  // Mid-slide the new view comes from the right.
   QTest::qWait(60);
-  EXPECT_GT(detail.view()->x(), 0);
+  EXPECT_GT(detail.view()->x(), 0);  // mid-slide the new view comes from the right
   ASSERT_TRUE(QTest::qWaitFor([&] { return !stack.isAnimating(); }, 2000));
-  EXPECT_EQ(visibleChildren(stack.view()), QList<QWidget*>{detail.view()});
+  EXPECT_EQ(visibleViews(), QList<QWidget*>{detail.view()});
   EXPECT_EQ(detail.view()->geometry(), stack.view()->rect());
 
   stack.popViewController();
@@ -58,11 +59,9 @@ TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   QTest::qWait(60);
   EXPECT_LT(root.view()->x(), 0);  // back in from the left
   stack.finishAnimation();
-  EXPECT_EQ(visibleChildren(stack.view()), QList<QWidget*>{root.view()});
+  EXPECT_EQ(visibleViews(), QList<QWidget*>{root.view()});
   EXPECT_EQ(root.displayed, 1);  // a pop does not announce a display
-  EXPECT_EQ(stack.viewControllers(), QList<WTViewController*>{&root});
-
-  stack.popViewController();  // the root stays
+  stack.popViewController();     // the root stays
   EXPECT_EQ(stack.viewControllers(), QList<WTViewController*>{&root});
   // Resizing keeps the one view filling the stack.
   window.resize(500, 350);
@@ -70,12 +69,7 @@ TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   EXPECT_EQ(root.view()->geometry(), stack.view()->rect());
 }
 
-TEST(WTNavigationControllerTest, APushFromAControllerWaitsForTheNextTurn) {
-  TestHostWindow window;
-  WTNavigationController stack;
-  window.stack = &stack;
-  window.setCentralWidget(stack.view());
-  Page root("root"), detail("detail");
+TEST_F(WTNavigationControllerTest, APushFromAControllerWaitsForTheNextTurn) {
   stack.pushViewController(&root);
   window.show();
   root.pushViewController(&detail);

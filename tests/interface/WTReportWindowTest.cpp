@@ -1,6 +1,5 @@
 #include "ModelFixture.h"
 
-#include "LogCapture.h"
 #include "WTCustomRangeDialog.h"
 #include "WTExportController.h"
 #include "WTRangePopUpButton.h"
@@ -64,20 +63,15 @@ class ReportWindowTest : public ModelTest {
     ModelTest::SetUp();
     setNow(berlin(2024, 3, 20, 12));
     client = WTClient::insertNewObject(context.get());
-    client->setName(QStringLiteral("Acme"));
-    web = WTProject::insertNewObject(context.get());
-    web->setName(QStringLiteral("Website"));
-    web->setClient(client);
-    backend = WTProject::insertNewObject(context.get());
-    backend->setName(QStringLiteral("Backend"));
-    backend->setClient(client);
-    design = makeTask(web, QStringLiteral("Design"));
-    design->setRate(Decimal::fromString(QStringLiteral("60")).value());
-    makeTime(design, berlin(2024, 3, 3, 9), berlin(2024, 3, 3, 10, 30))->setName(QStringLiteral("Kick-off"));
-    makeTime(design, berlin(2024, 3, 4, 9), berlin(2024, 3, 4, 10))->setName(QStringLiteral("Review"));
-    api = makeTask(backend, QStringLiteral("API"));
-    api->setRate(Decimal::fromString(QStringLiteral("60")).value());
-    makeTime(api, berlin(2024, 2, 10, 9), berlin(2024, 2, 10, 11))->setName(QStringLiteral("Schema"));
+    client->setName("Acme");
+    web = projectOfAcme("Website");
+    backend = projectOfAcme("Backend");
+    design = makeTask(web, "Design");
+    api = makeTask(backend, "API");
+    for (WTTask* task : {design, api}) task->setRate(Decimal(60));
+    makeTime(design, berlin(2024, 3, 3, 9), berlin(2024, 3, 3, 10, 30));
+    makeTime(design, berlin(2024, 3, 4, 9), berlin(2024, 3, 4, 10));
+    makeTime(api, berlin(2024, 2, 10, 9), berlin(2024, 2, 10, 11));
     ASSERT_TRUE(context->save().ok());
     QFile::remove(WTReportGenerator::userTemplatePath());
   }
@@ -88,6 +82,12 @@ class ReportWindowTest : public ModelTest {
     ModelTest::TearDown();
   }
 
+  WTProject* projectOfAcme(const QString& name) {
+    auto* project = WTProject::insertNewObject(context.get());
+    project->setName(name);
+    project->setClient(client);
+    return project;
+  }
   WTReportWindowController* openReport(const QList<WTProject*>& projects) {
     window = std::make_unique<WTReportWindowController>(context.get());
     window->resize(700, 400);
@@ -106,30 +106,22 @@ class ReportWindowTest : public ModelTest {
   std::unique_ptr<WTReportWindowController> window;
 };
 
-TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelOfDetailAndTheUsersTemplateWins) {
+// The segments choose the mode the report is rendered at (here seen through the user's template).
+TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelOfDetail) {
   useUserTemplate(
-      QStringLiteral("mode={{ mode }} client={{ client.name }} "
-                     "{% for project in projects %}[{{ project.name }}]{% /for %}"));
+      QStringLiteral("mode={{ mode }} {% for project in projects %}[{{ project.name }}]{% /for %}"));
   openReport({web});
-  EXPECT_EQ(window->html(), "mode=0 client=Acme [Website]");
+  EXPECT_EQ(window->html(), "mode=0 [Website]");
   EXPECT_EQ(window->segmentedControl()->checkedId(), 0);
   for (int mode : {3, 1, 2}) {
     window->segmentedControl()->button(mode)->click();
     EXPECT_EQ(window->mode(), mode);
-    EXPECT_EQ(window->html(), QStringLiteral("mode=%1 client=Acme [Website]").arg(mode));
-    EXPECT_TRUE(window->webView()->toPlainText().startsWith(QStringLiteral("mode=%1").arg(mode)));
+    EXPECT_EQ(window->webView()->toPlainText(), QStringLiteral("mode=%1 [Website]").arg(mode));
   }
   EXPECT_TRUE(window->errorBar()->isHidden());
-
-  // Without a user template the built-in report is the one rendered.
-  QFile::remove(WTReportGenerator::userTemplatePath());
-  window->refreshWebContent();
-  EXPECT_TRUE(window->html().contains("<html")) << window->html().left(200).toStdString();
-  EXPECT_TRUE(window->webView()->toPlainText().contains("Website"));
 }
 
 TEST_F(ReportWindowTest, ATemplateErrorIsNamedWithItsLineUntilTheNextRender) {
-  LogCapture log;
   useUserTemplate(QStringLiteral("<p>fine</p>\n<p>{{ nosuchvariable }}</p>\n{% nosuchmarker %}\n"));
   openReport({web});
   EXPECT_FALSE(window->errorBar()->isHidden());
@@ -137,7 +129,6 @@ TEST_F(ReportWindowTest, ATemplateErrorIsNamedWithItsLineUntilTheNextRender) {
   EXPECT_TRUE(bar.contains("line 2")) << bar.toStdString();
   EXPECT_TRUE(bar.contains("nosuchvariable")) << bar.toStdString();
   EXPECT_TRUE(bar.contains("1 more")) << bar.toStdString();
-  EXPECT_TRUE(log.contains("Template error: "));
   // The output made before and after the error is still shown.
   EXPECT_TRUE(window->webView()->toPlainText().contains("fine"));
 
@@ -278,45 +269,38 @@ TEST_F(ReportWindowTest, AClientReportCoversExactlyItsProjectsIncludingOnesAdded
   EXPECT_EQ(window->projects().size(), 2);
   auto* other = WTProject::insertNewObject(context.get());
   other->setName(QStringLiteral("Elsewhere"));  // no client: never in Acme's report
-  auto* later = WTProject::insertNewObject(context.get());
-  later->setName(QStringLiteral("Later"));
-  later->setClient(client);
+  projectOfAcme("Later");
   ASSERT_TRUE(context->save().ok());
   EXPECT_TRUE(window->html().contains("[Later]"));
   EXPECT_FALSE(window->html().contains("Elsewhere"));
   EXPECT_EQ(window->windowTitle(), "Report — Acme");
 }
 
+// What the lines hold is the CSV export's; the window writes them for its mode to the file chosen, and
+// nothing when the choice is cancelled or the folder is missing.
 TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   openReport({web});
   const QString csv = dir.filePath(QStringLiteral("report.csv"));
   QStringList asked;
-  window->setSaveLocationChooser([&](QWidget*, const QString& title, const QString& filter, const QString&) {
-    asked << title + QLatin1Char('|') + filter;
-    return csv;
+  window->setSaveLocationChooser([&](QWidget*, const QString&, const QString& filter, const QString&) {
+    asked << filter;
+    return asked.size() == 1 ? csv : QString();
   });
-  window->exportCSV();
-  EXPECT_EQ(readAll(csv), "\"Website\",\"Design\",\"02:30\",\"150.00\"\n");
   window->setMode(1);
   window->exportCSV();
-  QStringList lines = readAll(csv).split(QLatin1Char('\n'));
+  QStringList lines = readAll(csv).split(QLatin1Char('\n'), Qt::SkipEmptyParts);
   lines.sort();
-  EXPECT_EQ(lines, QStringList({"", "\"Website\",\"Design\",\"2024-03-03 09:00\",\"01:30\",\"90.00\"",
+  EXPECT_EQ(lines, QStringList({"\"Website\",\"Design\",\"2024-03-03 09:00\",\"01:30\",\"90.00\"",
                                 "\"Website\",\"Design\",\"2024-03-04 09:00\",\"01:00\",\"60.00\""}));
-  ASSERT_EQ(asked.size(), 2);
   EXPECT_TRUE(asked.front().endsWith("(*.csv)"));
-
-  // A cancelled dialog writes nothing.
   QFile::remove(csv);
-  window->setSaveLocationChooser(
-      [](QWidget*, const QString&, const QString&, const QString&) { return QString(); });
   window->exportCSV();
+  EXPECT_EQ(asked.size(), 2);
   EXPECT_FALSE(QFile::exists(csv));
 
   const QString html = dir.filePath(QStringLiteral("report.html"));
   ASSERT_TRUE(window->saveHTMLToFile(html).ok());
   EXPECT_EQ(readAll(html), window->html());
-  // A folder that does not exist is refused with its name, and nothing is left behind.
   const Result<void> refused = window->saveHTMLToFile(dir.filePath(QStringLiteral("missing/report.html")));
   ASSERT_FALSE(refused.ok());
   EXPECT_TRUE(refused.error().message.contains("missing/report.html"));
@@ -326,22 +310,13 @@ TEST_F(ReportWindowTest, ThePdfHoldsTheReportOnNumberedPages) {
   if (QStandardPaths::findExecutable(QStringLiteral("pdfinfo")).isEmpty())
     GTEST_SKIP() << "poppler-utils missing";
   openReport({web, backend});
-  const QString shortPdf = dir.filePath(QStringLiteral("short.pdf"));
-  ASSERT_TRUE(window->savePDFToFile(shortPdf).ok());
-  const QString info = poppler(QStringLiteral("pdfinfo"), {shortPdf});
-  EXPECT_TRUE(info.contains(QRegularExpression(QStringLiteral("Pages:\\s+1\\n")))) << info.toStdString();
-  const QString text =
-      poppler(QStringLiteral("pdftotext"), {QStringLiteral("-layout"), shortPdf, QStringLiteral("-")});
-  EXPECT_TRUE(text.contains("Website")) << text.toStdString();
-  EXPECT_TRUE(text.contains("270.00")) << text.toStdString();  // the grand total: 150.00 + 2 h at 60.00
-
   // Two hundred tasks of a day each make many pages; every page carries its number and the last the total.
   for (int i = 0; i < 200; ++i) {
     WTTask* task = makeTask(web, QStringLiteral("Task %1").arg(i));
-    task->setRate(Decimal::fromString(QStringLiteral("60")).value());
+    task->setRate(Decimal(60));
     makeTime(task, berlin(2024, 3, 6, 8), berlin(2024, 3, 6, 9));
   }
-  window->refreshWebContent();
+  ASSERT_TRUE(context->save().ok());
   const QString longPdf = dir.filePath(QStringLiteral("long.pdf"));
   ASSERT_TRUE(window->savePDFToFile(longPdf).ok());
   const QRegularExpressionMatch pages = QRegularExpression(QStringLiteral("Pages:\\s+(\\d+)"))
@@ -362,25 +337,17 @@ TEST_F(ReportWindowTest, ThePdfHoldsTheReportOnNumberedPages) {
   EXPECT_FALSE(QFile::exists(longPdf + ".part"));
 }
 
-TEST_F(ReportWindowTest, EditingTheTemplateCopiesTheBuiltInOneOnceAndOpensIt) {
+// How the copy is made is the generator's; the window opens it and shows the user's changes once saved.
+TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
   UrlCatcher catcher;
   QDesktopServices::setUrlHandler(QStringLiteral("file"), &catcher, "open");
   openReport({web});
   const QString path = WTReportGenerator::userTemplatePath();
   window->editReportTemplate();
   ASSERT_TRUE(QFile::exists(path));
-  QFile builtIn(WTReportGenerator::builtInTemplatePath());
-  ASSERT_TRUE(builtIn.open(QIODevice::ReadOnly));
-  EXPECT_EQ(readAll(path), QString::fromUtf8(builtIn.readAll()));
-  ASSERT_EQ(catcher.opened.size(), 1);
-  EXPECT_EQ(catcher.opened.front(), QUrl::fromLocalFile(path));
-
-  // The user's changes are never overwritten, and the open report shows them once the file changes.
+  EXPECT_EQ(catcher.opened, QList<QUrl>{QUrl::fromLocalFile(path)});
   writeFile(path, QStringLiteral("<p>my own report</p>"));
   EXPECT_TRUE(QTest::qWaitFor([&] { return window->html() == "<p>my own report</p>"; }, 5000));
-  window->editReportTemplate();
-  EXPECT_EQ(readAll(path), "<p>my own report</p>");
-  EXPECT_EQ(catcher.opened.size(), 2);
   QDesktopServices::unsetUrlHandler(QStringLiteral("file"));
 }
 
@@ -396,17 +363,12 @@ TEST_F(ReportWindowTest, TheWindowClosesWhenItsContextGoes) {
 // The range chooser and the export dialog.
 class RangeAndExportTest : public ReportWindowTest {};
 
-TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndCustomCoversItsEndDayWhole) {
+TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDaysShown) {
   WTRangePopUpButton button(defaults.get());
   QStringList titles;
-  QList<int> tags;
-  for (int i = 0; i < button.count(); ++i) {
-    titles << button.itemText(i);
-    tags << (button.itemData(i).isValid() ? button.itemData(i).toInt() : -1);
-  }
+  for (int i = 0; i < button.count(); ++i) titles << button.itemText(i);
   EXPECT_EQ(titles, QStringList({"Today", "Yesterday", "This week", "Last week", "This month", "Last month",
                                  "This year", "Last year", "Any date", "", "Custom..."}));
-  EXPECT_EQ(tags, QList<int>({0, 1, 2, 3, 4, 5, 6, 7, 21, -1, 20}));
   // The custom range starts out as the last month up to now.
   EXPECT_EQ(button.customRangeBegin(), RZDate::addMonth(clockNow, -1));
   EXPECT_EQ(button.customRangeEnd(), clockNow);
@@ -427,30 +389,19 @@ TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndCustomCoversItsE
   EXPECT_EQ(button.customRangeBegin(), berlin(2024, 3, 3));
   EXPECT_EQ(button.customRangeEnd(), berlin(2024, 3, 3));
 
-  const WTItemPredicate inRange = button.selectedPredicate();
-  ASSERT_TRUE(bool(inRange));
-  auto timeAt = [&](Date start) { return makeTime(design, start, start.addingSeconds(60)); };
-  EXPECT_TRUE(inRange(timeAt(berlin(2024, 3, 3, 0, 0))));
-  EXPECT_TRUE(inRange(timeAt(berlin(2024, 3, 3, 23, 59, 59))));
-  EXPECT_FALSE(inRange(timeAt(berlin(2024, 3, 4, 0, 0, 1))));
-  EXPECT_FALSE(inRange(timeAt(berlin(2024, 3, 2, 23, 59, 59))));
+  // The chosen days are the predicate's (its bounds are the range predicate's).
+  EXPECT_TRUE(
+      button.selectedPredicate()(makeTime(design, berlin(2024, 3, 3, 23), berlin(2024, 3, 3, 23, 30))));
+  EXPECT_FALSE(button.selectedPredicate()(makeTime(design, berlin(2024, 3, 4, 9), berlin(2024, 3, 4, 10))));
 
   // Reopening shows the stored dates again.
   dialog = button.showRangeWindow();
   EXPECT_EQ(dialog->beginEdit()->date(), QDate(2024, 3, 3));
   dialog->accept();
   EXPECT_EQ(chosen, 2);
-
-  // Any date matches an entry that has no date at all.
-  button.selectTag(WTRangePredicate::AnyDate);
-  auto* undated = WTTime::insertNewObject(context.get());
-  undated->setTask(design);
-  undated->setStartDate(std::nullopt);
-  EXPECT_TRUE(button.selectedPredicate()(undated));
 }
 
 TEST_F(RangeAndExportTest, TheExportWritesTheRangeOfTheChosenProjects) {
-  LogCapture log(QStringLiteral("tessal.export.debug=true"));
   WTProject* selected = nullptr;
   WTExportController exporter(context.get(), [&] { return selected; });
   exporter.rangeButton()->selectTag(WTRangePredicate::ThisMonth);
@@ -472,12 +423,6 @@ TEST_F(RangeAndExportTest, TheExportWritesTheRangeOfTheChosenProjects) {
   lines = readAll(path).split(QLatin1Char('\n'), Qt::SkipEmptyParts);
   ASSERT_EQ(lines.size(), 1);
   EXPECT_TRUE(lines.front().startsWith("\"Backend\",\"API\",")) << lines.front().toStdString();
-
-  // Nothing in range: an empty file and the count 0 in the log.
-  exporter.rangeButton()->selectTag(WTRangePredicate::Today);
-  ASSERT_TRUE(exporter.exportToPath(path).ok());
-  EXPECT_EQ(readAll(path), "");
-  EXPECT_TRUE(log.contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
 }
 
 }  // namespace

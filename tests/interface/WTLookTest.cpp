@@ -1,0 +1,103 @@
+#include "UiFixture.h"
+#include "WTClient.h"
+#include "WTClientsViewController.h"
+#include "WTListView.h"
+#include "WTObjectListModel.h"
+
+namespace {
+
+const QColor kHighlight(10, 90, 200);
+const QColor kHighlightedText(255, 255, 0);
+
+// A selected row of the view, painted with a palette of distinct highlight colours, is mostly highlight
+// and shows its text in the highlighted text colour.
+void expectHighlighted(QAbstractItemView* view, const QModelIndex& index) {
+  QPalette palette = view->palette();
+  for (auto group : {QPalette::Active, QPalette::Inactive}) {
+    palette.setColor(group, QPalette::Highlight, kHighlight);
+    palette.setColor(group, QPalette::HighlightedText, kHighlightedText);
+  }
+  view->setPalette(palette);
+  view->selectionModel()->select(index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  view->clearFocus();  // no hover, no editor: the plain selected row
+  QApplication::processEvents();
+  const QImage image = view->viewport()->grab().toImage();
+  const QRect row = view->visualRect(index).adjusted(0, 0, 0, -3);
+  int highlight = 0, text = 0;
+  for (int y = row.top(); y <= row.bottom(); ++y) {
+    for (int x = row.left(); x <= row.right(); ++x) {
+      const QColor colour = image.pixelColor(x, y);
+      if (colour == kHighlight) ++highlight;
+      if (colour.red() > 180 && colour.green() > 180 && colour.blue() < 120) ++text;
+    }
+  }
+  EXPECT_GT(highlight, row.width() * row.height() / 2);
+  EXPECT_GT(text, 20);
+}
+
+// Pixels of the view's middle band that are clearly darker than its background: text.
+int inkInMiddle(QAbstractItemView* view) {
+  QApplication::processEvents();
+  const QImage image = view->viewport()->grab().toImage();
+  const QColor base = image.pixelColor(2, 2);
+  int ink = 0;
+  const int top = image.height() / 2 - 20;
+  for (int y = std::max(0, top); y < std::min(image.height(), top + 40); ++y) {
+    for (int x = 0; x < image.width(); ++x) {
+      if (image.pixelColor(x, y).lightness() < base.lightness() - 60) ++ink;
+    }
+  }
+  return ink;
+}
+
+class WTLookTest : public UiTest {};
+
+TEST_F(WTLookTest, SelectedOutlineRowsTakeThePalettesHighlightAndItsTextColour) {
+  WTProject* project = makeProject("Website");
+  WTTask* task = makeTask(project, "Design");
+  WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
+  ShownOutline shown(context.get(), project, QSize(800, 400));
+  endTurn();
+  for (const WTObject* object : QList<const WTObject*>{task, time}) {
+    SCOPED_TRACE(object->name().toStdString());
+    shown.controller.expandContainerOfItem(time);
+    expectHighlighted(shown.outline(), shown.rowOf(object));
+  }
+}
+
+TEST_F(WTLookTest, SelectedListRowsTakeThePalettesHighlightAndItsTextColour) {
+  makeProject("Website");
+  ShownProjects shown(context.get());
+  endTurn();
+  ASSERT_TRUE(shown.projects.arrayController()->index(0, 0).isValid());
+  expectHighlighted(shown.projects.tableView(), shown.projects.arrayController()->index(0, 0));
+}
+
+TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRowAndForgetsItOnceThereIsOne) {
+  WTClientsViewController clients(context.get());
+  clients.view()->resize(600, 400);
+  clients.view()->show();
+  ASSERT_TRUE(QTest::qWaitForWindowExposed(clients.view()));
+  WTListView* list = clients.tableView();
+  EXPECT_EQ(list->emptyHint(), "No clients yet — press Ctrl+N");
+  EXPECT_GT(inkInMiddle(list), 30);
+  WTClient::insertNewObject(context.get())->setName("Acme");
+  endTurn();
+  clients.arrayController()->rearrangeObjects();
+  ASSERT_EQ(list->model()->rowCount(), 1);
+  EXPECT_EQ(inkInMiddle(list), 0);
+}
+
+TEST_F(WTLookTest, AProjectWithoutTasksSaysHowToAddOne) {
+  WTProject* project = makeProject("Website");
+  ShownOutline shown(context.get(), project, QSize(800, 400));
+  endTurn();
+  EXPECT_EQ(shown.outline()->emptyHint(), "No tasks yet — press Ctrl+N");
+  EXPECT_GT(inkInMiddle(shown.outline()), 30);
+  makeTask(project, "Design");
+  endTurn();
+  shown.controller.treeController()->processChanges();
+  EXPECT_EQ(inkInMiddle(shown.outline()), 0);
+}
+
+}  // namespace
