@@ -1,4 +1,3 @@
-#include "FaultInjectingVfs.h"
 #include "WTStore.h"
 
 #include <gtest/gtest.h>
@@ -14,6 +13,84 @@
 #include <random>
 
 namespace {
+
+// A SQLite VFS over the default one that, once armed, fails the N-th write or sync of any file (database,
+// log or journal) with an I/O error, and with `persistent` every later one too, in the manner of SQLite's
+// own fault tests. Its files are the default VFS's files with those two calls replaced.
+namespace FaultInjectingVfs {
+enum class Operation { Write, Sync };
+struct {
+  bool armed = false;
+  Operation kind = Operation::Write;
+  int remaining = 0;  // operations of `kind` until the one that fails
+  bool persistent = false, fired = false;
+} state;
+sqlite3_vfs* base = nullptr;
+sqlite3_vfs vfs;
+// The default VFS's sets of calls (one for databases, one for their logs and journals), each with its copy
+// whose write and sync may fail.
+struct Wrapped {
+  const sqlite3_io_methods* base = nullptr;
+  sqlite3_io_methods methods;
+} wrapped[4];
+
+const sqlite3_io_methods* baseOf(sqlite3_file* f) {
+  for (const Wrapped& w : wrapped)
+    if (&w.methods == f->pMethods) return w.base;
+  return nullptr;
+}
+bool shouldFail(Operation kind) {
+  if (!state.armed || state.kind != kind) return false;
+  if (state.fired) return state.persistent;
+  return state.fired = --state.remaining <= 0;
+}
+int xWrite(sqlite3_file* f, const void* buffer, int amount, sqlite3_int64 offset) {
+  return shouldFail(Operation::Write) ? SQLITE_IOERR_WRITE : baseOf(f)->xWrite(f, buffer, amount, offset);
+}
+int xSync(sqlite3_file* f, int flags) {
+  return shouldFail(Operation::Sync) ? SQLITE_IOERR_FSYNC : baseOf(f)->xSync(f, flags);
+}
+int xOpen(sqlite3_vfs*, sqlite3_filename name, sqlite3_file* file, int flags, int* outFlags) {
+  const int code = base->xOpen(base, name, file, flags, outFlags);
+  if (code != SQLITE_OK || !file->pMethods) return code;
+  for (Wrapped& w : wrapped) {
+    if (!w.base) {
+      w.base = file->pMethods;
+      w.methods = *w.base;
+      w.methods.xWrite = xWrite;
+      w.methods.xSync = xSync;
+    }
+    if (w.base == file->pMethods) {
+      file->pMethods = &w.methods;
+      return SQLITE_OK;
+    }
+  }
+  file->pMethods->xClose(file);
+  file->pMethods = nullptr;
+  return SQLITE_CANTOPEN;
+}
+// Registers the VFS (once; not as the default) and returns its name for WTStore::open.
+const char* name() {
+  static const bool registered = [] {
+    base = sqlite3_vfs_find(nullptr);
+    vfs = *base;  // every other call is the default VFS's own, with its own data
+    vfs.pNext = nullptr;
+    vfs.zName = "tessal-faults";
+    vfs.xOpen = xOpen;
+    return sqlite3_vfs_register(&vfs, 0) == SQLITE_OK;
+  }();
+  return registered ? vfs.zName : nullptr;
+}
+void arm(Operation kind, int n, bool persistent) {
+  state = {true, kind, n, persistent, false};
+}
+void disarm() {
+  state = {};
+}
+bool fired() {
+  return state.fired;
+}
+}  // namespace FaultInjectingVfs
 
 using Records = std::map<QString, WTStoreRecord>;
 
