@@ -107,24 +107,14 @@ QVariant at(WTObject* object, const char* keyPath) {
 
 }  // namespace
 
-TEST_F(ReportTest, TaskAnswersItsItemListsAndGroupTotalsByKey) {
+// The lists a template walks, by key and by mode: valuable items (no notes or to-dos) newest first
+// whatever order they were made in (Sketch, the oldest, was made after the March entries), and groups
+// of days and months newest first, which stay alive while the generator does.
+TEST_F(ReportTest, TasksAnswerTheirItemListsAndGroupTotalsPerMode) {
   EXPECT_EQ(at(design, "itemsWithoutPendingToDos.@count").toInt(), 5);
-  EXPECT_EQ(at(design, "valuableItems.@count").toInt(), 4);
-  // Newest first whatever order they were made in (Sketch, the oldest, was made after the March entries).
   EXPECT_EQ(at(design, "valuableItems.name").toStringList(),
             QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
-  // Days newest first: 4 March (expense), 3 March (two entries), 10 February.
-  const QVariantList days = at(design, "dailyItems").toList();
-  ASSERT_EQ(days.size(), 3);
-  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[0], u"cost")), dec("1234.5"));
-  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
-  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"items.@count").toInt(), 2);
-  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[1], u"cost")), dec("120"));
   EXPECT_EQ(Decimal::fromVariant(at(design, "dailyItems.@sum.cost")), dec("1414.5"));
-  const QVariantList months = at(design, "monthlyItems").toList();
-  ASSERT_EQ(months.size(), 2);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"duration").toInt(), 120);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[1], u"duration").toInt(), 60);
   // The outline's groups: the open to-do's "Pending" group first.
   const QVariantList children = at(design, "children").toList();
   ASSERT_EQ(children.size(), 5);
@@ -134,39 +124,37 @@ TEST_F(ReportTest, TaskAnswersItsItemListsAndGroupTotalsByKey) {
   EXPECT_EQ(at(design, "firstItemDate").value<Date>(), berlin(2024, 2, 10, 10));
   EXPECT_EQ(at(design, "lastItemDate").value<Date>(), berlin(2024, 3, 4, 8));
   EXPECT_FALSE(at(makeTask(web, QStringLiteral("Empty")), "firstItemDate").isValid());
+
+  WTReportGenerator generator(projects(), 0);
+  EXPECT_TRUE(generator.filteredItemsForTask(design, 0).isNull());
+  EXPECT_EQ(KeyPath::valueForKeyPath(generator.filteredItemsForTask(design, 1), u"name").toStringList(),
+            QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
+  // Days: 4 March (the expense), 3 March (two entries), 10 February; months: March, February.
+  const QVariantList days = generator.filteredItemsForTask(design, 2).toList();
+  const QVariantList months = generator.filteredItemsForTask(design, 3).toList();
+  ASSERT_EQ(days.size(), 3);
+  ASSERT_EQ(months.size(), 2);
+  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[0], u"cost")), dec("1234.5"));
+  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[1], u"cost")), dec("120"));
+  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
+  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"items.@count").toInt(), 2);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"items.@count").toInt(), 3);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"duration").toInt(), 120);
+  EXPECT_EQ(KeyPath::valueForKeyPath(months[1], u"duration").toInt(), 60);
+  EXPECT_EQ(at(design, "monthlyItems").toList().size(), 2);
 }
 
 TEST_F(ReportTest, VariablesFollowProjectsAndMode) {
   WTReportGenerator generator(projects(), 2);
-  WTReport report =
+  const WTReport report =
       generator.renderText(QStringLiteral("{{ mode }}|{{ client.name }}|{{ projects.@count }}"));
   EXPECT_TRUE(report.errors.empty());
   EXPECT_EQ(report.html, QStringLiteral("2|Acme|2"));
   generator.setMode(0);
   EXPECT_EQ(generator.renderText(QStringLiteral("{{ mode }}")).html, QStringLiteral("0"));
-  EXPECT_EQ(generator.variables().value(QStringLiteral("mode")).toInt(), 0);
-
   WTReportGenerator empty;
   EXPECT_FALSE(empty.variables().value(QStringLiteral("client")).isValid());
   EXPECT_EQ(empty.variables().value(QStringLiteral("projects")).toList().size(), 0);
-}
-
-TEST_F(ReportTest, FilteredItemsPerMode) {
-  WTReportGenerator generator(projects(), 0);
-  EXPECT_TRUE(generator.filteredItemsForTask(design, 0).isNull());
-  const QVariantList valuable = generator.filteredItemsForTask(design, 1).toList();
-  EXPECT_EQ(valuable.size(), 4);
-  for (const QVariant& item : valuable) {
-    const QString kind = KeyPath::valueForKeyPath(item, u"entityName").toString();
-    EXPECT_TRUE(kind == "WTTime" || kind == "WTExpense") << kind.toStdString();
-  }
-  const QVariantList days = generator.filteredItemsForTask(design, 2).toList();
-  ASSERT_EQ(days.size(), 3);  // the note has no value and no group
-  const QVariantList months = generator.filteredItemsForTask(design, 3).toList();
-  ASSERT_EQ(months.size(), 2);
-  // Handed-out groups stay alive while the generator does.
-  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"items.@count").toInt(), 3);
 }
 
 TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
@@ -193,12 +181,6 @@ TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
                            "\"Web \\\"Site\\\"\",\"Design\",\"2024-02\",\"01:00\",\"60.00\"\n"
                            "\"Backend\",\"API\",\"2024-03\",\"02:00\",\"200.00\"\n"));
   EXPECT_EQ(WTCSVExport::reportCSV({}, 2), QString());
-}
-
-TEST_F(ReportTest, EscapingUsesBackslashQuote) {
-  EXPECT_EQ(WTCSVExport::escapedString(QVariant()), QString(""));
-  EXPECT_EQ(WTCSVExport::escapedString(QStringLiteral("a\"b\"\"")), QStringLiteral("a\\\"b\\\"\\\""));
-  EXPECT_EQ(WTCSVExport::escapedString(QStringLiteral("plain, text")), QStringLiteral("plain, text"));
 }
 
 TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
@@ -229,14 +211,12 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   ASSERT_TRUE(WTCSVExport::exportTimes(*context, day.value(), alpha, path).ok());
   EXPECT_EQ(readAll(path), QString());
   EXPECT_TRUE(log.lines.contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
-}
 
-TEST_F(ReportTest, ExportToAMissingFolderFailsNamingThePath) {
-  const QString path = dir.filePath(QStringLiteral("missing-folder/times.csv"));
-  const Result<int> written = WTCSVExport::exportTimes(*context, {}, nullptr, path);
-  EXPECT_FALSE(written.ok());
-  EXPECT_TRUE(written.error().message.contains(path));
-  EXPECT_FALSE(QFile::exists(path));
+  const QString missing = dir.filePath(QStringLiteral("missing-folder/times.csv"));
+  const Result<int> failed = WTCSVExport::exportTimes(*context, {}, nullptr, missing);
+  ASSERT_FALSE(failed.ok());
+  EXPECT_TRUE(failed.error().message.contains(missing));
+  EXPECT_FALSE(QFile::exists(missing));
 }
 
 TEST_F(ReportTest, BuiltInTemplateRendersEveryModeWithTheTotals) {
@@ -307,7 +287,8 @@ TEST_F(ReportTest, DayLinesNameTheirItemsOnceOrCountThem) {
       "#{{ day.items.@count }}{% /if %};{% /for %}{% /for %}{% /for %}"));
   EXPECT_TRUE(report.errors.empty());
   // Two entries on 3 March; the open to-do and the note have no value and are no day's items.
-  EXPECT_TRUE(report.html.contains(QStringLiteral("03-03=Review; Kick \"off\";"))) << report.html.toStdString();
+  EXPECT_TRUE(report.html.contains(QStringLiteral("03-03=Review; Kick \"off\";")))
+      << report.html.toStdString();
   EXPECT_TRUE(report.html.contains(QStringLiteral("03-06=Setup;"))) << report.html.toStdString();
   EXPECT_TRUE(report.html.contains(QStringLiteral("02-10=Sketch;"))) << report.html.toStdString();
   EXPECT_FALSE(report.html.contains(QStringLiteral("Open question")));
@@ -334,7 +315,7 @@ TEST_F(ReportTest, BuiltInTemplateRendersSparseRecordsWithoutErrorsOrStrayRows) 
   WTTask* notesOnly = makeTask(backend, QString());
   makeItem<WTNote>(notesOnly, berlin(2024, 3, 7, 8));
   makeTime(api, berlin(2024, 3, 8, 9), berlin(2024, 3, 8, 9, 45));  // no name
-  auto* bare = WTFlat::insertNewObject(context.get());  // neither named nor dated
+  auto* bare = WTFlat::insertNewObject(context.get());              // neither named nor dated
   bare->setTask(api);
   bare->setMinutes(15);
   const QList<QList<WTProject*>> cases = {{empty}, {}, {web, backend, empty}};
@@ -356,7 +337,8 @@ TEST_F(ReportTest, BuiltInTemplateRendersSparseRecordsWithoutErrorsOrStrayRows) 
   }
   WTReportGenerator generator({backend}, 1);
   const QString html = generator.render().html;
-  EXPECT_EQ(html.count(QStringLiteral("class=\"item\"")), 3);  // the named flat fee, the time, the bare flat fee
+  EXPECT_EQ(html.count(QStringLiteral("class=\"item\"")),
+            3);  // the named flat fee, the time, the bare flat fee
   EXPECT_TRUE(html.contains(QStringLiteral(">Time</td>"))) << html.toStdString();
 }
 
