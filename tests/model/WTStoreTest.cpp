@@ -11,6 +11,11 @@
 #include <map>
 #include <memory>
 #include <random>
+#include <thread>
+
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 namespace {
 
@@ -672,6 +677,94 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
       EXPECT_GT(failures, 0);  // the loop must have met the I/O at least once
     }
   }
+}
+
+// ---- A process killed at random moments while it saves: the file still holds every save the process
+// had seen complete, and each save whole or not at all.
+
+constexpr int kRounds = 50;
+constexpr int kRecordsPerSave = 10;
+const QString kCounter = QStringLiteral("counter@WTTask");
+
+QString itemUuid(int save, int index) {
+  return index < kRecordsPerSave ? QStringLiteral("s%1-%2@WTNote").arg(save).arg(index)
+                                 : QStringLiteral("extra-%1@WTNote").arg(save);
+}
+
+// Save k adds its items, deletes the extra item of save k - 1, adds its own extra item and sets the counter
+// to k: one transaction, so either all of it shows or none.
+std::vector<WTStoreRecord> recordsOfSave(int save) {
+  std::vector<WTStoreRecord> records;
+  for (int i = 0; i <= kRecordsPerSave; ++i) {
+    records.push_back(record(itemUuid(save, i), "WTNote", kCounter));
+    records.back().name = QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3);
+  }
+  records.push_back(record(kCounter, "WTTask"));
+  records.back().position = save;
+  return records;
+}
+
+// The child: saves from `first` on until killed, reporting each completed save's number on `pipe`.
+[[noreturn]] void saveUntilKilled(const QString& path, int first, int pipe) {
+  auto store = WTStore::open(path);
+  if (!store) _exit(2);
+  for (int save = first;; ++save) {
+    if (!store.value()->save(recordsOfSave(save), {itemUuid(save - 1, kRecordsPerSave)})) _exit(3);
+    if (write(pipe, &save, sizeof save) != sizeof save) _exit(4);
+  }
+}
+
+TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
+  {
+    // Save 0: the counter and the first extra item, no items.
+    std::vector<WTStoreRecord> initial = recordsOfSave(0);
+    initial.erase(initial.begin(), initial.begin() + kRecordsPerSave);
+    makeStore(Records{{initial[0].uuid, initial[0]}, {initial[1].uuid, initial[1]}});
+  }
+  const unsigned seed = std::random_device()();
+  SCOPED_TRACE(testing::Message() << "seed " << seed);
+  std::mt19937 random(seed);
+  std::uniform_int_distribution<int> delayMs(2, 50);
+  int committed = 0;  // the last save found in the file
+  for (int round = 0; round < kRounds; ++round) {
+    SCOPED_TRACE(testing::Message() << "round " << round);
+    int fds[2];
+    ASSERT_EQ(pipe(fds), 0);
+    const pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child == 0) {
+      close(fds[0]);
+      saveUntilKilled(path(), committed + 1, fds[1]);
+    }
+    close(fds[1]);
+    std::this_thread::sleep_for(std::chrono::milliseconds(delayMs(random)));
+    kill(child, SIGKILL);
+    int status = 0;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(WIFSIGNALED(status)) << "the saver stopped by itself with status " << WEXITSTATUS(status);
+    int reported = committed, save = 0;
+    while (read(fds[0], &save, sizeof save) == sizeof save) reported = save;
+    close(fds[0]);
+
+    auto store = open();
+    ASSERT_TRUE(store);
+    const Records records = loadAll(*store);
+    store.reset();
+    ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
+    ASSERT_TRUE(records.contains(kCounter));
+    const int last = records.at(kCounter).position;
+    // Every reported save is there; at most the one in flight got in without being reported.
+    ASSERT_GE(last, reported);
+    ASSERT_LE(last, reported + 1);
+    // Each save whole: all items of every save up to the counter, none beyond, one extra item.
+    ASSERT_EQ(records.size(), std::size_t(last) * kRecordsPerSave + 2);
+    for (int k = 1; k <= last; ++k)
+      for (int i = 0; i < kRecordsPerSave; ++i)
+        ASSERT_TRUE(records.contains(itemUuid(k, i))) << k << "/" << i;
+    ASSERT_TRUE(records.contains(itemUuid(last, kRecordsPerSave)));
+    committed = last;
+  }
+  EXPECT_GT(committed, kRounds);  // the saver got through many saves, not just its open
 }
 
 }  // namespace
