@@ -9,10 +9,10 @@
 
 #include <QCoreApplication>
 #include <QDeadlineTimer>
-#include <QDir>
 #include <QFile>
 #include <QLibrary>
 #include <QProcess>
+#include <QScopeGuard>
 #include <QSignalSpy>
 #include <QStandardPaths>
 #include <QTemporaryDir>
@@ -100,7 +100,8 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
     bool account;
     const char *keychainBefore, *fileBefore;
     bool keptBefore, openFile, available;
-    const char* actions;  // "store" stores x; "keep" is a command's load that leaves the password in place
+    const char*
+        actions;  // store x, store an empty one, remove it, load it, or "keep" it where it is (a command)
     Location where;
     const char *password, *keychainAfter, *fileAfter;
     int reads, writes, kept, restartWrites;
@@ -125,6 +126,10 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
        "x", "-", "x", 0, 0, 0, 1},
       {"a move the keychain refuses stays in a private file", true, "-", "x", false, true, false, "load",
        Location::SettingsFile, "x", "-", "x", 0, 1, 1, 0},
+      {"removing clears keychain and file", true, "x", "old", true, false, true, "remove", Location::None, "",
+       "-", "-", 0, 0, 0, 0},
+      {"an empty password is no password", true, "-", "-", false, false, true, "store clear", Location::None,
+       "", "-", "-", 0, 1, 0, 0},
       {"the keychain is read once", true, "x", "-", false, false, true, "load load store", Location::Keychain,
        "x", "x", "-", 1, 1, 0, 0},
   };
@@ -150,8 +155,10 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
     auto store = makeStore();
     QSignalSpy kept(store.get(), &WTPasswordStore::keptInSettingsFile);
     for (const QString& action : QString::fromLatin1(row.actions).split(' ')) {
-      if (action == "store") {
-        EXPECT_EQ(storeNow(*store, kPassword), row.where);
+      if (action == "store" || action == "clear") {
+        storeNow(*store, action == "store" ? kPassword : QString());
+      } else if (action == "remove") {
+        store->removePassword();
       } else {
         loadNow(*store,
                 action == "keep" ? WTPasswordStore::FilePassword::Keep : WTPasswordStore::FilePassword{});
@@ -185,44 +192,10 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
   }
 }
 
-TEST_F(WTPasswordStoreTest, RemovingThePasswordClearsKeychainAndFile) {
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  auto store = makeStore();
-  storeNow(*store, kPassword);
-  defaults->setValue(kInFile, QStringLiteral("stale"));
-  store->removePassword();
-  EXPECT_TRUE(keychain.entries.isEmpty());
-  EXPECT_FALSE(defaults->hasStoredValue(kInFile));
-  EXPECT_TRUE(store->password().isEmpty());
-  auto again = makeStore();
-  loadNow(*again);
-  EXPECT_TRUE(again->password().isEmpty());
-  // An empty password is no password.
-  storeNow(*store, kPassword);
-  EXPECT_EQ(storeNow(*store, QString()), Location::None);
-  EXPECT_TRUE(keychain.entries.isEmpty());
+// Sets an environment variable, or removes it for a null value.
+void setEnvironment(const char* name, const QByteArray& value) {
+  value.isNull() ? void(qunsetenv(name)) : void(qputenv(name, value));
 }
-
-// Sets an environment variable (or removes it, for a null value) while it lives.
-class ScopedEnvironment {
- public:
-  ScopedEnvironment(const char* name, const QByteArray& value) : name_(name), previous_(qgetenv(name)) {
-    if (value.isNull())
-      qunsetenv(name);
-    else
-      qputenv(name, value);
-  }
-  ~ScopedEnvironment() {
-    if (previous_.isNull())
-      qunsetenv(name_);
-    else
-      qputenv(name_, previous_);
-  }
-
- private:
-  const char* name_;
-  QByteArray previous_;
-};
 
 // The real adapter where there is no session bus (a server, an SSH login): nothing is asked, so
 // neither D-Bus nor GLib tries to start a bus through a display, and the settings file is where the
@@ -232,8 +205,13 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
   const QByteArray runtimeWithoutBus = QFile::encodeName(dir.path());
   for (const QByteArray& address : {deadSocket, QByteArray()}) {
     SCOPED_TRACE(address.toStdString());
-    ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address);
-    ScopedEnvironment runtime("XDG_RUNTIME_DIR", runtimeWithoutBus);
+    const QByteArray bus = qgetenv("DBUS_SESSION_BUS_ADDRESS"), runtime = qgetenv("XDG_RUNTIME_DIR");
+    const auto restore = qScopeGuard([&] {
+      setEnvironment("DBUS_SESSION_BUS_ADDRESS", bus);
+      setEnvironment("XDG_RUNTIME_DIR", runtime);
+    });
+    setEnvironment("DBUS_SESSION_BUS_ADDRESS", address);
+    setEnvironment("XDG_RUNTIME_DIR", runtimeWithoutBus);
     WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
     std::optional<Result<QString>> read;
     secrets.readPassword(QStringLiteral("sync-password"),
@@ -259,7 +237,9 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   using fakesecrets::FakeSecretService;
   const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
+  const QByteArray previousBus = qgetenv("DBUS_SESSION_BUS_ADDRESS");
+  const auto restore = qScopeGuard([&] { setEnvironment("DBUS_SESSION_BUS_ADDRESS", previousBus); });
+  qputenv("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
   FakeSecretService service;
   ASSERT_TRUE(service.start(address));
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
