@@ -17,7 +17,7 @@ QMap<QString, WTStoreRecord> rowsOf(const QString& path) {
   return rows;
 }
 
-class WTUndoAcrossSavesTest : public ModelTest, public ::testing::WithParamInterface<WTEntity> {
+class UndoAcrossSaves : public ModelTest {
  protected:
   void endTurn() { context->processPendingChanges(); }
   void save() {
@@ -42,6 +42,10 @@ class WTUndoAcrossSavesTest : public ModelTest, public ::testing::WithParamInter
     journal.calls.clear();
     return kinds;
   }
+};
+
+class WTUndoAcrossSavesTest : public UndoAcrossSaves, public ::testing::WithParamInterface<WTEntity> {
+ protected:
   // The uuid of the record's owner, as a fresh context reads it from the file; empty for none.
   QString storedOwnerOf(const QString& uuid) {
     openContext();
@@ -131,7 +135,7 @@ void expectJournaledOnceEach(const RecordingJournal& journal, const QStringList&
 // A whole project with its tasks and items, undone and redone after its save, and deleted with them
 // (a client's deletion only unlinks its projects): each record reaches file and journal, and undoing the
 // deletion brings back every record with its order and links. Both survive a restart.
-TEST_F(ModelTest, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLink) {
+TEST_F(UndoAcrossSaves, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLink) {
   auto* client = WTClient::insertNewObject(context.get());
   auto* project = WTProject::insertNewObject(context.get());
   project->setClient(client);
@@ -147,33 +151,27 @@ TEST_F(ModelTest, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLi
   }
   const QStringList cascaded = QStringList{project->uuid(), first->uuid(), second->uuid()} + items;
   const QString clientUuid = client->uuid(), projectUuid = project->uuid();
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  endTurn();
+  save();
   const QMap<QString, WTStoreRecord> before = rowsOf(storePath());
   journal.calls.clear();
-  context->undoManager().undo();
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  undoAndSave();
   expectJournaledOnceEach(journal, cascaded + QStringList{clientUuid}, "delete");
   EXPECT_TRUE(rowsOf(storePath()).isEmpty());
   journal.calls.clear();
-  context->undoManager().redo();
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  redoAndSave();
   expectJournaledOnceEach(journal, cascaded, "insert");
   EXPECT_EQ(rowsOf(storePath()), before);
   journal.calls.clear();
 
   context->deleteObject(project);
-  context->processPendingChanges();
+  endTurn();
   EXPECT_TRUE(context->fetch<WTTask>().isEmpty());
-  ASSERT_TRUE(context->save().ok());
+  save();
   expectJournaledOnceEach(journal, cascaded, "delete");
   EXPECT_EQ(rowsOf(storePath()).keys(), QStringList{clientUuid});
   journal.calls.clear();
-  context->undoManager().undo();
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  undoAndSave();
   EXPECT_EQ(rowsOf(storePath()), before);
   expectJournaledOnceEach(journal, cascaded, "insert");
   EXPECT_EQ(KeyPath::objectFromVariant(journal.callsFor(projectUuid)[0].values.value("client")), client);
@@ -182,13 +180,11 @@ TEST_F(ModelTest, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLi
 
   context->deleteObject(client);
   EXPECT_EQ(project->client(), nullptr);
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  endTurn();
+  save();
   ASSERT_TRUE(rowsOf(storePath()).contains(projectUuid));
   EXPECT_TRUE(rowsOf(storePath()).value(projectUuid).clientUuid.isEmpty());
-  context->undoManager().undo();
-  context->processPendingChanges();
-  ASSERT_TRUE(context->save().ok());
+  undoAndSave();
   EXPECT_EQ(rowsOf(storePath()), before);
   const auto projectCalls = journal.callsFor(projectUuid);
   ASSERT_FALSE(projectCalls.empty());
@@ -212,7 +208,7 @@ TEST_F(ModelTest, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLi
 
 // A record that lost its identity is refused loudly by the save: nothing reaches the file or the
 // journal, the change stays pending, and the save goes through once the record has an identity again.
-TEST_F(ModelTest, ARecordWithoutIdentityIsNeverSavedOrJournaled) {
+TEST_F(UndoAcrossSaves, ARecordWithoutIdentityIsNeverSavedOrJournaled) {
   auto* flat = WTFlat::insertNewObject(context.get());
   const QString uuid = flat->uuid();
   flat->setUuid(QString());
