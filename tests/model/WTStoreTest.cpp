@@ -552,6 +552,7 @@ TEST_F(WTStoreTest, EmptyAndMissingFiles) {
 
   auto store = open();
   ASSERT_TRUE(store);
+  EXPECT_EQ(store->path(), path());
   EXPECT_TRUE(loadAll(*store).empty());
   EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
 }

@@ -181,6 +181,7 @@ TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
                            "\"Web \\\"Site\\\"\",\"Design\",\"2024-02\",\"01:00\",\"60.00\"\n"
                            "\"Backend\",\"API\",\"2024-03\",\"02:00\",\"200.00\"\n"));
   EXPECT_EQ(WTCSVExport::reportCSV({}, 2), QString());
+  EXPECT_EQ(WTCSVExport::escapedString(QVariant()), QString(""));
 }
 
 TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
