@@ -124,9 +124,14 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   second->setNotes("notes\nwith lines");
   const Date start = Date::fromSeconds(1767000000.25);
   makeTime(first, start, start.addingSeconds(3600));
-  makeItem<WTFlat>(first, start)->setMinutes(45);
-  makeItem<WTExpense>(second, start)->setExpense(dec("12.30"));
-  makeItem<WTToDo>(project->tasks()[0], start)->setCompleted(true);
+  auto* flat = makeItem<WTFlat>(first, start);
+  flat->setMinutes(45);
+  auto* expense = makeItem<WTExpense>(second, start);
+  expense->setExpense(dec("12.30"));
+  auto* todo = makeItem<WTToDo>(project->tasks()[0], start);
+  todo->setCompleted(true);
+  const QString clientId = client->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(),
+                todoId = todo->uuid();
   project->tasks()[0]->toggleTimer();
   const QMap<QString, QString> before = storedValues(*context);
   EXPECT_EQ(before.value(client->uuid() + ".rate"), "120.00");
@@ -135,6 +140,15 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
 
   saveAndReopen();
   EXPECT_EQ(storedValues(*context), before);
+  // And as each entity's own accessors read them.
+  const WTClient* c = WTClient::objectWithUUID(clientId, context.get());
+  ASSERT_TRUE(c && WTFlat::objectWithUUID(flatId, context.get()) &&
+              WTExpense::objectWithUUID(expenseId, context.get()) &&
+              WTToDo::objectWithUUID(todoId, context.get()));
+  EXPECT_EQ(c->addressBookUID() + c->totalsUID(), "ab:1tot");
+  EXPECT_EQ(*WTFlat::objectWithUUID(flatId, context.get())->minutes(), 45);
+  EXPECT_TRUE(WTExpense::objectWithUUID(expenseId, context.get())->expense()->isIdenticalTo(dec("12.30")));
+  EXPECT_TRUE(WTToDo::objectWithUUID(todoId, context.get())->completed());
   const QList<WTTask*> tasks = context->fetch<WTProject>()[0]->tasks();
   ASSERT_EQ(tasks.size(), 3);
   EXPECT_EQ(tasks[0]->name() + tasks[1]->name() + tasks[2]->name(), "thirdfirstsecond");
