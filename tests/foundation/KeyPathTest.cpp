@@ -52,15 +52,6 @@ bool isDecimal(const QVariant& value) {
   return value.metaType() == QMetaType::fromType<Decimal>();
 }
 
-TEST(KeyPathTest, ObjectVariantsRoundTripAndOtherVariantsAreNoObject) {
-  Record record;
-  const QVariant wrapped = KeyPath::variantFromObject(&record);
-  EXPECT_EQ(KeyPath::objectFromVariant(wrapped), &record);
-  EXPECT_EQ(KeyPath::objectFromVariant(QVariant(5)), nullptr);
-  EXPECT_EQ(KeyPath::objectFromVariant(QVariant()), nullptr);
-  EXPECT_FALSE(KeyPath::variantFromObject(nullptr).isValid());
-}
-
 TEST(KeyPathTest, NestedPathsThroughMapsHashesAndRecords) {
   Records records;
   const QVariant client = records.make({{"name", "Acme"}, {"address", QVariantHash{{"city", "Bern"}}}});
@@ -76,6 +67,9 @@ TEST(KeyPathTest, NestedPathsThroughMapsHashesAndRecords) {
   EXPECT_EQ(eval(QVariant(7), "self"), QVariant(7));
   EXPECT_EQ(eval(QVariant(7), ""), QVariant(7));
   EXPECT_EQ(eval(QVariantMap{{"self", 1}}, "self"), QVariant(1));
+  EXPECT_EQ(KeyPath::objectFromVariant(QVariant(5)), nullptr);
+  EXPECT_EQ(KeyPath::objectFromVariant(QVariant()), nullptr);
+  EXPECT_FALSE(KeyPath::variantFromObject(nullptr).isValid());
 }
 
 TEST(KeyPathTest, UnansweredPathsAreNull) {
@@ -112,58 +106,33 @@ TEST(KeyPathTest, PlainKeysMapOverListsKeepingNulls) {
   EXPECT_EQ(eval(QVariant(words), "@min").toString(), "apple");
 }
 
-TEST(KeyPathTest, CountOfListsAndMaps) {
-  Records records;
-  const QVariant task = records.make({{"items", QVariantList{1, QVariant(), 3}}, {"none", QVariantList{}}});
-  EXPECT_EQ(eval(task, "items.@count"), QVariant(qlonglong(3)));  // nulls are elements too
-  EXPECT_EQ(eval(task, "none.@count"), QVariant(qlonglong(0)));
-  EXPECT_EQ(eval(QVariantMap{{"a", 1}, {"b", 2}}, "@count"), QVariant(qlonglong(2)));
-}
-
-struct SumCase {
-  const char* name;
-  QVariantList values;
-  QVariant sum;  // expected; Decimals are compared including their exponent
-  QVariant avg;
-};
-
 TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
   const qlonglong big = std::numeric_limits<qlonglong>::max();
-  const std::vector<SumCase> cases = {
-      {"ints", {1, 2, qlonglong(3), 4u}, qlonglong(10), decVar("2.5")},
-      {"bools count as integers",
-       {true, false, true},
-       qlonglong(2),
-       decVar("0.66666666666666666666666666666666666667")},
-      {"nulls skipped", {QVariant(), 2, QVariant(), 4}, qlonglong(6), decVar("3")},
-      {"empty", {}, qlonglong(0), QVariant()},
-      {"only nulls", {QVariant(), QVariant()}, qlonglong(0), QVariant()},
-      {"decimal keeps places", {decVar("12.30"), 1}, decVar("13.30"), decVar("6.65")},
-      {"doubles are summed exactly", {0.1, 0.2}, decVar("0.3"), decVar("0.15")},
-      {"int then decimal then int",
-       {5, decVar("0.5"), -3},
-       decVar("2.5"),
-       decVar("0.83333333333333333333333333333333333333")},
-      {"integer overflow continues exactly",
-       {big, big},
-       decVar("18446744073709551614"),
-       decVar("9223372036854775807")},
-      {"huge unsigned",
-       {std::numeric_limits<qulonglong>::max(), 1},
+  const QVariant third = decVar("0.66666666666666666666666666666666666667");
+  const struct {
+    QVariantList values;
+    QVariant sum, avg;  // Decimals are compared including their exponent
+  } cases[] = {
+      {{1, 2, qlonglong(3), 4u}, qlonglong(10), decVar("2.5")},
+      {{true, false, true}, qlonglong(2), third},  // booleans count as integers
+      {{QVariant(), 2, QVariant(), 4}, qlonglong(6), decVar("3")},
+      {{}, qlonglong(0), QVariant()},
+      {{QVariant(), QVariant()}, qlonglong(0), QVariant()},
+      {{decVar("12.30"), 1}, decVar("13.30"), decVar("6.65")},
+      {{0.1, 0.2}, decVar("0.3"), decVar("0.15")},  // doubles are summed exactly
+      {{5, decVar("0.5"), -3}, decVar("2.5"), decVar("0.83333333333333333333333333333333333333")},
+      {{big, big}, decVar("18446744073709551614"), decVar("9223372036854775807")},
+      {{std::numeric_limits<qulonglong>::max(), 1},
        decVar("18446744073709551616"),
        decVar("9223372036854775808")},
-      {"numeric text counts, other text is skipped",
-       {QString("2.25"), QString("n/a"), 1},
-       decVar("3.25"),
-       decVar("1.625")},
+      {{QString("2.25"), QString("n/a"), 1}, decVar("3.25"), decVar("1.625")},  // other text is skipped
   };
-  for (const SumCase& c : cases) {
-    SCOPED_TRACE(c.name);
+  for (const auto& c : cases) {
+    SCOPED_TRACE(QVariant(c.values).toStringList().join(' ').toStdString());
     const QVariant sum = eval(c.values, "@sum");
     ASSERT_EQ(sum.metaType(), c.sum.metaType());
     if (isDecimal(c.sum)) {
-      EXPECT_TRUE(sum.value<Decimal>().isIdenticalTo(c.sum.value<Decimal>()))
-          << sum.value<Decimal>().toString().toStdString();
+      EXPECT_TRUE(sum.value<Decimal>().isIdenticalTo(c.sum.value<Decimal>())) << sum.toString().toStdString();
     } else {
       EXPECT_EQ(sum, c.sum);
     }
@@ -171,8 +140,7 @@ TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
     ASSERT_EQ(avg.isValid(), c.avg.isValid());
     if (c.avg.isValid()) {
       ASSERT_TRUE(isDecimal(avg));
-      EXPECT_EQ(avg.value<Decimal>(), c.avg.value<Decimal>())
-          << avg.value<Decimal>().toString().toStdString();
+      EXPECT_EQ(avg.value<Decimal>(), c.avg.value<Decimal>()) << avg.toString().toStdString();
     }
   }
 }
@@ -194,6 +162,9 @@ TEST(KeyPathTest, OperatorsEvaluateTheRestOfThePathOnEachElement) {
   EXPECT_EQ(eval(project, "tasks.items.@count"), QVariant(qlonglong(2)));  // a list of two lists
   EXPECT_EQ(eval(tasks, "@max.items.@count"), QVariant(qlonglong(3)));
   EXPECT_EQ(eval(tasks, "@sum.items.@sum.duration"), QVariant(qlonglong(120)));
+  // Nulls are elements too; maps count their keys.
+  EXPECT_EQ(eval(QVariantList{1, QVariant(), 3}, "@count"), QVariant(qlonglong(3)));
+  EXPECT_EQ(eval(QVariantMap{{"a", 1}, {"b", 2}}, "@count"), QVariant(qlonglong(2)));
 }
 
 TEST(KeyPathTest, MaxAndMinReturnTheElementItself) {
@@ -224,36 +195,31 @@ TEST(KeyPathTest, MaxAndMinReturnTheElementItself) {
   }
 }
 
-struct CompareCase {
-  const char* name;
-  QVariant a;
-  QVariant b;
-  int expected;
-};
-
 TEST(KeyPathTest, CompareValuesAcrossTypes) {
   const qlonglong twoTo53 = qlonglong(1) << 53;
-  const std::vector<CompareCase> cases = {
-      {"null before numbers", QVariant(), -5, -1},
-      {"null before text", QVariant(), QString(""), -1},
-      {"null equals null", QVariant(), QVariant(), 0},
-      {"int vs decimal equal", 12, decVar("12.00"), 0},
-      {"int vs decimal exact past double precision", twoTo53 + 1, decVar("9007199254740992"), 1},
-      {"int vs double exact past double precision", twoTo53 + 1, double(twoTo53), 1},
-      {"decimal vs double", decVar("0.1"), 0.1, 0},
-      {"decimal fractions", decVar("2.5"), decVar("2.49999999999999999999999999"), 1},
-      {"unsigned above signed range", std::numeric_limits<qulonglong>::max(), qlonglong(-1), 1},
-      {"bool vs int", true, 2, -1},
-      {"negative decimal", decVar("-0.5"), 0, -1},
-      {"text is case sensitive", QString("apple"), QString("Banana"), 1},
-      {"date vs date", dateVar(10.5), dateVar(10.25), 1},
-      {"date vs date-time", dateVar(60), QVariant(QDateTime::fromSecsSinceEpoch(60, Qt::UTC)), 0},
-      {"date-time vs date", QVariant(QDateTime::fromSecsSinceEpoch(59, Qt::UTC)), dateVar(59.5), -1},
+  const struct {
+    QVariant a, b;
+    int expected;
+  } cases[] = {
+      {QVariant(), -5, -1},  // null first
+      {QVariant(), QString(""), -1},
+      {QVariant(), QVariant(), 0},
+      {12, decVar("12.00"), 0},
+      {twoTo53 + 1, decVar("9007199254740992"), 1},  // exact past a double's precision
+      {twoTo53 + 1, double(twoTo53), 1},
+      {decVar("0.1"), 0.1, 0},
+      {decVar("2.5"), decVar("2.49999999999999999999999999"), 1},
+      {std::numeric_limits<qulonglong>::max(), qlonglong(-1), 1},
+      {true, 2, -1},
+      {decVar("-0.5"), 0, -1},
+      {QString("apple"), QString("Banana"), 1},  // case sensitive
+      {dateVar(10.5), dateVar(10.25), 1},
+      {dateVar(60), QVariant(QDateTime::fromSecsSinceEpoch(60, Qt::UTC)), 0},
+      {QVariant(QDateTime::fromSecsSinceEpoch(59, Qt::UTC)), dateVar(59.5), -1},
   };
-  for (const CompareCase& c : cases) {
-    SCOPED_TRACE(c.name);
-    EXPECT_EQ(KeyPath::compareValues(c.a, c.b), c.expected);
-    EXPECT_EQ(KeyPath::compareValues(c.b, c.a), -c.expected);
+  for (const auto& c : cases) {
+    EXPECT_EQ(KeyPath::compareValues(c.a, c.b), c.expected) << c.a.toString().toStdString();
+    EXPECT_EQ(KeyPath::compareValues(c.b, c.a), -c.expected) << c.a.toString().toStdString();
   }
   EXPECT_EQ(KeyPath::compareValues(QString("apple"), QString("APPLE"), true), 0);
   EXPECT_LT(KeyPath::compareValues(QString("apple"), QString("Banana"), true), 0);
@@ -287,6 +253,18 @@ TEST(KeyPathTest, SortIsStableAndFollowsDescriptorsInTurn) {
       names(KeyPath::sorted(values, {SortDescriptor{"group", true, true}, SortDescriptor{"date", false}})),
       QStringList({"n1", "a2", "a1", "b1", "b3", "b2"}));
   EXPECT_EQ(names(KeyPath::sorted(values, {})), names(values));
+
+  const QVariant acme = records.make({{"name", "acme"}});
+  const QVariant zeta = records.make({{"name", "Zeta"}});
+  const QVariantList projects{records.make({{"name", "p1"}, {"client", zeta}}),
+                              records.make({{"name", "p2"}, {"client", acme}}),
+                              records.make({{"name", "p3"}})};
+  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, true}})), QStringList({"p3", "p2", "p1"}));
+  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, false}})),
+            QStringList({"p3", "p1", "p2"}));
+
+  const QVariantList numbers{3, decVar("1.5"), QVariant(), 2.0};
+  EXPECT_EQ(KeyPath::sorted(numbers, {{"", true, false}}), (QVariantList{QVariant(), decVar("1.5"), 2.0, 3}));
 }
 
 TEST(KeyPathTest, SortKeepsTheOrderOfEqualKeysInLongLists) {
@@ -303,21 +281,6 @@ TEST(KeyPathTest, SortKeepsTheOrderOfEqualKeysInLongLists) {
       ASSERT_LT(eval(result[i - 1], "index").toInt(), eval(result[i], "index").toInt()) << i;
     }
   }
-}
-
-TEST(KeyPathTest, SortByNestedPathAndByTheElementsThemselves) {
-  Records records;
-  const QVariant acme = records.make({{"name", "acme"}});
-  const QVariant zeta = records.make({{"name", "Zeta"}});
-  const QVariantList projects{records.make({{"name", "p1"}, {"client", zeta}}),
-                              records.make({{"name", "p2"}, {"client", acme}}),
-                              records.make({{"name", "p3"}})};
-  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, true}})), QStringList({"p3", "p2", "p1"}));
-  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, false}})),
-            QStringList({"p3", "p1", "p2"}));
-
-  const QVariantList numbers{3, decVar("1.5"), QVariant(), 2.0};
-  EXPECT_EQ(KeyPath::sorted(numbers, {{"", true, false}}), (QVariantList{QVariant(), decVar("1.5"), 2.0, 3}));
 }
 
 }  // namespace

@@ -12,6 +12,7 @@
 #include <QFile>
 #include <QLibrary>
 #include <QProcess>
+#include <QScopeGuard>
 #include <QSignalSpy>
 #include <QStandardPaths>
 #include <QTemporaryDir>
@@ -27,6 +28,7 @@ using Location = WTPasswordStore::Location;
 const QString kPassword = QStringLiteral("correct horse battery");
 const QString kUser = QStringLiteral("WTSyncUser");
 const QString kInFile = QStringLiteral("WTSyncPassword");
+const QString kKey = QStringLiteral("sync-password");
 
 // Runs the event loop until `answered` holds, for at most 30 seconds.
 template <class Answered>
@@ -82,193 +84,118 @@ class WTPasswordStoreTest : public ::testing::Test {
     if (::stat(QFile::encodeName(settingsPath()).constData(), &info) != 0) return -1;
     return int(info.st_mode & 07777);
   }
-  void makeFileReadableByOthers() const {
-    ASSERT_TRUE(QFile::setPermissions(settingsPath(), QFileDevice::ReadOwner | QFileDevice::WriteOwner |
-                                                          QFileDevice::ReadGroup | QFileDevice::ReadOther));
-  }
 
   QTemporaryDir dir;
   std::unique_ptr<UserDefaults> defaults;
   MemoryKeychain keychain;
 };
 
-TEST_F(WTPasswordStoreTest, AWorkingKeychainTakesThePasswordAndTheSettingsFileNeverSeesIt) {
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  auto store = makeStore();
-  EXPECT_EQ(storeNow(*store, kPassword), Location::Keychain);
-  EXPECT_EQ(store->password(), kPassword);
-  EXPECT_EQ(keychain.entries.value(QStringLiteral("sync-password")), kPassword);
-  EXPECT_FALSE(defaults->hasStoredValue(kInFile));
-  EXPECT_TRUE(fileBytes().contains("ann@example.org"));
-  EXPECT_FALSE(fileBytes().contains("horse"));
+// Where the password ends up from each state of account, keychain and settings file, after storing or
+// loading it; and what the next start, with a working keychain, makes of that. "x" is the password, "-"
+// none. A file password kept after the keychain failed is never offered to the keychain again: the
+// keyring would prompt at every start.
+TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
+  const struct {
+    const char* name;
+    bool account;
+    const char *keychainBefore, *fileBefore;
+    bool keptBefore, openFile, available;
+    const char*
+        actions;  // store x, store an empty one, remove it, load it, or "keep" it where it is (a command)
+    Location where;
+    const char *password, *keychainAfter, *fileAfter;
+    int reads, writes, kept, restartWrites;
+  } rows[] = {
+      {"a working keychain takes it", true, "-", "-", false, false, true, "store", Location::Keychain, "x",
+       "x", "-", 0, 1, 0, 0},
+      {"without a keychain, a file only its owner reads", false, "-", "-", false, false, false, "store",
+       Location::SettingsFile, "x", "-", "x", 0, 1, 1, 0},
+      {"a file others could read is closed first", true, "-", "-", false, true, false, "store",
+       Location::SettingsFile, "x", "-", "x", 0, 1, 1, 0},
+      {"a keychain that comes back takes it out of the file", true, "-", "old", true, false, true, "store",
+       Location::Keychain, "x", "x", "-", 0, 1, 0, 0},
+      {"load moves the file's into the keychain", true, "-", "x", false, false, true, "load",
+       Location::Keychain, "x", "x", "-", 0, 1, 0, 0},
+      {"a newer one in the file replaces the keychain's", true, "old", "x", false, false, true, "load",
+       Location::Keychain, "x", "x", "-", 0, 1, 0, 0},
+      {"without an account load asks nothing", false, "-", "x", false, false, true, "load",
+       Location::SettingsFile, "x", "-", "x", 0, 0, 0, 0},
+      {"without an account the keychain is not read", false, "x", "-", false, false, true, "load",
+       Location::None, "", "x", "-", 0, 0, 0, 0},
+      {"a command uses it where it is", true, "-", "x", false, false, true, "keep", Location::SettingsFile,
+       "x", "-", "x", 0, 0, 0, 1},
+      {"a move the keychain refuses stays in a private file", true, "-", "x", false, true, false, "load",
+       Location::SettingsFile, "x", "-", "x", 0, 1, 1, 0},
+      {"removing clears keychain and file", true, "x", "old", true, false, true, "remove", Location::None, "",
+       "-", "-", 0, 0, 0, 0},
+      {"an empty password is no password", true, "-", "-", false, false, true, "store clear", Location::None,
+       "", "-", "-", 0, 1, 0, 0},
+      {"the keychain is read once", true, "x", "-", false, false, true, "load load store", Location::Keychain,
+       "x", "x", "-", 1, 1, 0, 0},
+  };
+  const auto text = [](const char* value) {
+    return value == std::string("x") ? kPassword : QString::fromUtf8(value);
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.name);
+    QFile::remove(settingsPath());
+    defaults = std::make_unique<UserDefaults>(settingsPath());
+    keychain.entries.clear();
+    keychain.reads = keychain.writes = 0;
+    if (row.account) defaults->setValue(kUser, QStringLiteral("ann@example.org"));
+    if (row.keychainBefore != std::string("-")) keychain.entries.insert(kKey, text(row.keychainBefore));
+    if (row.fileBefore != std::string("-")) defaults->setValue(kInFile, text(row.fileBefore));
+    if (row.keptBefore) defaults->setValue(SettingsKeys::kSyncPasswordKeptInFile, true);
+    if (row.openFile) {
+      ASSERT_TRUE(QFile::setPermissions(settingsPath(), QFileDevice::ReadOwner | QFileDevice::WriteOwner |
+                                                            QFileDevice::ReadGroup | QFileDevice::ReadOther));
+      ASSERT_EQ(fileMode(), 0644);
+    }
+    keychain.available = row.available;
+    auto store = makeStore();
+    QSignalSpy kept(store.get(), &WTPasswordStore::keptInSettingsFile);
+    for (const QString& action : QString::fromLatin1(row.actions).split(' ')) {
+      if (action == "store" || action == "clear") {
+        storeNow(*store, action == "store" ? kPassword : QString());
+      } else if (action == "remove") {
+        store->removePassword();
+      } else {
+        loadNow(*store,
+                action == "keep" ? WTPasswordStore::FilePassword::Keep : WTPasswordStore::FilePassword{});
+      }
+    }
+    EXPECT_EQ(store->location(), row.where);
+    EXPECT_EQ(store->password(), text(row.password));
+    EXPECT_EQ(keychain.entries.value(kKey, "-"), text(row.keychainAfter));
+    EXPECT_EQ(defaults->stringForKey(kInFile),
+              row.fileAfter == std::string("-") ? QString() : text(row.fileAfter));
+    EXPECT_EQ(fileBytes().contains("horse"), row.fileAfter == std::string("x"));
+    EXPECT_EQ(keychain.reads, row.reads);
+    EXPECT_EQ(keychain.writes, row.writes);
+    EXPECT_EQ(kept.count(), row.kept);
+    EXPECT_EQ(store->keychainError().isEmpty(), row.kept == 0);
+    EXPECT_EQ(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile), row.kept > 0);
+    // A file the store put the password in stays private, through later writes of other settings too.
+    defaults->setValue(QStringLiteral("WTShouldIdle"), true);
+    if (row.kept > 0) {
+      EXPECT_EQ(fileMode(), 0600);
+    }
 
-  // Another start reads it back from the keychain.
-  auto again = makeStore();
-  loadNow(*again);
-  EXPECT_EQ(again->password(), kPassword);
-  EXPECT_EQ(again->location(), Location::Keychain);
-}
-
-TEST_F(WTPasswordStoreTest, TheKeychainIsReadOnceAndOnlyForAnAccount) {
-  keychain.entries.insert(QStringLiteral("sync-password"), kPassword);
-  auto store = makeStore();
-  loadNow(*store);
-  EXPECT_EQ(keychain.reads, 0) << "no account, no keychain";
-  EXPECT_TRUE(store->password().isEmpty());
-
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  loadNow(*store);
-  loadNow(*store);
-  EXPECT_EQ(store->password(), kPassword);
-  EXPECT_EQ(keychain.reads, 1);
-  storeNow(*store, QStringLiteral("new one"));
-  EXPECT_EQ(store->password(), QStringLiteral("new one"));
-  EXPECT_EQ(keychain.reads, 1);
-}
-
-TEST_F(WTPasswordStoreTest, WithoutAKeychainThePasswordGoesToASettingsFileOnlyItsOwnerCanRead) {
-  keychain.available = false;
-  ASSERT_EQ(fileMode(), -1);
-  auto store = makeStore();
-  EXPECT_EQ(storeNow(*store, kPassword), Location::SettingsFile);
-  EXPECT_TRUE(fileBytes().contains("horse"));
-  EXPECT_EQ(fileMode(), 0600);
-
-  // Later writes of other settings keep the file private.
-  defaults->setValue(QStringLiteral("WTShouldIdle"), true);
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  EXPECT_EQ(fileMode(), 0600);
-
-  auto again = makeStore();
-  EXPECT_EQ(again->password(), kPassword);
-  EXPECT_EQ(again->location(), Location::SettingsFile);
-}
-
-TEST_F(WTPasswordStoreTest, AnExistingSettingsFileOthersCouldReadIsClosedBeforeThePasswordGoesIn) {
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  makeFileReadableByOthers();
-  ASSERT_EQ(fileMode(), 0644);
-  keychain.available = false;
-  storeNow(*makeStore(), kPassword);
-  EXPECT_EQ(fileMode(), 0600);
-  EXPECT_TRUE(fileBytes().contains("horse"));
-}
-
-TEST_F(WTPasswordStoreTest, AKeychainThatComesBackTakesThePasswordOutOfTheFile) {
-  keychain.available = false;
-  auto store = makeStore();
-  storeNow(*store, kPassword);
-  ASSERT_TRUE(fileBytes().contains("horse"));
-  keychain.available = true;
-  EXPECT_EQ(storeNow(*store, QStringLiteral("battery staple")), Location::Keychain);
-  EXPECT_FALSE(fileBytes().contains("horse"));
-  EXPECT_FALSE(fileBytes().contains("staple"));
-  EXPECT_FALSE(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile));
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  auto again = makeStore();
-  loadNow(*again);
-  EXPECT_EQ(again->password(), QStringLiteral("battery staple"));
-}
-
-TEST_F(WTPasswordStoreTest, LoadMovesAPasswordFromTheSettingsFileIntoTheKeychainForAnAccountOnly) {
-  defaults->setValue(kInFile, kPassword);
-  ASSERT_TRUE(fileBytes().contains("horse"));
-  loadNow(*makeStore());
-  EXPECT_EQ(keychain.writes, 0) << "no account, no keychain";
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  // A command uses it where it is.
-  auto command = makeStore();
-  loadNow(*command, WTPasswordStore::FilePassword::Keep);
-  EXPECT_EQ(command->location(), Location::SettingsFile);
-  EXPECT_EQ(keychain.writes + keychain.reads, 0);
-
-  auto store = makeStore();
-  loadNow(*store);
-  EXPECT_EQ(keychain.entries.value(QStringLiteral("sync-password")), kPassword);
-  EXPECT_FALSE(defaults->hasStoredValue(kInFile));
-  EXPECT_FALSE(fileBytes().contains("horse"));
-  EXPECT_EQ(store->password(), kPassword);
-  EXPECT_EQ(store->location(), Location::Keychain);
-  // Nothing left to move the next time.
-  loadNow(*makeStore());
-  EXPECT_EQ(keychain.writes, 1);
-}
-
-TEST_F(WTPasswordStoreTest, AMoveTheKeychainRefusesLeavesThePasswordInAPrivateFileAndIsNotTriedAgain) {
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  defaults->setValue(kInFile, kPassword);
-  makeFileReadableByOthers();
-  keychain.available = false;
-  auto store = makeStore();
-  QSignalSpy kept(store.get(), &WTPasswordStore::keptInSettingsFile);
-  loadNow(*store);
-  EXPECT_TRUE(fileBytes().contains("horse"));
-  EXPECT_EQ(fileMode(), 0600);
-  EXPECT_EQ(store->password(), kPassword);
-  EXPECT_EQ(store->location(), Location::SettingsFile);
-  EXPECT_EQ(kept.count(), 1);
-  EXPECT_FALSE(store->keychainError().isEmpty());
-
-  // The next start neither asks nor says anything again: the keyring would prompt at every start.
-  keychain.available = true;
-  auto next = makeStore();
-  QSignalSpy keptAgain(next.get(), &WTPasswordStore::keptInSettingsFile);
-  loadNow(*next);
-  EXPECT_EQ(keychain.writes, 1);
-  EXPECT_EQ(next->password(), kPassword);
-  EXPECT_EQ(keptAgain.count(), 0);
-}
-
-TEST_F(WTPasswordStoreTest, ANewerPasswordInTheFileReplacesTheKeychainsOlderOne) {
-  // The file holds a password only when the keychain could not take it, so the file's is the newer.
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  keychain.entries.insert(QStringLiteral("sync-password"), QStringLiteral("old"));
-  defaults->setValue(kInFile, kPassword);
-  loadNow(*makeStore());
-  EXPECT_EQ(keychain.entries.value(QStringLiteral("sync-password")), kPassword);
-  auto again = makeStore();
-  loadNow(*again);
-  EXPECT_EQ(again->password(), kPassword);
-}
-
-TEST_F(WTPasswordStoreTest, RemovingThePasswordClearsKeychainAndFile) {
-  defaults->setValue(kUser, QStringLiteral("ann@example.org"));
-  auto store = makeStore();
-  storeNow(*store, kPassword);
-  defaults->setValue(kInFile, QStringLiteral("stale"));
-  store->removePassword();
-  EXPECT_TRUE(keychain.entries.isEmpty());
-  EXPECT_FALSE(defaults->hasStoredValue(kInFile));
-  EXPECT_TRUE(store->password().isEmpty());
-  auto again = makeStore();
-  loadNow(*again);
-  EXPECT_TRUE(again->password().isEmpty());
-  // An empty password is no password.
-  storeNow(*store, kPassword);
-  EXPECT_EQ(storeNow(*store, QString()), Location::None);
-  EXPECT_TRUE(keychain.entries.isEmpty());
-}
-
-// Sets an environment variable (or removes it, for a null value) while it lives.
-class ScopedEnvironment {
- public:
-  ScopedEnvironment(const char* name, const QByteArray& value) : name_(name), previous_(qgetenv(name)) {
-    if (value.isNull())
-      qunsetenv(name);
-    else
-      qputenv(name, value);
+    keychain.available = true;
+    const int writes = keychain.writes;
+    auto next = makeStore();
+    QSignalSpy keptAgain(next.get(), &WTPasswordStore::keptInSettingsFile);
+    loadNow(*next);
+    EXPECT_EQ(next->password(), text(row.password)) << "after a restart";
+    EXPECT_EQ(keychain.writes - writes, row.restartWrites) << "after a restart";
+    EXPECT_EQ(keptAgain.count(), 0) << "after a restart";
   }
-  ~ScopedEnvironment() {
-    if (previous_.isNull())
-      qunsetenv(name_);
-    else
-      qputenv(name_, previous_);
-  }
+}
 
- private:
-  const char* name_;
-  QByteArray previous_;
-};
+// Sets an environment variable, or removes it for a null value.
+void setEnvironment(const char* name, const QByteArray& value) {
+  value.isNull() ? void(qunsetenv(name)) : void(qputenv(name, value));
+}
 
 // The real adapter where there is no session bus (a server, an SSH login): nothing is asked, so
 // neither D-Bus nor GLib tries to start a bus through a display, and the settings file is where the
@@ -278,8 +205,13 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
   const QByteArray runtimeWithoutBus = QFile::encodeName(dir.path());
   for (const QByteArray& address : {deadSocket, QByteArray()}) {
     SCOPED_TRACE(address.toStdString());
-    ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address);
-    ScopedEnvironment runtime("XDG_RUNTIME_DIR", runtimeWithoutBus);
+    const QByteArray bus = qgetenv("DBUS_SESSION_BUS_ADDRESS"), runtime = qgetenv("XDG_RUNTIME_DIR");
+    const auto restore = qScopeGuard([&] {
+      setEnvironment("DBUS_SESSION_BUS_ADDRESS", bus);
+      setEnvironment("XDG_RUNTIME_DIR", runtime);
+    });
+    setEnvironment("DBUS_SESSION_BUS_ADDRESS", address);
+    setEnvironment("XDG_RUNTIME_DIR", runtimeWithoutBus);
     WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
     std::optional<Result<QString>> read;
     secrets.readPassword(QStringLiteral("sync-password"),
@@ -305,7 +237,9 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   using fakesecrets::FakeSecretService;
   const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
+  const QByteArray previousBus = qgetenv("DBUS_SESSION_BUS_ADDRESS");
+  const auto restore = qScopeGuard([&] { setEnvironment("DBUS_SESSION_BUS_ADDRESS", previousBus); });
+  qputenv("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
   FakeSecretService service;
   ASSERT_TRUE(service.start(address));
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);

@@ -1,31 +1,27 @@
 #include "ModelFixture.h"
 
+#include <QColor>
 #include <QCoreApplication>
 #include <QSignalSpy>
 
 class WTObjectContextTest : public ModelTest {};
 
-TEST_F(WTObjectContextTest, IdentitiesNameTheirEntityAndFindTheirRecord) {
+TEST_F(WTObjectContextTest, IdentitiesNameTheirEntityAndFindOrMakeTheirRecord) {
   WTTask* task = makeTask();
   auto* time = makeItem<WTTime>(task, berlin(2026, 1, 1, 9));
   EXPECT_TRUE(time->uuid().endsWith(QStringLiteral("@WTTime")));
   EXPECT_TRUE(task->uuid().endsWith(QStringLiteral("@WTTask")));
-  EXPECT_NE(time->uuid(), task->uuid());
   EXPECT_EQ(WTTime::objectWithUUID(time->uuid(), context.get()), time);
   EXPECT_EQ(context->objectWithUUID(time->uuid()), time);
-  // The class operation answers only its own entity.
-  EXPECT_EQ(WTTask::objectWithUUID(time->uuid(), context.get()), nullptr);
-}
+  EXPECT_EQ(WTTask::objectWithUUID(time->uuid(), context.get()), nullptr);  // only its own entity
 
-TEST_F(WTObjectContextTest, ObjectWithUUIDForceInsertMakesARecordOfTheNamedEntity) {
+  // Forced, an identity naming a concrete entity makes its record; nothing else does.
   const qsizetype before = context->count();
-  EXPECT_EQ(context->objectWithUUID(QVariant(42), true), nullptr);
-  EXPECT_EQ(context->objectWithUUID(QVariant(), true), nullptr);
-  EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTNothing"), true), nullptr);
-  EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTItem"), true), nullptr);  // abstract
+  for (const QVariant& refused :
+       {QVariant(42), QVariant(), QVariant("ABC@WTNothing"), QVariant("ABC@WTItem")})
+    EXPECT_EQ(context->objectWithUUID(refused, true), nullptr) << refused.toString().toStdString();
   EXPECT_EQ(context->objectWithUUID(QStringLiteral("ABC@WTFlat"), false), nullptr);
   EXPECT_EQ(context->count(), before);
-
   WTObject* made = context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true);
   ASSERT_NE(made, nullptr);
   EXPECT_EQ(made->entity(), WTEntity::Flat);
@@ -43,26 +39,22 @@ TEST_F(WTObjectContextTest, FetchingByEntityName) {
   auto* a = WTProject::insertNewObject(context.get());
   a->setName("alpha");
   b->setName("Beta");
-
   EXPECT_FALSE(context->fetchObjectsForEntityName("WTInvoice").has_value());
   EXPECT_EQ(context->fetchObjectsForEntityName("WTItem")->size(), 2);
   EXPECT_EQ(context->fetchObjectsForEntityName("WTObject")->size(), 5);
   const auto sorted = context->fetchObjectsForEntityName("WTProject", {{"name", false, true}});
-  ASSERT_EQ(sorted->size(), 2);
-  EXPECT_EQ(sorted->at(0), b);
+  EXPECT_EQ(*sorted, (QList<WTObject*>{b, a}));
   const auto filtered = context->fetchObjectsForEntityName(
       "WTProject", {}, [](const WTObject* o) { return o->name() == "alpha"; });
-  EXPECT_EQ(filtered->size(), 1);
+  EXPECT_EQ(*filtered, QList<WTObject*>{a});
   EXPECT_EQ(WTProject::fetchByPredicate({}, context.get()).size(), 2);
 }
 
 TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
   auto* project = WTProject::insertNewObject(context.get());
-  project->setName("P");
   WTTask* task = makeTask(project, "first");
   task->setName("renamed before saving");
   ASSERT_TRUE(context->save().ok());
-
   auto calls = journal.callsFor(task->uuid());
   ASSERT_EQ(calls.size(), 1u);
   EXPECT_EQ(calls[0].kind, "insert");
@@ -70,9 +62,9 @@ TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
   EXPECT_EQ(KeyPath::objectFromVariant(calls[0].values.value("project")), project);
   EXPECT_TRUE(calls[0].values.contains("uuid"));
   // The project's ordered tasks travel as an ordered relationship.
-  auto projectCalls = journal.callsFor(project->uuid());
-  ASSERT_EQ(projectCalls.size(), 1u);
-  const auto tasks = projectCalls[0].values.value("tasks").value<WTOrderedRelationship>();
+  ASSERT_EQ(journal.callsFor(project->uuid()).size(), 1u);
+  const auto tasks =
+      journal.callsFor(project->uuid())[0].values.value("tasks").value<WTOrderedRelationship>();
   EXPECT_EQ(tasks.objects, QList<WTObject*>{task});
 
   journal.calls.clear();
@@ -83,21 +75,35 @@ TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
   EXPECT_EQ(calls[0].kind, "update");
   EXPECT_EQ(calls[0].values.keys(), QStringList{"budget"});
 
-  journal.calls.clear();
-  const QString uuid = task->uuid();
-  context->deleteObject(task);
-  ASSERT_TRUE(context->save().ok());
-  calls = journal.callsFor(uuid);
-  ASSERT_EQ(calls.size(), 1u);
-  EXPECT_EQ(calls[0].kind, "delete");
-
   // A record made and removed between two saves leaves no trace.
   journal.calls.clear();
   WTTask* fleeting = makeTask();
   const QString fleetingUuid = fleeting->uuid();
   context->deleteObject(fleeting);
   ASSERT_TRUE(context->save().ok());
-  EXPECT_TRUE(journal.callsFor(fleetingUuid).empty());
+  EXPECT_TRUE(journal.calls.empty());
+}
+
+// Every stored value of every record as text: decimals with their places, dates to the millisecond,
+// colours with their alpha, relationships by identity.
+QMap<QString, QString> storedValues(WTObjectContext& context) {
+  QMap<QString, QString> values;
+  const auto objects = context.fetchObjectsForEntityName("WTObject");
+  for (WTObject* object : objects.value()) {
+    for (const QString& key : object->storedKeys()) {
+      const QVariant value = object->valueForKey(key);
+      QString text = value.toString();
+      if (const auto* related = static_cast<WTObject*>(KeyPath::objectFromVariant(value))) {
+        text = related->uuid();
+      } else if (value.metaType() == QMetaType::fromType<Date>()) {
+        text = QString::number(value.value<Date>().secondsSince1970(), 'f', 3);
+      } else if (value.typeId() == QMetaType::QColor) {
+        text = value.value<QColor>().name(QColor::HexArgb);
+      }
+      values.insert(object->uuid() + '.' + key, value.isNull() ? QStringLiteral("none") : text);
+    }
+  }
+  return values;
 }
 
 TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
@@ -112,99 +118,46 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   project->setClient(client);
   WTTask* first = makeTask(project, "first");
   WTTask* second = makeTask(project, "second");
-  WTTask* third = makeTask(project, "third");
-  project->moveTask(third, 0);
+  makeTask(project, "third");
+  project->moveTask(project->tasks()[2], 0);
   second->setBudget(dec("1000.50"));
   second->setNotes("notes\nwith lines");
   const Date start = Date::fromSeconds(1767000000.25);
-  WTTime* time = makeTime(first, start, start.addingSeconds(3600));
+  makeTime(first, start, start.addingSeconds(3600));
   auto* flat = makeItem<WTFlat>(first, start);
   flat->setMinutes(45);
   auto* expense = makeItem<WTExpense>(second, start);
   expense->setExpense(dec("12.30"));
-  auto* todo = makeItem<WTToDo>(third, start);
+  auto* todo = makeItem<WTToDo>(project->tasks()[0], start);
   todo->setCompleted(true);
-  auto* running = third->toggleTimer();
-  const QString timeId = time->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(),
-                todoId = todo->uuid(), runningId = running->uuid(), clientId = client->uuid(),
-                projectId = project->uuid();
+  const QString clientId = client->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(),
+                todoId = todo->uuid();
+  project->tasks()[0]->toggleTimer();
+  const QMap<QString, QString> before = storedValues(*context);
+  EXPECT_EQ(before.value(client->uuid() + ".rate"), "120.00");
+  EXPECT_EQ(before.value(client->uuid() + ".color"), "#280a141e");
+  EXPECT_GE(before.size(), 9 * 6);  // nine records, each with at least the six keys every record keeps
 
   saveAndReopen();
-  auto* c = WTClient::objectWithUUID(clientId, context.get());
-  ASSERT_NE(c, nullptr);
-  EXPECT_EQ(c->name(), "Client Ü");
-  EXPECT_EQ(c->addressBookUID(), "ab:1");
-  EXPECT_EQ(c->totalsUID(), "tot");
-  EXPECT_TRUE(c->storedRate()->isIdenticalTo(dec("120.00")));
-  EXPECT_EQ(c->color(), QColor(10, 20, 30, 40));
-  EXPECT_TRUE(c->archived());
-  auto* p = WTProject::objectWithUUID(projectId, context.get());
-  ASSERT_EQ(c->projects(), QList<WTProject*>{p});
-  QStringList names;
-  for (WTTask* task : p->tasks()) names << task->name();
-  EXPECT_EQ(names, QStringList({"third", "first", "second"}));
-  EXPECT_TRUE(p->tasks()[2]->budget()->isIdenticalTo(dec("1000.50")));
-  EXPECT_EQ(p->tasks()[2]->notes(), "notes\nwith lines");
-  auto* t = WTTime::objectWithUUID(timeId, context.get());
-  EXPECT_EQ(*t->startDate(), start);
-  EXPECT_EQ(*t->endDate(), start.addingSeconds(3600));
-  EXPECT_EQ(t->task(), p->tasks()[1]);
+  EXPECT_EQ(storedValues(*context), before);
+  // And as each entity's own accessors read them.
+  const WTClient* c = WTClient::objectWithUUID(clientId, context.get());
+  ASSERT_TRUE(c && WTFlat::objectWithUUID(flatId, context.get()) &&
+              WTExpense::objectWithUUID(expenseId, context.get()) &&
+              WTToDo::objectWithUUID(todoId, context.get()));
+  EXPECT_EQ(c->addressBookUID() + c->totalsUID(), "ab:1tot");
   EXPECT_EQ(*WTFlat::objectWithUUID(flatId, context.get())->minutes(), 45);
   EXPECT_TRUE(WTExpense::objectWithUUID(expenseId, context.get())->expense()->isIdenticalTo(dec("12.30")));
   EXPECT_TRUE(WTToDo::objectWithUUID(todoId, context.get())->completed());
-  auto* r = WTTime::objectWithUUID(runningId, context.get());
-  EXPECT_TRUE(r->running());
-  EXPECT_FALSE(r->endDate().has_value());
-  EXPECT_TRUE(p->tasks()[0]->running());
+  const QList<WTTask*> tasks = context->fetch<WTProject>()[0]->tasks();
+  ASSERT_EQ(tasks.size(), 3);
+  EXPECT_EQ(tasks[0]->name() + tasks[1]->name() + tasks[2]->name(), "thirdfirstsecond");
+  EXPECT_TRUE(tasks[0]->running());
   EXPECT_FALSE(context->hasChanges());
 }
 
-TEST_F(WTObjectContextTest, DeletingCascadesDownButNotFromClients) {
-  auto* client = WTClient::insertNewObject(context.get());
-  auto* project = WTProject::insertNewObject(context.get());
-  project->setClient(client);
-  WTTask* task = makeTask(project);
-  makeItem<WTNote>(task, berlin(2026, 1, 1));
-  makeItem<WTNote>(task, berlin(2026, 1, 2));
-  ASSERT_TRUE(context->save().ok());
-
-  context->deleteObject(client);
-  EXPECT_EQ(project->client(), nullptr);
-  EXPECT_EQ(context->fetch<WTProject>().size(), 1);
-  context->deleteObject(project);
-  EXPECT_TRUE(context->fetch<WTTask>().isEmpty());
-  EXPECT_TRUE(context->fetchObjectsForEntityName("WTItem")->isEmpty());
-  saveAndReopen();
-  EXPECT_EQ(context->count(), 0);
-}
-
-TEST_F(WTObjectContextTest, UndoTakesBackOneEventLoopTurnAtATime) {
-  WTTask* task = makeTask(nullptr, "before");
-  context->processPendingChanges();
-
-  task->setName("after");
-  task->setRate(dec("90"));
-  QCoreApplication::processEvents();  // the turn ends
-  task->setBudget(dec("5"));
-  context->processPendingChanges();
-
-  context->undoManager().undo();
-  EXPECT_FALSE(task->budget().has_value());
-  EXPECT_EQ(task->name(), "after");
-  context->undoManager().undo();
-  EXPECT_EQ(task->name(), "before");
-  EXPECT_FALSE(task->storedRate().has_value());
-  context->undoManager().redo();
-  EXPECT_EQ(task->name(), "after");
-  EXPECT_EQ(task->inheritedRate(), dec("90"));
-
-  // A new change forgets what could be redone.
-  context->processPendingChanges();
-  task->setNotes("n");
-  EXPECT_FALSE(context->undoManager().canRedo());
-}
-
-TEST_F(WTObjectContextTest, EachUndoStepKeepsTheNameOfWhatMadeItThroughUndoAndRedo) {
+// Undo takes back one event-loop turn at a time, each step under the name of what made it.
+TEST_F(WTObjectContextTest, UndoStepsAreTurnsAndKeepTheirNames) {
   WTUndoManager& undo = context->undoManager();
   QSignalSpy changed(context.get(), &WTObjectContext::undoStateChanged);
   WTTask* task = makeTask(nullptr, "before");
@@ -215,9 +168,10 @@ TEST_F(WTObjectContextTest, EachUndoStepKeepsTheNameOfWhatMadeItThroughUndoAndRe
   context->processPendingChanges();
   EXPECT_EQ(undo.undoActionName(), "Start Timer");
   task->setName("after");
+  task->setRate(dec("90"));
   undo.setActionName("Typing");
-  undo.setActionName("Rename");  // the last name of the turn wins
-  context->processPendingChanges();
+  undo.setActionName("Rename");       // the last name of the turn wins
+  QCoreApplication::processEvents();  // the turn ends
   // A name given in a turn that changed nothing names nothing.
   undo.setActionName("Nothing");
   { const WTUndoManager::NamedStep unchanged(undo, "Unchanged"); }
@@ -225,27 +179,38 @@ TEST_F(WTObjectContextTest, EachUndoStepKeepsTheNameOfWhatMadeItThroughUndoAndRe
   EXPECT_EQ(undo.undoActionName(), "Rename");
   {
     const WTUndoManager::NamedStep step(undo, "Typing");
-    task->setNotes("n");
+    task->setBudget(dec("5"));
   }
   EXPECT_EQ(undo.undoActionName(), "Typing");  // the open step already answers to its name
   context->processPendingChanges();
 
   changed.clear();
   undo.undo();
+  EXPECT_FALSE(task->budget().has_value());
+  EXPECT_EQ(task->name(), "after");
   EXPECT_EQ(undo.undoActionName(), "Rename");
   EXPECT_EQ(undo.redoActionName(), "Typing");
   undo.undo();
+  EXPECT_EQ(task->name(), "before");
+  EXPECT_FALSE(task->storedRate().has_value());
   EXPECT_EQ(undo.undoActionName(), "Start Timer");
   EXPECT_EQ(undo.redoActionName(), "Rename");
   undo.redo();
+  EXPECT_EQ(task->name(), "after");
+  EXPECT_EQ(task->inheritedRate(), dec("90"));
   EXPECT_EQ(undo.undoActionName(), "Rename");
   EXPECT_EQ(undo.redoActionName(), "Typing");
-  EXPECT_EQ(task->name(), "after");
   EXPECT_EQ(changed.count(), 3);
   // A new change drops what could be redone, and says so.
-  task->setBudget(dec("5"));
+  task->setNotes("n");
+  EXPECT_FALSE(undo.canRedo());
   EXPECT_EQ(undo.redoActionName(), "");
   EXPECT_EQ(changed.count(), 4);
+
+  // Undoing the first turn forgets the record it made; nothing is left to save.
+  while (undo.canUndo()) undo.undo();
+  EXPECT_EQ(context->count(), 0);
+  EXPECT_FALSE(context->hasChanges());
 }
 
 TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
@@ -262,14 +227,11 @@ TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
   context->processPendingChanges();
   EXPECT_EQ(project->duration(), 0);
   EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
-
   context->undoManager().undo();
   EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
   EXPECT_EQ(project->duration(), 40);
   EXPECT_EQ(project->cost(), dec("40"));
-  EXPECT_EQ(context->fetch<WTTime>().size(), 2);
   EXPECT_EQ(context->objectWithUUID(task->uuid()), task);
-
   // The undone delete must not reach the file or the journal.
   journal.calls.clear();
   saveAndReopen();
@@ -277,38 +239,17 @@ TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
   for (const auto& call : journal.calls) EXPECT_NE(call.kind, "delete");
 }
 
-TEST_F(WTObjectContextTest, UndoingAnInsertForgetsTheRecord) {
-  context->processPendingChanges();
-  auto* project = WTProject::insertNewObject(context.get());
-  makeTask(project);
-  context->processPendingChanges();
-  context->undoManager().undo();
-  EXPECT_EQ(context->count(), 0);
-  EXPECT_FALSE(context->hasChanges());
-  context->undoManager().redo();
-  EXPECT_EQ(context->fetch<WTTask>().size(), 1);
-  EXPECT_EQ(context->fetch<WTTask>()[0]->project(), project);
-}
-
-TEST_F(WTObjectContextTest, ChangesAreAnnouncedOncePerTurn) {
+// A list that follows the store learns of a change only here: a record changed in one turn and again in
+// a later one, with no save between them, must be announced both times, and once per turn.
+TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItOnce) {
   QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
   WTTask* task = makeTask();
   task->setName("a");
-  task->setName("b");
   QCoreApplication::processEvents();
   ASSERT_EQ(spy.count(), 1);
   EXPECT_EQ(spy[0][0].value<QList<WTObject*>>(), QList<WTObject*>{task});
   QCoreApplication::processEvents();
   EXPECT_EQ(spy.count(), 1);
-}
-
-TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItEvenBeforeASave) {
-  // A list that follows the store learns of a change only here: a record changed in one turn and again in
-  // a later one, with no save between them, must be announced both times.
-  QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
-  WTTask* task = makeTask();
-  QCoreApplication::processEvents();
-  ASSERT_EQ(spy.count(), 1);
   task->setName("inserted, then changed in a later turn");
   QCoreApplication::processEvents();
   ASSERT_EQ(spy.count(), 2);
@@ -328,7 +269,6 @@ TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   WTTask* task = makeTask();
   auto* expense = makeItem<WTExpense>(task, berlin(2026, 1, 1));
   EXPECT_TRUE(expense->setValue("expense", QStringLiteral("7.10")));
-  EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")));
   EXPECT_FALSE(expense->setValue("expense", QStringLiteral("seven")));
   EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")));
   EXPECT_FALSE(expense->setValue("cost", 3));
@@ -339,24 +279,18 @@ TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   EXPECT_TRUE(task->items().isEmpty());
 }
 
-TEST_F(WTObjectContextTest, ItemsOfAnOpenedStoreAreFoundAndDeletedByIdentity) {
+TEST_F(WTObjectContextTest, ItemsOfAnOpenedStoreAreDeletedByIdentity) {
   WTTask* task = makeTask();
-  auto* note = makeItem<WTNote>(task, berlin(2026, 1, 1));
-  auto* kept = makeItem<WTNote>(task, berlin(2026, 1, 2));
-  const QString noteId = note->uuid(), keptId = kept->uuid();
+  const QString noteId = makeItem<WTNote>(task, berlin(2026, 1, 1))->uuid();
+  const QString keptId = makeItem<WTNote>(task, berlin(2026, 1, 2))->uuid();
   saveAndReopen();
-
   // Deleting first, before anything looked an item up, must still remove its row.
-  auto* reopenedTask = context->fetch<WTTask>().value(0);
-  ASSERT_NE(reopenedTask, nullptr);
-  WTItem* toDelete =
-      reopenedTask->items()[0]->uuid() == noteId ? reopenedTask->items()[0] : reopenedTask->items()[1];
-  context->deleteObject(toDelete);
-  journal.calls.clear();
+  const QList<WTItem*> items = context->fetch<WTTask>().value(0)->items();
+  ASSERT_EQ(items.size(), 2);
+  context->deleteObject(items[items[0]->uuid() == noteId ? 0 : 1]);
   saveAndReopen();
   EXPECT_EQ(context->objectWithUUID(noteId), nullptr);
   EXPECT_NE(context->objectWithUUID(keptId), nullptr);
-  EXPECT_EQ(context->fetch<WTNote>().size(), 1);
 }
 
 TEST_F(WTObjectContextTest, ARecordDeletedAndMadeAgainUnderItsIdentityIsKept) {
@@ -364,7 +298,6 @@ TEST_F(WTObjectContextTest, ARecordDeletedAndMadeAgainUnderItsIdentityIsKept) {
   project->setName("first life");
   const QString uuid = project->uuid();
   ASSERT_TRUE(context->save().ok());
-
   // The sync may take over an identity that was deleted here since the last save.
   context->deleteObject(project);
   WTObject* again = context->objectWithUUID(uuid, true);
@@ -372,7 +305,6 @@ TEST_F(WTObjectContextTest, ARecordDeletedAndMadeAgainUnderItsIdentityIsKept) {
   EXPECT_NE(again, project);
   again->setName("second life");
   saveAndReopen();
-  auto* reopened = WTProject::objectWithUUID(uuid, context.get());
-  ASSERT_NE(reopened, nullptr);
-  EXPECT_EQ(reopened->name(), "second life");
+  ASSERT_NE(WTProject::objectWithUUID(uuid, context.get()), nullptr);
+  EXPECT_EQ(WTProject::objectWithUUID(uuid, context.get())->name(), "second life");
 }

@@ -1,12 +1,8 @@
-#include "FaultInjectingVfs.h"
 #include "WTStore.h"
 
 #include <gtest/gtest.h>
-
-#include <QSet>
 #include <sqlite3.h>
 
-#include <QDir>
 #include <QFile>
 #include <QFileInfo>
 #include <QTemporaryDir>
@@ -15,54 +11,135 @@
 #include <map>
 #include <memory>
 #include <random>
+#include <thread>
+
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 namespace {
+
+// A SQLite VFS over the default one that, once armed, fails the N-th write or sync of any file (database,
+// log or journal) with an I/O error, and with `persistent` every later one too, in the manner of SQLite's
+// own fault tests. Its files are the default VFS's files with those two calls replaced.
+namespace FaultInjectingVfs {
+enum class Operation { Write, Sync };
+struct {
+  bool armed = false;
+  Operation kind = Operation::Write;
+  int remaining = 0;  // operations of `kind` until the one that fails
+  bool persistent = false, fired = false;
+} state;
+sqlite3_vfs* base = nullptr;
+sqlite3_vfs vfs;
+// The default VFS's sets of calls (one for databases, one for their logs and journals), each with its copy
+// whose write and sync may fail.
+struct Wrapped {
+  const sqlite3_io_methods* base = nullptr;
+  sqlite3_io_methods methods;
+} wrapped[4];
+
+const sqlite3_io_methods* baseOf(sqlite3_file* f) {
+  for (const Wrapped& w : wrapped)
+    if (&w.methods == f->pMethods) return w.base;
+  return nullptr;
+}
+bool shouldFail(Operation kind) {
+  if (!state.armed || state.kind != kind) return false;
+  if (state.fired) return state.persistent;
+  return state.fired = --state.remaining <= 0;
+}
+int xWrite(sqlite3_file* f, const void* buffer, int amount, sqlite3_int64 offset) {
+  return shouldFail(Operation::Write) ? SQLITE_IOERR_WRITE : baseOf(f)->xWrite(f, buffer, amount, offset);
+}
+int xSync(sqlite3_file* f, int flags) {
+  return shouldFail(Operation::Sync) ? SQLITE_IOERR_FSYNC : baseOf(f)->xSync(f, flags);
+}
+int xOpen(sqlite3_vfs*, sqlite3_filename name, sqlite3_file* file, int flags, int* outFlags) {
+  const int code = base->xOpen(base, name, file, flags, outFlags);
+  if (code != SQLITE_OK || !file->pMethods) return code;
+  for (Wrapped& w : wrapped) {
+    if (!w.base) {
+      w.base = file->pMethods;
+      w.methods = *w.base;
+      w.methods.xWrite = xWrite;
+      w.methods.xSync = xSync;
+    }
+    if (w.base == file->pMethods) {
+      file->pMethods = &w.methods;
+      return SQLITE_OK;
+    }
+  }
+  file->pMethods->xClose(file);
+  file->pMethods = nullptr;
+  return SQLITE_CANTOPEN;
+}
+// Registers the VFS (once; not as the default) and returns its name for WTStore::open.
+const char* name() {
+  static const bool registered = [] {
+    base = sqlite3_vfs_find(nullptr);
+    vfs = *base;  // every other call is the default VFS's own, with its own data
+    vfs.pNext = nullptr;
+    vfs.zName = "tessal-faults";
+    vfs.xOpen = xOpen;
+    return sqlite3_vfs_register(&vfs, 0) == SQLITE_OK;
+  }();
+  return registered ? vfs.zName : nullptr;
+}
+void arm(Operation kind, int n, bool persistent) {
+  state = {true, kind, n, persistent, false};
+}
+void disarm() {
+  state = {};
+}
+bool fired() {
+  return state.fired;
+}
+}  // namespace FaultInjectingVfs
 
 using Records = std::map<QString, WTStoreRecord>;
 
 std::optional<Decimal> decimal(const char16_t* text) {
-  auto value = Decimal::fromString(QStringView(text));
-  EXPECT_TRUE(value) << QString::fromUtf16(text).toStdString();
-  return value;
+  return Decimal::fromString(QStringView(text));
 }
 
-// Compares whole records, decimals by representation (12.30 is not 12.3).
+// Compares whole records, decimals also by representation (12.30 is not 12.3), strings also by null-ness.
 void expectSameRecords(const Records& actual, const Records& expected) {
   ASSERT_EQ(actual.size(), expected.size());
-  for (const auto& [uuid, record] : expected) {
+  for (const auto& [uuid, want] : expected) {
     const auto found = actual.find(uuid);
     ASSERT_NE(found, actual.end()) << uuid.toStdString();
     const WTStoreRecord& got = found->second;
-    EXPECT_TRUE(got == record) << uuid.toStdString();
+    EXPECT_TRUE(got == want) << uuid.toStdString();
     for (auto field : {&WTStoreRecord::rate, &WTStoreRecord::budget, &WTStoreRecord::expense}) {
-      ASSERT_EQ((got.*field).has_value(), (record.*field).has_value()) << uuid.toStdString();
-      if (record.*field) {
-        EXPECT_TRUE((got.*field)->isIdenticalTo(*(record.*field)))
-            << uuid.toStdString() << ": " << (got.*field)->toString().toStdString() << " vs "
-            << (record.*field)->toString().toStdString();
+      ASSERT_EQ((got.*field).has_value(), (want.*field).has_value()) << uuid.toStdString();
+      if (want.*field) {
+        EXPECT_TRUE((got.*field)->isIdenticalTo(*(want.*field))) << uuid.toStdString();
       }
     }
-    for (auto field :
-         {&WTStoreRecord::name, &WTStoreRecord::notes, &WTStoreRecord::color, &WTStoreRecord::addressBookUID,
-          &WTStoreRecord::clientUuid, &WTStoreRecord::taskUuid}) {
-      EXPECT_EQ((got.*field).isNull(), (record.*field).isNull()) << uuid.toStdString();
-    }
+    for (auto field : {&WTStoreRecord::name, &WTStoreRecord::notes, &WTStoreRecord::color,
+                       &WTStoreRecord::addressBookUID, &WTStoreRecord::clientUuid, &WTStoreRecord::taskUuid})
+      EXPECT_EQ((got.*field).isNull(), (want.*field).isNull()) << uuid.toStdString();
   }
 }
 
-WTStoreRecord record(const QString& uuid, const QString& entity) {
+WTStoreRecord record(const QString& uuid, const QString& entity, const QString& task = {}) {
   WTStoreRecord r;
   r.uuid = uuid;
   r.entity = entity;
+  r.taskUuid = task;
   return r;
+}
+
+bool isOwner(const WTStoreRecord& r) {
+  return r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask";
 }
 
 // One record of every entity, every field used somewhere, with the awkward values a store must keep.
 Records sampleRecords() {
   Records records;
-  auto add = [&](WTStoreRecord r) { records[r.uuid] = std::move(r); };
-
-  WTStoreRecord client = record(QStringLiteral("C1@WTClient"), QStringLiteral("WTClient"));
+  auto add = [&](WTStoreRecord r) -> WTStoreRecord& { return records[r.uuid] = std::move(r); };
+  WTStoreRecord& client = add(record("C1@WTClient", "WTClient"));
   client.name = QStringLiteral("Müller & Söhne ☕ 日本");
   client.notes = QStringLiteral("line one\nline two\ttab, \"quoted\"");
   client.rate = decimal(u"85.50");
@@ -70,57 +147,35 @@ Records sampleRecords() {
   client.archived = true;
   client.addressBookUID = QStringLiteral("AB-1:ABPerson");
   client.totalsUID = QString(QLatin1StringView(""));  // empty, not none
-  add(client);
-
-  WTStoreRecord project = record(QStringLiteral("P1@WTProject"), QStringLiteral("WTProject"));
+  WTStoreRecord& project = add(record("P1@WTProject", "WTProject"));
   project.name = QString(QLatin1StringView(""));
   project.clientUuid = client.uuid;
-  project.rate = decimal(u"1E+3");  // a positive exponent: 1000 with exponent 3
-  add(project);
-
-  WTStoreRecord task = record(QStringLiteral("T1@WTTask"), QStringLiteral("WTTask"));
+  project.rate = decimal(u"1E+3");  // a positive exponent
+  WTStoreRecord& task = add(record("T1@WTTask", "WTTask"));
   task.name = QStringLiteral("Design");
   task.projectUuid = project.uuid;
   task.position = 3;
   task.budget = decimal(u"12345678901234567890123456789012345678");  // 38 digits
   task.rate = decimal(u"0.00");
-  add(task);
-
-  WTStoreRecord time = record(QStringLiteral("I1@WTTime"), QStringLiteral("WTTime"));
+  WTStoreRecord& time = add(record("I1@WTTime", "WTTime", task.uuid));
   time.name = QString::fromUtf16(u"nul \0 inside", 12);
-  time.taskUuid = task.uuid;
   time.startDate = Date::fromSeconds(1767261600.25);
   time.endDate = Date::fromSeconds(1767265200.75);
   time.running = true;
-  add(time);
-
-  WTStoreRecord flat = record(QStringLiteral("I2@WTFlat"), QStringLiteral("WTFlat"));
-  flat.taskUuid = task.uuid;
+  WTStoreRecord& flat = add(record("I2@WTFlat", "WTFlat", task.uuid));
   flat.startDate = Date::fromSeconds(-86400.5);  // before 1970
   flat.minutes = 0;                              // zero, not none
-  add(flat);
-
-  WTStoreRecord expense = record(QStringLiteral("I3@WTExpense"), QStringLiteral("WTExpense"));
-  expense.taskUuid = task.uuid;
+  WTStoreRecord& expense = add(record("I3@WTExpense", "WTExpense", task.uuid));
   expense.startDate = Date::fromSeconds(0);
   expense.expense = decimal(u"-12.30");
   expense.rate = decimal(u"0.0000000000000000000001");
-  add(expense);
-
-  WTStoreRecord note = record(QStringLiteral("I4@WTNote"), QStringLiteral("WTNote"));
-  note.notes = QString(20000, QChar(u'é'));
-  note.taskUuid = task.uuid;
-  add(note);
-
-  WTStoreRecord toDo = record(QStringLiteral("I5@WTToDo"), QStringLiteral("WTToDo"));
+  add(record("I4@WTNote", "WTNote", task.uuid)).notes = QString(20000, QChar(u'é'));
+  WTStoreRecord& toDo = add(record("I5@WTToDo", "WTToDo"));
   toDo.name = QStringLiteral("Call back");
   toDo.completed = true;
   toDo.position = -1;
-  toDo.minutes = 9007199254740993LL;  // beyond a double's exact integers
-  add(toDo);
-
-  // A record of an entity this version does not know is kept as it is.
-  add(record(QStringLiteral("X1@WTFuture"), QStringLiteral("WTFuture")));
+  toDo.minutes = 9007199254740993LL;       // beyond a double's exact integers
+  add(record("X1@WTFuture", "WTFuture"));  // an entity this version does not know is kept as it is
   return records;
 }
 
@@ -130,12 +185,11 @@ std::vector<WTStoreRecord> values(const Records& records) {
   return list;
 }
 
-Records loadAll(WTStore& store) {
+Records loadAll(WTStore& store, WTStore::Records which = WTStore::Records::All,
+                const QStringList& tasks = {}) {
   Records records;
-  const Result<void> loaded = store.loadAll([&](WTStoreRecord&& r) {
-    const QString uuid = r.uuid;
-    records[uuid] = std::move(r);
-  });
+  const Result<void> loaded =
+      store.loadAll([&](WTStoreRecord&& r) { records[r.uuid] = std::move(r); }, which, tasks);
   EXPECT_TRUE(loaded.ok()) << loaded.error().message.toStdString();
   return records;
 }
@@ -143,6 +197,12 @@ Records loadAll(WTStore& store) {
 QByteArray fileBytes(const QString& path) {
   QFile file(path);
   return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
+}
+
+void writeFile(const QString& path, const QByteArray& bytes) {
+  QFile file(path);
+  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
+  file.write(bytes);
 }
 
 // Plain sqlite3 on a file, as another program would see it.
@@ -173,6 +233,8 @@ class RawDatabase {
   sqlite3* db_ = nullptr;
 };
 
+const char* const kSuffixes[] = {"", "-wal", "-shm", "-journal"};
+
 class WTStoreTest : public ::testing::Test {
  protected:
   QString path() const { return dir.filePath(QStringLiteral("Tessal.sqlite")); }
@@ -187,64 +249,40 @@ class WTStoreTest : public ::testing::Test {
   void makeStore(const Records& records) {
     auto store = open();
     ASSERT_TRUE(store);
-    const Result<void> saved = store->save(values(records), {});
-    ASSERT_TRUE(saved.ok()) << saved.error().message.toStdString();
+    ASSERT_TRUE(store->save(values(records), {}).ok());
   }
 
-  bool sideFilesExist() const {
-    return QFileInfo::exists(path() + QStringLiteral("-wal")) ||
-           QFileInfo::exists(path() + QStringLiteral("-shm")) ||
-           QFileInfo::exists(path() + QStringLiteral("-journal"));
+  // The bytes of the file, its log and its journal; whether the log's index exists.
+  QList<QByteArray> allBytes() const {
+    QList<QByteArray> bytes;
+    for (const char* suffix : {"", "-wal", "-journal"})
+      bytes.append(fileBytes(path() + QLatin1StringView(suffix)));
+    bytes.append(QFileInfo::exists(path() + QStringLiteral("-shm")) ? "index" : "");
+    return bytes;
+  }
+  void removeFiles() const {
+    for (const char* suffix : kSuffixes) QFile::remove(path() + QLatin1StringView(suffix));
   }
 
   QTemporaryDir dir;
 };
 
-TEST_F(WTStoreTest, EveryFieldSurvivesTheFileExactly) {
-  const Records records = sampleRecords();
-  makeStore(records);
-  auto store = open();
-  ASSERT_TRUE(store);
-  expectSameRecords(loadAll(*store), records);
-}
-
-TEST_F(WTStoreTest, ANewFileIsACurrentStoreInWalMode) {
-  ASSERT_TRUE(open());
-  EXPECT_FALSE(sideFilesExist());  // closing folds the log back into the file
-  RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("3"));
-  EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
-  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("0"));
-}
-
-TEST_F(WTStoreTest, AMissingFolderIsNotCreated) {
-  const QString folder = dir.filePath(QStringLiteral("Tessal2"));
-  const QString file = folder + QStringLiteral("/Tessal.sqlite");
-  auto store = WTStore::open(file);
-  ASSERT_FALSE(store.ok());
-  EXPECT_EQ(store.error().code, WTStore::OpenFailed);
-  EXPECT_TRUE(store.error().message.contains(file)) << store.error().message.toStdString();
-  EXPECT_FALSE(QFileInfo::exists(folder));
-}
-
-TEST_F(WTStoreTest, SavingReplacesWholeRecordsAndDeletes) {
+TEST_F(WTStoreTest, EveryFieldSurvivesSavesThatReplaceWholeRecordsAndDelete) {
   Records records = sampleRecords();
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
-
-  // Cleared fields must come back as none, not as their old values.
-  WTStoreRecord cleared = record(QStringLiteral("C1@WTClient"), QStringLiteral("WTClient"));
-  cleared.name = QStringLiteral("Renamed");
-  WTStoreRecord added = record(QStringLiteral("I9@WTNote"), QStringLiteral("WTNote"));
-  added.taskUuid = QStringLiteral("T1@WTTask");
-  ASSERT_TRUE(
-      store->save({cleared, added}, {QStringLiteral("I3@WTExpense"), QStringLiteral("never@WTTime")}).ok());
-  records[cleared.uuid] = cleared;
-  records[added.uuid] = added;
-  records.erase(QStringLiteral("I3@WTExpense"));
   expectSameRecords(loadAll(*store), records);
 
+  // Cleared fields must come back as none, not as their old values.
+  WTStoreRecord cleared = record("C1@WTClient", "WTClient");
+  cleared.name = QStringLiteral("Renamed");
+  const WTStoreRecord added = record("I9@WTNote", "WTNote", "T1@WTTask");
+  ASSERT_TRUE(store->save({cleared, added}, {"I3@WTExpense", "never@WTTime"}).ok());
+  records[cleared.uuid] = cleared;
+  records[added.uuid] = added;
+  records.erase("I3@WTExpense");
+  expectSameRecords(loadAll(*store), records);
   store.reset();
   store = open();
   ASSERT_TRUE(store);
@@ -252,19 +290,39 @@ TEST_F(WTStoreTest, SavingReplacesWholeRecordsAndDeletes) {
   EXPECT_TRUE(store->save({}, {}).ok());
 }
 
+TEST_F(WTStoreTest, ANewFileIsACurrentStoreInWalModeButItsFolderIsNeverMade) {
+  ASSERT_TRUE(open());
+  for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
+    EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
+  RawDatabase raw(path());
+  EXPECT_EQ(raw.text("PRAGMA user_version"), "3");
+  EXPECT_EQ(raw.text("PRAGMA journal_mode"), "wal");
+  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), "0");
+
+  const QString folder = dir.filePath(QStringLiteral("Tessal2"));
+  auto store = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
+  ASSERT_FALSE(store.ok());
+  EXPECT_EQ(store.error().code, WTStore::OpenFailed);
+  EXPECT_TRUE(store.error().message.contains(folder)) << store.error().message.toStdString();
+  EXPECT_FALSE(QFileInfo::exists(folder));
+}
+
+// A row needs its identity: a save holding a row or a deletion without one writes nothing of itself.
 TEST_F(WTStoreTest, ASaveThatFailsHalfwayWritesNothing) {
   const Records records = sampleRecords();
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
-  const WTStoreRecord good = record(QStringLiteral("good@WTNote"), QStringLiteral("WTNote"));
-  const WTStoreRecord nameless = record(QString(), QStringLiteral("WTNote"));  // a row needs its identity
-  const Result<void> saved = store->save({good, nameless}, {QStringLiteral("I1@WTTime")});
-  ASSERT_FALSE(saved.ok());
-  EXPECT_EQ(saved.error().code, WTStore::WriteFailed);
-  EXPECT_TRUE(saved.error().message.contains(path())) << saved.error().message.toStdString();
-  expectSameRecords(loadAll(*store), records);
-
+  const WTStoreRecord good = record("good@WTNote", "WTNote");
+  for (const auto& [writes, deletes] :
+       {std::pair{std::vector{good, record({}, "WTNote")}, QStringList{"I1@WTTime"}},
+        std::pair{std::vector{good}, QStringList{QString()}}}) {
+    const Result<void> saved = store->save(writes, deletes);
+    ASSERT_FALSE(saved.ok());
+    EXPECT_EQ(saved.error().code, WTStore::WriteFailed);
+    EXPECT_TRUE(saved.error().message.contains(path())) << saved.error().message.toStdString();
+    expectSameRecords(loadAll(*store), records);
+  }
   ASSERT_TRUE(store->save({good}, {}).ok());
   store.reset();
   store = open();
@@ -274,55 +332,30 @@ TEST_F(WTStoreTest, ASaveThatFailsHalfwayWritesNothing) {
   expectSameRecords(loadAll(*store), expected);
 }
 
-TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBack) {
-  {
-    // Version 1 as it was first written; later versions must keep reading such files.
-    RawDatabase raw(path());
-    raw.exec(
-        "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
-        " rate TEXT, color TEXT, archived INTEGER NOT NULL DEFAULT 0, addressBookUID TEXT, totalsUID TEXT,"
-        " clientUuid TEXT, projectUuid TEXT, position INTEGER NOT NULL DEFAULT 0, budget TEXT, taskUuid TEXT,"
-        " startDate REAL, endDate REAL, running INTEGER NOT NULL DEFAULT 0, minutes INTEGER, expense TEXT,"
-        " completed INTEGER NOT NULL DEFAULT 0);"
-        "PRAGMA application_id = 1416852332;"
-        "PRAGMA user_version = 1;"
-        "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
-        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
-        "INSERT INTO records (uuid, entity, name, projectUuid, position, budget) VALUES"
-        " ('T@WTTask', 'WTTask', '', 'P@WTProject', 2, '5E+2');"
-        "INSERT INTO records (uuid, entity, taskUuid, startDate, endDate, running, notes) VALUES"
-        " ('I@WTTime', 'WTTime', 'T@WTTask', 1700000000.5, 1700003600, 0, 'x');"
-        "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
-        " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000, 90, '-0.10', 1);");
-  }
+TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBackAndIsMigratedOnlyByAWriter) {
+  RawDatabase(path()).exec(
+      "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
+      " rate TEXT, color TEXT, archived INTEGER NOT NULL DEFAULT 0, addressBookUID TEXT, totalsUID TEXT,"
+      " clientUuid TEXT, projectUuid TEXT, position INTEGER NOT NULL DEFAULT 0, budget TEXT, taskUuid TEXT,"
+      " startDate REAL, endDate REAL, running INTEGER NOT NULL DEFAULT 0, minutes INTEGER, expense TEXT,"
+      " completed INTEGER NOT NULL DEFAULT 0);"
+      "PRAGMA application_id = 1416852332; PRAGMA user_version = 1;"
+      "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
+      " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
+      "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
+      " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
   Records expected;
-  WTStoreRecord client = record(QStringLiteral("C@WTClient"), QStringLiteral("WTClient"));
+  WTStoreRecord& client = expected["C@WTClient"] = record("C@WTClient", "WTClient");
   client.name = QStringLiteral("Acme");
   client.rate = decimal(u"80.00");
   client.archived = true;
   client.color = QStringLiteral("#ff112233");
-  expected[client.uuid] = client;
-  WTStoreRecord task = record(QStringLiteral("T@WTTask"), QStringLiteral("WTTask"));
-  task.name = QString(QLatin1StringView(""));
-  task.projectUuid = QStringLiteral("P@WTProject");
-  task.position = 2;
-  task.budget = decimal(u"5E+2");
-  expected[task.uuid] = task;
-  WTStoreRecord time = record(QStringLiteral("I@WTTime"), QStringLiteral("WTTime"));
-  time.taskUuid = task.uuid;
-  time.startDate = Date::fromSeconds(1700000000.5);
-  time.endDate = Date::fromSeconds(1700003600);
-  time.notes = QStringLiteral("x");
-  expected[time.uuid] = time;
-  WTStoreRecord flat = record(QStringLiteral("F@WTFlat"), QStringLiteral("WTFlat"));
-  flat.taskUuid = task.uuid;
-  flat.startDate = Date::fromSeconds(1700000000);
+  WTStoreRecord& flat = expected["F@WTFlat"] = record("F@WTFlat", "WTFlat", "T@WTTask");
+  flat.startDate = Date::fromSeconds(1700000000.5);
   flat.minutes = 90;
   flat.expense = decimal(u"-0.10");
   flat.completed = true;
-  expected[flat.uuid] = flat;
 
-  // A reader that may not migrate reads it as it is, and leaves it so.
   const QByteArray before = fileBytes(path());
   {
     auto reader = WTStore::openReadOnly(path());
@@ -334,210 +367,181 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBack) {
   auto store = open();
   ASSERT_TRUE(store);
   expectSameRecords(loadAll(*store), expected);
-  ASSERT_TRUE(store->save({record(QStringLiteral("N@WTNote"), QStringLiteral("WTNote"))}, {}).ok());
+  ASSERT_TRUE(store->save({record("N@WTNote", "WTNote")}, {}).ok());
   store.reset();
   RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA journal_mode"), QStringLiteral("wal"));
-  EXPECT_EQ(raw.text("PRAGMA user_version"), QStringLiteral("3"));
-  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), QStringLiteral("5"));
+  EXPECT_EQ(raw.text("PRAGMA journal_mode"), "wal");
+  EXPECT_EQ(raw.text("PRAGMA user_version"), "3");
+  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), "3");
   EXPECT_EQ(raw.text("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name LIKE 'records_%'"),
-            QStringLiteral("3"));
+            "3");
 }
 
-TEST_F(WTStoreTest, TimersReadTheOwnersAndTheRunningEntriesOnly) {
+// Partial loads read every owner, and of the items only the running entries or those of the named tasks.
+TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
   Records records = sampleRecords();
-  WTStoreRecord running = record(QStringLiteral("R@WTTime"), QStringLiteral("WTTime"));
-  running.taskUuid = QStringLiteral("T1@WTTask");
-  running.startDate = Date::fromSeconds(1700000000);
+  WTStoreRecord& running = records["R@WTTime"] = record("R@WTTime", "WTTime", "T1@WTTask");
   running.running = true;
-  records[running.uuid] = running;
-  makeStore(records);
-  Records expected;
-  for (const auto& [uuid, stored] : records) {
-    if (stored.entity == QLatin1String("WTClient") || stored.entity == QLatin1String("WTProject") ||
-        stored.entity == QLatin1String("WTTask") || stored.running)
-      expected[uuid] = stored;
-  }
-  ASSERT_GT(expected.size(), 1u);
-  ASSERT_LT(expected.size(), records.size());
-  auto store = open();
-  ASSERT_TRUE(store);
-  Records loaded;
-  ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { loaded[r.uuid] = r; }, WTStore::Records::Timers).ok());
-  expectSameRecords(loaded, expected);
-}
-
-TEST_F(WTStoreTest, ItemsOfTasksReadTheOwnersAndThoseTasksItemsOnly) {
-  Records records = sampleRecords();
   // Tasks whose uuids hold what JSON must escape still find their items.
-  for (const QString& task : {QStringLiteral("T\"quoted\\@WTTask"), QStringLiteral("T9@WTTask")}) {
-    WTStoreRecord owner = record(task, QStringLiteral("WTTask"));
-    records[task] = owner;
-    WTStoreRecord item = record(task + QStringLiteral("-item@WTNote"), QStringLiteral("WTNote"));
-    item.taskUuid = task;
-    records[item.uuid] = item;
+  const QString quoted = QStringLiteral("T\"quoted\\@WTTask");
+  for (const QString& task : {quoted, QStringLiteral("T9@WTTask")}) {
+    records[task] = record(task, "WTTask");
+    records[task + "-item@WTNote"] = record(task + "-item@WTNote", "WTNote", task);
   }
   makeStore(records);
-  QSet<QString> tasks;
-  for (const auto& [uuid, stored] : records) {
-    if (stored.entity == QLatin1String("WTTask") && uuid != QLatin1String("T9@WTTask")) tasks.insert(uuid);
-  }
   auto store = open();
   ASSERT_TRUE(store);
-  for (const QStringList& chosen : {QStringList(tasks.begin(), tasks.end()), QStringList()}) {
+  using Pick = std::function<bool(const WTStoreRecord&)>;
+  const struct {
+    WTStore::Records which;
+    QStringList tasks;
+    Pick item;
+  } cases[] = {
+      {WTStore::Records::Timers, {"T1@WTTask"}, [](const WTStoreRecord& r) { return r.running; }},
+      {WTStore::Records::ItemsOfTasks,
+       {"T1@WTTask", quoted},
+       [&](const WTStoreRecord& r) { return r.taskUuid == u"T1@WTTask" || r.taskUuid == quoted; }},
+      // The statement is used again: the next load's tasks replace the last one's.
+      {WTStore::Records::ItemsOfTasks, {}, [](const WTStoreRecord&) { return false; }},
+      {WTStore::Records::ItemsOfTasks,
+       {quoted},
+       [&](const WTStoreRecord& r) { return r.taskUuid == quoted; }},
+  };
+  for (const auto& c : cases) {
     Records expected;
-    for (const auto& [uuid, stored] : records) {
-      const bool owner = stored.entity == QLatin1String("WTClient") || stored.entity == QLatin1String("WTProject") ||
-                         stored.entity == QLatin1String("WTTask");
-      if (owner || chosen.contains(stored.taskUuid)) expected[uuid] = stored;
-    }
-    Records loaded;
-    ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { loaded[r.uuid] = r; }, WTStore::Records::ItemsOfTasks, chosen).ok());
-    expectSameRecords(loaded, expected);
-    // The statement is used again: the next load's tasks replace this one's.
+    for (const auto& [uuid, stored] : records)
+      if (isOwner(stored) || c.item(stored)) expected[uuid] = stored;
+    ASSERT_LT(expected.size(), records.size());
+    expectSameRecords(loadAll(*store, c.which, c.tasks), expected);
   }
-  Records items;
-  ASSERT_TRUE(store->loadAll([&](WTStoreRecord&& r) { items[r.uuid] = r; }, WTStore::Records::ItemsOfTasks,
-                             {QStringLiteral("T\"quoted\\@WTTask")}).ok());
-  EXPECT_EQ(items.count(QStringLiteral("T\"quoted\\@WTTask-item@WTNote")), 1u);
-  EXPECT_EQ(items.count(QStringLiteral("T9@WTTask-item@WTNote")), 0u);
-}
-
-TEST_F(WTStoreTest, AnEmptyFileBecomesAStore) {
-  QFile file(path());
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly));
-  file.close();
-  auto store = open();
-  ASSERT_TRUE(store);
-  EXPECT_TRUE(loadAll(*store).empty());
-  EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
-}
-
-// Files that must be refused, and left exactly as they were.
-struct RefusedFile {
-  const char* name;
-  std::function<void(WTStoreTest&, const QString& path)> make;
-  int code;
-  const char* message;  // %1 is the path
-};
-
-void writeFile(const QString& path, const QByteArray& bytes) {
-  QFile file(path);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-  file.write(bytes);
 }
 
 // A real store with enough rows for several levels of pages.
-void makeLargeStore(WTStoreTest& test, const QString& path) {
+void makeLargeStore(const QString& path) {
   std::vector<WTStoreRecord> records;
   for (int i = 0; i < 3000; ++i) {
-    WTStoreRecord r = record(QStringLiteral("item-%1@WTNote").arg(i), QStringLiteral("WTNote"));
-    r.name = QStringLiteral("A note of some length, number %1").arg(i);
-    records.push_back(r);
+    records.push_back(record(QStringLiteral("item-%1@WTNote").arg(i), "WTNote"));
+    records.back().name = QStringLiteral("A note of some length, number %1").arg(i);
   }
   auto store = WTStore::open(path);
   ASSERT_TRUE(store.ok());
   ASSERT_TRUE(store.value()->save(records, {}).ok());
-  (void)test;
 }
 
 void newerVersion(const QString& path, bool wal) {
   RawDatabase raw(path);
   if (wal) raw.exec("PRAGMA journal_mode = WAL");
   raw.exec(
-      "CREATE TABLE records (uuid TEXT PRIMARY KEY, entity TEXT, colour BLOB);"
-      "CREATE TABLE later (x);"
+      "CREATE TABLE records (uuid TEXT PRIMARY KEY, entity TEXT, colour BLOB); CREATE TABLE later (x);"
       "INSERT INTO records VALUES ('a@WTClient', 'WTClient', x'00ff');"
-      "PRAGMA application_id = 1416852332;"
-      "PRAGMA user_version = 99;");
+      "PRAGMA application_id = 1416852332; PRAGMA user_version = 99;");
 }
 
-const RefusedFile kRefusedFiles[] = {
+const char kNotAStore[] = "The file “%1” is not a Tessal data file and cannot be opened.";
+const char kNewer[] = "The data file “%1” was written by a newer version of Tessal and cannot be opened.";
+const char kDamaged[] = "The data file “%1” is damaged and cannot be opened.";
+
+// Files that must be refused by writers and readers alike, and left exactly as they were, log included.
+const struct RefusedFile {
+  const char* name;
+  std::function<void(const QString& path)> make;
+  int code;
+  const char* message;  // %1 is the path
+} kRefusedFiles[] = {
     {"a text file",
-     [](WTStoreTest&, const QString& path) {
-       writeFile(path, QByteArray("Not a database at all.\n").repeated(300));
-     },
-     WTStore::NotAStore, "The file “%1” is not a Tessal data file and cannot be opened."},
+     [](const QString& path) { writeFile(path, QByteArray("Not a database at all.\n").repeated(300)); },
+     WTStore::NotAStore, kNotAStore},
     {"another program's database",
-     [](WTStoreTest&, const QString& path) { RawDatabase(path).exec("CREATE TABLE songs (title TEXT)"); },
-     WTStore::NotAStore, "The file “%1” is not a Tessal data file and cannot be opened."},
+     [](const QString& path) { RawDatabase(path).exec("CREATE TABLE songs (title TEXT)"); },
+     WTStore::NotAStore, kNotAStore},
     {"another program's database with a version",
-     [](WTStoreTest&, const QString& path) {
+     [](const QString& path) {
        RawDatabase(path).exec("CREATE TABLE records (uuid TEXT); PRAGMA user_version = 1;");
      },
-     WTStore::NotAStore, "The file “%1” is not a Tessal data file and cannot be opened."},
-    {"a newer version", [](WTStoreTest&, const QString& path) { newerVersion(path, false); },
-     WTStore::NewerVersion,
-     "The data file “%1” was written by a newer version of Tessal and cannot be opened."},
-    {"a newer version in WAL mode", [](WTStoreTest&, const QString& path) { newerVersion(path, true); },
-     WTStore::NewerVersion,
-     "The data file “%1” was written by a newer version of Tessal and cannot be opened."},
+     WTStore::NotAStore, kNotAStore},
+    {"a newer version", [](const QString& path) { newerVersion(path, false); }, WTStore::NewerVersion,
+     kNewer},
+    {"a newer version in WAL mode", [](const QString& path) { newerVersion(path, true); },
+     WTStore::NewerVersion, kNewer},
+    {"a newer version only its log knows about",
+     [](const QString& path) {
+       RawDatabase raw(path);
+       raw.exec(
+           "CREATE TABLE records (uuid TEXT PRIMARY KEY); PRAGMA application_id = 1416852332;"
+           "PRAGMA user_version = 1; PRAGMA journal_mode = WAL;");
+       // The newer version's changes are still in the log when it stops.
+       raw.exec("PRAGMA user_version = 99; INSERT INTO records VALUES ('a@WTClient')");
+       ASSERT_EQ(sqlite3_db_config(raw.handle(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr), SQLITE_OK);
+     },
+     WTStore::NewerVersion, kNewer},
     {"a truncated store",
-     [](WTStoreTest& test, const QString& path) {
-       makeLargeStore(test, path);
+     [](const QString& path) {
+       makeLargeStore(path);
        writeFile(path, fileBytes(path).left(fileBytes(path).size() / 2));
      },
-     WTStore::Damaged, "The data file “%1” is damaged and cannot be opened."},
+     WTStore::Damaged, kDamaged},
     {"a store with garbled pages",
-     [](WTStoreTest& test, const QString& path) {
-       makeLargeStore(test, path);
+     [](const QString& path) {
+       makeLargeStore(path);
        QByteArray bytes = fileBytes(path);
        std::mt19937 random(7);
        // Every page but the first (the header and schema) gets noise in its middle.
-       for (qsizetype page = 4096; page < bytes.size(); page += 4096) {
+       for (qsizetype page = 4096; page < bytes.size(); page += 4096)
          for (int i = 1000; i < 1200; ++i) bytes[page + i] = char(random());
-       }
        writeFile(path, bytes);
      },
-     WTStore::Damaged, "The data file “%1” is damaged and cannot be opened."},
+     WTStore::Damaged, kDamaged},
     {"a store whose last page is garbled",
-     [](WTStoreTest& test, const QString& path) {
-       makeLargeStore(test, path);
+     [](const QString& path) {
+       makeLargeStore(path);
        QByteArray bytes = fileBytes(path);
        for (qsizetype i = bytes.size() - 4096; i < bytes.size(); ++i) bytes[i] = char(0x5a);
        writeFile(path, bytes);
      },
-     WTStore::Damaged, "The data file “%1” is damaged and cannot be opened."},
+     WTStore::Damaged, kDamaged},
 };
 
 TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
   for (const RefusedFile& refused : kRefusedFiles) {
-    SCOPED_TRACE(refused.name);
-    QFile::remove(path());
-    refused.make(*this, path());
-    ASSERT_FALSE(sideFilesExist());
-    const QByteArray before = fileBytes(path());
-    ASSERT_FALSE(before.isEmpty());
-
-    auto store = WTStore::open(path());
-    ASSERT_FALSE(store.ok());
-    EXPECT_EQ(store.error().code, refused.code);
-    EXPECT_EQ(store.error().message, QString::fromUtf8(refused.message).arg(path()));
-    EXPECT_EQ(fileBytes(path()), before);
-    EXPECT_FALSE(sideFilesExist());
+    for (bool readOnly : {false, true}) {
+      SCOPED_TRACE(std::string(refused.name) + (readOnly ? ", reading" : ", writing"));
+      removeFiles();
+      refused.make(path());
+      const QList<QByteArray> before = allBytes();
+      ASSERT_FALSE(before[0].isEmpty());
+      auto store = readOnly ? WTStore::openReadOnly(path()) : WTStore::open(path());
+      ASSERT_FALSE(store.ok());
+      EXPECT_EQ(store.error().code, refused.code);
+      EXPECT_EQ(store.error().message, QString::fromUtf8(refused.message).arg(path()));
+      QList<QByteArray> after = allBytes();
+      if (readOnly) after.back() = before.back();  // a reader may leave the log's index behind
+      EXPECT_EQ(after, before);
+    }
   }
 }
 
-TEST_F(WTStoreTest, ANewerVersionOnlyItsLogKnowsAboutIsRefusedWithTheLogKept) {
-  {
-    RawDatabase raw(path());
-    raw.exec(
-        "CREATE TABLE records (uuid TEXT PRIMARY KEY); PRAGMA application_id = 1416852332;"
-        "PRAGMA user_version = 1; PRAGMA journal_mode = WAL;");
-    // The newer version's changes are still in the log when it stops.
-    raw.exec("PRAGMA user_version = 99; INSERT INTO records VALUES ('a@WTClient')");
-    ASSERT_EQ(sqlite3_db_config(raw.handle(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr), SQLITE_OK);
-  }
-  const QString log = path() + QStringLiteral("-wal");
-  const QByteArray fileBefore = fileBytes(path());
-  const QByteArray logBefore = fileBytes(log);
-  ASSERT_FALSE(logBefore.isEmpty());
+// An empty file (made but never written) is a store without records: a writer makes it one, a reader
+// reads it as empty and leaves it so; a missing file is never made by a reader.
+TEST_F(WTStoreTest, EmptyAndMissingFiles) {
+  auto missing = WTStore::openReadOnly(path());
+  ASSERT_FALSE(missing.ok());
+  EXPECT_EQ(missing.error().code, WTStore::OpenFailed);
+  EXPECT_TRUE(missing.error().message.contains(path()));
+  EXPECT_FALSE(QFileInfo::exists(path()));
 
-  auto store = WTStore::open(path());
-  ASSERT_FALSE(store.ok());
-  EXPECT_EQ(store.error().code, WTStore::NewerVersion);
-  EXPECT_EQ(fileBytes(path()), fileBefore);
-  EXPECT_EQ(fileBytes(log), logBefore);
+  writeFile(path(), QByteArray());
+  auto empty = WTStore::openReadOnly(path());
+  ASSERT_TRUE(empty) << empty.error().message.toStdString();
+  EXPECT_TRUE(loadAll(*empty.value()).empty());
+  EXPECT_FALSE(empty.value()->save({record("x@WTNote", "WTNote")}, {}).ok());
+  empty.value().reset();
+  EXPECT_TRUE(fileBytes(path()).isEmpty());
+
+  auto store = open();
+  ASSERT_TRUE(store);
+  EXPECT_EQ(store->path(), path());
+  EXPECT_TRUE(loadAll(*store).empty());
+  EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
 }
 
 TEST_F(WTStoreTest, AnAmountThatIsNotANumberFailsTheLoad) {
@@ -551,138 +555,13 @@ TEST_F(WTStoreTest, AnAmountThatIsNotANumberFailsTheLoad) {
   EXPECT_TRUE(loaded.error().message.contains(path()));
 }
 
-// ---- Fault loops: fail the N-th write or sync, raise N until the operation gets through.
-
-struct FaultKind {
-  FaultInjectingVfs::Operation operation;
-  bool persistent;
-  const char* name;
-};
-const FaultKind kFaultKinds[] = {
-    {FaultInjectingVfs::Operation::Write, false, "one failed write"},
-    {FaultInjectingVfs::Operation::Write, true, "every write from the N-th on"},
-    {FaultInjectingVfs::Operation::Sync, false, "one failed sync"},
-    {FaultInjectingVfs::Operation::Sync, true, "every sync from the N-th on"},
-};
-
-void expectIntact(const QString& path) {
-  RawDatabase raw(path);
-  EXPECT_EQ(raw.text("PRAGMA integrity_check"), QStringLiteral("ok"));
-}
-
-TEST_F(WTStoreTest, AFailedSaveLeavesNothingBehindAndTheStoreUsable) {
-  const char* vfs = FaultInjectingVfs::name();
-  ASSERT_TRUE(vfs);
-  const Records committed = sampleRecords();
-
-  // The save under test changes, adds and deletes; enough rows to span several pages.
-  Records changed = committed;
-  std::vector<WTStoreRecord> writes;
-  for (int i = 0; i < 200; ++i) {
-    WTStoreRecord r = record(QStringLiteral("new-%1@WTTime").arg(i), QStringLiteral("WTTime"));
-    r.name = QStringLiteral("entry %1 ").arg(i).repeated(10);
-    r.startDate = Date::fromSeconds(i);
-    writes.push_back(r);
-  }
-  WTStoreRecord renamed = committed.at(QStringLiteral("T1@WTTask"));
-  renamed.name = QStringLiteral("Renamed");
-  writes.push_back(renamed);
-  for (const WTStoreRecord& r : writes) changed[r.uuid] = r;
-  const QStringList deletes = {QStringLiteral("I1@WTTime"), QStringLiteral("C1@WTClient")};
-  for (const QString& uuid : deletes) changed.erase(uuid);
-
-  const WTStoreRecord probe = record(QStringLiteral("probe@WTNote"), QStringLiteral("WTNote"));
-
-  for (const FaultKind& kind : kFaultKinds) {
-    SCOPED_TRACE(kind.name);
-    int failures = 0;
-    for (int n = 1;; ++n) {
-      SCOPED_TRACE(n);
-      ASSERT_LT(n, 500) << "the save never got through";
-      for (const char* suffix : {"", "-wal", "-shm"}) QFile::remove(path() + QLatin1StringView(suffix));
-      makeStore(committed);
-
-      auto store = open(vfs);
-      ASSERT_TRUE(store);
-      FaultInjectingVfs::arm(kind.operation, n, kind.persistent);
-      const Result<void> saved = store->save(writes, deletes);
-      const bool fired = FaultInjectingVfs::fired();
-      FaultInjectingVfs::disarm();
-      if (saved) {
-        EXPECT_FALSE(fired);
-        store.reset();
-        store = open();
-        ASSERT_TRUE(store);
-        expectSameRecords(loadAll(*store), changed);
-        break;
-      }
-      ++failures;
-      ASSERT_TRUE(fired) << saved.error().message.toStdString();
-      EXPECT_EQ(saved.error().code, WTStore::WriteFailed);
-      EXPECT_TRUE(saved.error().message.contains(path()));
-
-      // The same store object sees none of it and can save again.
-      expectSameRecords(loadAll(*store), committed);
-      ASSERT_TRUE(store->save({probe}, {}).ok());
-      Records withProbe = committed;
-      withProbe[probe.uuid] = probe;
-      expectSameRecords(loadAll(*store), withProbe);
-
-      // So does the file, opened afresh.
-      store.reset();
-      expectIntact(path());
-      store = open();
-      ASSERT_TRUE(store);
-      expectSameRecords(loadAll(*store), withProbe);
-    }
-    EXPECT_GT(failures, 0);  // the loop must have met the save's I/O at least once
-    RecordProperty(std::string("failed saves, ") + kind.name, failures);
-  }
-}
-
-TEST_F(WTStoreTest, AFailedFirstOpenLeavesAFileThatOpensLater) {
-  const char* vfs = FaultInjectingVfs::name();
-  ASSERT_TRUE(vfs);
-  for (const FaultKind& kind : kFaultKinds) {
-    SCOPED_TRACE(kind.name);
-    int failures = 0;
-    for (int n = 1;; ++n) {
-      SCOPED_TRACE(n);
-      ASSERT_LT(n, 200) << "opening never got through";
-      for (const char* suffix : {"", "-wal", "-shm"}) QFile::remove(path() + QLatin1StringView(suffix));
-      FaultInjectingVfs::arm(kind.operation, n, kind.persistent);
-      auto store = WTStore::open(path(), vfs);
-      const bool fired = FaultInjectingVfs::fired();
-      FaultInjectingVfs::disarm();
-      if (store) {
-        EXPECT_FALSE(fired);
-        break;
-      }
-      ++failures;
-      ASSERT_TRUE(fired) << store.error().message.toStdString();
-      EXPECT_TRUE(store.error().message.contains(path()));
-      auto reopened = open();
-      ASSERT_TRUE(reopened);
-      EXPECT_TRUE(loadAll(*reopened).empty());
-      ASSERT_TRUE(reopened->save(values(sampleRecords()), {}).ok());
-      reopened.reset();
-      expectIntact(path());
-    }
-    EXPECT_GT(failures, 0);
-    RecordProperty(std::string("failed opens, ") + kind.name, failures);
-  }
-}
-
-}  // namespace
-
 // Commands that only read (reports, exports) open the store beside a running application that writes it.
 TEST_F(WTStoreTest, AReaderSeesWhatAWriterSavedAndCannotChangeIt) {
   const Records records = sampleRecords();
   makeStore(records);
   auto writer = open();
   ASSERT_TRUE(writer);
-  WTStoreRecord added = record(QStringLiteral("late@WTNote"), QStringLiteral("WTNote"));
-  added.taskUuid = QStringLiteral("T1@WTTask");
+  const WTStoreRecord added = record("late@WTNote", "WTNote", "T1@WTTask");
   ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
 
   auto reader = WTStore::openReadOnly(path());
@@ -690,38 +569,190 @@ TEST_F(WTStoreTest, AReaderSeesWhatAWriterSavedAndCannotChangeIt) {
   Records expected = records;
   expected[added.uuid] = added;
   expectSameRecords(loadAll(*reader.value()), expected);
-
-  const Result<void> refused = reader.value()->save({record(QStringLiteral("x@WTNote"), QStringLiteral("WTNote"))}, {});
+  const Result<void> refused = reader.value()->save({record("x@WTNote", "WTNote")}, {});
   ASSERT_FALSE(refused.ok());
   EXPECT_EQ(refused.error().code, WTStore::WriteFailed);
-  // The writer goes on saving while the reader is open.
-  EXPECT_TRUE(writer->save({record(QStringLiteral("later@WTNote"), QStringLiteral("WTNote"))}, {}).ok());
+  EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
 }
 
-TEST_F(WTStoreTest, ReadingNeverCreatesOrChangesAFile) {
-  auto missing = WTStore::openReadOnly(path());
-  ASSERT_FALSE(missing.ok());
-  EXPECT_EQ(missing.error().code, WTStore::OpenFailed);
-  EXPECT_TRUE(missing.error().message.contains(path()));
-  EXPECT_FALSE(QFileInfo::exists(path()));
+// ---- Fault loops: fail the N-th write or sync, raise N until the operation gets through.
 
-  // An empty file (made but never written) reads as a store without records and stays empty.
-  writeFile(path(), QByteArray());
-  auto empty = WTStore::openReadOnly(path());
-  ASSERT_TRUE(empty) << empty.error().message.toStdString();
-  EXPECT_TRUE(loadAll(*empty.value()).empty());
-  EXPECT_FALSE(empty.value()->save({record(QStringLiteral("x@WTNote"), QStringLiteral("WTNote"))}, {}).ok());
-  empty.value().reset();
-  EXPECT_TRUE(fileBytes(path()).isEmpty());
+const struct FaultKind {
+  FaultInjectingVfs::Operation operation;
+  bool persistent;
+  const char* name;
+} kFaultKinds[] = {
+    {FaultInjectingVfs::Operation::Write, false, "one failed write"},
+    {FaultInjectingVfs::Operation::Write, true, "every write from the N-th on"},
+    {FaultInjectingVfs::Operation::Sync, false, "one failed sync"},
+    {FaultInjectingVfs::Operation::Sync, true, "every sync from the N-th on"},
+};
 
-  for (const RefusedFile& refused : kRefusedFiles) {
-    SCOPED_TRACE(refused.name);
-    QFile::remove(path());
-    refused.make(*this, path());
-    const QByteArray before = fileBytes(path());
-    auto store = WTStore::openReadOnly(path());
-    ASSERT_FALSE(store.ok());
-    EXPECT_EQ(store.error().code, refused.code);
-    EXPECT_EQ(fileBytes(path()), before);
+// Whatever write or sync fails, a first open or a save that fails names the file, leaves no part of
+// itself behind, and leaves a file that opens again; after a failed save the same store still saves.
+TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) {
+  const char* vfs = FaultInjectingVfs::name();
+  ASSERT_TRUE(vfs);
+  const Records committed = sampleRecords();
+  // The save under test changes, adds and deletes; enough rows to span several pages.
+  Records changed = committed;
+  std::vector<WTStoreRecord> writes;
+  for (int i = 0; i < 200; ++i) {
+    writes.push_back(record(QStringLiteral("new-%1@WTTime").arg(i), "WTTime"));
+    writes.back().name = QStringLiteral("entry %1 ").arg(i).repeated(10);
+    writes.back().startDate = Date::fromSeconds(i);
+  }
+  writes.push_back(committed.at("T1@WTTask"));
+  writes.back().name = QStringLiteral("Renamed");
+  for (const WTStoreRecord& r : writes) changed[r.uuid] = r;
+  const QStringList deletes = {"I1@WTTime", "C1@WTClient"};
+  for (const QString& uuid : deletes) changed.erase(uuid);
+  const WTStoreRecord probe = record("probe@WTNote", "WTNote");
+
+  for (bool opening : {true, false}) {
+    const Records before = opening ? Records{} : committed;
+    Records withProbe = before;
+    withProbe[probe.uuid] = probe;
+    for (const FaultKind& kind : kFaultKinds) {
+      SCOPED_TRACE(std::string(opening ? "open, " : "save, ") + kind.name);
+      int failures = 0;
+      for (int n = 1;; ++n) {
+        SCOPED_TRACE(n);
+        ASSERT_LT(n, 500) << "never got through";
+        removeFiles();
+        std::unique_ptr<WTStore> store;
+        if (!opening) {
+          makeStore(committed);
+          ASSERT_TRUE(store = open(vfs));
+        }
+        FaultInjectingVfs::arm(kind.operation, n, kind.persistent);
+        std::optional<Error> error;
+        if (opening) {
+          auto opened = WTStore::open(path(), vfs);
+          if (opened) {
+            store = std::move(opened.value());
+          } else {
+            error = opened.error();
+          }
+        } else if (const Result<void> saved = store->save(writes, deletes); !saved) {
+          error = saved.error();
+        }
+        const bool fired = FaultInjectingVfs::fired();
+        FaultInjectingVfs::disarm();
+        if (!error) {
+          EXPECT_FALSE(fired);
+          store.reset();
+          ASSERT_TRUE(store = open());
+          expectSameRecords(loadAll(*store), opening ? before : changed);
+          break;
+        }
+        ++failures;
+        ASSERT_TRUE(fired) << error->message.toStdString();
+        EXPECT_TRUE(error->message.contains(path()));
+        if (store) {  // the same store object sees none of the save and saves again
+          EXPECT_EQ(error->code, WTStore::WriteFailed);
+        } else {
+          ASSERT_TRUE(store = open());
+        }
+        expectSameRecords(loadAll(*store), before);
+        ASSERT_TRUE(store->save({probe}, {}).ok());
+        expectSameRecords(loadAll(*store), withProbe);
+        store.reset();
+        EXPECT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
+        ASSERT_TRUE(store = open());
+        expectSameRecords(loadAll(*store), withProbe);
+      }
+      EXPECT_GT(failures, 0);  // the loop must have met the I/O at least once
+    }
   }
 }
+
+// ---- A process killed at random moments while it saves: the file still holds every save the process
+// had seen complete, and each save whole or not at all.
+
+constexpr int kRounds = 50;
+constexpr int kRecordsPerSave = 10;
+const QString kCounter = QStringLiteral("counter@WTTask");
+
+QString itemUuid(int save, int index) {
+  return index < kRecordsPerSave ? QStringLiteral("s%1-%2@WTNote").arg(save).arg(index)
+                                 : QStringLiteral("extra-%1@WTNote").arg(save);
+}
+
+// Save k adds its items, deletes the extra item of save k - 1, adds its own extra item and sets the counter
+// to k: one transaction, so either all of it shows or none.
+std::vector<WTStoreRecord> recordsOfSave(int save) {
+  std::vector<WTStoreRecord> records;
+  for (int i = 0; i <= kRecordsPerSave; ++i) {
+    records.push_back(record(itemUuid(save, i), "WTNote", kCounter));
+    records.back().name = QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3);
+  }
+  records.push_back(record(kCounter, "WTTask"));
+  records.back().position = save;
+  return records;
+}
+
+// The child: saves from `first` on until killed, reporting each completed save's number on `pipe`.
+[[noreturn]] void saveUntilKilled(const QString& path, int first, int pipe) {
+  auto store = WTStore::open(path);
+  if (!store) _exit(2);
+  for (int save = first;; ++save) {
+    if (!store.value()->save(recordsOfSave(save), {itemUuid(save - 1, kRecordsPerSave)})) _exit(3);
+    if (write(pipe, &save, sizeof save) != sizeof save) _exit(4);
+  }
+}
+
+TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
+  {
+    // Save 0: the counter and the first extra item, no items.
+    std::vector<WTStoreRecord> initial = recordsOfSave(0);
+    initial.erase(initial.begin(), initial.begin() + kRecordsPerSave);
+    makeStore(Records{{initial[0].uuid, initial[0]}, {initial[1].uuid, initial[1]}});
+  }
+  const unsigned seed = std::random_device()();
+  SCOPED_TRACE(testing::Message() << "seed " << seed);
+  std::mt19937 random(seed);
+  std::uniform_int_distribution<int> delayMs(2, 50);
+  int committed = 0;  // the last save found in the file
+  for (int round = 0; round < kRounds; ++round) {
+    SCOPED_TRACE(testing::Message() << "round " << round);
+    int fds[2];
+    ASSERT_EQ(pipe(fds), 0);
+    const pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child == 0) {
+      close(fds[0]);
+      saveUntilKilled(path(), committed + 1, fds[1]);
+    }
+    close(fds[1]);
+    std::this_thread::sleep_for(std::chrono::milliseconds(delayMs(random)));
+    kill(child, SIGKILL);
+    int status = 0;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(WIFSIGNALED(status)) << "the saver stopped by itself with status " << WEXITSTATUS(status);
+    int reported = committed, save = 0;
+    while (read(fds[0], &save, sizeof save) == sizeof save) reported = save;
+    close(fds[0]);
+
+    auto store = open();
+    ASSERT_TRUE(store);
+    const Records records = loadAll(*store);
+    store.reset();
+    ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
+    ASSERT_TRUE(records.contains(kCounter));
+    const int last = records.at(kCounter).position;
+    // Every reported save is there; at most the one in flight got in without being reported.
+    ASSERT_GE(last, reported);
+    ASSERT_LE(last, reported + 1);
+    // Each save whole: all items of every save up to the counter, none beyond, one extra item.
+    ASSERT_EQ(records.size(), std::size_t(last) * kRecordsPerSave + 2);
+    for (int k = 1; k <= last; ++k)
+      for (int i = 0; i < kRecordsPerSave; ++i)
+        ASSERT_TRUE(records.contains(itemUuid(k, i))) << k << "/" << i;
+    ASSERT_TRUE(records.contains(itemUuid(last, kRecordsPerSave)));
+    committed = last;
+  }
+  EXPECT_GT(committed, kRounds);  // the saver got through many saves, not just its open
+}
+
+}  // namespace

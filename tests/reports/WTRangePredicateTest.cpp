@@ -7,9 +7,13 @@
 
 namespace {
 
+struct Wall {
+  int year, month, day, hour = 0, minute = 0, second = 0;
+};
+
 // An instant given as local wall-clock time in `zone`.
-Date local(const char* zone, int year, int month, int day, int hour = 0, int minute = 0, int second = 0) {
-  const QDateTime at(QDate(year, month, day), QTime(hour, minute, second), QTimeZone(zone));
+Date local(const char* zone, const Wall& w) {
+  const QDateTime at(QDate(w.year, w.month, w.day), QTime(w.hour, w.minute, w.second), QTimeZone(zone));
   return Date::fromSeconds(double(at.toSecsSinceEpoch()));
 }
 
@@ -37,71 +41,72 @@ class RangePredicateTest : public ModelTest {
 
 }  // namespace
 
-// Now is Tuesday 2 April 2024 in Berlin; the week began on Sunday 31 March, the night clocks went forward.
-TEST_F(RangePredicateTest, PresetsAcrossTheSpringDaylightChange) {
-  setNow(local("Europe/Berlin", 2024, 4, 2, 12));
-  //                                                      today yday thisW lastW thisM lastM thisY lastY
-  // Today's first instant is also yesterday's end bound.
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 4, 2, 0))), "11101010");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 4, 1, 23, 59))), "01101010");
-  // The week's first instant lies in both weeks: each range includes both of its bounds.
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 3, 31, 0))), "00110110");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 3, 31, 3, 30))), "00100110");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 3, 30, 23, 59, 59))), "00010110");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 3, 24, 0))), "00010110");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 3, 23, 23, 59))), "00000110");
-  // The end of this week is included as its bound.
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2024, 4, 7, 0))), "00101010");
-  EXPECT_EQ(presets(entryAt(local("Europe/Berlin", 2023, 12, 31, 23))), "00000001");
+// Which presets take an entry: each range includes both of its bounds, so a week's first instant lies
+// in both weeks; weeks begin on Sunday, here the night clocks went forward in Berlin; and the same
+// instant may be 2024 in New York but 2025 in Berlin.
+TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
+  const struct {
+    const char* zone;
+    Wall now, entry;
+    const char*
+        presets;  // today, yesterday, this week, last week, this month, last month, this year, last year
+  } cases[] = {
+      // Tuesday 2 April 2024; the week began on Sunday 31 March.
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 4, 2}, "11101010"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 4, 1, 23, 59}, "01101010"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 3, 31}, "00110110"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 3, 31, 3, 30}, "00100110"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 3, 30, 23, 59, 59}, "00010110"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 3, 24}, "00010110"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 3, 23, 23, 59}, "00000110"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 4, 7}, "00101010"},
+      {"Europe/Berlin", {2024, 4, 2, 12}, {2023, 12, 31, 23}, "00000001"},
+      // New Year's morning 2025.
+      {"America/New_York", {2025, 1, 1, 10}, {2024, 12, 31, 23, 30}, "01100101"},
+      {"America/New_York", {2025, 1, 1, 10}, {2025, 1, 1}, "11101111"},
+      {"America/New_York", {2025, 1, 1, 10}, {2024, 12, 29}, "00110101"},
+      {"America/New_York", {2025, 1, 1, 10}, {2024, 12, 28, 12}, "00010101"},
+      {"America/New_York", {2025, 1, 1, 10}, {2024, 12, 31, 20}, "01100101"},
+  };
+  for (const auto& c : cases) {
+    ASSERT_TRUE(RZDate::setDefaultTimeZone(QString::fromLatin1(c.zone)));
+    setNow(local(c.zone, c.now));
+    EXPECT_EQ(presets(entryAt(local(c.zone, c.entry))), c.presets)
+        << c.zone << " " << c.entry.month << "/" << c.entry.day;
+  }
 }
 
-// Now is New Year's morning 2025 in New York.
-TEST_F(RangePredicateTest, PresetsAcrossTheYearEndInAnotherZone) {
-  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("America/New_York")));
-  setNow(local("America/New_York", 2025, 1, 1, 10));
-  //                                                         today yday thisW lastW thisM lastM thisY lastY
-  EXPECT_EQ(presets(entryAt(local("America/New_York", 2024, 12, 31, 23, 30))), "01100101");
-  EXPECT_EQ(presets(entryAt(local("America/New_York", 2025, 1, 1, 0))), "11101111");
-  EXPECT_EQ(presets(entryAt(local("America/New_York", 2024, 12, 29, 0))), "00110101");
-  EXPECT_EQ(presets(entryAt(local("America/New_York", 2024, 12, 28, 12))), "00010101");
-  // The same instant is still 2024 in New York but already 2025 in Berlin.
-  EXPECT_EQ(presets(entryAt(local("America/New_York", 2024, 12, 31, 20))), "01100101");
-}
-
-TEST_F(RangePredicateTest, CustomRangeCoversItsEndDayWhole) {
-  setNow(local("Europe/Berlin", 2024, 4, 2, 12));
-  const Date march3 = local("Europe/Berlin", 2024, 3, 3, 15, 20);
-  const WTItemPredicate predicate =
-      WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, march3);
-  ASSERT_TRUE(predicate);
-  EXPECT_TRUE(predicate(entryAt(local("Europe/Berlin", 2024, 3, 3, 0))));
-  EXPECT_TRUE(predicate(entryAt(local("Europe/Berlin", 2024, 3, 3, 23, 59, 59))));
-  EXPECT_TRUE(predicate(entryAt(local("Europe/Berlin", 2024, 3, 4, 0))));  // the bound, included
-  EXPECT_FALSE(predicate(entryAt(local("Europe/Berlin", 2024, 3, 2, 23, 59, 59))));
-  EXPECT_FALSE(predicate(entryAt(local("Europe/Berlin", 2024, 3, 4, 0, 0, 1))));
+// A custom range covers its end day whole; "any date" takes items without a date too.
+TEST_F(RangePredicateTest, CustomRangesAndAnyDate) {
+  setNow(berlin(2024, 4, 2, 12));
+  const Date march3 = berlin(2024, 3, 3, 15, 20);
+  const WTItemPredicate custom = WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, march3);
+  ASSERT_TRUE(custom);
+  for (const auto& [entry, taken] : {std::pair{berlin(2024, 3, 3), true},
+                                     {berlin(2024, 3, 3, 23, 59, 59), true},
+                                     {berlin(2024, 3, 4), true},
+                                     {berlin(2024, 3, 2, 23, 59, 59), false},
+                                     {berlin(2024, 3, 4, 0, 0, 1), false}})
+    EXPECT_EQ(custom(entryAt(entry)), taken) << entry.secondsSince1970();
   // Missing custom dates and unknown tags give no predicate at all.
   EXPECT_FALSE(WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, std::nullopt));
   EXPECT_FALSE(WTRangePredicate::predicateForTag(WTRangePredicate::Custom));
   EXPECT_FALSE(WTRangePredicate::predicateForTag(8));
   EXPECT_FALSE(WTRangePredicate::predicateForTag(-1));
-}
 
-TEST_F(RangePredicateTest, AnyDateMatchesItemsWithoutDates) {
-  setNow(local("Europe/Berlin", 2024, 4, 2, 12));
-  WTTime* undated = makeItem<WTTime>(task, local("Europe/Berlin", 2024, 4, 2, 9));
+  WTTime* undated = makeItem<WTTime>(task, berlin(2024, 4, 2, 9));
   undated->setStartDate(std::nullopt);
-  ASSERT_FALSE(undated->startDate());
   const WTItemPredicate any = WTRangePredicate::predicateForTag(WTRangePredicate::AnyDate);
   ASSERT_TRUE(any);
   EXPECT_TRUE(any(undated));
-  EXPECT_TRUE(any(entryAt(local("Europe/Berlin", 1999, 1, 1))));
+  EXPECT_TRUE(any(entryAt(berlin(1999, 1, 1))));
   EXPECT_EQ(presets(undated), "00000000");
 }
 
 TEST_F(RangePredicateTest, CommandLineWords) {
-  setNow(local("Europe/Berlin", 2024, 4, 2, 12));
-  const WTItem* monday = entryAt(local("Europe/Berlin", 2024, 4, 1, 9));
-  const WTItem* lastYear = entryAt(local("Europe/Berlin", 2023, 6, 1, 9));
+  setNow(berlin(2024, 4, 2, 12));
+  const WTItem* monday = entryAt(berlin(2024, 4, 1, 9));
+  const WTItem* lastYear = entryAt(berlin(2023, 6, 1, 9));
   const struct {
     const char* word;
     bool monday;
