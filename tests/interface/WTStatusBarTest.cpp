@@ -35,22 +35,9 @@ class StatusBarTest : public TrackingTest {
   }
 };
 
-// A StatusNotifierItem tray on a private bus, its watcher served from a thread of its own.
-class TrayHostTest : public StatusBarTest {
+// A StatusNotifierItem tray on a private bus, its watcher served from the bus's service thread.
+class TrayHostTest : public PrivateBusTest<StatusBarTest> {
  protected:
-  void SetUp() override {
-    StatusBarTest::SetUp();
-    ASSERT_FALSE(PrivateBus::instance().address().isEmpty()) << "dbus-daemon did not start";
-    serviceThread.start();
-  }
-  void TearDown() override {
-    PrivateBus::instance().disconnectAll();
-    serviceThread.quit();
-    serviceThread.wait();
-    StatusBarTest::TearDown();
-  }
-
-  QThread serviceThread;
   FakeStatusNotifierWatcher watcher;
 };
 
