@@ -3,6 +3,7 @@
 // Real parts for the sync tests: an HTTP server on 127.0.0.1 inside the test (answers are scripted per
 // test), a client made of a real store file, context and sync manager in a temp folder, and the real
 // tessal-sync-server process.
+#include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
@@ -47,6 +48,17 @@ inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
 }
 
 using ::LogCapture;
+
+inline Decimal dec(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
+inline QVariant money(const char* text) {
+  return QVariant::fromValue(dec(text));
+}
+// A value as one line of JSON, for comparing journal entries and request bodies as text.
+inline QString compact(const QVariant& value) {
+  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
+}
 
 // One HTTP request as the test server received it.
 struct HttpRequest {
