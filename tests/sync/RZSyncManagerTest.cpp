@@ -129,18 +129,27 @@ TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney
 
 // Local edits are saved (and journaled) before the server's changes arrive; the server's value of a key
 // replaces a pending local one, which then is not sent; the rest is sent with the head's iteration.
+// A cleared value arrives as null and clears it here.
 TEST_F(RZSyncManagerTest, ServerValueWinsOverAPendingLocalKey) {
   WTTask* task = syncedTask();
   const QString id = task->uuid();
+  task->setBudget(dec("500.00"));
+  task->setRate(dec("90.00"));
+  client.save();
+  ASSERT_TRUE(client.syncOnce());
+  setUpRequests = server.requests.size();
   task->setName("Local name");
   task->setNotes("Local notes");  // not saved yet: the poll saves it first
   server.handler = [&](const HttpRequest& request) {
     if (request.json().value("action") == "save") return saveReply(6);
-    return headReply(5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}}}}));
+    return headReply(
+        5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}, {"budget", {}}, {"rate", {}}}}}));
   };
   ASSERT_TRUE(client.syncOnce());
-  EXPECT_EQ(task->name(), "Server name");
-  EXPECT_EQ(task->notes(), "Local notes");
+  EXPECT_EQ(synctest::storedRecord(*client.context, id),
+            QString(R"({"name":"Server name","notes":"Local notes","project":"%1"})")
+                .arg(task->project()->uuid())
+                .toStdString());
   ASSERT_EQ(sent("save").size(), 1);
   const QVariantMap save = sent("save")[0];
   EXPECT_EQ(save.value("iteration").toLongLong(), 5);
