@@ -14,6 +14,8 @@
 
 #include <QSignalSpy>
 
+#include <sstream>
+
 using synctest::changeSet;
 using synctest::compact;
 using synctest::dec;
@@ -479,29 +481,20 @@ TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
   ASSERT_TRUE(file.open(QIODevice::ReadOnly));
   const QByteArray journalFile = file.readAll();
   file.close();
-  const QByteArray bad[] = {
-      R"({"action": "head", "iteration": -5, "result": {}})",
-      R"({"action": "head", "iteration": "abc", "result": {}})",
-      R"({"action": "head", "iteration": true, "result": {}})",
-      R"({"action": "head", "iteration": 1e300, "result": {}})",
-      R"({"action": "head", "iteration": 7.5, "result": {}})",
-      R"({"action": "save", "iteration": -1})",
-      R"({"action": "head", "iteration": 7})",
-      R"({"action": "head", "iteration": 7, "result": []})",
-      R"({"action": "head", "iteration": 7, "result": {"i": []}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTTask": "name"}}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTTask": {"name": {"text": "x"}}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTProject": {"tasks": [["A@WTTask"]]}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"i": {"A@WTTask": {"uuid": "B@WTTask"}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"x": "A@WTTask"}})",
-      R"({"action": "head", "iteration": 7, "result": {"x": [5]}})",
-      R"({"action": "head", "iteration": 7, "result": {"q": {}}})",
-      R"({"action": "push", "iteration": 7})",
-      R"({"error": ["not", "text"], "code": 1})",
-      R"({"error": "Busy", "code": "4", "iteration": 7})",
-      R"([1, 2, 3])",
-  };
-  for (const QByteArray& body : bad) {
+  std::istringstream bad(
+      R"({"action":"head","iteration":-5,"result":{}} {"action":"head","iteration":"abc","result":{}})"
+      R"( {"action":"head","iteration":true,"result":{}} {"action":"head","iteration":1e300,"result":{}})"
+      R"( {"action":"head","iteration":7.5,"result":{}} {"action":"save","iteration":-1} {"action":"head","iteration":7})"
+      R"( {"action":"head","iteration":7,"result":[]} {"action":"head","iteration":7,"result":{"i":[]}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":"name"}}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":{"name":{"text":"x"}}}}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTProject":{"tasks":[["A@WTTask"]]}}}})"
+      R"( {"action":"head","iteration":7,"result":{"i":{"A@WTTask":{"uuid":"B@WTTask"}}}})"
+      R"( {"action":"head","iteration":7,"result":{"x":"A@WTTask"}} {"action":"head","iteration":7,"result":{"x":[5]}})"
+      R"( {"action":"head","iteration":7,"result":{"q":{}}} {"action":"push","iteration":7})"
+      R"( {"error":["not","text"],"code":1} {"error":"Busy","code":"4","iteration":7} [1,2,3])");
+  for (std::string text; bad >> text;) {
+    const QByteArray body = QByteArray::fromStdString(text);
     SCOPED_TRACE(body.toStdString());
     server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(body); };
     ASSERT_TRUE(client.syncOnce());
