@@ -24,13 +24,6 @@ CommandResult run(SyncClient& client, const QStringList& arguments = {}) {
   return {code, out, err};
 }
 
-QByteArray reply(const char* action, qint64 iteration, const QVariantMap& inserted = {}) {
-  QVariantMap body{{"action", action}, {"iteration", iteration}};
-  if (QByteArray(action) == "head")
-    body.insert("result", QVariantMap{{"i", inserted}, {"u", QVariantMap{}}, {"x", QVariantList{}}});
-  return LoopbackHttpServer::json(body);
-}
-
 }  // namespace
 
 // Polls until a head brings nothing and nothing waits to be sent: what is here goes up and what others
@@ -38,8 +31,10 @@ QByteArray reply(const char* action, qint64 iteration, const QVariantMap& insert
 TEST(RZSyncCommand, RunsUntilInStep) {
   LoopbackHttpServer server;
   const QByteArray answers[] = {
-      reply("head", 3, {{"One@WTTask", QVariantMap{{"name", "One"}}}}), reply("save", 4),
-      reply("head", 5, {{"Two@WTTask", QVariantMap{{"name", "Two"}}}}), reply("head", 5)};
+      synctest::headReply(3, synctest::changeSet({{"One@WTTask", QVariantMap{{"name", "One"}}}})),
+      synctest::saveReply(4),
+      synctest::headReply(5, synctest::changeSet({{"Two@WTTask", QVariantMap{{"name", "Two"}}}})),
+      synctest::headReply(5)};
   server.handler = [&](const HttpRequest&) {
     return answers[std::min<qsizetype>(server.requests.size(), 4) - 1];
   };
@@ -64,7 +59,7 @@ TEST(RZSyncCommand, FailsWithAMessage) {
   };
   const Case cases[] = {
       {"refused",
-       LoopbackHttpServer::json(QVariantMap{{"error", "Wrong e-mail address or password."}, {"code", 2}}),
+       synctest::errorReply("Wrong e-mail address or password.", 2),
        {},
        "The server refused: Wrong e-mail address or password. - (Code: 2)"},
       {"no usable answer", LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"), {}, "Sync failed: "},

@@ -14,42 +14,23 @@
 
 #include <QSignalSpy>
 
+#include <sstream>
+
+using synctest::changeSet;
+using synctest::compact;
+using synctest::dec;
+using synctest::errorReply;
+using synctest::headReply;
 using synctest::HttpRequest;
 using synctest::LogCapture;
 using synctest::LoopbackHttpServer;
+using synctest::money;
+using synctest::saveReply;
 using synctest::SyncClient;
 using synctest::waitUntil;
 using Section = RZSyncTrack::Section;
 
 namespace {
-
-Decimal dec(const char* text) {
-  return *Decimal::fromString(QString::fromLatin1(text));
-}
-QVariant money(const char* text) {
-  return QVariant::fromValue(dec(text));
-}
-QString compact(const QVariant& value) {
-  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
-}
-
-QVariantMap changeSet(const QVariantMap& inserted = {}, const QVariantMap& updated = {},
-                      const QStringList& deleted = {}) {
-  return {{"i", inserted}, {"u", updated}, {"x", deleted}};
-}
-
-QByteArray headReply(qint64 iteration, const QVariantMap& result = changeSet()) {
-  return LoopbackHttpServer::json(
-      QVariantMap{{"action", "head"}, {"iteration", iteration}, {"result", result}});
-}
-QByteArray saveReply(qint64 iteration) {
-  return LoopbackHttpServer::json(QVariantMap{{"action", "save"}, {"iteration", iteration}});
-}
-QByteArray errorReply(const QString& message, qint64 code, const QVariant& iteration = {}) {
-  QVariantMap reply{{"error", message}, {"code", code}};
-  if (iteration.isValid()) reply.insert("iteration", iteration);
-  return LoopbackHttpServer::json(reply);
-}
 
 class RZSyncManagerTest : public ::testing::Test {
  protected:
@@ -109,43 +90,35 @@ TEST(RZSyncManagerEndpoint, ServerAddressBecomesTheEndpoint) {
   }
 }
 
+// Records, their owners, dates and money arrive as sent; a record named only as an owner is made, empty,
+// under its identity. What came from the server is saved but not journaled, and the user cannot undo it.
 TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney) {
-  head = 9;
-  const QVariantMap result = changeSet(
-      {{"C@WTClient", QVariantMap{{"name", "Acme"}, {"uuid", "C@WTClient"}}},
-       {"P@WTProject", QVariantMap{{"name", "Site"}, {"client", "C@WTClient"}, {"rate", money("80.50")}}},
-       {"T1@WTTask", QVariantMap{{"name", "One"}, {"project", "P@WTProject"}, {"budget", money("1200.00")}}},
-       {"T2@WTTask", QVariantMap{{"name", "Two"}, {"project", "P@WTProject"}}},
-       {"E@WTTime", QVariantMap{{"task", "T1@WTTask"}, {"startDate", 1700000000}, {"endDate", 1700003600}}},
-       {"X@WTExpense",
-        QVariantMap{{"task", "T1@WTTask"}, {"expense", money("12.30")}, {"startDate", 1700000000}}},
-       {"N@WTNote",
-        QVariantMap{{"task", "T3@WTTask"}, {"name", "Filed under a task not sent"}, {"color", "#80ff0000"}}}},
-      {{"P@WTProject", QVariantMap{{"tasks", QStringList{"T2@WTTask", "T1@WTTask"}}}}});
-  server.handler = [&](const HttpRequest&) { return headReply(9, result); };
+  const std::pair<QString, QString> records[] = {
+      {"C@WTClient", R"({"name":"Acme"})"},
+      {"P@WTProject",
+       R"({"client":"C@WTClient","name":"Site","rate":80.50,"tasks":["T2@WTTask","T1@WTTask"]})"},
+      {"T1@WTTask", R"({"budget":1200.00,"name":"One","project":"P@WTProject"})"},
+      {"T2@WTTask", R"({"name":"Two","project":"P@WTProject"})"},
+      {"E@WTTime", R"({"endDate":1700003600,"startDate":1700000000,"task":"T1@WTTask"})"},
+      {"X@WTExpense", R"({"expense":12.30,"startDate":1700000000,"task":"T1@WTTask"})"},
+      {"N@WTNote",
+       R"({"color":"#80ff0000","name":"Filed under a task not sent","startDate":1700000000,"task":"T3@WTTask"})"},
+      {"T3@WTTask", "{}"},
+  };
+  QVariantMap updated;  // every record under both sections, as the server sends them
+  for (const auto& [uuid, values] : records) {
+    if (uuid != "T3@WTTask") updated.insert(uuid, RZSyncJSON::parse(values.toUtf8()).value_or(QVariant()));
+  }
+  QVariantMap inserted = updated;
+  inserted["C@WTClient"] = QVariantMap{{"name", "Acme"}, {"uuid", "C@WTClient"}};
+  QVariantMap project = inserted.value("P@WTProject").toMap();
+  project.remove("tasks");  // the order only among the updates, naming tasks of this same head
+  inserted["P@WTProject"] = project;
+  server.handler = [&](const HttpRequest&) { return headReply(9, changeSet(inserted, updated)); };
   ASSERT_TRUE(client.syncOnce());
+  for (const auto& [uuid, values] : records)
+    EXPECT_EQ(synctest::storedRecord(*client.context, uuid), values.toStdString());
 
-  auto* project = client.find<WTProject>("P@WTProject");
-  auto* one = client.find<WTTask>("T1@WTTask");
-  auto* two = client.find<WTTask>("T2@WTTask");
-  ASSERT_TRUE(project && one && two);
-  EXPECT_EQ(project->client(), client.find<WTClient>("C@WTClient"));
-  EXPECT_EQ(project->tasks(), (QList<WTTask*>{two, one}));
-  EXPECT_TRUE(project->storedRate()->isIdenticalTo(dec("80.50")));
-  EXPECT_TRUE(one->budget()->isIdenticalTo(dec("1200.00")));
-  auto* time = client.find<WTTime>("E@WTTime");
-  ASSERT_TRUE(time);
-  EXPECT_EQ(time->task(), one);
-  EXPECT_EQ(time->startDate(), Date::fromSeconds(1700000000));
-  EXPECT_EQ(time->duration(), 60);
-  EXPECT_TRUE(client.find<WTExpense>("X@WTExpense")->expense()->isIdenticalTo(dec("12.30")));
-  // A record named only as an owner is made, empty, under its identity.
-  auto* note = client.find<WTNote>("N@WTNote");
-  ASSERT_TRUE(note && note->task());
-  EXPECT_EQ(note->task()->uuid(), "T3@WTTask");
-  EXPECT_EQ(note->color(), QColor(255, 0, 0, 128));
-
-  // What came from the server is saved but not journaled, and the user cannot undo it.
   EXPECT_FALSE(client.context->hasChanges());
   EXPECT_FALSE(client.track().hasChanges());
   EXPECT_FALSE(client.context->undoManager().canUndo());
@@ -153,23 +126,32 @@ TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney
   EXPECT_TRUE(sent("save").isEmpty());
   client.reopen();
   EXPECT_EQ(client.track().iteration(), 9);
-  EXPECT_EQ(client.find<WTProject>("P@WTProject")->tasks().size(), 2);
+  EXPECT_EQ(synctest::storedRecord(*client.context, "P@WTProject"), records[1].second.toStdString());
 }
 
 // Local edits are saved (and journaled) before the server's changes arrive; the server's value of a key
 // replaces a pending local one, which then is not sent; the rest is sent with the head's iteration.
+// A cleared value arrives as null and clears it here.
 TEST_F(RZSyncManagerTest, ServerValueWinsOverAPendingLocalKey) {
   WTTask* task = syncedTask();
   const QString id = task->uuid();
+  task->setBudget(dec("500.00"));
+  task->setRate(dec("90.00"));
+  client.save();
+  ASSERT_TRUE(client.syncOnce());
+  setUpRequests = server.requests.size();
   task->setName("Local name");
   task->setNotes("Local notes");  // not saved yet: the poll saves it first
   server.handler = [&](const HttpRequest& request) {
     if (request.json().value("action") == "save") return saveReply(6);
-    return headReply(5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}}}}));
+    return headReply(
+        5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}, {"budget", {}}, {"rate", {}}}}}));
   };
   ASSERT_TRUE(client.syncOnce());
-  EXPECT_EQ(task->name(), "Server name");
-  EXPECT_EQ(task->notes(), "Local notes");
+  EXPECT_EQ(synctest::storedRecord(*client.context, id),
+            QString(R"({"name":"Server name","notes":"Local notes","project":"%1"})")
+                .arg(task->project()->uuid())
+                .toStdString());
   ASSERT_EQ(sent("save").size(), 1);
   const QVariantMap save = sent("save")[0];
   EXPECT_EQ(save.value("iteration").toLongLong(), 5);
@@ -230,6 +212,7 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
   kept->setProject(project);
   auto* movedItem = client.context->insertNewObject<WTNote>();
   movedItem->setTask(kept);
+  movedItem->setStartDate(Date::fromSeconds(1700000000));
   auto* acme = client.context->insertNewObject<WTClient>();
   client.save();
   ASSERT_TRUE(client.syncOnce());
@@ -241,14 +224,14 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
   client.context->deleteObject(acme);
   client.save();
 
-  const QVariantMap result =
-      changeSet({{"New@WTTime", QVariantMap{{"task", taskId}, {"startDate", 1700000000}}},
-                 {"Deeper@WTNote", QVariantMap{{"task", "NewTask@WTTask"}}},
-                 {"NewTask@WTTask", QVariantMap{{"project", projectId}, {"name", "fine"}}},
-                 {"P2@WTProject", QVariantMap{{"client", acmeId}, {"name", "Outlives its client"}}}},
-                {{taskId, QVariantMap{{"name", "Renamed elsewhere"}}},
-                 {movedId, QVariantMap{{"task", taskId}}},
-                 {projectId, QVariantMap{{"tasks", QStringList{taskId, keptId}}}}});
+  const QVariantMap result = changeSet(
+      {{"New@WTTime", QVariantMap{{"task", taskId}, {"startDate", 1700000000}, {"endDate", 1700000060}}},
+       {"Deeper@WTNote", QVariantMap{{"task", "NewTask@WTTask"}, {"startDate", 1700000000}}},
+       {"NewTask@WTTask", QVariantMap{{"project", projectId}, {"name", "fine"}}},
+       {"P2@WTProject", QVariantMap{{"client", acmeId}, {"name", "Outlives its client"}}}},
+      {{taskId, QVariantMap{{"name", "Renamed elsewhere"}}},
+       {movedId, QVariantMap{{"task", taskId}}},
+       {projectId, QVariantMap{{"tasks", QStringList{taskId, keptId}}}}});
   server.handler = [&](const HttpRequest& request) {
     if (request.json().value("action") == "save") return saveReply(31);
     return headReply(30, result);
@@ -257,21 +240,18 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
 
   // Nothing is filed under the deleted task or client; the server takes care of what it has there once
   // the deletions arrive (it deletes or clears them and tells every device).
-  EXPECT_EQ(client.context->objectWithUUID(taskId, false), nullptr);
-  auto* newTime = client.find<WTTime>("New@WTTime");
-  ASSERT_NE(newTime, nullptr);
-  EXPECT_EQ(newTime->task(), nullptr);
-  EXPECT_EQ(newTime->startDate(), Date::fromSeconds(1700000000));
-  EXPECT_EQ(client.find<WTNote>(movedId)->task(), client.find<WTTask>(keptId));
-  EXPECT_EQ(project->tasks().size(), 2);  // kept, and the new task filed by someone else
-  EXPECT_TRUE(project->tasks().contains(client.find<WTTask>(keptId)));
-  ASSERT_NE(client.find<WTTask>("NewTask@WTTask"), nullptr);
-  EXPECT_EQ(client.find<WTNote>("Deeper@WTNote")->task(), client.find<WTTask>("NewTask@WTTask"));
-  auto* outliving = client.find<WTProject>("P2@WTProject");
-  ASSERT_NE(outliving, nullptr);
-  EXPECT_EQ(outliving->client(), nullptr);
-  EXPECT_EQ(client.context->objectWithUUID(acmeId, false), nullptr);
-
+  const std::pair<QString, QString> records[] = {
+      {taskId, "(none)"},
+      {acmeId, "(none)"},
+      {"New@WTTime", R"({"endDate":1700000060,"startDate":1700000000})"},
+      {movedId, QString(R"({"startDate":1700000000,"task":"%1"})").arg(keptId)},
+      {projectId, QString(R"({"name":"Site","tasks":["%1","NewTask@WTTask"]})").arg(keptId)},
+      {"NewTask@WTTask", QString(R"({"name":"fine","project":"%1"})").arg(projectId)},
+      {"Deeper@WTNote", R"({"startDate":1700000000,"task":"NewTask@WTTask"})"},
+      {"P2@WTProject", R"({"name":"Outlives its client"})"},
+  };
+  for (const auto& [uuid, values] : records)
+    EXPECT_EQ(synctest::storedRecord(*client.context, uuid), values.toStdString());
   ASSERT_EQ(sent("save").size(), 1);
   const QStringList deleted = sent("save")[0].value("data").toMap().value("x").toStringList();
   EXPECT_TRUE(deleted.contains(taskId));
@@ -298,14 +278,24 @@ TEST_F(RZSyncManagerTest, IterationMovesToTheMergedHeadBeforeTheSave) {
   EXPECT_EQ(heads[1].value("iteration").toLongLong(), 9);
 }
 
-// What the user does while a save is on its way stays in the journal after the server confirms it.
-TEST_F(RZSyncManagerTest, ConfirmedSaveKeepsEditsMadeWhileItWasInFlight) {
+// A save whose connection closes before any answer, however often it is tried, keeps the whole journal;
+// what the user does while a save is on its way stays in the journal after the server confirms it.
+TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
   WTTask* task = syncedTask();
   task->setName("First");
   task->setNotes("Notes");
   server.handler = [&](const HttpRequest& request) {
     return request.json().value("action") == "save" ? QByteArray() : headReply(head);
   };
+  client.manager->sync();
+  ASSERT_TRUE(waitUntil([&] {
+    server.dropHeld();
+    return client.idle();
+  }));
+  EXPECT_EQ(compact(client.track().entry(Section::Updated, task->uuid())),
+            R"({"name":"First","notes":"Notes"})");
+  EXPECT_EQ(client.presenter.networkErrors.size(), 1);
+
   client.manager->sync();
   ASSERT_TRUE(waitUntil([&] { return server.hasHeld(); }));
   task->setName("Second");
@@ -314,28 +304,11 @@ TEST_F(RZSyncManagerTest, ConfirmedSaveKeepsEditsMadeWhileItWasInFlight) {
   client.save();
   ASSERT_TRUE(server.answerHeld(saveReply(4)));
   ASSERT_TRUE(waitUntil([&] { return client.idle(); }));
-
   const RZSyncTrack& track = client.track();
   EXPECT_EQ(track.iteration(), 4);
   EXPECT_EQ(compact(track.entry(Section::Updated, task->uuid())), R"({"name":"Second"})");
   EXPECT_TRUE(track.entries(Section::Inserted).contains(note->uuid()));
   EXPECT_EQ(RZSyncTrack(client.journalPath()).iteration(), 4);
-}
-
-TEST_F(RZSyncManagerTest, FailedSaveKeepsTheWholeJournal) {
-  WTTask* task = syncedTask();
-  task->setName("Pending");
-  server.handler = [&](const HttpRequest& request) {
-    return request.json().value("action") == "save" ? QByteArray() : headReply(head);
-  };
-  client.manager->sync();
-  // The connection closes before any answer, however often the request is tried.
-  ASSERT_TRUE(waitUntil([&] {
-    server.dropHeld();
-    return client.idle();
-  }));
-  EXPECT_EQ(compact(client.track().entry(Section::Updated, task->uuid())), R"({"name":"Pending"})");
-  EXPECT_EQ(client.presenter.networkErrors.size(), 1);
 }
 
 // How a refusal is taken: a stale head (code 4) naming an iteration resends the journal claiming it, one
@@ -444,24 +417,12 @@ TEST_F(RZSyncManagerTest, PollingResumesAfterAGoodReplyFollowingFailures) {
   ASSERT_TRUE(waitUntil([&] { return client.presenter.networkErrors.size() == 2; }, 3000));
 }
 
-// Every request names the installation, which keeps its identity across launches.
-TEST_F(RZSyncManagerTest, EveryRequestCarriesThisInstallationsDevice) {
+// Every request names the installation, which keeps its identity and its journal across launches.
+TEST_F(RZSyncManagerTest, DeviceAndJournalSurviveARestart) {
   WTTask* task = syncedTask();
-  task->setName("Pending");
-  client.save();
   ASSERT_TRUE(client.syncOnce());
   const QString device = client.defaults->stringForKey("WTSyncDevice");
   EXPECT_FALSE(device.isEmpty());
-  client.reopen();
-  ASSERT_TRUE(client.syncOnce());
-  ASSERT_GE(server.requests.size(), 4);
-  for (const HttpRequest& request : server.requests) EXPECT_EQ(request.json().value("device"), device);
-  SyncClient other(server.address());
-  EXPECT_NE(other.network().device(), device);
-}
-
-TEST_F(RZSyncManagerTest, JournalSurvivesARestart) {
-  WTTask* task = syncedTask();
   task->setName("Before quitting");
   client.save();
   const QString id = task->uuid();
@@ -469,8 +430,12 @@ TEST_F(RZSyncManagerTest, JournalSurvivesARestart) {
   EXPECT_EQ(client.track().entry(Section::Updated, id).value("name"), "Before quitting");
   ASSERT_TRUE(client.syncOnce());
   ASSERT_EQ(sent("save").size(), 1);
-  EXPECT_EQ(sent("save")[0].value("data").toMap().value("u").toMap().value(id).toMap().value("name"),
-            "Before quitting");
+  EXPECT_EQ(compact(sent("save")[0].value("data")),
+            QString(R"({"i":{},"u":{"%1":{"name":"Before quitting"}},"x":[]})").arg(id));
+  ASSERT_GE(server.requests.size(), 4);
+  for (const HttpRequest& request : server.requests) EXPECT_EQ(request.json().value("device"), device);
+  SyncClient other(server.address());
+  EXPECT_NE(other.network().device(), device);
 }
 
 TEST_F(RZSyncManagerTest, NothingIsSentWithoutAServerAddress) {
@@ -516,29 +481,20 @@ TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
   ASSERT_TRUE(file.open(QIODevice::ReadOnly));
   const QByteArray journalFile = file.readAll();
   file.close();
-  const QByteArray bad[] = {
-      R"({"action": "head", "iteration": -5, "result": {}})",
-      R"({"action": "head", "iteration": "abc", "result": {}})",
-      R"({"action": "head", "iteration": true, "result": {}})",
-      R"({"action": "head", "iteration": 1e300, "result": {}})",
-      R"({"action": "head", "iteration": 7.5, "result": {}})",
-      R"({"action": "save", "iteration": -1})",
-      R"({"action": "head", "iteration": 7})",
-      R"({"action": "head", "iteration": 7, "result": []})",
-      R"({"action": "head", "iteration": 7, "result": {"i": []}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTTask": "name"}}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTTask": {"name": {"text": "x"}}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"u": {"A@WTProject": {"tasks": [["A@WTTask"]]}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"i": {"A@WTTask": {"uuid": "B@WTTask"}}}})",
-      R"({"action": "head", "iteration": 7, "result": {"x": "A@WTTask"}})",
-      R"({"action": "head", "iteration": 7, "result": {"x": [5]}})",
-      R"({"action": "head", "iteration": 7, "result": {"q": {}}})",
-      R"({"action": "push", "iteration": 7})",
-      R"({"error": ["not", "text"], "code": 1})",
-      R"({"error": "Busy", "code": "4", "iteration": 7})",
-      R"([1, 2, 3])",
-  };
-  for (const QByteArray& body : bad) {
+  std::istringstream bad(
+      R"({"action":"head","iteration":-5,"result":{}} {"action":"head","iteration":"abc","result":{}})"
+      R"( {"action":"head","iteration":true,"result":{}} {"action":"head","iteration":1e300,"result":{}})"
+      R"( {"action":"head","iteration":7.5,"result":{}} {"action":"save","iteration":-1} {"action":"head","iteration":7})"
+      R"( {"action":"head","iteration":7,"result":[]} {"action":"head","iteration":7,"result":{"i":[]}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":"name"}}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":{"name":{"text":"x"}}}}})"
+      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTProject":{"tasks":[["A@WTTask"]]}}}})"
+      R"( {"action":"head","iteration":7,"result":{"i":{"A@WTTask":{"uuid":"B@WTTask"}}}})"
+      R"( {"action":"head","iteration":7,"result":{"x":"A@WTTask"}} {"action":"head","iteration":7,"result":{"x":[5]}})"
+      R"( {"action":"head","iteration":7,"result":{"q":{}}} {"action":"push","iteration":7})"
+      R"( {"error":["not","text"],"code":1} {"error":"Busy","code":"4","iteration":7} [1,2,3])");
+  for (std::string text; bad >> text;) {
+    const QByteArray body = QByteArray::fromStdString(text);
     SCOPED_TRACE(body.toStdString());
     server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(body); };
     ASSERT_TRUE(client.syncOnce());

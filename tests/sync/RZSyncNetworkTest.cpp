@@ -67,24 +67,26 @@ class RZSyncNetworkTest : public ::testing::Test {
 
 }  // namespace
 
+// A head carries neither data nor a device unless one is set; a save carries its data pretty-printed,
+// money as written.
 TEST_F(RZSyncNetworkTest, RequestCarriesBodyAndHeaders) {
+  exchange();
+  EXPECT_EQ(server.requests.value(0).json().keys(), (QStringList{"action", "iteration", "password", "user"}));
   network.setDevice(QStringLiteral("device-1"));
   const QVariantMap data{
-      {"i", QVariantMap{{"A@WTExpense",
-                         QVariantMap{{"expense", QVariant::fromValue(*Decimal::fromString(u"12.30"))}}}}},
+      {"i", QVariantMap{{"A@WTExpense", QVariantMap{{"expense", synctest::money("12.30")}}}}},
       {"u", QVariantMap{}},
       {"x", QVariantList{}}};
   exchange(data, QStringLiteral("save"), 9);
-  ASSERT_EQ(server.requests.size(), 1);
-  const HttpRequest& request = server.requests[0];
+  ASSERT_EQ(server.requests.size(), 2);
+  const HttpRequest& request = server.requests[1];
   EXPECT_EQ(request.method, "POST");
   EXPECT_EQ(request.path, "/sync/tessal/sync.php");
   EXPECT_EQ(request.headers.value("accept"), "application/json");
   EXPECT_EQ(request.headers.value("content-type"), "application/json");
   EXPECT_EQ(request.headers.value("content-length").toLongLong(), request.body.size());
-  EXPECT_TRUE(request.body.contains("\n  \"action\": \"save\""))
-      << request.body.toStdString();                                                       // pretty-printed
-  EXPECT_TRUE(request.body.contains("\"expense\": 12.30")) << request.body.toStdString();  // money as written
+  EXPECT_TRUE(request.body.contains("\n  \"action\": \"save\"")) << request.body.toStdString();
+  EXPECT_TRUE(request.body.contains("\"expense\": 12.30")) << request.body.toStdString();
   const QVariantMap body = request.json();
   EXPECT_EQ(body.value("user"), "ann@example.org");
   EXPECT_EQ(body.value("password"), "pw");
@@ -93,32 +95,9 @@ TEST_F(RZSyncNetworkTest, RequestCarriesBodyAndHeaders) {
   EXPECT_EQ(body.value("data").toMap().keys(), (QStringList{"i", "u", "x"}));
 }
 
-TEST_F(RZSyncNetworkTest, HeadHasNoDataAndNoDeviceWhenNoneIsSet) {
-  exchange();
-  const QVariantMap body = server.requests.value(0).json();
-  EXPECT_EQ(body.keys(), (QStringList{"action", "iteration", "password", "user"}));
-  EXPECT_EQ(body.value("action"), "head");
-}
-
-TEST_F(RZSyncNetworkTest, CredentialsAreTrimmedAndComeFromTheDelegateWhenUnset) {
-  FixedCredentials credentials;
-  credentials.user = QStringLiteral("  bob@example.org\n");
-  credentials.password = QStringLiteral("\tsecret ");
-  network.setUser({});
-  network.setPassword({});
-  network.setCredentialDelegate(&credentials);
-  EXPECT_TRUE(network.hasCredentials());
-  exchange();
-  EXPECT_EQ(server.requests.value(0).json().value("user"), "bob@example.org");
-  EXPECT_EQ(server.requests.value(0).json().value("password"), "secret");
-  // The explicit field wins over the delegate.
-  network.setUser(QStringLiteral("carl@example.org"));
-  exchange();
-  EXPECT_EQ(server.requests.value(1).json().value("user"), "carl@example.org");
-}
-
-// Missing credentials are silent: no request and no callback.
-TEST_F(RZSyncNetworkTest, BlankCredentialsSendNothing) {
+// Credentials come trimmed from the delegate when unset, an explicit field wins, and blank ones send
+// nothing at all: no request and no callback.
+TEST_F(RZSyncNetworkTest, CredentialsAreTrimmedAndBlankOnesSendNothing) {
   FixedCredentials credentials;
   network.setCredentialDelegate(&credentials);
   const std::pair<QString, QString> blanks[] = {{"   ", "pw"}, {"ann", "\n\t"}, {"", "pw"}, {"ann", ""}};
@@ -131,95 +110,69 @@ TEST_F(RZSyncNetworkTest, BlankCredentialsSendNothing) {
     network.postJSONObject({}, QStringLiteral("head"), 1);
     EXPECT_EQ(network.networkAction(), RZSyncNetwork::Idle);
   }
-  QTest::qWait(200);
+  QTest::qWait(100);
   EXPECT_TRUE(server.requests.isEmpty());
   EXPECT_EQ(delegate.calls(), 0);
+
+  credentials.user = QStringLiteral("  bob@example.org\n");
+  credentials.password = QStringLiteral("\tsecret ");
+  EXPECT_TRUE(network.hasCredentials());
+  exchange();
+  EXPECT_EQ(server.requests.value(0).json().value("user"), "bob@example.org");
+  EXPECT_EQ(server.requests.value(0).json().value("password"), "secret");
+  network.setUser(QStringLiteral("carl@example.org"));
+  exchange();
+  EXPECT_EQ(server.requests.value(1).json().value("user"), "carl@example.org");
 }
 
-TEST_F(RZSyncNetworkTest, RepliesThatAreNotObjectsOrArraysFail) {
-  struct Case {
-    QByteArray answer;
-    bool delivered;
+// Only a JSON object or array is delivered (the status is not examined). Everything else fails, and the
+// failure says what the server answered. A redirect is a failure too: the request carries the password,
+// so nothing is sent where it points. A reply is counted as its bytes arrive: a declared length over the
+// limit fails at once, and so does a chunked body that declares none.
+TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
+  LoopbackHttpServer elsewhere;
+  network.setMaxReplyBytes(1024);
+  network.setTimeoutMilliseconds(300);
+  QByteArray chunked =
+      "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\nConnection: "
+      "close\r\n\r\n";
+  for (int i = 0; i < 4; ++i) chunked += "400\r\n" + QByteArray(1024, ' ') + "\r\n";
+  const struct {
+    QByteArray answer;  // empty: never answers
+    const char* error;  // what the failure says; null when the reply is delivered
+  } rows[] = {
+      {LoopbackHttpServer::json(QVariantMap{{"iteration", 3}}), nullptr},
+      {LoopbackHttpServer::raw("[1, 2]"), nullptr},
+      {LoopbackHttpServer::raw("{\"error\": \"x\", \"code\": 9}", 500), nullptr},
+      {LoopbackHttpServer::raw("\"just text\""), ""},
+      {LoopbackHttpServer::raw("42"), ""},
+      {LoopbackHttpServer::raw(""), ""},
+      {LoopbackHttpServer::raw("<html>Bad gateway</html>", 502, "text/html"), "502"},
+      {LoopbackHttpServer::raw("The sync service cannot reach its storage; try again later.\n", 503,
+                               "text/plain"),
+       "try again later"},
+      {LoopbackHttpServer::raw("{\"iteration\": 6}", 307, "application/json",
+                               "Location: " + elsewhere.url().toEncoded() + "\r\n"),
+       "307"},
+      {LoopbackHttpServer::raw("{\"pad\": \"" + QByteArray(4096, 'x') + "\"}"), "larger than 1024 bytes"},
+      {chunked + "2\r\n{}\r\n0\r\n\r\n", "larger than 1024 bytes"},
+      {QByteArray(), ""},
   };
-  const Case cases[] = {
-      {LoopbackHttpServer::json(QVariantMap{{"iteration", 3}}), true},
-      {LoopbackHttpServer::raw("[1, 2]"), true},
-      {LoopbackHttpServer::raw("{\"error\": \"x\", \"code\": 9}", 500), true},  // the status is not examined
-      {LoopbackHttpServer::raw("\"just text\""), false},
-      {LoopbackHttpServer::raw("42"), false},
-      {LoopbackHttpServer::raw("<html>Bad gateway</html>", 502, "text/html"), false},
-      {LoopbackHttpServer::raw(""), false},
-  };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.answer.toStdString());
-    server.handler = [&](const HttpRequest&) { return c.answer; };
-    const int objects = int(delegate.objects.size());
-    const int errors = int(delegate.errors.size());
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.answer.left(120).toStdString());
+    server.handler = [&](const HttpRequest&) { return row.answer; };
+    const qsizetype objects = delegate.objects.size(), errors = delegate.errors.size();
     exchange();
-    EXPECT_EQ(delegate.objects.size(), objects + (c.delivered ? 1 : 0));
-    EXPECT_EQ(delegate.errors.size(), errors + (c.delivered ? 0 : 1));
+    EXPECT_EQ(delegate.objects.size(), objects + (row.error ? 0 : 1));
+    ASSERT_EQ(delegate.errors.size(), errors + (row.error ? 1 : 0));
+    if (row.error) {
+      EXPECT_FALSE(delegate.errors.last().isEmpty());
+      EXPECT_TRUE(delegate.errors.last().contains(row.error)) << delegate.errors.last().toStdString();
+    }
     EXPECT_EQ(delegate.actionWhenCalled, RZSyncNetwork::Idle);
   }
-  EXPECT_TRUE(delegate.errors.last().isEmpty() == false);
-}
-
-TEST_F(RZSyncNetworkTest, AnErrorPageSaysWhatTheServerAnswered) {
-  server.handler = [](const HttpRequest&) {
-    return LoopbackHttpServer::raw("The sync service cannot reach its storage; try again later.\n", 503,
-                                   "text/plain");
-  };
-  exchange();
-  ASSERT_EQ(delegate.errors.size(), 1);
-  EXPECT_TRUE(delegate.errors[0].contains("503")) << delegate.errors[0].toStdString();
-  EXPECT_TRUE(delegate.errors[0].contains("try again later"));
-}
-
-// A second response in one exchange (here after a redirect) starts the body over.
-// The request carries the password: a redirect, even with a JSON body, is a failure that names it, and
-// nothing is sent where it points (here another port on the same host).
-TEST_F(RZSyncNetworkTest, ARedirectIsAFailureAndTheCredentialsStayHome) {
-  LoopbackHttpServer elsewhere;
-  elsewhere.handler = [](const HttpRequest&) {
-    return LoopbackHttpServer::json(QVariantMap{{"iteration", 5}});
-  };
-  server.handler = [&](const HttpRequest&) -> QByteArray {
-    return LoopbackHttpServer::raw("{\"iteration\": 6}", 307, "application/json",
-                                   "Location: " + elsewhere.url().toEncoded() + "\r\n");
-  };
-  exchange();
-  EXPECT_TRUE(delegate.objects.isEmpty());
-  ASSERT_EQ(delegate.errors.size(), 1);
-  EXPECT_TRUE(delegate.errors[0].contains("307")) << delegate.errors[0].toStdString();
-  EXPECT_EQ(server.requests.size(), 1);
   QTest::qWait(50);
   EXPECT_TRUE(elsewhere.requests.isEmpty());
-}
-
-// Counted as the bytes arrive: a declared length over the limit fails at once, and so does a chunked
-// body that declares none; the rest is not read.
-TEST_F(RZSyncNetworkTest, AReplyOverTheSizeLimitFails) {
-  EXPECT_EQ(network.maxReplyBytes(), 64 << 20);
-  network.setMaxReplyBytes(1024);
-  const QByteArray big = "{\"pad\": \"" + QByteArray(4096, 'x') + "\"}";
-  server.handler = [&](const HttpRequest&) { return LoopbackHttpServer::raw(big); };
-  exchange();
-  EXPECT_TRUE(delegate.objects.isEmpty());
-  ASSERT_EQ(delegate.errors.size(), 1);
-  EXPECT_TRUE(delegate.errors[0].contains("larger than 1024 bytes")) << delegate.errors[0].toStdString();
-  EXPECT_EQ(network.networkAction(), RZSyncNetwork::Idle);
-
-  delegate.errors.clear();
-  server.handler = [&](const HttpRequest&) {
-    QByteArray chunked =
-        "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n"
-        "Connection: close\r\n\r\n";
-    for (int i = 0; i < 4; ++i) chunked += "400\r\n" + QByteArray(1024, ' ') + "\r\n";
-    return chunked + "2\r\n{}\r\n0\r\n\r\n";
-  };
-  exchange();
-  EXPECT_TRUE(delegate.objects.isEmpty());
-  ASSERT_EQ(delegate.errors.size(), 1);
-  EXPECT_TRUE(delegate.errors[0].contains("larger than")) << delegate.errors[0].toStdString();
 }
 
 TEST_F(RZSyncNetworkTest, ConnectionFailureIsReportedAndLogged) {
@@ -237,7 +190,7 @@ TEST_F(RZSyncNetworkTest, ConnectionFailureIsReportedAndLogged) {
 
 // A server that streams a reply without end: the exchange fails as soon as the limit is passed, and the
 // client hangs up instead of waiting for the rest.
-TEST(RZSyncNetworkSizeLimit, AnEndlessReplyIsCutOffAtTheLimit) {
+TEST_F(RZSyncNetworkTest, AnEndlessReplyIsCutOffAtTheLimit) {
   QTcpServer endless;
   ASSERT_TRUE(endless.listen(QHostAddress::LocalHost, 0));
   QPointer<QTcpSocket> connection;
@@ -245,37 +198,18 @@ TEST(RZSyncNetworkSizeLimit, AnEndlessReplyIsCutOffAtTheLimit) {
     connection = endless.nextPendingConnection();
     QObject::connect(connection, &QTcpSocket::readyRead, connection, [&] {
       connection->readAll();
-      // Headers and a first chunk of 4 KiB of white space; the rest never comes.
       connection->write(
-          "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n\r\n"
-          "1000\r\n" +
+          "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n\r\n1000\r\n" +
           QByteArray(4096, ' ') + "\r\n");
     });
   });
-  RecordingDelegate delegate;
-  RZSyncNetwork network(QUrl(QStringLiteral("http://127.0.0.1:%1/sync").arg(endless.serverPort())),
-                        &delegate);
-  network.setUser(QStringLiteral("ann@example.org"));
-  network.setPassword(QStringLiteral("pw"));
+  network.setUrl(QUrl(QStringLiteral("http://127.0.0.1:%1/sync").arg(endless.serverPort())));
   network.setMaxReplyBytes(1024);
-  network.postJSONObject({}, QStringLiteral("head"), 7);
-  ASSERT_TRUE(waitUntil([&] { return delegate.calls() > 0; }, 3000));
+  exchange();
   ASSERT_EQ(delegate.errors.size(), 1);
   EXPECT_TRUE(delegate.errors[0].contains("larger than 1024 bytes")) << delegate.errors[0].toStdString();
-  EXPECT_EQ(network.networkAction(), RZSyncNetwork::Idle);
   EXPECT_TRUE(
       waitUntil([&] { return !connection || connection->state() != QAbstractSocket::ConnectedState; }));
-}
-
-TEST_F(RZSyncNetworkTest, SilentServerTimesOut) {
-  EXPECT_EQ(network.timeoutMilliseconds(), 60000);
-  network.setTimeoutMilliseconds(300);
-  server.handler = [](const HttpRequest&) { return QByteArray(); };  // never answers
-  QElapsedTimer clock;
-  clock.start();
-  exchange();
-  EXPECT_EQ(delegate.errors.size(), 1);
-  EXPECT_GE(clock.elapsed(), 250);
 }
 
 // The client is idle again before its delegate hears, so the delegate may send the next request.

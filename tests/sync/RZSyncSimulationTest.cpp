@@ -299,156 +299,104 @@ class Simulation {
   // One random change; some clear a value.
   void edit(SyncClient& client) {
     WTObjectContext& context = *client.context;
-    switch (roll(12)) {
-      case 0:
-        insert<WTClient>(client)->setName(text());
-        break;
-      case 1: {
-        auto* project = insert<WTProject>(client);
-        project->setName(text());
-        if (WTClient* owner = any<WTClient>(client)) project->setClient(owner);
-        break;
+    const int kind = roll(12);
+    if (kind == 0) {
+      insert<WTClient>(client)->setName(text());
+    } else if (kind == 1) {
+      auto* project = insert<WTProject>(client);
+      project->setName(text());
+      if (WTClient* owner = any<WTClient>(client)) project->setClient(owner);
+    } else if (kind == 2) {
+      WTProject* project = any<WTProject>(client);
+      if (!project) return;
+      auto* task = insert<WTTask>(client);
+      task->setName(text());
+      task->setProject(project, roll(int(project->tasks().size()) + 1));
+    } else if (kind <= 4) {  // a new item of any kind
+      WTTask* task = any<WTTask>(client);
+      if (!task) return;
+      const int type = roll(5);
+      WTItem* item = type == 3 ? static_cast<WTItem*>(insert<WTNote>(client)) : nullptr;
+      if (type == 0) {
+        auto* time = insert<WTTime>(client);
+        const Date start = day();
+        time->setStartDate(start);
+        time->setEndDate(start.addingSeconds(60.0 * roll(300)));
+        item = time;
+      } else if (type == 1) {
+        auto* flat = insert<WTFlat>(client);
+        flat->setMinutes(roll(600));
+        item = flat;
+      } else if (type == 2) {
+        auto* expense = insert<WTExpense>(client);
+        expense->setExpense(money());
+        item = expense;
+      } else if (type == 4) {
+        item = insert<WTToDo>(client);
       }
-      case 2: {
-        WTProject* project = any<WTProject>(client);
-        if (!project) break;
-        auto* task = insert<WTTask>(client);
-        task->setName(text());
-        task->setProject(project, roll(int(project->tasks().size()) + 1));
-        break;
+      item->setStartDate(day());
+      item->setName(text());
+      item->setTask(task);
+    } else if (kind == 5) {  // rename, re-rate or clear anything
+      WTObject* object = anyOf(client, QStringLiteral("WTObject"));
+      if (!object) return;
+      const int change = roll(6);
+      if (change == 0) object->setName(text());
+      if (change == 1) object->setNotes(text());
+      if (change == 2) object->setRate(money());
+      if (change == 3 && roll(2)) {
+        object->setRate(std::nullopt);
+      } else if (change == 3) {
+        object->setNotes(QString());
       }
-      case 3:
-      case 4: {
-        WTTask* task = any<WTTask>(client);
-        if (!task) break;
-        WTItem* item = nullptr;
-        switch (roll(5)) {
-          case 0: {
-            auto* time = insert<WTTime>(client);
-            const Date start = day();
-            time->setStartDate(start);
-            time->setEndDate(start.addingSeconds(60.0 * roll(300)));
-            item = time;
-            break;
-          }
-          case 1: {
-            auto* flat = insert<WTFlat>(client);
-            flat->setMinutes(roll(600));
-            item = flat;
-            break;
-          }
-          case 2: {
-            auto* expense = insert<WTExpense>(client);
-            expense->setExpense(money());
-            item = expense;
-            break;
-          }
-          case 3:
-            item = insert<WTNote>(client);
-            break;
-          default:
-            item = insert<WTToDo>(client);
-            break;
-        }
+      if (change == 4) {
+        if (auto* task = dynamic_cast<WTTask*>(object))
+          task->setBudget(roll(2) ? std::optional(money()) : std::nullopt);
+        if (auto* expense = dynamic_cast<WTExpense*>(object)) expense->setExpense(std::nullopt);
+        if (auto* flat = dynamic_cast<WTFlat*>(object)) flat->setMinutes(std::nullopt);
+        if (auto* time = dynamic_cast<WTTime*>(object)) time->setEndDate(std::nullopt);
+      }
+      if (change == 5) object->setArchived(roll(2) == 1);
+    } else if (kind == 6) {  // item values
+      WTItem* item = anyItem(client);
+      if (!item) return;
+      if (auto* time = dynamic_cast<WTTime*>(item)) {
+        time->setEndDate(time->startDate().value_or(day()).addingSeconds(60.0 * roll(300)));
+      } else if (auto* expense = dynamic_cast<WTExpense*>(item)) {
+        expense->setExpense(money());
+      } else if (auto* flat = dynamic_cast<WTFlat*>(item)) {
+        flat->setMinutes(roll(600));
+      } else if (auto* todo = dynamic_cast<WTToDo*>(item)) {
+        todo->setCompleted(!todo->completed());
+      } else {
         item->setStartDate(day());
-        item->setName(text());
-        item->setTask(task);
-        break;
       }
-      case 5: {  // rename or re-rate anything
-        WTObject* object = anyOf(client, QStringLiteral("WTObject"));
-        if (!object) break;
-        switch (roll(6)) {
-          case 0:
-            object->setName(text());
-            break;
-          case 1:
-            object->setNotes(text());
-            break;
-          case 2:
-            object->setRate(money());
-            break;
-          case 3:
-            if (roll(2)) {
-              object->setRate(std::nullopt);
-            } else {
-              object->setNotes(QString());
-            }
-            break;
-          case 4:
-            if (auto* task = dynamic_cast<WTTask*>(object))
-              task->setBudget(roll(2) ? std::optional(money()) : std::nullopt);
-            if (auto* expense = dynamic_cast<WTExpense*>(object)) expense->setExpense(std::nullopt);
-            if (auto* flat = dynamic_cast<WTFlat*>(object)) flat->setMinutes(std::nullopt);
-            if (auto* time = dynamic_cast<WTTime*>(object)) time->setEndDate(std::nullopt);
-            break;
-          default:
-            object->setArchived(roll(2) == 1);
-            break;
-        }
-        break;
+    } else if (kind == 7) {  // reorder or move a task
+      WTTask* task = any<WTTask>(client);
+      WTProject* project = any<WTProject>(client);
+      if (!task || !project) return;
+      if (task->project() == project) {
+        project->moveTask(task, roll(int(project->tasks().size())));
+      } else {
+        task->setProject(project, roll(int(project->tasks().size()) + 1));
       }
-      case 6: {  // item values
-        WTItem* item = anyItem(client);
-        if (!item) break;
-        if (auto* time = dynamic_cast<WTTime*>(item)) {
-          time->setEndDate(time->startDate().value_or(day()).addingSeconds(60.0 * roll(300)));
-        } else if (auto* expense = dynamic_cast<WTExpense*>(item)) {
-          expense->setExpense(money());
-        } else if (auto* flat = dynamic_cast<WTFlat*>(item)) {
-          flat->setMinutes(roll(600));
-        } else if (auto* todo = dynamic_cast<WTToDo*>(item)) {
-          todo->setCompleted(!todo->completed());
-        } else {
-          item->setStartDate(day());
-        }
-        break;
-      }
-      case 7: {  // reorder or move a task
-        WTTask* task = any<WTTask>(client);
-        WTProject* project = any<WTProject>(client);
-        if (!task || !project) break;
-        if (task->project() == project) {
-          project->moveTask(task, roll(int(project->tasks().size())));
-        } else {
-          task->setProject(project, roll(int(project->tasks().size()) + 1));
-        }
-        if (roll(2)) task->setBudget(money());
-        break;
-      }
-      case 8: {  // move an item, or file a project under another client
-        if (roll(2)) {
-          WTItem* item = anyItem(client);
-          WTTask* task = any<WTTask>(client);
-          if (item && task) item->setTask(task);
-        } else {
-          WTProject* project = any<WTProject>(client);
-          WTClient* owner = roll(4) ? any<WTClient>(client) : nullptr;  // sometimes none
-          if (project) project->setClient(owner);
-        }
-        break;
-      }
-      case 9:
-      case 10: {  // delete an item
-        if (WTItem* item = anyItem(client)) context.deleteObject(item);
-        break;
-      }
-      default: {  // delete an owner
-        switch (roll(3)) {
-          case 0:
-            if (WTTask* task = any<WTTask>(client)) context.deleteObject(task);
-            break;
-          case 1:
-            if (roll(3) == 0) {
-              if (WTProject* project = any<WTProject>(client)) context.deleteObject(project);
-            }
-            break;
-          default:
-            if (WTClient* owner = any<WTClient>(client)) context.deleteObject(owner);
-            break;
-        }
-        break;
-      }
+      if (roll(2)) task->setBudget(money());
+    } else if (kind == 8 && roll(2)) {  // move an item
+      WTItem* item = anyItem(client);
+      WTTask* task = any<WTTask>(client);
+      if (item && task) item->setTask(task);
+    } else if (kind == 8) {  // file a project under another client, sometimes none
+      WTProject* project = any<WTProject>(client);
+      WTClient* owner = roll(4) ? any<WTClient>(client) : nullptr;
+      if (project) project->setClient(owner);
+    } else if (kind <= 10) {  // delete an item
+      if (WTItem* item = anyItem(client)) context.deleteObject(item);
+    } else if (const int owner = roll(3); owner == 0) {  // delete an owner; projects seldom
+      if (WTTask* task = any<WTTask>(client)) context.deleteObject(task);
+    } else if (owner == 1 && roll(3) == 0) {
+      if (WTProject* project = any<WTProject>(client)) context.deleteObject(project);
+    } else if (owner == 2) {
+      if (WTClient* other = any<WTClient>(client)) context.deleteObject(other);
     }
   }
 

@@ -26,14 +26,12 @@
 #include <sys/resource.h>
 #include <csignal>
 
+using synctest::compact;
+using synctest::dec;
 using synctest::LogCapture;
 using Section = RZSyncTrack::Section;
 
 namespace {
-
-Decimal dec(const char* text) {
-  return *Decimal::fromString(QString::fromLatin1(text));
-}
 
 QByteArray readFile(const QString& path) {
   QFile file(path);
@@ -46,10 +44,6 @@ void writeFile(const QString& path, const QByteArray& bytes) {
   file.write(bytes);
 }
 
-QString compact(const QVariant& value) {
-  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
-}
-
 class RZSyncTrackTest : public ::testing::Test {
  protected:
   QString path() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
@@ -57,14 +51,6 @@ class RZSyncTrackTest : public ::testing::Test {
 };
 
 }  // namespace
-
-TEST_F(RZSyncTrackTest, FreshJournalIsEmptyAtIterationZero) {
-  RZSyncTrack track(path());
-  EXPECT_FALSE(track.hasChanges());
-  EXPECT_EQ(track.iteration(), 0);
-  EXPECT_EQ(compact(track.dictionary()), QStringLiteral(R"({"i":{},"u":{},"x":[]})"));
-  EXPECT_FALSE(QFile::exists(path() + QStringLiteral(".corrupt")));
-}
 
 TEST_F(RZSyncTrackTest, FileHoldsIterationAndTrackAndReadsBack) {
   RZSyncTrack track;
@@ -94,39 +80,38 @@ TEST_F(RZSyncTrackTest, FileHoldsIterationAndTrackAndReadsBack) {
   EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
 }
 
-TEST_F(RZSyncTrackTest, MissingSectionsLoadEmpty) {
-  writeFile(path(), R"({"iteration": 3, "track": {"u": {"A@WTTask": {"name": "a"}}}})");
-  RZSyncTrack track(path());
-  EXPECT_EQ(track.iteration(), 3);
-  EXPECT_TRUE(track.deletedIds().isEmpty());
-  EXPECT_TRUE(track.entries(Section::Inserted).isEmpty());
-  EXPECT_EQ(track.entry(Section::Updated, "A@WTTask").value("name"), "a");
-  EXPECT_EQ(compact(track.dictionary().value("x")), "[]");
-}
-
-// Whatever cannot be read as a journal is kept aside, byte for byte, and the journal starts over.
-TEST_F(RZSyncTrackTest, MalformedFilesAreKeptAsideAndTheJournalStartsEmpty) {
-  const QByteArray bad[] = {
-      "",
-      "{\"iteration\": 3, \"track\": {\"i\": {",  // cut short
-      "[1, 2]",
-      R"({"iteration": "7", "track": {}})",
-      R"({"iteration": 7, "track": []})",
-      R"({"iteration": 7, "track": {"i": {"A@WTTask": 5}}})",
-      R"({"iteration": 7, "track": {"x": ["A@WTTask", 5]}})",
+// Missing sections load empty; whatever cannot be read as a journal is kept aside, byte for byte, and
+// the journal starts over.
+TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
+  const struct {
+    const char* text;  // null: no file
+    qint64 iteration;
+    const char* loaded;  // null: kept aside
+  } rows[] = {
+      {nullptr, 0, R"({"i":{},"u":{},"x":[]})"},
+      {R"({"iteration": 3, "track": {"u": {"A@WTTask": {"name": "a"}}}})", 3,
+       R"({"i":{},"u":{"A@WTTask":{"name":"a"}},"x":[]})"},
+      {"", 0, nullptr},
+      {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr},  // cut short
+      {"[1, 2]", 0, nullptr},
+      {R"({"iteration": "7", "track": {}})", 0, nullptr},
+      {R"({"iteration": 7, "track": []})", 0, nullptr},
+      {R"({"iteration": 7, "track": {"i": {"A@WTTask": 5}}})", 0, nullptr},
+      {R"({"iteration": 7, "track": {"x": ["A@WTTask", 5]}})", 0, nullptr},
   };
-  for (const QByteArray& text : bad) {
-    SCOPED_TRACE(text.toStdString());
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.text ? row.text : "(no file)");
     QTemporaryDir folder;
     const QString file = folder.filePath(QStringLiteral("Tessal.sync"));
-    writeFile(file, text);
+    if (row.text) writeFile(file, row.text);
     LogCapture log;
     RZSyncTrack track(file);
-    EXPECT_FALSE(track.hasChanges());
-    EXPECT_EQ(track.iteration(), 0);
-    EXPECT_TRUE(log.contains(QStringLiteral("Can not parse json - ")));
-    EXPECT_FALSE(QFile::exists(file));
-    EXPECT_EQ(readFile(file + QStringLiteral(".corrupt")), text);
+    EXPECT_EQ(track.iteration(), row.iteration);
+    EXPECT_EQ(compact(track.dictionary()), row.loaded ? row.loaded : R"({"i":{},"u":{},"x":[]})");
+    EXPECT_EQ(log.contains(QStringLiteral("Can not parse json - ")), !row.loaded);
+    EXPECT_EQ(QFile::exists(file), row.loaded && row.text);
+    EXPECT_EQ(readFile(file + QStringLiteral(".corrupt")), row.loaded ? QByteArray() : QByteArray(row.text));
+    EXPECT_EQ(QFile::exists(file + QStringLiteral(".corrupt")), !row.loaded);
   }
 }
 
@@ -163,10 +148,6 @@ TEST_F(RZSyncTrackTest, FailedWriteKeepsThePreviousFile) {
   EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
   EXPECT_TRUE(track.entries(Section::Inserted).contains("B@WTTask"));  // memory unchanged
   EXPECT_TRUE(track.writeToFile(path()).ok());
-}
-
-TEST_F(RZSyncTrackTest, WriteIntoAMissingFolderFails) {
-  RZSyncTrack track;
   EXPECT_FALSE(track.writeToFile(dir.filePath(QStringLiteral("missing/Tessal.sync"))).ok());
 }
 
@@ -201,31 +182,25 @@ TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
   }
 }
 
-TEST(RZSyncTrackSections, InsertionThenUpdateStaysOneInsertion) {
+// An update of a pending insertion stays one insertion; a deletion keeps the pending values and writing
+// the record again undoes it; a value that is not journaled still leaves an entry, a cleared one is null.
+TEST(RZSyncTrackSections, ChangesCombinePerRecord) {
   RZSyncTrack track;
   track.insertValues({{"name", "a"}, {"notes", "n"}}, "A@WTTask");
   track.updateValues({{"name", "b"}, {"rate", 50}}, "A@WTTask");
-  EXPECT_EQ(compact(track.dictionary()),
-            R"({"i":{"A@WTTask":{"name":"b","notes":"n","rate":50}},"u":{},"x":[]})");
-}
-
-TEST(RZSyncTrackSections, DeletionKeepsPendingValuesAndRewritingUndeletes) {
-  RZSyncTrack track;
-  track.updateValues({{"name", "a"}}, "A@WTTask");
-  track.deleteObjectWithId("A@WTTask");
-  track.deleteObjectWithId("A@WTTask");
+  track.updateValues({{"name", "a"}}, "D@WTTask");
+  track.deleteObjectWithId("D@WTTask");
+  track.deleteObjectWithId("D@WTTask");
   track.deleteObjectWithId({});
-  EXPECT_EQ(compact(track.dictionary()), R"({"i":{},"u":{"A@WTTask":{"name":"a"}},"x":["A@WTTask"]})");
-  EXPECT_TRUE(track.isPendingDeletion("A@WTTask"));
-  track.updateValues({{"name", "b"}}, "A@WTTask");
-  EXPECT_FALSE(track.isPendingDeletion("A@WTTask"));
-  // A value that is not journaled still leaves an entry behind; a cleared one is journaled as null.
   track.updateValues({{"items", QVariant::fromValue(WTUnorderedRelationship{})}}, "B@WTTask");
-  EXPECT_TRUE(track.entries(Section::Updated).contains("B@WTTask"));
-  EXPECT_TRUE(track.entry(Section::Updated, "B@WTTask").isEmpty());
-  track.updateValues({{"rate", QVariant::fromValue(*Decimal::fromString(u"5"))}}, "C@WTTask");
+  track.updateValues({{"rate", synctest::money("5")}}, "C@WTTask");
   track.updateValues({{"rate", QVariant()}}, "C@WTTask");
-  EXPECT_EQ(compact(track.entry(Section::Updated, "C@WTTask")), R"({"rate":null})");
+  EXPECT_EQ(compact(track.dictionary()),
+            R"({"i":{"A@WTTask":{"name":"b","notes":"n","rate":50}},)"
+            R"("u":{"B@WTTask":{},"C@WTTask":{"rate":null},"D@WTTask":{"name":"a"}},"x":["D@WTTask"]})");
+  EXPECT_TRUE(track.isPendingDeletion("D@WTTask"));
+  track.updateValues({{"name", "b"}}, "D@WTTask");
+  EXPECT_FALSE(track.isPendingDeletion("D@WTTask"));
   EXPECT_TRUE(track.hasChanges());
   track.resetChanges();
   EXPECT_FALSE(track.hasChanges());
@@ -265,13 +240,8 @@ TEST(RZSyncTrackSections, ConfirmedSaveForgetsOnlyWhatItSentUnchanged) {
   EXPECT_EQ(
       compact(track.dictionary()),
       R"({"i":{},"u":{"N@WTTask":{"rate":12.30},"U@WTTask":{"archived":true,"notes":"newer"}},"x":["L@WTNote"]})");
-}
-
-TEST(RZSyncTrackSections, ConfirmedSaveWithoutEditsEmptiesTheJournal) {
-  RZSyncTrack track;
-  track.insertValues({{"name", "new"}}, "N@WTTask");
+  // Without edits in between, nothing is left, an entry without keys included.
   track.updateValues({{"items", QVariant::fromValue(WTUnorderedRelationship{})}}, "E@WTTask");
-  track.deleteObjectWithId("D@WTNote");
   track.removeSentChanges(track.dictionary());
   EXPECT_FALSE(track.hasChanges());
 }

@@ -35,41 +35,42 @@ QStringList makeOneOfEach(WTObjectContext& context) {
   return made;
 }
 
-void undoOrRedo(WTObjectContext& context, int steps, bool undo) {
-  for (int i = 0; i < steps; ++i) {
-    undo ? context.undoManager().undo() : context.undoManager().redo();
-    context.processPendingChanges();
-  }
-}
-
-int sync(SyncClient& client) {
-  QString out, err;
-  QTextStream outStream(&out), errStream(&err);
-  const int code = runSyncCommand(*client.manager, {QStringLiteral("--timeout"), QStringLiteral("30")},
-                                  outStream, errStream);
-  EXPECT_EQ(code, 0) << err.toStdString();
-  return code;
-}
-
 }  // namespace
 
-class RZSyncUndoAcrossSavesWithServer : public synctest::TwoDevicesTest {};
+class RZSyncUndoAcrossSavesWithServer : public synctest::TwoDevicesTest {
+ protected:
+  // Undoes or redoes `steps` steps on A and saves.
+  void undoOrRedo(int steps, bool undo) {
+    for (int i = 0; i < steps; ++i) {
+      undo ? a->context->undoManager().undo() : a->context->undoManager().redo();
+      a->context->processPendingChanges();
+    }
+    a->save();
+  }
+  // A, then B, run the sync command until each is in step with the server.
+  static void syncBoth(SyncClient& first, SyncClient& second) {
+    for (SyncClient* client : {&first, &second}) {
+      QString out, err;
+      QTextStream outStream(&out), errStream(&err);
+      ASSERT_EQ(runSyncCommand(*client->manager, {QStringLiteral("--timeout"), QStringLiteral("30")},
+                               outStream, errStream),
+                0)
+          << err.toStdString();
+    }
+  }
+};
 
 // With the real server: undo and redo saved between two polls leave the other device as it was; an undo
 // that reaches the server takes the records from the other device too, for good, across restarts.
 TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   const QStringList made = makeOneOfEach(*a->context);
   a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  syncBoth(*a, *b);
   for (const QString& uuid : made) ASSERT_NE(b->context->objectWithUUID(uuid), nullptr) << uuid.toStdString();
 
-  undoOrRedo(*a->context, int(made.size()), true);
-  a->save();
-  undoOrRedo(*a->context, int(made.size()), false);
-  a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  undoOrRedo(int(made.size()), true);
+  undoOrRedo(int(made.size()), false);
+  syncBoth(*a, *b);
   for (const QString& uuid : made) {
     WTObject* there = b->context->objectWithUUID(uuid);
     ASSERT_NE(there, nullptr) << uuid.toStdString();
@@ -77,10 +78,8 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   }
   expectSameStores();
 
-  undoOrRedo(*a->context, int(made.size()), true);
-  a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  undoOrRedo(int(made.size()), true);
+  syncBoth(*a, *b);
   a->reopen();
   b->reopen();
   for (const QString& uuid : made) {
@@ -106,29 +105,24 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, UndoingADeletionTheServerHeldBringsTheRe
   before->setTask(task);
   a->context->processPendingChanges();
   a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  syncBoth(*a, *b);
   ASSERT_EQ(b->context->count(), 3);
 
   a->context->deleteObject(task);
   a->context->processPendingChanges();
   a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  syncBoth(*a, *b);
   ASSERT_EQ(b->context->count(), 1) << "the deletion reached the other device";
 
-  undoOrRedo(*a->context, 1, true);
-  a->save();
+  undoOrRedo(1, true);
   auto* after = a->context->insertNewObject<WTTime>();
   after->setName(QStringLiteral("after"));
   after->setTask(task);
   a->context->processPendingChanges();
   a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  syncBoth(*a, *b);
   a->reopen();
   b->reopen();
-
   for (SyncClient* device : {a.get(), b.get()}) {
     const QList<WTTask*> tasks = device->context->fetch<WTTask>();
     ASSERT_EQ(tasks.size(), 1) << (device == a.get() ? "here" : "there");
@@ -150,17 +144,12 @@ TEST_F(RZSyncUndoAcrossSavesWithServer,
   project->setName(QStringLiteral("Atlas"));
   a->context->processPendingChanges();
   a->save();
-  ASSERT_EQ(sync(*a), 0);
-  undoOrRedo(*a->context, 1, true);
-  a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  syncBoth(*a, *a);
+  undoOrRedo(1, true);
+  syncBoth(*a, *b);
   ASSERT_EQ(b->context->count(), 0);
-
-  undoOrRedo(*a->context, 1, false);
-  a->save();
-  ASSERT_EQ(sync(*a), 0);
-  ASSERT_EQ(sync(*b), 0);
+  undoOrRedo(1, false);
+  syncBoth(*a, *b);
   const QList<WTProject*> there = b->context->fetch<WTProject>();
   ASSERT_EQ(there.size(), 1);
   EXPECT_EQ(there.first()->name(), "Atlas");

@@ -3,6 +3,7 @@
 // Real parts for the sync tests: an HTTP server on 127.0.0.1 inside the test (answers are scripted per
 // test), a client made of a real store file, context and sync manager in a temp folder, and the real
 // tessal-sync-server process.
+#include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
@@ -47,6 +48,17 @@ inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
 }
 
 using ::LogCapture;
+
+inline Decimal dec(const char* text) {
+  return *Decimal::fromString(QString::fromLatin1(text));
+}
+inline QVariant money(const char* text) {
+  return QVariant::fromValue(dec(text));
+}
+// A value as one line of JSON, for comparing journal entries and request bodies as text.
+inline QString compact(const QVariant& value) {
+  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
+}
 
 // One HTTP request as the test server received it.
 struct HttpRequest {
@@ -148,6 +160,24 @@ class LoopbackHttpServer {
   QList<QPointer<QTcpSocket>> held_;
 };
 
+// The protocol's replies: a change set, a head bringing one, a confirmed save, a refusal.
+inline QVariantMap changeSet(const QVariantMap& inserted = {}, const QVariantMap& updated = {},
+                             const QStringList& deleted = {}) {
+  return {{"i", inserted}, {"u", updated}, {"x", deleted}};
+}
+inline QByteArray headReply(qint64 iteration, const QVariantMap& result = changeSet()) {
+  return LoopbackHttpServer::json(
+      QVariantMap{{"action", "head"}, {"iteration", iteration}, {"result", result}});
+}
+inline QByteArray saveReply(qint64 iteration) {
+  return LoopbackHttpServer::json(QVariantMap{{"action", "save"}, {"iteration", iteration}});
+}
+inline QByteArray errorReply(const QString& message, qint64 code, const QVariant& iteration = {}) {
+  QVariantMap reply{{"error", message}, {"code", code}};
+  if (iteration.isValid()) reply.insert("iteration", iteration);
+  return LoopbackHttpServer::json(reply);
+}
+
 // Remembers what the manager presented to the user.
 class RecordingPresenter final : public RZSyncErrorPresenter {
  public:
@@ -247,40 +277,61 @@ inline QVariant storedValue(const WTObject* object, const QString& key) {
   return object->valueForKey(key);
 }
 
-// Every record of a store as text: uuid -> its stored values in journal form (so dates in whole seconds
-// and money as written), a project's task order included. Two stores in step give equal snapshots.
+// A record's stored values in journal form (dates in whole seconds, money as written, records as their
+// uuid), a project's task order included.
+inline QVariantMap journalValues(const WTObject* object) {
+  QVariantMap values;
+  QStringList keys = object->storedKeys();
+  if (object->entity() == WTEntity::Project) keys << QStringLiteral("tasks");
+  for (const QString& key : keys) {
+    QVariant value = storedValue(object, key);
+    if (key == QLatin1String("tasks")) {
+      QVariantList uuids;
+      for (const QVariant& task : value.toList())
+        uuids.append(RZSyncTrack::transformedValue(task).value_or(QVariant()));
+      value = uuids;
+    }
+    values.insert(key, RZSyncTrack::transformedValue(value).value_or(QVariant()));
+  }
+  return values;
+}
+
+// Every record of a store as text: uuid -> its journal values. Two stores in step give equal snapshots.
 inline QMap<QString, QString> snapshot(WTObjectContext& context) {
   QMap<QString, QString> records;
   for (WTObject* object :
        context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>())) {
-    QVariantMap values;
-    QStringList keys = object->storedKeys();
-    if (object->entity() == WTEntity::Project) keys << QStringLiteral("tasks");
-    for (const QString& key : keys) {
-      QVariant value = storedValue(object, key);
-      if (key == QLatin1String("tasks")) {
-        QVariantList uuids;
-        for (const QVariant& task : value.toList())
-          uuids.append(RZSyncTrack::transformedValue(task).value_or(QVariant()));
-        value = uuids;
-      }
-      values.insert(key, RZSyncTrack::transformedValue(value).value_or(QVariant()));
-    }
-    records.insert(object->uuid(), QString::fromUtf8(RZSyncJSON::write(values, RZSyncJSON::Style::Compact)));
+    records.insert(object->uuid(), compact(journalValues(object)));
   }
   return records;
+}
+
+// One record's journal values without those left unset (null, false, empty, the uuid), as one line;
+// "(none)" when the store has no such record.
+inline std::string storedRecord(WTObjectContext& context, const QString& uuid) {
+  const WTObject* object = context.objectWithUUID(uuid, false);
+  if (!object) return "(none)";
+  QVariantMap values = journalValues(object);
+  values.remove(QStringLiteral("uuid"));
+  for (auto it = values.begin(); it != values.end();) {
+    const QVariant& v = it.value();
+    const bool unset =
+        !v.isValid() || v.isNull() || (v.typeId() == QMetaType::Bool && !v.toBool()) ||
+        (v.canConvert<QVariantList>() && v.typeId() != QMetaType::QString && v.toList().isEmpty()) ||
+        (v.typeId() == QMetaType::QString && v.toString().isEmpty());
+    it = unset ? values.erase(it) : std::next(it);
+  }
+  return compact(values).toStdString();
 }
 
 // Where two snapshots differ, for failure messages.
 inline std::string snapshotDifference(const QMap<QString, QString>& a, const QMap<QString, QString>& b) {
   std::string out;
   int shown = 0;
-  QSet<QString> keys;
-  for (const QString& key : a.keys()) keys.insert(key);
-  for (const QString& key : b.keys()) keys.insert(key);
-  QStringList sorted(keys.begin(), keys.end());
-  sorted.sort();
-  for (const QString& key : sorted) {
+  QStringList keys = a.keys() + b.keys();
+  keys.sort();
+  keys.removeDuplicates();
+  for (const QString& key : keys) {
     if (a.value(key) == b.value(key)) continue;
     if (++shown > 8) break;
     out += key.toStdString() + "\n  " + a.value(key, "(none)").toStdString() + "\n  " +
