@@ -60,7 +60,6 @@ class RZSyncNetwork : public QObject {
   void setDevice(const QString& device) { device_ = device; }
 
   // How long a request may wait for the next byte before it fails; 60 seconds unless changed.
-  int timeoutMilliseconds() const { return timeoutMs_; }
   void setTimeoutMilliseconds(int milliseconds) { timeoutMs_ = milliseconds; }
 
   // Sends {"user", "password", "action", "iteration", "device", "data"} (no "data" when `data` is null).
@@ -72,7 +71,6 @@ class RZSyncNetwork : public QObject {
 
   // A reply larger than this fails the exchange and is not read further (64 MiB unless changed).
   static constexpr qsizetype kMaxReplyBytes = qsizetype(64) << 20;
-  qsizetype maxReplyBytes() const { return maxReplyBytes_; }
   void setMaxReplyBytes(qsizetype bytes) { maxReplyBytes_ = bytes; }
 
  private:
