@@ -27,9 +27,30 @@ FLIPS = [("<=", ">"), (">=", "<"), ("==", "!="), ("!=", "=="), ("<", ">="), (">"
 COMPARISON = re.compile(r"(?<![<>=!&|+\-*/%^-])(<=|>=|==|!=|<|>)(?![<>=])")
 
 
+def masked(code):
+    """`code` with the insides of string and character literals blanked, at the same length."""
+    return re.sub(r'"(\\.|[^"\\])*"|\'(\\.|[^\'\\])*\'', lambda m: m.group()[0] + " " * (len(m.group()) - 2) +
+                  m.group()[-1], code)
+
+
+def condition(code):
+    """The span of the condition of an `if` on the line, or None."""
+    start = code.find("if (")
+    if start < 0:
+        return None
+    depth = 0
+    for index in range(start + 3, len(code)):
+        depth += {"(": 1, ")": -1}.get(code[index], 0)
+        if depth == 0:
+            return start + 4, index
+    return None
+
+
 def mutations(text):
     """The mutants a line offers, as (what, new text), best first."""
-    code = text.split("//")[0]
+    code = masked(text.split("//")[0] if '"' not in text else text)
+    if "//" in code:
+        code = code[: code.index("//")]
     found = []
     for match in COMPARISON.finditer(code):
         operator = match.group(1)
@@ -45,7 +66,11 @@ def mutations(text):
         if index >= 0:
             found.append((f"{a} -> {b}", text[:index + 1] + b + text[index + 3:]))
             break
-    number = re.search(r"(?<![\w.])(\d+)(?![\w.])", code)
+    span = condition(code)
+    if span:
+        begin, end = span
+        found.append(("condition negated", text[:begin] + "!(" + text[begin:end] + ")" + text[end:]))
+    number = re.search(r"(?<![\w.%])(\d+)(?![\w.])", code)
     if number:
         value = int(number.group(1))
         found.append((f"{value} -> {value + 1}", text[:number.start()] + str(value + 1) + text[number.end():]))
