@@ -1,13 +1,16 @@
 #!/usr/bin/env python3
 """Lines and branches one coverage report (scripts/coverage.sh) covers and another does not.
 
-usage: coverage-compare.py BEFORE.json AFTER.json [OTHER.json...]
+usage: coverage-compare.py [--before-rev REV] BEFORE.json AFTER.json [OTHER.json...]
 What the OTHER reports cover counts as covered after (the suites of other test binaries, when AFTER is
-the report of some binaries only).
+the report of some binaries only). With --before-rev, BEFORE was measured on the sources of git revision
+REV: its lines are followed to where they stand now, and lines since changed or removed are listed apart.
 Exits 1 when AFTER misses something BEFORE covered in a line that still holds the same text, so code that
 was deleted or moved is listed apart and does not count as lost.
 """
+import difflib
 import json
+import subprocess
 import sys
 from pathlib import Path
 
@@ -28,10 +31,48 @@ def covered(report):
     return lines, branches
 
 
+def line_map(revision, name, now):
+    """Old line number -> current line number for the lines of `name` unchanged since `revision`."""
+    shown = subprocess.run(["git", "show", f"{revision}:{name}"], capture_output=True, text=True)
+    if shown.returncode != 0:
+        return {}
+    old = shown.stdout.splitlines()
+    mapping = {}
+    for block in difflib.SequenceMatcher(None, old, now, autojunk=False).get_matching_blocks():
+        for offset in range(block.size):
+            mapping[block.a + offset + 1] = block.b + offset + 1
+    return mapping
+
+
+def follow(revision, before_lines, before_branches):
+    """The before sets moved to today's line numbers, and the count of lines that changed or went."""
+    lines, branches, changed = {}, {}, 0
+    for name in set(before_lines) | set(before_branches):
+        path = Path(name)
+        now = path.read_text(errors="replace").splitlines() if path.exists() else []
+        mapping = line_map(revision, name, now)
+        for number in before_lines.get(name, set()):
+            if number in mapping:
+                lines.setdefault(name, set()).add(mapping[number])
+            else:
+                changed += 1
+        for number, index in before_branches.get(name, set()):
+            if number in mapping:
+                branches.setdefault(name, set()).add((mapping[number], index))
+    return lines, branches, changed
+
+
 def main():
-    before_lines, before_branches = covered(sys.argv[1])
-    after_lines, after_branches = covered(sys.argv[2])
-    for other in sys.argv[3:]:
+    arguments = sys.argv[1:]
+    revision = None
+    if arguments[:1] == ["--before-rev"]:
+        revision, arguments = arguments[1], arguments[2:]
+    before_lines, before_branches = covered(arguments[0])
+    if revision:
+        before_lines, before_branches, changed = follow(revision, before_lines, before_branches)
+        print(f"{changed} covered lines of {revision} have since changed or gone (not counted)")
+    after_lines, after_branches = covered(arguments[1])
+    for other in arguments[2:]:
         other_lines, other_branches = covered(other)
         for name, numbers in other_lines.items():
             after_lines.setdefault(name, set()).update(numbers)
