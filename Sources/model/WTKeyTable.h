@@ -12,6 +12,7 @@
 
 #include <initializer_list>
 #include <optional>
+#include <type_traits>
 #include <variant>
 #include <vector>
 

@@ -59,17 +59,23 @@ constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
 // Each half is read through its own small index (version 2), so a large store's items are never visited.
 #define WT_STORE_OWNERS "entity IN ('WTClient', 'WTProject', 'WTTask')"
 #define WT_STORE_RUNNING "running <> 0"
-constexpr char kSelectTimerRecordsSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
-                                          " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_RUNNING
-                                          " AND NOT " WT_STORE_OWNERS;
+constexpr char kSelectTimerRecordsSql[] =
+    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
+    " FROM records WHERE " WT_STORE_RUNNING " AND NOT " WT_STORE_OWNERS;
 // The task uuids arrive as one JSON array, so a single prepared statement serves any number of them.
-constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
-                                          " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE taskUuid IN"
-                                          " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
+constexpr char kSelectItemsOfTasksSql[] =
+    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
+    " FROM records WHERE taskUuid IN"
+    " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
+// A row that is there already is changed in place: replacing it would take it out of every index and put it
+// back, though a save mostly changes a name or a date and leaves the uuid and the task as they were.
 constexpr char kReplaceSql[] =
-    "INSERT OR REPLACE INTO records (" WT_STORE_COLUMNS
+    "INSERT INTO records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
-    "?17, ?18, ?19, ?20)";
+    "?17, ?18, ?19, ?20) ON CONFLICT(uuid) DO UPDATE SET entity = ?2, name = ?3, notes = ?4, rate = ?5, "
+    "color = ?6, archived = ?7, addressBookUID = ?8, totalsUID = ?9, clientUuid = ?10, projectUuid = ?11, "
+    "position = ?12, budget = ?13, taskUuid = ?14, startDate = ?15, endDate = ?16, running = ?17, "
+    "minutes = ?18, expense = ?19, completed = ?20";
 constexpr char kDeleteSql[] = "DELETE FROM records WHERE uuid = ?1";
 
 #undef WT_STORE_COLUMNS
@@ -78,7 +84,8 @@ constexpr char kDeleteSql[] = "DELETE FROM records WHERE uuid = ?1";
 // and the running entries. They hold a handful of rows each and cost the saves of items nothing.
 int addTimerIndexes(sqlite3* db) {
   return sqlite3_exec(db,
-                      "CREATE INDEX records_owners ON records(entity) WHERE " WT_STORE_OWNERS ";"
+                      "CREATE INDEX records_owners ON records(entity) WHERE " WT_STORE_OWNERS
+                      ";"
                       "CREATE INDEX records_running ON records(uuid) WHERE " WT_STORE_RUNNING ";",
                       nullptr, nullptr, nullptr);
 }
@@ -344,12 +351,12 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path, Check check) {
-  if (!QFileInfo::exists(path))
-    return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
+  if (!QFileInfo::exists(path)) return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
   return open(path, nullptr, true, check);
 }
 
-Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly, Check check) {
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly,
+                                               Check check) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -427,6 +434,9 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   code = readText(db, "PRAGMA journal_mode = WAL", &mode);
   if (code == SQLITE_OK && mode != "wal") code = SQLITE_CANTOPEN;
   if (code == SQLITE_OK) code = sqlite3_exec(db, "PRAGMA synchronous = FULL", nullptr, nullptr, nullptr);
+  // A save touches pages all over the file (rows and the index of items by task): with the default 2 MB
+  // cache a large merge spills dirty pages to the log before it commits, and writes many twice.
+  if (code == SQLITE_OK) code = sqlite3_exec(db, "PRAGMA cache_size = -32768", nullptr, nullptr, nullptr);
   if (code != SQLITE_OK) {
     return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
   }
@@ -444,8 +454,12 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
 
 Result<void> WTStore::prepareStatements() {
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
-      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
-      {&replace_, kReplaceSql},     {&remove_, kDeleteSql}, {&selectAll_, kSelectAllSql},
+      {&begin_, "BEGIN IMMEDIATE"},
+      {&commit_, "COMMIT"},
+      {&rollback_, "ROLLBACK"},
+      {&replace_, kReplaceSql},
+      {&remove_, kDeleteSql},
+      {&selectAll_, kSelectAllSql},
       {&selectTimerRecords_, kSelectTimerRecordsSql},
   };
   for (const auto& [statement, sql] : statements) {
