@@ -59,14 +59,13 @@ constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
 // Each half is read through its own small index (version 2), so a large store's items are never visited.
 #define WT_STORE_OWNERS "entity IN ('WTClient', 'WTProject', 'WTTask')"
 #define WT_STORE_RUNNING "running <> 0"
-constexpr char kSelectTimerRecordsSql[] =
-    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
-    " FROM records WHERE " WT_STORE_RUNNING " AND NOT " WT_STORE_OWNERS;
+constexpr char kSelectTimerRecordsSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
+                                          " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_RUNNING
+                                          " AND NOT " WT_STORE_OWNERS;
 // The task uuids arrive as one JSON array, so a single prepared statement serves any number of them.
-constexpr char kSelectItemsOfTasksSql[] =
-    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
-    " FROM records WHERE taskUuid IN"
-    " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
+constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS
+                                          " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE taskUuid IN"
+                                          " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
 // A row that is there already is changed in place: replacing it would take it out of every index and put it
 // back, though a save mostly changes a name or a date and leaves the uuid and the task as they were.
 constexpr char kReplaceSql[] =
@@ -84,8 +83,7 @@ constexpr char kDeleteSql[] = "DELETE FROM records WHERE uuid = ?1";
 // and the running entries. They hold a handful of rows each and cost the saves of items nothing.
 int addTimerIndexes(sqlite3* db) {
   return sqlite3_exec(db,
-                      "CREATE INDEX records_owners ON records(entity) WHERE " WT_STORE_OWNERS
-                      ";"
+                      "CREATE INDEX records_owners ON records(entity) WHERE " WT_STORE_OWNERS ";"
                       "CREATE INDEX records_running ON records(uuid) WHERE " WT_STORE_RUNNING ";",
                       nullptr, nullptr, nullptr);
 }
@@ -351,12 +349,12 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path, Check check) {
-  if (!QFileInfo::exists(path)) return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
+  if (!QFileInfo::exists(path))
+    return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
   return open(path, nullptr, true, check);
 }
 
-Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly,
-                                               Check check) {
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly, Check check) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -454,12 +452,8 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
 
 Result<void> WTStore::prepareStatements() {
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
-      {&begin_, "BEGIN IMMEDIATE"},
-      {&commit_, "COMMIT"},
-      {&rollback_, "ROLLBACK"},
-      {&replace_, kReplaceSql},
-      {&remove_, kDeleteSql},
-      {&selectAll_, kSelectAllSql},
+      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
+      {&replace_, kReplaceSql},     {&remove_, kDeleteSql}, {&selectAll_, kSelectAllSql},
       {&selectTimerRecords_, kSelectTimerRecordsSql},
   };
   for (const auto& [statement, sql] : statements) {
