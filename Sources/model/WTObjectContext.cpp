@@ -338,8 +338,12 @@ Result<void> WTObjectContext::save() {
         return Error{2, tr("A %1 without identity cannot be saved.").arg(object->entityName())};
     }
   }
-  for (WTObject* object : written) object->willSave();
-  for (WTObject* object : deleted_) object->willSave();
+  // The journal that records nothing is not worth the changed values of every record (a merge saves
+  // thousands with it).
+  if (journal_ != &nullJournal_) {
+    for (WTObject* object : written) object->willSave();
+    for (WTObject* object : deleted_) object->willSave();
+  }
 
   // A project whose task order changed rewrites the positions of all its tasks.
   std::unordered_set<WTObject*> rows(written.begin(), written.end());

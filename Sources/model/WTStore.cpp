@@ -67,11 +67,12 @@ constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM reco
                                           " UNION ALL SELECT " WT_STORE_COLUMNS " FROM records WHERE taskUuid IN"
                                           " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
 // A row that is there already is changed in place: replacing it would take it out of every index and put it
-// back, though a save mostly changes a name or a date and leaves the uuid and the task as they were.
+// back, though a save mostly changes a name or a date and leaves the uuid and the task as they were. The
+// entity is part of the uuid and never changes.
 constexpr char kReplaceSql[] =
     "INSERT INTO records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
-    "?17, ?18, ?19, ?20) ON CONFLICT(uuid) DO UPDATE SET entity = ?2, name = ?3, notes = ?4, rate = ?5, "
+    "?17, ?18, ?19, ?20) ON CONFLICT(uuid) DO UPDATE SET name = ?3, notes = ?4, rate = ?5, "
     "color = ?6, archived = ?7, addressBookUID = ?8, totalsUID = ?9, clientUuid = ?10, projectUuid = ?11, "
     "position = ?12, budget = ?13, taskUuid = ?14, startDate = ?15, endDate = ?16, running = ?17, "
     "minutes = ?18, expense = ?19, completed = ?20";
