@@ -331,7 +331,7 @@ WTObject::WTObject(WTEntity entity, WTObjectContext* context)
 WTObject::~WTObject() = default;
 
 void WTObject::awakeFromInsert() {
-  assignNewIdentity();
+  if (uuid_.isEmpty()) assignNewIdentity();
 }
 
 void WTObject::assignNewIdentity() {

@@ -109,7 +109,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
  protected:
   WTObject(WTEntity entity, WTObjectContext* context);
 
-  // Life cycle: a brand-new record gets its identity here; subclasses add their initial values.
+  // Life cycle: a brand-new record gets its identity here (unless made under a known one); subclasses add
+  // their initial values.
   virtual void awakeFromInsert();
   virtual void awakeFromFetch() {}
 
