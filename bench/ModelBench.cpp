@@ -1,5 +1,6 @@
 // Opening a large store, saving one change and grouping a big task, against the floor of reading the
-// same rows with plain sqlite3.
+// same rows with plain sqlite3. Opening also checks the whole file (PRAGMA quick_check, about a third of
+// the plain read on 100,000 items), which the floor does not.
 #include "LargeStore.h"
 #include "RZDate.h"
 #include "WTItem.h"

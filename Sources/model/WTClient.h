@@ -32,18 +32,9 @@ class WTClient final : public WTObject {
   // Name of the list image: "admin_2_32", or "admin_2_32_dis" when archived.
   QString tableImage() const;
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
   // A rate announces the client's cost.
   void storedValueDidChange(const QString& key) override;
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
-  QList<WTObject*> relatedObjects(const QString& relationship) const override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   friend class WTProject;

@@ -14,16 +14,8 @@ class WTExpense final : public WTItem {
   Decimal cost() const override { return expense_.value_or(Decimal()); }
   Decimal costAtRate(const Decimal&) const override { return cost(); }
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
   void storedValueDidChange(const QString& key) override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   std::optional<Decimal> expense_;

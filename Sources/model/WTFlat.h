@@ -13,16 +13,8 @@ class WTFlat final : public WTItem {
   void setMinutes(const std::optional<qint64>& minutes);
   int duration() const override { return static_cast<int>(minutes_.value_or(0)); }
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
   void storedValueDidChange(const QString& key) override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   std::optional<qint64> minutes_;

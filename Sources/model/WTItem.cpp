@@ -70,74 +70,35 @@ void WTItem::relinkOwner(WTObject* owner, int) {
   if (task_) task_->items_.append(this);
 }
 
-QVariant WTItem::valueForKey(const QString& key) const {
-  // "startTime", "flatDateBegin" and "flatDateEnd" are what the time-entry export reads: an item is
-  // dated by its start (and a time entry ends at its end), and no item is billed as a flat charge.
-  if (key == QLatin1String("startDate") || key == QLatin1String("date") ||
-      key == QLatin1String("startTime") || key == QLatin1String("flatDateBegin")) {
-    return dateVariant(startDate_);
-  }
-  if (key == QLatin1String("flatDateEnd")) {
-    const QVariant end = valueForKey(QStringLiteral("endDate"));
-    return end.isNull() ? dateVariant(startDate_) : end;
-  }
-  if (key == QLatin1String("chargeFlat")) return false;
-  if (key == QLatin1String("task")) return task_ ? KeyPath::variantFromObject(task_) : QVariant();
-  if (key == QLatin1String("duration")) return duration();
-  if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
-  if (key == QLatin1String("rate")) {
-    const auto itemRate = rate();
-    return itemRate ? QVariant::fromValue(*itemRate) : QVariant();
-  }
-  if (key == QLatin1String("title")) return title();
-  return WTObject::valueForKey(key);
-}
-
-bool WTItem::setValue(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("task")) {
-    auto* task = dynamic_cast<WTTask*>(KeyPath::objectFromVariant(value));
-    if (!value.isNull() && !task) return false;
-    setTask(task);
-    return true;
-  }
-  if (key == QLatin1String("startDate") || key == QLatin1String("date")) {
-    bool ok = false;
-    const std::optional<Date> date = dateFromVariant(value, &ok);
-    if (!ok) return false;
-    if (key == QLatin1String("date")) {
-      setDate(date);
-    } else {
-      setStartDate(date);
-    }
-    return true;
-  }
-  return WTObject::setValue(key, value);
-}
-
-QStringList WTItem::storedKeys() const {
-  return WTObject::storedKeys() << QStringLiteral("startDate") << QStringLiteral("task");
-}
-
-QVariant WTItem::primitiveValue(const QString& key) const {
-  if (key == QLatin1String("startDate")) return dateVariant(startDate_);
-  return WTObject::primitiveValue(key);
-}
-
-bool WTItem::writePrimitive(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("startDate")) {
-    startDate_ = value.isNull() ? std::nullopt : std::optional<Date>(value.value<Date>());
-    return true;
-  }
-  return WTObject::writePrimitive(key, value);
-}
-
-void WTItem::readRecord(const WTStoreRecord& record) {
-  WTObject::readRecord(record);
-  startDate_ = record.startDate;
-}
-
-void WTItem::writeRecord(WTStoreRecord& record) const {
-  WTObject::writeRecord(record);
-  record.startDate = startDate_;
-  record.taskUuid = task_ ? task_->uuid() : QString();
+const WTKeyTable& WTItem::itemKeys() {
+  using namespace WTKeys;
+  static const WTKeyTable table(
+      &objectKeys(),
+      {
+          stored("startDate", &WTItem::startDate_, &WTStoreRecord::startDate),
+          toOne("task", &WTStoreRecord::taskUuid),
+          refine("rate", &read<&WTItem::rate>),
+          // Read and set as a date, but not stored: the sync takes a value for it as it comes.
+          derived("date", WTKeyType::Other, &read<&WTItem::startDate>, {},
+                  [](WTObject& object, const QVariant& value) {
+                    bool ok = false;
+                    const std::optional<Date> date = dateFromVariant(value, &ok);
+                    if (ok) static_cast<WTItem&>(object).setDate(date);
+                    return ok;
+                  }),
+          // What the time-entry export reads: an item is dated by its start (and a time entry ends at its
+          // end), and no item is billed as a flat charge.
+          derived("startTime", WTKeyType::Date, &read<&WTItem::startDate>),
+          derived("flatDateBegin", WTKeyType::Date, &read<&WTItem::startDate>),
+          derived("flatDateEnd", WTKeyType::Date,
+                  [](const WTObject& object) {
+                    const QVariant end = object.valueForKey(QStringLiteral("endDate"));
+                    return end.isNull() ? dateVariant(static_cast<const WTItem&>(object).startDate_) : end;
+                  }),
+          derived("chargeFlat", WTKeyType::Flag, [](const WTObject&) { return QVariant(false); }),
+          derived<&WTItem::duration>("duration"),
+          derived<&WTItem::cost>("cost", {"duration"}),
+          derived<&WTItem::title>("title"),
+      });
+  return table;
 }

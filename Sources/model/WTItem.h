@@ -35,20 +35,13 @@ class WTItem : public WTObject {
   std::optional<Decimal> rate() const;
   virtual QString title() const { return name(); }
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
   WTItem(WTEntity entity, WTObjectContext* context) : WTObject(entity, context) {}
+  // The keys every kind of item has.
+  static const WTKeyTable& itemKeys();
   void awakeFromInsert() override;
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
   WTObject* owner() const override;
-  QString ownerKey() const override { return QStringLiteral("task"); }
   void relinkOwner(WTObject* owner, int index) override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
   // rate x (minutes / 60), exactly.
   static Decimal timeCost(const Decimal& rate, int minutes);

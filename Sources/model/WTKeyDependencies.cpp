@@ -1,69 +1,10 @@
 #include "WTKeyDependencies.h"
 
+#include "WTObject.h"
+
 #include <QHash>
 
 namespace {
-
-struct Declaration {
-  const char* key;
-  std::vector<const char*> paths;
-};
-
-// The declared dependencies. The circular pairs (a project's rate and inherited rate, a time entry's
-// duration and end date) are intended: a change of either refreshes observers of both.
-const std::vector<Declaration>& declarations(WTEntity entity) {
-  static const std::vector<Declaration> client = {
-      {"duration", {"projects"}},
-      {"cost", {"projects"}},
-      {"inheritedRate", {"rate"}},
-      {"tableImage", {"archived"}},
-  };
-  static const std::vector<Declaration> project = {
-      {"duration", {"tasks"}},     {"cost", {"duration", "rate"}},
-      {"tasksArray", {"tasks"}},   {"rate", {"inheritedRate", "client", "client.rate"}},
-      {"inheritedRate", {"rate"}}, {"tableImage", {"archived"}},
-      {"running", {"tasks"}},
-  };
-  static const std::vector<Declaration> task = {
-      {"duration", {"items"}},           {"cost", {"rate", "items"}},  {"rate", {"project", "project.rate"}},
-      {"inheritedRate", {"rate"}},       {"times", {"items"}},         {"runningTimes", {"times"}},
-      {"runningDuration", {"duration"}}, {"buttonTitle", {"running"}}, {"timerButtonImage", {"running"}},
-      {"tableImage", {"running"}},       {"children", {"items"}},
-  };
-  static const std::vector<Declaration> time = {
-      {"cost", {"duration"}},
-      {"duration", {"startDate", "endDate"}},
-      {"endDate", {"duration"}},
-  };
-  static const std::vector<Declaration> flat = {
-      {"cost", {"duration"}},
-      {"duration", {"minutes"}},
-  };
-  static const std::vector<Declaration> expense = {
-      {"cost", {"duration", "expense"}},
-  };
-  static const std::vector<Declaration> item = {
-      {"cost", {"duration"}},
-  };
-  switch (entity) {
-    case WTEntity::Client:
-      return client;
-    case WTEntity::Project:
-      return project;
-    case WTEntity::Task:
-      return task;
-    case WTEntity::Time:
-      return time;
-    case WTEntity::Flat:
-      return flat;
-    case WTEntity::Expense:
-      return expense;
-    case WTEntity::Note:
-    case WTEntity::ToDo:
-      return item;
-  }
-  return item;
-}
 
 // The to-many side of each to-one relationship a path may run through.
 QString inverseOf(WTEntity entity, const QString& relationship) {
@@ -92,10 +33,9 @@ struct Tables {
   Tables() {
     for (WTEntity entity : WTEntities::kAll) {
       const int index = static_cast<int>(entity);
-      for (const Declaration& declaration : declarations(entity)) {
-        const QString key = QString::fromLatin1(declaration.key);
-        for (const char* rawPath : declaration.paths) {
-          const QString path = QString::fromLatin1(rawPath);
+      for (const WTKeyDescriptor& declaration : WTObject::keyTable(entity).keys()) {
+        const QString& key = declaration.name;
+        for (const QString& path : declaration.affectedBy) {
           const qsizetype dot = path.indexOf(u'.');
           if (dot < 0) {
             local[index][path].append(key);
@@ -122,14 +62,8 @@ const Tables& tables() {
 namespace WTKeyDependencies {
 
 QStringList keyPathsForValuesAffecting(WTEntity entity, const QString& key) {
-  for (const Declaration& declaration : declarations(entity)) {
-    if (key == QLatin1String(declaration.key)) {
-      QStringList paths;
-      for (const char* path : declaration.paths) paths.append(QString::fromLatin1(path));
-      return paths;
-    }
-  }
-  return {};
+  const WTKeyDescriptor* declaration = WTObject::keyTable(entity).find(key);
+  return declaration ? declaration->affectedBy : QStringList();
 }
 
 const QStringList& dependentKeys(WTEntity entity, const QString& key) {

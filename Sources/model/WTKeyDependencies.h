@@ -9,7 +9,9 @@
 
 // Which derived keys depend on which key paths, per entity. An announcement of a key also reaches
 // observers of every key that depends on it, in the same record or, for paths through a to-one
-// relationship ("project.rate"), in the records on the to-many side of it.
+// relationship ("project.rate"), in the records on the to-many side of it. The paths are declared with the
+// keys, in each entity's key table (WTKeyTable.h). The circular pairs (a project's rate and inherited rate,
+// a time entry's duration and end date) are intended: a change of either refreshes observers of both.
 namespace WTKeyDependencies {
 
 // The key paths `key` of `entity` depends on, as declared; empty when it depends on nothing.

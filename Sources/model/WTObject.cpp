@@ -3,10 +3,19 @@
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
+#include "WTExpense.h"
+#include "WTFlat.h"
+#include "WTNote.h"
 #include "WTObjectContext.h"
+#include "WTProject.h"
 #include "WTStoreRecord.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTToDo.h"
 
 #include <QUuid>
+
+#include <type_traits>
 
 namespace {
 
@@ -25,7 +34,283 @@ QVariant colorFromText(const QString& text) {
   return color;
 }
 
+// The entity a record of `entity` is filed under.
+WTEntity ownerEntity(WTEntity entity) {
+  switch (entity) {
+    case WTEntity::Client:
+    case WTEntity::Project:
+      return WTEntity::Client;
+    case WTEntity::Task:
+      return WTEntity::Project;
+    default:
+      return WTEntity::Task;
+  }
+}
+
+template <class>
+struct Pointee;
+template <class T, class C>
+struct Pointee<T C::*> {
+  using Type = T;
+};
+
+QVariant variantOf(const QString& text) {
+  return text.isNull() ? QVariant() : QVariant(text);
+}
+QVariant variantOf(bool flag) {
+  return flag;
+}
+QVariant variantOf(const std::optional<qint64>& number) {
+  return number ? QVariant(*number) : QVariant();
+}
+QVariant variantOf(const std::optional<Decimal>& number) {
+  return number ? QVariant::fromValue(*number) : QVariant();
+}
+QVariant variantOf(const std::optional<Date>& date) {
+  return dateVariant(date);
+}
+QVariant variantOf(const QVariant& color) {
+  return color;
+}
+
+void assign(QString& text, const QVariant& value) {
+  text = value.isNull() ? QString() : value.toString();
+}
+void assign(bool& flag, const QVariant& value) {
+  flag = value.toBool();
+}
+void assign(std::optional<qint64>& number, const QVariant& value) {
+  number = value.isNull() ? std::nullopt : std::optional<qint64>(value.toLongLong());
+}
+void assign(std::optional<Decimal>& number, const QVariant& value) {
+  number = Decimal::fromVariant(value);
+}
+void assign(std::optional<Date>& date, const QVariant& value) {
+  date = value.isNull() ? std::nullopt : std::optional<Date>(value.value<Date>());
+}
+void assign(QVariant& color, const QVariant& value) {
+  color = colorFromText(WTObject::colorText(value));
+}
+
 }  // namespace
+
+const WTKeyTable& WTObject::objectKeys() {
+  using namespace WTKeys;
+  static const WTKeyTable table(
+      nullptr, {
+                   stored("uuid", &WTObject::uuid_, &WTStoreRecord::uuid,
+                          [](WTObject& object, const QVariant& value) {
+                            if (!value.canConvert<QString>()) return false;
+                            object.setUuid(value.toString());
+                            return true;
+                          }),
+                   stored("name", &WTObject::name_, &WTStoreRecord::name),
+                   stored("notes", &WTObject::notes_, &WTStoreRecord::notes),
+                   stored("rate", &WTObject::rate_, &WTStoreRecord::rate,
+                          [](WTObject& object, const QVariant& value) {
+                            const std::optional<Decimal> rate = Decimal::fromVariant(value);
+                            if (!value.isNull() && !rate) return false;
+                            object.setRate(rate);
+                            return true;
+                          }),
+                   [] {
+                     WTKeyDescriptor color;
+                     color.name = QStringLiteral("color");
+                     color.type = WTKeyType::Color;
+                     color.stored = color.journaled = true;
+                     color.field = &WTObject::color_;
+                     color.column = &WTStoreRecord::color;
+                     color.set = [](WTObject& object, const QVariant& value) {
+                       const QMetaType type = guiColorType();
+                       if (!value.isNull() &&
+                           !(type.isValid() ? value.canConvert(type) : value.typeId() == QMetaType::QString))
+                         return false;
+                       object.setColor(value);
+                       return true;
+                     };
+                     return color;
+                   }(),
+                   stored("archived", &WTObject::archived_, &WTStoreRecord::archived),
+                   derived<&WTObject::inheritedRate>("inheritedRate"),
+                   derived<&WTObject::entityName>("entity"),
+                   derived<&WTObject::entityName>("entityName"),
+               });
+  return table;
+}
+
+const WTKeyTable& WTObject::keyTable(WTEntity entity) {
+  switch (entity) {
+    case WTEntity::Client:
+      return WTClient::keys();
+    case WTEntity::Project:
+      return WTProject::keys();
+    case WTEntity::Task:
+      return WTTask::keys();
+    case WTEntity::Time:
+      return WTTime::keys();
+    case WTEntity::Flat:
+      return WTFlat::keys();
+    case WTEntity::Expense:
+      return WTExpense::keys();
+    case WTEntity::Note:
+      return WTNote::keys();
+    case WTEntity::ToDo:
+      return WTToDo::keys();
+  }
+  return objectKeys();
+}
+
+QVariant WTObject::fieldValue(const WTKeyDescriptor& key) const {
+  return std::visit(
+      [this](auto field) -> QVariant {
+        if constexpr (std::is_same_v<decltype(field), std::monostate>) {
+          return {};
+        } else {
+          return variantOf(this->*field);
+        }
+      },
+      key.field);
+}
+
+void WTObject::writeField(const WTKeyDescriptor& key, const QVariant& value) {
+  std::visit(
+      [&](auto field) {
+        if constexpr (!std::is_same_v<decltype(field), std::monostate>) assign(this->*field, value);
+      },
+      key.field);
+}
+
+QVariant WTObject::primitiveValue(const QString& key) const {
+  const WTKeyDescriptor* descriptor = keys_->find(key);
+  return descriptor ? fieldValue(*descriptor) : QVariant();
+}
+
+bool WTObject::writePrimitive(const QString& key, const QVariant& value) {
+  const WTKeyDescriptor* descriptor = keys_->find(key);
+  if (!descriptor || descriptor->field.index() == 0) return false;
+  writeField(*descriptor, value);
+  return true;
+}
+
+void WTObject::storedValueDidChange(const QString&) {}
+
+QVariant WTObject::valueForKey(const QString& key) const {
+  const WTKeyDescriptor* descriptor = keys_->find(key);
+  if (!descriptor) return {};
+  if (descriptor->get) return descriptor->get(*this);
+  if (descriptor->type == WTKeyType::ToOne) {
+    WTObject* related = owner();
+    return related ? KeyPath::variantFromObject(related) : QVariant();
+  }
+  if (descriptor->members) {
+    QVariantList list;
+    for (WTObject* record : descriptor->members(*this)) list.append(KeyPath::variantFromObject(record));
+    return list;
+  }
+  return fieldValue(*descriptor);
+}
+
+bool WTObject::setValue(const QString& key, const QVariant& value) {
+  const WTKeyDescriptor* descriptor = keys_->find(key);
+  if (!descriptor) return false;
+  if (descriptor->set) return descriptor->set(*this, value);
+  return descriptor->stored && setByType(*descriptor, value);
+}
+
+// Each type converts as its typed setter takes it, so that a value set by key is stored the same way.
+bool WTObject::setByType(const WTKeyDescriptor& key, const QVariant& value) {
+  switch (key.type) {
+    case WTKeyType::Text:
+      setStoredValue(key, QVariant(value.isNull() ? QString() : value.toString()));
+      return true;
+    case WTKeyType::Flag:
+      setStoredValue(key, QVariant(value.toBool()));
+      return true;
+    case WTKeyType::Integer: {
+      if (value.isNull()) {
+        setStoredValue(key, QVariant());
+        return true;
+      }
+      bool ok = false;
+      const qint64 number = value.toLongLong(&ok);
+      if (!ok) return false;
+      setStoredValue(key, QVariant(number));
+      return true;
+    }
+    case WTKeyType::Decimal: {
+      const std::optional<Decimal> number = Decimal::fromVariant(value);
+      if (!value.isNull() && !number) return false;
+      setStoredValue(key, number ? QVariant::fromValue(*number) : QVariant());
+      return true;
+    }
+    case WTKeyType::Date: {
+      bool ok = false;
+      const std::optional<Date> date = dateFromVariant(value, &ok);
+      if (!ok) return false;
+      setStoredValue(key, dateVariant(date));
+      return true;
+    }
+    case WTKeyType::ToOne: {
+      auto* related = dynamic_cast<WTObject*>(KeyPath::objectFromVariant(value));
+      if (related && related->entity() != ownerEntity(entity_)) related = nullptr;
+      if (!value.isNull() && !related) return false;
+      changeOwner(related);
+      return true;
+    }
+    default:
+      return false;
+  }
+}
+
+void WTObject::readRecord(const WTStoreRecord& record) {
+  for (const WTKeyDescriptor& key : keys_->keys()) {
+    if (!key.stored) continue;
+    std::visit(
+        [&](auto field, auto column) {
+          using Field = decltype(field);
+          using Column = decltype(column);
+          if constexpr (std::is_same_v<Field, std::monostate> || std::is_same_v<Column, std::monostate>) {
+            return;
+          } else if constexpr (std::is_same_v<typename Pointee<Field>::Type, QVariant>) {
+            if constexpr (std::is_same_v<typename Pointee<Column>::Type, QString>)
+              this->*field = colorFromText(record.*column);
+          } else if constexpr (std::is_same_v<typename Pointee<Field>::Type,
+                                              typename Pointee<Column>::Type>) {
+            this->*field = record.*column;
+          }
+        },
+        key.field, key.column);
+  }
+}
+
+void WTObject::writeRecord(WTStoreRecord& record) const {
+  record.entity = entityName();
+  for (const WTKeyDescriptor& key : keys_->keys()) {
+    if (!key.stored) continue;
+    if (key.type == WTKeyType::ToOne) {
+      const WTObject* related = owner();
+      record.*std::get<QString WTStoreRecord::*>(key.column) = related ? related->uuid_ : QString();
+      continue;
+    }
+    std::visit(
+        [&](auto field, auto column) {
+          using Field = decltype(field);
+          using Column = decltype(column);
+          if constexpr (std::is_same_v<Field, std::monostate> || std::is_same_v<Column, std::monostate>) {
+            return;
+          } else if constexpr (std::is_same_v<typename Pointee<Field>::Type, QVariant>) {
+            if constexpr (std::is_same_v<typename Pointee<Column>::Type, QString>)
+              record.*column = colorText(this->*field);
+          } else if constexpr (std::is_same_v<typename Pointee<Field>::Type,
+                                              typename Pointee<Column>::Type>) {
+            record.*column = this->*field;
+          }
+        },
+        key.field, key.column);
+  }
+  // The place among the project's tasks.
+  if (entity_ == WTEntity::Task) record.position = indexInOwner();
+}
 
 QString WTObject::colorText(const QVariant& color) {
   if (color.isNull()) return {};
@@ -40,12 +325,13 @@ QString WTObject::colorText(const QVariant& color) {
   return name;
 }
 
-WTObject::WTObject(WTEntity entity, WTObjectContext* context) : context_(context), entity_(entity) {}
+WTObject::WTObject(WTEntity entity, WTObjectContext* context)
+    : context_(context), keys_(&keyTable(entity)), entity_(entity) {}
 
 WTObject::~WTObject() = default;
 
 void WTObject::awakeFromInsert() {
-  assignNewIdentity();
+  if (uuid_.isEmpty()) assignNewIdentity();
 }
 
 void WTObject::assignNewIdentity() {
@@ -82,49 +368,18 @@ Decimal WTObject::rateFromAbove() const {
   return WTClient::builtInRate();
 }
 
-QVariant WTObject::primitiveValue(const QString& key) const {
-  if (key == QLatin1String("uuid")) return uuid_;
-  if (key == QLatin1String("name")) return name_.isNull() ? QVariant() : QVariant(name_);
-  if (key == QLatin1String("notes")) return notes_.isNull() ? QVariant() : QVariant(notes_);
-  if (key == QLatin1String("rate")) return rate_ ? QVariant::fromValue(*rate_) : QVariant();
-  if (key == QLatin1String("color")) return color_;
-  if (key == QLatin1String("archived")) return archived_;
-  return {};
-}
-
-bool WTObject::writePrimitive(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("uuid")) {
-    uuid_ = value.toString();
-  } else if (key == QLatin1String("name")) {
-    name_ = value.isNull() ? QString() : value.toString();
-  } else if (key == QLatin1String("notes")) {
-    notes_ = value.isNull() ? QString() : value.toString();
-  } else if (key == QLatin1String("rate")) {
-    rate_ = Decimal::fromVariant(value);
-  } else if (key == QLatin1String("color")) {
-    color_ = colorFromText(colorText(value));
-  } else if (key == QLatin1String("archived")) {
-    archived_ = value.toBool();
-  } else {
-    return false;
-  }
-  return true;
-}
-
-void WTObject::storedValueDidChange(const QString&) {}
-
-QStringList WTObject::storedKeys() const {
-  return {QStringLiteral("uuid"), QStringLiteral("name"),  QStringLiteral("notes"),
-          QStringLiteral("rate"), QStringLiteral("color"), QStringLiteral("archived")};
-}
-
 void WTObject::setStoredValue(const QString& key, const QVariant& value) {
-  const QVariant old = primitiveValue(key);
+  if (const WTKeyDescriptor* descriptor = keys_->find(key)) setStoredValue(*descriptor, value);
+}
+
+void WTObject::setStoredValue(const WTKeyDescriptor& key, const QVariant& value) {
+  if (key.field.index() == 0) return;
+  const QVariant old = fieldValue(key);
   if (old == value && old.isNull() == value.isNull()) return;
-  if (!writePrimitive(key, value)) return;
-  context_->storedValueChanged(this, key, old);
-  storedValueDidChange(key);
-  announce(key);
+  writeField(key, value);
+  context_->storedValueChanged(this, key.name, old);
+  storedValueDidChange(key.name);
+  announce(key.name);
 }
 
 void WTObject::announce(const QString& key) const {
@@ -133,8 +388,9 @@ void WTObject::announce(const QString& key) const {
 
 void WTObject::relinkOwner(WTObject*, int) {}
 
-QList<WTObject*> WTObject::relatedObjects(const QString&) const {
-  return {};
+QList<WTObject*> WTObject::relatedObjects(const QString& relationship) const {
+  const WTKeyDescriptor* key = keys_->find(relationship);
+  return key && key->members ? key->members(*this) : QList<WTObject*>();
 }
 
 void WTObject::changeOwner(WTObject* newOwner, int index) {
@@ -144,40 +400,6 @@ void WTObject::changeOwner(WTObject* newOwner, int index) {
   relinkOwner(newOwner, index);
   if (oldOwner == newOwner && oldIndex == indexInOwner()) return;
   context_->ownerChanged(this, oldOwner, oldIndex);
-}
-
-QVariant WTObject::valueForKey(const QString& key) const {
-  if (key == QLatin1String("inheritedRate")) return QVariant::fromValue(inheritedRate());
-  if (key == QLatin1String("entity") || key == QLatin1String("entityName")) return entityName();
-  QVariant value = primitiveValue(key);
-  if (value.isValid()) return value;
-  if (WTObject* related = owner(); related && key == ownerKey()) return KeyPath::variantFromObject(related);
-  return {};
-}
-
-bool WTObject::setValue(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("uuid")) {
-    if (!value.canConvert<QString>()) return false;
-    setUuid(value.toString());
-  } else if (key == QLatin1String("name")) {
-    setName(value.isNull() ? QString() : value.toString());
-  } else if (key == QLatin1String("notes")) {
-    setNotes(value.isNull() ? QString() : value.toString());
-  } else if (key == QLatin1String("rate")) {
-    const std::optional<Decimal> rate = Decimal::fromVariant(value);
-    if (!value.isNull() && !rate) return false;
-    setRate(rate);
-  } else if (key == QLatin1String("color")) {
-    const QMetaType type = guiColorType();
-    if (!value.isNull() && !(type.isValid() ? value.canConvert(type) : value.typeId() == QMetaType::QString))
-      return false;
-    setColor(value);
-  } else if (key == QLatin1String("archived")) {
-    setArchived(value.toBool());
-  } else {
-    return false;
-  }
-  return true;
 }
 
 bool WTObject::isInserted() const {
@@ -192,30 +414,33 @@ bool WTObject::isDeleted() const {
 
 QVariantMap WTObject::changedValues() const {
   QVariantMap values;
-  auto add = [&](const QString& key) {
-    if (key == ownerKey()) {
-      WTObject* related = owner();
-      values.insert(key, related ? KeyPath::variantFromObject(related) : QVariant());
-      return;
+  auto add = [&](const QString& name) {
+    const WTKeyDescriptor* key = keys_->find(name);
+    if (!key) return;
+    switch (key->type) {
+      case WTKeyType::ToOne: {
+        WTObject* related = owner();
+        values.insert(name, related ? KeyPath::variantFromObject(related) : QVariant());
+        return;
+      }
+      case WTKeyType::Ordered:
+        values.insert(name, QVariant::fromValue(WTOrderedRelationship{key->members(*this)}));
+        return;
+      case WTKeyType::Unordered:
+        values.insert(name, QVariant::fromValue(WTUnorderedRelationship{key->members(*this)}));
+        return;
+      default:
+        values.insert(name, fieldValue(*key));
     }
-    for (const QString& relationship :
-         {QStringLiteral("projects"), QStringLiteral("tasks"), QStringLiteral("items")}) {
-      if (key != relationship) continue;
-      const QList<WTObject*> related = relatedObjects(relationship);
-      values.insert(key, isOrderedRelationship(relationship)
-                             ? QVariant::fromValue(WTOrderedRelationship{related})
-                             : QVariant::fromValue(WTUnorderedRelationship{related}));
-      return;
-    }
-    values.insert(key, primitiveValue(key));
   };
   if (isInserted()) {
     // A new record reports every value it has; unset ones stay out.
-    for (const QString& key : storedKeys()) {
-      if (key == ownerKey() ? owner() != nullptr : !primitiveValue(key).isNull()) add(key);
+    for (const WTKeyDescriptor& key : keys_->keys()) {
+      if (!key.stored) continue;
+      if (key.type == WTKeyType::ToOne ? owner() != nullptr : !fieldValue(key).isNull()) add(key.name);
     }
     for (const QString& key : changedKeys_) {
-      if (!values.contains(key) && !storedKeys().contains(key)) add(key);
+      if (!values.contains(key) && !keys_->storedKeys().contains(key)) add(key);
     }
     return values;
   }
@@ -233,25 +458,6 @@ void WTObject::willSave() {
     return;
   }
   if (isDeleted()) journal->deleteObjectWithId(uuid_);
-}
-
-void WTObject::readRecord(const WTStoreRecord& record) {
-  uuid_ = record.uuid;
-  name_ = record.name;
-  notes_ = record.notes;
-  rate_ = record.rate;
-  color_ = colorFromText(record.color);
-  archived_ = record.archived;
-}
-
-void WTObject::writeRecord(WTStoreRecord& record) const {
-  record.uuid = uuid_;
-  record.entity = entityName();
-  record.name = name_;
-  record.notes = notes_;
-  record.rate = rate_;
-  record.color = colorText(color_);
-  record.archived = archived_;
 }
 
 std::optional<Decimal> WTObject::userDefaultRate() const {

@@ -3,6 +3,7 @@
 #include "Decimal.h"
 #include "KeyPath.h"
 #include "WTEntity.h"
+#include "WTKeyTable.h"
 
 #include <QList>
 #include <QMetaType>
@@ -81,12 +82,13 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   // of its kind); the base answers a client's built-in rate.
   virtual Decimal rateFromAbove() const;
 
-  // Key-value access by the stored and derived key names the lists, reports and sync use.
+  // Key-value access by the stored and derived key names the lists, reports and sync use, as the entity's
+  // key table declares them.
   QVariant valueForKey(const QString& key) const override;
   // Sets a writable key through the same setter a caller would use (so the same announcements follow).
   // Relationships take a record (variantFromObject) or null. Returns false for unknown or derived keys
   // and for values of the wrong kind; nothing changes then.
-  virtual bool setValue(const QString& key, const QVariant& value);
+  bool setValue(const QString& key, const QVariant& value);
 
   // Save bookkeeping, as the journal sees it.
   bool isInserted() const;
@@ -99,18 +101,22 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   void willSave();
 
   // The stored keys of this entity (attributes and to-one relationships, not to-many sides).
-  virtual QStringList storedKeys() const;
+  QStringList storedKeys() const { return keys_->storedKeys(); }
+  // The keys of this record's entity, and of any entity.
+  const WTKeyTable& keyTable() const { return *keys_; }
+  static const WTKeyTable& keyTable(WTEntity entity);
 
  protected:
   WTObject(WTEntity entity, WTObjectContext* context);
 
-  // Life cycle: a brand-new record gets its identity here; subclasses add their initial values.
+  // Life cycle: a brand-new record gets its identity here (unless made under a known one); subclasses add
+  // their initial values.
   virtual void awakeFromInsert();
   virtual void awakeFromFetch() {}
 
   // Reads and writes stored attributes by key without any bookkeeping; false for keys it does not keep.
-  virtual QVariant primitiveValue(const QString& key) const;
-  virtual bool writePrimitive(const QString& key, const QVariant& value);
+  QVariant primitiveValue(const QString& key) const;
+  bool writePrimitive(const QString& key, const QVariant& value);
   // Runs after a stored attribute changed (also during undo and redo): the place for upward
   // announcements that must follow the value wherever the change came from.
   virtual void storedValueDidChange(const QString& key);
@@ -122,26 +128,36 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
 
   // The to-one owner (client, project or task) and its relink; none for clients.
   virtual WTObject* owner() const { return nullptr; }
-  virtual QString ownerKey() const { return {}; }
+  QString ownerKey() const {
+    const WTKeyDescriptor* key = keys_->ownerKey();
+    return key ? key->name : QString();
+  }
   virtual void relinkOwner(WTObject* owner, int index);
   // The place among the owner's ordered children; -1 where the owner keeps no order.
   virtual int indexInOwner() const { return -1; }
   // The records of a to-many relationship this entity holds, for announcements and the journal.
-  virtual QList<WTObject*> relatedObjects(const QString& relationship) const;
-  virtual bool isOrderedRelationship(const QString&) const { return false; }
+  QList<WTObject*> relatedObjects(const QString& relationship) const;
 
   // "WTDefaultRate" from the user's settings, when set to a number.
   std::optional<Decimal> userDefaultRate() const;
 
-  // Store row mapping.
-  virtual void readRecord(const WTStoreRecord& record);
-  virtual void writeRecord(WTStoreRecord& record) const;
+  // Store row mapping, by the stored keys' columns.
+  void readRecord(const WTStoreRecord& record);
+  void writeRecord(WTStoreRecord& record) const;
 
   // Moves this record under `owner` (or out, with null) keeping both sides of the relationship and the
   // undo step; `index` is the place among the owner's ordered children (-1: at the end).
   void changeOwner(WTObject* owner, int index = -1);
 
  private:
+  // The generic paths by a key's declaration.
+  QVariant fieldValue(const WTKeyDescriptor& key) const;
+  void writeField(const WTKeyDescriptor& key, const QVariant& value);
+  bool setByType(const WTKeyDescriptor& key, const QVariant& value);
+  void setStoredValue(const WTKeyDescriptor& key, const QVariant& value);
+  // The keys every record has.
+  static const WTKeyTable& objectKeys();
+
   friend class WTObjectContext;
   friend class WTClient;
   friend class WTProject;
@@ -149,6 +165,7 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   friend class WTItem;
 
   WTObjectContext* context_;
+  const WTKeyTable* keys_;
   QString uuid_;
   QString name_;
   QString notes_;
@@ -174,7 +191,9 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   static QList<Class*> fetchByPredicate(const std::function<bool(const Class*)>& predicate = {}, \
                                         WTObjectContext* context = nullptr);                     \
   /* The record of that identity in the default context, or none; never creates one. */          \
-  static Class* objectWithUUID(const QString& uuid, WTObjectContext* context = nullptr);
+  static Class* objectWithUUID(const QString& uuid, WTObjectContext* context = nullptr);         \
+  /* The keys of this entity, declared once in its source file. */                               \
+  static const WTKeyTable& keys();
 
 #define WT_ENTITY_CLASS_IMPL(Class)                                                              \
   Class* Class::insertNewObject(WTObjectContext* context) {                                      \

@@ -151,7 +151,12 @@ void WTObjectContext::unregisterObject(WTObject* object) {
 }
 
 WTObject* WTObjectContext::insertNewObject(WTEntity entity) {
+  return insertNewObject(entity, QString());
+}
+
+WTObject* WTObjectContext::insertNewObject(WTEntity entity, const QString& identity) {
   WTObject* object = makeObject(entity);
+  object->uuid_ = identity;
   registerObject(object, true);
   inserted_.insert(object);
   turnInserted_.append(object);
@@ -228,9 +233,8 @@ WTObject* WTObjectContext::objectWithUUID(const QVariant& uuid, bool forceInsert
   if (found || !forceInsert) return found;
   const std::optional<WTEntity> entity = WTEntities::fromName(entityName);
   if (!entity) return nullptr;  // an abstract entity cannot be made
-  WTObject* object = insertNewObject(*entity);
-  object->setUuid(identity);
-  return object;
+  // Made under its identity at once: a random one first would be made, indexed and replaced for nothing.
+  return insertNewObject(*entity, identity);
 }
 
 void WTObjectContext::uuidChanged(WTObject* object, const QString& oldUuid) {
@@ -338,8 +342,12 @@ Result<void> WTObjectContext::save() {
         return Error{2, tr("A %1 without identity cannot be saved.").arg(object->entityName())};
     }
   }
-  for (WTObject* object : written) object->willSave();
-  for (WTObject* object : deleted_) object->willSave();
+  // The journal that records nothing is not worth the changed values of every record (a merge saves
+  // thousands with it).
+  if (journal_ != &nullJournal_) {
+    for (WTObject* object : written) object->willSave();
+    for (WTObject* object : deleted_) object->willSave();
+  }
 
   // A project whose task order changed rewrites the positions of all its tasks.
   std::unordered_set<WTObject*> rows(written.begin(), written.end());

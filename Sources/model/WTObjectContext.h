@@ -126,6 +126,8 @@ class WTObjectContext : public QObject {
   friend class WTObject;
 
   WTObject* makeObject(WTEntity entity);
+  // A new record under `identity`, or under a new one of its own when that is empty.
+  WTObject* insertNewObject(WTEntity entity, const QString& identity);
   void registerObject(WTObject* object, bool adoptOwnership);
   void unregisterObject(WTObject* object);
   void reinsertObject(WTObject* object);

@@ -9,6 +9,32 @@
 
 WT_ENTITY_CLASS_IMPL(WTProject)
 
+const WTKeyTable& WTProject::keys() {
+  using namespace WTKeys;
+  static const WTKeyTable table(
+      &objectKeys(), {
+                         toOne("client", &WTStoreRecord::clientUuid),
+                         refine("rate", nullptr, nullptr, {"inheritedRate", "client", "client.rate"}),
+                         refine("inheritedRate", nullptr, nullptr, {"rate"}),
+                         toMany("tasks", WTKeyType::Ordered, &records<&WTProject::tasks>,
+                                [](WTObject& object, const QVariant& value) {
+                                  // An ordered list of tasks: each is filed here at its place.
+                                  int index = 0;
+                                  for (const QVariant& element : value.toList()) {
+                                    auto* task = dynamic_cast<WTTask*>(KeyPath::objectFromVariant(element));
+                                    if (task) task->setProject(static_cast<WTProject*>(&object), index++);
+                                  }
+                                  return value.canConvert<QVariantList>();
+                                }),
+                         derived<&WTProject::duration>("duration", {"tasks"}),
+                         derived<&WTProject::cost>("cost", {"duration", "rate"}),
+                         derived<&WTProject::tasksArray>("tasksArray", {"tasks"}),
+                         derived<&WTProject::tableImage>("tableImage", {"archived"}),
+                         derived<&WTProject::running>("running", {"tasks"}),
+                     });
+  return table;
+}
+
 void WTProject::setClient(WTClient* client) {
   changeOwner(client);
 }
@@ -86,59 +112,4 @@ void WTProject::runningDidChange() {
 
 QString WTProject::tableImage() const {
   return archived() ? QStringLiteral("folder_32_dis") : QStringLiteral("folder_32");
-}
-
-QVariant WTProject::valueForKey(const QString& key) const {
-  if (key == QLatin1String("tasks") || key == QLatin1String("tasksArray")) {
-    QVariantList list;
-    for (WTTask* task : tasks_) list.append(KeyPath::variantFromObject(task));
-    return list;
-  }
-  if (key == QLatin1String("client")) return client_ ? KeyPath::variantFromObject(client_) : QVariant();
-  if (key == QLatin1String("duration")) return duration();
-  if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
-  if (key == QLatin1String("tableImage")) return tableImage();
-  if (key == QLatin1String("running")) return running();
-  return WTObject::valueForKey(key);
-}
-
-bool WTProject::setValue(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("client")) {
-    auto* client = dynamic_cast<WTClient*>(KeyPath::objectFromVariant(value));
-    if (!value.isNull() && !client) return false;
-    setClient(client);
-    return true;
-  }
-  if (key == QLatin1String("tasks")) {
-    // An ordered list of tasks: each is filed here at its place.
-    int index = 0;
-    for (const QVariant& element : value.toList()) {
-      auto* task = dynamic_cast<WTTask*>(KeyPath::objectFromVariant(element));
-      if (task) task->setProject(this, index++);
-    }
-    return value.canConvert<QVariantList>();
-  }
-  return WTObject::setValue(key, value);
-}
-
-QStringList WTProject::storedKeys() const {
-  return WTObject::storedKeys() << QStringLiteral("client");
-}
-
-QList<WTObject*> WTProject::relatedObjects(const QString& relationship) const {
-  if (relationship != QLatin1String("tasks")) return {};
-  return QList<WTObject*>(tasks_.begin(), tasks_.end());
-}
-
-bool WTProject::isOrderedRelationship(const QString& relationship) const {
-  return relationship == QLatin1String("tasks");
-}
-
-void WTProject::readRecord(const WTStoreRecord& record) {
-  WTObject::readRecord(record);
-}
-
-void WTProject::writeRecord(WTStoreRecord& record) const {
-  WTObject::writeRecord(record);
-  record.clientUuid = client_ ? client_->uuid() : QString();
 }

@@ -42,20 +42,11 @@ class WTProject final : public WTObject {
   // "folder_32", or "folder_32_dis" when archived.
   QString tableImage() const;
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
   // A rate tells the client its cost changed.
   void storedValueDidChange(const QString& key) override;
   WTObject* owner() const override;
-  QString ownerKey() const override { return QStringLiteral("client"); }
   void relinkOwner(WTObject* owner, int index) override;
-  QList<WTObject*> relatedObjects(const QString& relationship) const override;
-  bool isOrderedRelationship(const QString& relationship) const override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   friend class WTTask;

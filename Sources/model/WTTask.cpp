@@ -19,6 +19,65 @@ WT_ENTITY_CLASS_IMPL(WTTask)
 
 WTTask::~WTTask() = default;
 
+namespace {
+
+QVariant groupsVariant(const WTItemContainerList& list) {
+  QVariantList result;
+  result.reserve(qsizetype(list.size()));
+  for (const auto& group : list) result.append(KeyPath::variantFromObject(group.get()));
+  return result;
+}
+
+}  // namespace
+
+const WTKeyTable& WTTask::keys() {
+  using namespace WTKeys;
+  static const WTKeyTable table(
+      &objectKeys(),
+      {
+          stored("budget", &WTTask::budget_, &WTStoreRecord::budget),
+          toOne("project", &WTStoreRecord::projectUuid),
+          refine("rate", nullptr, nullptr, {"project", "project.rate"}),
+          refine("inheritedRate", nullptr, nullptr, {"rate"}),
+          toMany("items", WTKeyType::Unordered, &records<&WTTask::items>),
+          derived<&WTTask::duration>("duration", {"items"}),
+          derived<&WTTask::cost>("cost", {"rate", "items"}),
+          derived<&WTTask::times>("times", {"items"}),
+          derived<&WTTask::runningTimes>("runningTimes", {"times"}),
+          derived<&WTTask::runningDuration>("runningDuration", {"duration"}),
+          derived<&WTTask::running>("running"),
+          derived<&WTTask::maxTimeEndDate>("maxTimeEndDate"),
+          derived<&WTTask::pendingToDos>("pendingToDos"),
+          derived<&WTTask::valuableItems>("valuableItems"),
+          derived<&WTTask::firstItemDate>("firstItemDate"),
+          derived<&WTTask::lastItemDate>("lastItemDate"),
+          derived<&WTTask::itemsWithoutPendingToDos>("itemsWithoutPendingToDos"),
+          // Groups are made afresh on each read; the task keeps the last list of each key alive so the
+          // records handed out stay valid while a template walks them.
+          derived("dailyItems", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    const auto& task = static_cast<const WTTask&>(object);
+                    return groupsVariant(task.keyedGroups_[0] = task.dailyItems());
+                  }),
+          derived("monthlyItems", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    const auto& task = static_cast<const WTTask&>(object);
+                    return groupsVariant(task.keyedGroups_[1] = task.monthlyItems());
+                  }),
+          derived("children", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    return groupsVariant(const_cast<WTTask&>(static_cast<const WTTask&>(object)).children());
+                  },
+                  {"items"}),
+          derived<&WTTask::buttonTitle>("buttonTitle", {"running"}),
+          derived<&WTTask::timerButtonImage>("timerButtonImage", {"running"}),
+          derived<&WTTask::tableImage>("tableImage", {"running"}),
+          // The time-entry export reads a task's "title": it is the task's name.
+          derived<&WTObject::name>("title"),
+      });
+  return table;
+}
+
 void WTTask::setProject(WTProject* project, int index) {
   changeOwner(project, index);
 }
@@ -321,99 +380,4 @@ QString WTTask::timerButtonImage() const {
 QString WTTask::buttonTitle() const {
   return running() ? QCoreApplication::translate("WTTask", "Stop")
                    : QCoreApplication::translate("WTTask", "Start");
-}
-
-QVariant WTTask::valueForKey(const QString& key) const {
-  auto records = [](const auto& list) {
-    QVariantList result;
-    result.reserve(list.size());
-    for (auto* object : list) result.append(KeyPath::variantFromObject(object));
-    return result;
-  };
-  auto groups = [](const WTItemContainerList& list) {
-    QVariantList result;
-    result.reserve(qsizetype(list.size()));
-    for (const auto& group : list) result.append(KeyPath::variantFromObject(group.get()));
-    return result;
-  };
-  if (key == QLatin1String("items")) return records(items_);
-  if (key == QLatin1String("project")) return project_ ? KeyPath::variantFromObject(project_) : QVariant();
-  if (key == QLatin1String("duration")) return duration();
-  if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
-  if (key == QLatin1String("times")) return records(times());
-  if (key == QLatin1String("runningTimes")) return records(runningTimes());
-  if (key == QLatin1String("runningDuration")) return runningDuration();
-  if (key == QLatin1String("running")) return running();
-  if (key == QLatin1String("maxTimeEndDate")) {
-    const auto date = maxTimeEndDate();
-    return date ? QVariant::fromValue(*date) : QVariant();
-  }
-  if (key == QLatin1String("pendingToDos")) return records(pendingToDos());
-  if (key == QLatin1String("valuableItems")) return records(valuableItems());
-  if (key == QLatin1String("firstItemDate") || key == QLatin1String("lastItemDate")) {
-    const std::optional<Date> date = key.at(0) == u'f' ? firstItemDate() : lastItemDate();
-    return date ? QVariant::fromValue(*date) : QVariant();
-  }
-  if (key == QLatin1String("itemsWithoutPendingToDos")) return records(itemsWithoutPendingToDos());
-  // Groups are made afresh on each read; the task keeps the last list of each key alive so the records
-  // handed out stay valid while a template walks them.
-  if (key == QLatin1String("dailyItems")) return groups(keyedGroups_[0] = dailyItems());
-  if (key == QLatin1String("monthlyItems")) return groups(keyedGroups_[1] = monthlyItems());
-  if (key == QLatin1String("children")) return groups(const_cast<WTTask*>(this)->children());
-  if (key == QLatin1String("tableImage")) return tableImage();
-  if (key == QLatin1String("timerButtonImage")) return timerButtonImage();
-  if (key == QLatin1String("buttonTitle")) return buttonTitle();
-  // The time-entry export reads a task's "title": it is the task's name.
-  if (key == QLatin1String("title")) return name();
-  return WTObject::valueForKey(key);
-}
-
-bool WTTask::setValue(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("project")) {
-    auto* project = dynamic_cast<WTProject*>(KeyPath::objectFromVariant(value));
-    if (!value.isNull() && !project) return false;
-    setProject(project);
-    return true;
-  }
-  if (key == QLatin1String("budget")) {
-    const std::optional<Decimal> budget = Decimal::fromVariant(value);
-    if (!value.isNull() && !budget) return false;
-    setBudget(budget);
-    return true;
-  }
-  return WTObject::setValue(key, value);
-}
-
-QStringList WTTask::storedKeys() const {
-  return WTObject::storedKeys() << QStringLiteral("budget") << QStringLiteral("project");
-}
-
-QVariant WTTask::primitiveValue(const QString& key) const {
-  if (key == QLatin1String("budget")) return budget_ ? QVariant::fromValue(*budget_) : QVariant();
-  return WTObject::primitiveValue(key);
-}
-
-bool WTTask::writePrimitive(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("budget")) {
-    budget_ = Decimal::fromVariant(value);
-    return true;
-  }
-  return WTObject::writePrimitive(key, value);
-}
-
-QList<WTObject*> WTTask::relatedObjects(const QString& relationship) const {
-  if (relationship != QLatin1String("items")) return {};
-  return QList<WTObject*>(items_.begin(), items_.end());
-}
-
-void WTTask::readRecord(const WTStoreRecord& record) {
-  WTObject::readRecord(record);
-  budget_ = record.budget;
-}
-
-void WTTask::writeRecord(WTStoreRecord& record) const {
-  WTObject::writeRecord(record);
-  record.budget = budget_;
-  record.projectUuid = project_ ? project_->uuid() : QString();
-  record.position = static_cast<int>(indexInOwner());
 }

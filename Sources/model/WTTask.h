@@ -104,22 +104,12 @@ class WTTask final : public WTObject {
   // "Stop" while running, else "Start" (translated).
   QString buttonTitle() const;
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
   // A rate tells the project its cost changed.
   void storedValueDidChange(const QString& key) override;
   WTObject* owner() const override;
-  QString ownerKey() const override { return QStringLiteral("project"); }
   void relinkOwner(WTObject* owner, int index) override;
   int indexInOwner() const override;
-  QList<WTObject*> relatedObjects(const QString& relationship) const override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   friend class WTItem;

@@ -12,6 +12,34 @@
 
 WT_ENTITY_CLASS_IMPL(WTTime)
 
+const WTKeyTable& WTTime::keys() {
+  using namespace WTKeys;
+  static const WTKeyTable table(
+      &itemKeys(), {
+                       stored("endDate", &WTTime::endDate_, &WTStoreRecord::endDate, nullptr, {"duration"}),
+                       stored("running", &WTTime::running_, &WTStoreRecord::running,
+                              [](WTObject& object, const QVariant& value) {
+                                static_cast<WTTime&>(object).setRunning(value.toBool());
+                                return true;
+                              }),
+                       derived("lastDuration", WTKeyType::Integer,
+                               [](const WTObject& object) {
+                                 const std::optional<int> minutes =
+                                     static_cast<const WTTime&>(object).lastDuration_;
+                                 return minutes ? QVariant(*minutes) : QVariant();
+                               }),
+                       refine("duration", nullptr,
+                              [](WTObject& object, const QVariant& value) {
+                                bool ok = false;
+                                const int minutes = value.toInt(&ok);
+                                if (ok) static_cast<WTTime&>(object).setDuration(minutes);
+                                return ok;
+                              },
+                              {"startDate", "endDate"}),
+                   });
+  return table;
+}
+
 void WTTime::awakeFromInsert() {
   WTItem::awakeFromInsert();
   setEndDate(startDate());
@@ -96,67 +124,4 @@ bool WTTime::peek() {
   }
   lastDuration_ = minutes;
   return changed;
-}
-
-QVariant WTTime::valueForKey(const QString& key) const {
-  if (key == QLatin1String("endDate")) return dateVariant(endDate_);
-  if (key == QLatin1String("running")) return running_;
-  if (key == QLatin1String("lastDuration")) return lastDuration_ ? QVariant(*lastDuration_) : QVariant();
-  return WTItem::valueForKey(key);
-}
-
-bool WTTime::setValue(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("endDate")) {
-    bool ok = false;
-    const std::optional<Date> date = dateFromVariant(value, &ok);
-    if (!ok) return false;
-    setEndDate(date);
-    return true;
-  }
-  if (key == QLatin1String("running")) {
-    setRunning(value.toBool());
-    return true;
-  }
-  if (key == QLatin1String("duration")) {
-    bool ok = false;
-    const int minutes = value.toInt(&ok);
-    if (!ok) return false;
-    setDuration(minutes);
-    return true;
-  }
-  return WTItem::setValue(key, value);
-}
-
-QStringList WTTime::storedKeys() const {
-  return WTItem::storedKeys() << QStringLiteral("endDate") << QStringLiteral("running");
-}
-
-QVariant WTTime::primitiveValue(const QString& key) const {
-  if (key == QLatin1String("endDate")) return dateVariant(endDate_);
-  if (key == QLatin1String("running")) return running_;
-  return WTItem::primitiveValue(key);
-}
-
-bool WTTime::writePrimitive(const QString& key, const QVariant& value) {
-  if (key == QLatin1String("endDate")) {
-    endDate_ = value.isNull() ? std::nullopt : std::optional<Date>(value.value<Date>());
-    return true;
-  }
-  if (key == QLatin1String("running")) {
-    running_ = value.toBool();
-    return true;
-  }
-  return WTItem::writePrimitive(key, value);
-}
-
-void WTTime::readRecord(const WTStoreRecord& record) {
-  WTItem::readRecord(record);
-  endDate_ = record.endDate;
-  running_ = record.running;
-}
-
-void WTTime::writeRecord(WTStoreRecord& record) const {
-  WTItem::writeRecord(record);
-  record.endDate = endDate_;
-  record.running = running_;
 }

@@ -32,17 +32,9 @@ class WTTime final : public WTItem {
   bool peek();
   std::optional<int> lastDuration() const { return lastDuration_; }
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
  protected:
   void awakeFromInsert() override;
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
   void storedValueDidChange(const QString& key) override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
 
  private:
   std::optional<Date> endDate_;

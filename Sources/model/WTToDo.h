@@ -15,16 +15,6 @@ class WTToDo final : public WTItem {
   // opened again keeps that date. Saying what already holds changes nothing.
   void markCompleted(bool completed);
 
-  QVariant valueForKey(const QString& key) const override;
-  bool setValue(const QString& key, const QVariant& value) override;
-  QStringList storedKeys() const override;
-
- protected:
-  QVariant primitiveValue(const QString& key) const override;
-  bool writePrimitive(const QString& key, const QVariant& value) override;
-  void readRecord(const WTStoreRecord& record) override;
-  void writeRecord(WTStoreRecord& record) const override;
-
  private:
   bool completed_ = false;
 };

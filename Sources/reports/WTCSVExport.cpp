@@ -29,13 +29,15 @@ QString text(const QVariant& value) {
   return value.toString();
 }
 
-QString quotedLine(const QStringList& fields) {
-  QString line;
+// Appends to `out` in place: a year's report is tens of thousands of lines.
+void appendQuotedLine(QString& out, const QStringList& fields) {
   for (qsizetype i = 0; i < fields.size(); ++i) {
-    if (i) line += QLatin1Char(',');
-    line += QLatin1Char('"') + escapedString(fields[i]) + QLatin1Char('"');
+    if (i) out += QLatin1Char(',');
+    out += QLatin1Char('"');
+    out += escapedString(fields[i]);
+    out += QLatin1Char('"');
   }
-  return line + QLatin1Char('\n');
+  out += QLatin1Char('\n');
 }
 
 QString money(const QVariant& value) {
@@ -70,19 +72,21 @@ QString reportCSV(const QList<WTProject*>& projects, int mode) {
   for (const WTProject* project : projects) {
     for (WTTask* task : project->tasks()) {
       if (mode == 0) {
-        out += quotedLine({project->name(), task->name(), DurationText::stringWithMinutes(task->duration()),
-                           MoneyFormat::format(task->cost())});
+        appendQuotedLine(out,
+                         {project->name(), task->name(), DurationText::stringWithMinutes(task->duration()),
+                          MoneyFormat::format(task->cost())});
       }
       const QVariant items = generator.filteredItemsForTask(task, mode);
       for (const QVariant& entry : items.toList()) {
         const QVariant date = KeyPath::valueForKeyPath(entry, u"date");
         bool ok = false;
         const std::optional<Date> day = dateFromVariant(date, &ok);
-        out += quotedLine({text(KeyPath::valueForKeyPath(entry, u"task.project.name")),
-                           text(KeyPath::valueForKeyPath(entry, u"task.name")),
-                           day && !pattern.isEmpty() ? RZDate::stringWithPattern(*day, pattern) : QString(),
-                           minutes(KeyPath::valueForKeyPath(entry, u"duration")),
-                           money(KeyPath::valueForKeyPath(entry, u"cost"))});
+        appendQuotedLine(out,
+                         {text(KeyPath::valueForKeyPath(entry, u"task.project.name")),
+                          text(KeyPath::valueForKeyPath(entry, u"task.name")),
+                          day && !pattern.isEmpty() ? RZDate::stringWithPattern(*day, pattern) : QString(),
+                          minutes(KeyPath::valueForKeyPath(entry, u"duration")),
+                          money(KeyPath::valueForKeyPath(entry, u"cost"))});
       }
     }
   }
@@ -124,10 +128,10 @@ QString timesCSV(QList<WTTime*> times) {
     const WTTime* time = entry.time;
     const WTTask* task = time->task();
     const WTProject* project = task ? task->project() : nullptr;
-    out += quotedLine({project ? project->name() : QString(), task ? task->name() : QString(),
-                       task ? text(task->valueForKey(QStringLiteral("rate"))) : QString(), time->name(),
-                       shortDate(time, QStringLiteral("startDate")),
-                       shortDate(time, QStringLiteral("endDate")), QString::number(time->duration())});
+    appendQuotedLine(out, {project ? project->name() : QString(), task ? task->name() : QString(),
+                           task ? text(task->valueForKey(QStringLiteral("rate"))) : QString(), time->name(),
+                           shortDate(time, QStringLiteral("startDate")),
+                           shortDate(time, QStringLiteral("endDate")), QString::number(time->duration())});
   }
   return out;
 }

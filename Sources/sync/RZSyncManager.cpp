@@ -38,31 +38,23 @@ std::optional<qint64> integerValue(const QVariant& value) {
 enum class KeyKind { Plain, Date, Decimal, Color, ToOne, Ordered, Unordered };
 
 KeyKind keyKind(WTEntity entity, const QString& key) {
-  static const QSet<QString> dates{QStringLiteral("startDate"), QStringLiteral("endDate"),
-                                   QStringLiteral("startTime"), QStringLiteral("flatDateBegin"),
-                                   QStringLiteral("flatDateEnd")};
-  static const QSet<QString> decimals{QStringLiteral("rate"), QStringLiteral("budget"),
-                                      QStringLiteral("expense")};
-  if (key == QLatin1String("color")) return KeyKind::Color;
-  if (decimals.contains(key)) return KeyKind::Decimal;
-  switch (entity) {
-    case WTEntity::Client:
-      if (key == QLatin1String("projects")) return KeyKind::Unordered;
-      break;
-    case WTEntity::Project:
-      if (key == QLatin1String("client")) return KeyKind::ToOne;
-      if (key == QLatin1String("tasks")) return KeyKind::Ordered;
-      break;
-    case WTEntity::Task:
-      if (key == QLatin1String("project")) return KeyKind::ToOne;
-      if (key == QLatin1String("items")) return KeyKind::Unordered;
-      break;
+  const WTKeyDescriptor* declared = WTObject::keyTable(entity).find(key);
+  switch (declared ? declared->type : WTKeyType::Other) {
+    case WTKeyType::Date:
+      return KeyKind::Date;
+    case WTKeyType::Decimal:
+      return KeyKind::Decimal;
+    case WTKeyType::Color:
+      return KeyKind::Color;
+    case WTKeyType::ToOne:
+      return KeyKind::ToOne;
+    case WTKeyType::Ordered:
+      return KeyKind::Ordered;
+    case WTKeyType::Unordered:
+      return KeyKind::Unordered;
     default:
-      if (key == QLatin1String("task")) return KeyKind::ToOne;
-      if (dates.contains(key)) return KeyKind::Date;
-      break;
+      return KeyKind::Plain;
   }
-  return KeyKind::Plain;
 }
 
 std::optional<WTEntity> entityOfUuid(const QString& uuid) {
