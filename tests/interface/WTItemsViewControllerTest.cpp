@@ -328,9 +328,7 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRat
 
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));
-  QAction* spent = nullptr;
-  for (QAction* action : menu->actions())
-    if (action->text().startsWith("New Time Entry")) spent = action;
+  QAction* spent = actionTitled(menu.get(), "New Time Entry");
   ASSERT_NE(spent, nullptr);
   spent->trigger();
   ASSERT_EQ(build->items().size(), 1);
