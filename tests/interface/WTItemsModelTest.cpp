@@ -97,7 +97,6 @@ TEST_F(WTItemsModelTest, ChangesArriveAsRowMovesNotResets) {
   QSignalSpy removed(model.get(), &QAbstractItemModel::rowsRemoved);
   QSignalSpy moved(model.get(), &QAbstractItemModel::rowsMoved);
 
-  // A new day group above, with its item inside.
   makeItem<WTFlat>(design, "fee", at(2024, 3, 12));
   endTurn();
   EXPECT_EQ(shape(), "Design[03-12[fee],03-11[b,a]] Build[]");
@@ -108,16 +107,13 @@ TEST_F(WTItemsModelTest, ChangesArriveAsRowMovesNotResets) {
   b->setDate(at(2024, 3, 12));
   endTurn();
   EXPECT_EQ(shape(), "Design[03-12[fee,b,a]] Build[]");
-  // Reordering the tasks moves their rows.
   project->moveTask(build, 0);
   endTurn();
   EXPECT_EQ(shape(), "Build[] Design[03-12[fee,b,a]]");
   EXPECT_EQ(moved.count(), 1);
-  // An item that changes task moves between task rows.
   a->setTask(build);
   endTurn();
   EXPECT_EQ(shape(), "Build[03-12[a]] Design[03-12[fee,b]]");
-  // Deleting a task takes its row away.
   context->deleteObject(design);
   endTurn();
   EXPECT_EQ(shape(), "Build[03-12[a]]");

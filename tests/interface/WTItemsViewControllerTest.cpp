@@ -194,7 +194,6 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   outline()->expand(model()->indexOfContainerOfItem(note));
   EXPECT_EQ(controller->autosaveName(), project->uuid());
 
-  // Another project shown meanwhile keeps its own.
   WTProject* other = makeProject("Other");
   makeTask(other, "Alone");
   controller->setProject(other);

@@ -48,7 +48,6 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_FALSE(clientOf(clients, client));
   ASSERT_TRUE(clientOf(projects, client));
   EXPECT_EQ(project->client(), client);
-  // A client's row says the rate its work is billed at.
   EXPECT_EQ(shows(clientRow), "1 project · 100.00 an hour|00:30|50.00|admin_2_32|");
   QSignalSpy changed(&projects, &QAbstractItemModel::dataChanged);
   QSignalSpy clientChanged(&clients, &QAbstractItemModel::dataChanged);

@@ -132,7 +132,6 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKey
   EXPECT_TRUE(bytes.contains("ann@example.org"));
   EXPECT_FALSE(bytes.contains("horse"));
 
-  // Return in the password field starts syncing too.
   manager->disableSync();
   type(window->passwordTextField(), "battery staple", true);
   EXPECT_EQ(keychain.entries.value("sync-password"), "battery staple");

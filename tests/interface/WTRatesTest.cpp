@@ -97,7 +97,6 @@ TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) 
   EXPECT_TRUE(field->toolTip().isEmpty());
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), Decimal(7));
-  // Emptied, the project inherits again.
   field->clear();
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), std::nullopt);

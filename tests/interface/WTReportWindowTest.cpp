@@ -233,7 +233,6 @@ TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKe
   EXPECT_EQ(scroll->value(), place);
   EXPECT_TRUE(first.isNull()) << "a replaced document is deleted";
 
-  // Two renders in a row: only the second is shown.
   window->setMode(1);
   window->setMode(2);
   waitForDocument();
@@ -346,7 +345,6 @@ TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDa
   for (int i = 0; i < button.count(); ++i) titles << button.itemText(i);
   EXPECT_EQ(titles, QStringList({"Today", "Yesterday", "This week", "Last week", "This month", "Last month",
                                  "This year", "Last year", "Any date", "", "Custom..."}));
-  // The custom range starts out as the last month up to now.
   EXPECT_EQ(button.customRangeBegin(), RZDate::addMonth(clockNow, -1));
   EXPECT_EQ(button.customRangeEnd(), clockNow);
 
@@ -370,7 +368,6 @@ TEST_F(RangeAndExportTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDa
       button.selectedPredicate()(makeTime(design, berlin(2024, 3, 3, 23), berlin(2024, 3, 3, 23, 30))));
   EXPECT_FALSE(button.selectedPredicate()(makeTime(design, berlin(2024, 3, 4, 9), berlin(2024, 3, 4, 10))));
 
-  // Reopening shows the stored dates again.
   dialog = button.showRangeWindow();
   EXPECT_EQ(dialog->beginEdit()->date(), QDate(2024, 3, 3));
   dialog->accept();

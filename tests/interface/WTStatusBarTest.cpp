@@ -23,7 +23,6 @@ namespace {
 
 class StatusBarTest : public TrackingTest {
  protected:
-  // The popup's rows in view, in order.
   static QList<QWidget*> shownRows(const WTStatusBarPopup& popup) {
     QList<QWidget*> rows = popup.findChildren<QWidget*>("taskRow");
     rows.removeIf([&](const QWidget* row) { return !row->isVisibleTo(&popup); });
@@ -148,7 +147,6 @@ TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeA
         call("/StatusNotifierItem", "org.freedesktop.DBus.Properties", "Get", {sni, name});
     return reply.arguments().value(0).value<QDBusVariant>().variant();
   };
-  // The label, its guide and the icon's name, as a host shows them.
   auto shows = [&] {
     return QStringList{property("XAyatanaLabel").toString(), property("XAyatanaLabelGuide").toString(),
                        property("IconName").toString()};
