@@ -148,6 +148,11 @@ class UiTest : public ModelTest {
     project->setName(name);
     return project;
   }
+  WTClient* makeClient(const QString& name) {
+    auto* client = WTClient::insertNewObject(context.get());
+    client->setName(name);
+    return client;
+  }
   using ModelTest::makeItem;
   // A named item; a time entry lasts half an hour.
   template <class T>

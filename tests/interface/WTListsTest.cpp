@@ -21,8 +21,7 @@ QStringList names(const WTObjectListModel& model) {
 }
 
 TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName("ACME");
+  auto* client = makeClient("ACME");
   auto* project = makeProject("Site");
   auto* task = makeTask(project, "Work");
   makeItem<WTTime>(task, "time", at(2024, 3, 14, 9));  // 30 minutes
@@ -120,8 +119,7 @@ TEST_F(WTObjectListModelTest, AFilteredListFollowsChangesRowByRowAndShowsAnArchi
 
 // What a deletion asks and how Undo names it, for selections of records holding what goes with them.
 TEST_F(WTObjectListModelTest, ADeletionAsksOnlyWhenItemsOrARunningTimerGoAndNamesWhatGoes) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName("ACME");
+  auto* client = makeClient("ACME");
   auto* site = makeProject("Site");
   site->setClient(client);
   WTTask* general = makeTask(site, "General");
@@ -301,10 +299,8 @@ TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {
 
 TEST_F(WTListControllerTest, TheClientChooserSetsTheProjectsClientAndClientsAreAdded) {
   auto* project = makeProject("Site");
-  auto* acme = WTClient::insertNewObject(context.get());
-  acme->setName("ACME");
-  auto* gone = WTClient::insertNewObject(context.get());
-  gone->setName("Gone");
+  auto* acme = makeClient("ACME");
+  auto* gone = makeClient("Gone");
   gone->setArchived(true);
   endTurn();
   std::unique_ptr<QMenu> menu(projects->clientMenu(project));

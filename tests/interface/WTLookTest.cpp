@@ -77,7 +77,7 @@ TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
   WTListView* list = clients.tableView();
   EXPECT_EQ(list->emptyHint(), "No clients yet — press Ctrl+N");
   EXPECT_GT(inkInMiddle(list), 30);
-  WTClient::insertNewObject(context.get())->setName("Acme");
+  makeClient("Acme");
   endTurn();
   clients.arrayController()->rearrangeObjects();
   ASSERT_EQ(list->model()->rowCount(), 1);

@@ -58,9 +58,8 @@ class WTPreferencesWindowTest : public ::testing::Test {
     EXPECT_EQ(name, window->statusImageName());
     const QImage image = view->pixmap().toImage();
     const QColor centre = image.pixelColor(image.width() / 2, image.height() * 2 / 3);
-    const int channels[] = {centre.red(), centre.green(), centre.blue()};
-    const QString colour = QStringList{"red", "green", "blue"}.at(
-        int(std::max_element(std::begin(channels), std::end(channels)) - std::begin(channels)));
+    const int r = centre.red(), g = centre.green(), b = centre.blue();
+    const QString colour = r >= g && r >= b ? "red" : g >= b ? "green" : "blue";
     EXPECT_EQ(colour, name) << "the light shows " << colour.toStdString();
     EXPECT_EQ(centre.alpha(), 255);
     return name;

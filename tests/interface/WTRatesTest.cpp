@@ -29,8 +29,7 @@ class WTRatesTest : public OutlineTest {
  protected:
   void SetUp() override {
     OutlineTest::SetUp();
-    acme = WTClient::insertNewObject(context.get());
-    acme->setName("Acme");
+    acme = makeClient("Acme");
     acme->setRate(Decimal(80));
     project->setClient(acme);
     endTurn();
