@@ -13,10 +13,46 @@
 #include <QHelpEvent>
 #include <QLineEdit>
 #include <QMainWindow>
+#include <QMenu>
 #include <QTest>
 #include <QToolTip>
 
 #include <memory>
+#include <ostream>
+
+// Failures show texts as text.
+inline void PrintTo(const QString& text, std::ostream* os) {
+  *os << '"' << text.toStdString() << '"';
+}
+
+// The first of a menu's entries whose title starts with `title`, or nothing.
+inline QAction* actionTitled(const QMenu* menu, const QString& title) {
+  for (QAction* action : menu->actions())
+    if (action->text().startsWith(title)) return action;
+  return nullptr;
+}
+// A menu's titles, a separator's empty.
+inline QStringList titlesOf(const QMenu* menu) {
+  QStringList titles;
+  for (const QAction* action : menu->actions()) titles << action->text();
+  return titles;
+}
+// Types into a field as a user does, over what it held, then presses Return if asked.
+inline void type(QLineEdit* field, const QString& text, bool andReturn = false) {
+  field->setFocus();
+  field->selectAll();
+  QTest::keyClicks(field, text);
+  if (andReturn) QTest::keyClick(field, Qt::Key_Return);
+}
+
+// Receives what the desktop would open, in the desktop's place.
+class UrlCatcher : public QObject {
+  Q_OBJECT
+ public:
+  QList<QUrl> opened;
+ public slots:
+  void open(const QUrl& url) { opened.append(url); }
+};
 
 // A window that hosts one navigation stack, as the main window does. Asked about a deletion, it
 // records the question and its detail and answers `deletes`.
@@ -111,6 +147,11 @@ class UiTest : public ModelTest {
     auto* project = WTProject::insertNewObject(context.get());
     project->setName(name);
     return project;
+  }
+  WTClient* makeClient(const QString& name) {
+    auto* client = WTClient::insertNewObject(context.get());
+    client->setName(name);
+    return client;
   }
   using ModelTest::makeItem;
   // A named item; a time entry lasts half an hour.

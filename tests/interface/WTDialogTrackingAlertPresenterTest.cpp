@@ -12,9 +12,8 @@
 
 namespace {
 
-const WTTrackingAlert kQuit{QStringLiteral("Running Timer"),
-                            QStringLiteral("Would you like to stop the running timers before quitting?"),
-                            QStringLiteral("Stop"), QStringLiteral("Keep running")};
+const WTTrackingAlert kQuit{"Running Timer", "Would you like to stop the running timers before quitting?",
+                            "Stop", "Keep running"};
 
 // Runs the alert and acts on its message box once it is on screen, from inside its own event loop.
 WTTrackingAlertAnswer answer(const std::function<void(QMessageBox*)>& act) {
@@ -32,22 +31,20 @@ QAbstractButton* buttonTitled(QMessageBox* box, const QString& title) {
   return nullptr;
 }
 
-TEST(WTDialogTrackingAlertPresenterTest, ShowsTheTextsAndAnswersWithTheButtonClicked) {
+// The texts are shown, Return chooses the default, the other button its answer; Escape chooses nothing.
+TEST(WTDialogTrackingAlertPresenterTest, ShowsTheTextsAndAnswersWithTheButtonChosen) {
   bool checked = false;
   EXPECT_EQ(answer([&](QMessageBox* box) {
               EXPECT_EQ(box->text(), kQuit.messageText);
               EXPECT_EQ(box->informativeText(), kQuit.informativeText);
               EXPECT_EQ(box->buttons().size(), 2);
-              ASSERT_NE(buttonTitled(box, QStringLiteral("Stop")), nullptr);
-              EXPECT_EQ(box->defaultButton(), buttonTitled(box, QStringLiteral("Stop")));
+              ASSERT_NE(buttonTitled(box, "Stop"), nullptr);
+              EXPECT_EQ(box->defaultButton(), buttonTitled(box, "Stop"));
               checked = true;
-              QTest::mouseClick(buttonTitled(box, QStringLiteral("Keep running")), Qt::LeftButton);
+              QTest::mouseClick(buttonTitled(box, "Keep running"), Qt::LeftButton);
             }),
             WTTrackingAlertAnswer::Alternate);
   EXPECT_TRUE(checked);
-}
-
-TEST(WTDialogTrackingAlertPresenterTest, ReturnChoosesTheDefaultAndEscapeChoosesNothing) {
   EXPECT_EQ(answer([](QMessageBox* box) {
               QTest::keyClick(box, Qt::Key_Escape);
               EXPECT_TRUE(box->isVisible()) << "Escape must not answer for the user";

@@ -115,7 +115,6 @@ TEST(RZBackgroundViewTest, ArchivedSettingsComeBack) {
   EXPECT_DOUBLE_EQ(copy->gradientAngle(), 90);
   EXPECT_EQ(copy->imageName(), "play_32");
   EXPECT_FALSE(copy->image().isNull());  // loaded again by its name
-  // Defaults of a new view.
   RZBackgroundView fresh;
   EXPECT_EQ(fresh.backgroundMode(), RZBackgroundView::SolidColor);
   EXPECT_EQ(fresh.scaleMode(), RZBackgroundView::Stretched);
@@ -171,12 +170,10 @@ TEST(WTTableCellViewTest, TheNotesFieldGrowsBetweenItsLimits) {
   cell.setNotes(QString("word ").repeated(60));
   const qreal wrapped = cell.requestedHeight(false);
   EXPECT_GT(wrapped, oneLine);
-  // A narrower row wraps more.
   cell.setFrame(QRectF(0, 0, 300, 30));
   EXPECT_GT(cell.requestedHeight(false), wrapped);
   cell.setNotes(QString("line\n").repeated(500));
   EXPECT_EQ(cell.notesFrame().height(), WTTableCellView::kMaximumNotesHeight);
-  // Groups have no notes field at all.
   WTTableCellView group("WTItemContainer");
   group.setNotes("ignored");
   EXPECT_EQ(group.requestedHeight(true), group.initialFrame().height());
@@ -202,7 +199,6 @@ TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   }
   EXPECT_EQ(task.partAt(task.partRect(WTTableCellView::Part::TimerButton, row).center(), row, false),
             WTTableCellView::Part::TimerButton);
-  // Items have the date and notes buttons instead, and no add buttons.
   WTTableCellView time("WTTime");
   EXPECT_TRUE(time.partRect(WTTableCellView::Part::AddTime, row).isEmpty());
   EXPECT_FALSE(time.partRect(WTTableCellView::Part::DateButton, row).isEmpty());

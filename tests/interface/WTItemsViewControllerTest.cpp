@@ -194,7 +194,6 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   outline()->expand(model()->indexOfContainerOfItem(note));
   EXPECT_EQ(controller->autosaveName(), project->uuid());
 
-  // Another project shown meanwhile keeps its own.
   WTProject* other = makeProject("Other");
   makeTask(other, "Alone");
   controller->setProject(other);
@@ -328,9 +327,7 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRat
 
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));
-  QAction* spent = nullptr;
-  for (QAction* action : menu->actions())
-    if (action->text().startsWith("New Time Entry")) spent = action;
+  QAction* spent = actionTitled(menu.get(), "New Time Entry");
   ASSERT_NE(spent, nullptr);
   spent->trigger();
   ASSERT_EQ(build->items().size(), 1);

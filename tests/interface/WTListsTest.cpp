@@ -2,13 +2,9 @@
 #include "WTClient.h"
 #include "WTClientsViewController.h"
 #include "WTDeletion.h"
-#include "WTItemsModel.h"
 #include "WTListView.h"
 #include "WTObjectListModel.h"
 
-#include <QAction>
-#include <QLineEdit>
-#include <QMenu>
 #include <QSignalSpy>
 
 namespace {
@@ -25,29 +21,33 @@ QStringList names(const WTObjectListModel& model) {
 }
 
 TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName("ACME");
+  auto* client = makeClient("ACME");
   auto* project = makeProject("Site");
   auto* task = makeTask(project, "Work");
   makeItem<WTTime>(task, "time", at(2024, 3, 14, 9));  // 30 minutes
   WTObjectListModel projects(context.get(), WTEntity::Project);
   WTObjectListModel clients(context.get(), WTEntity::Client);
   const QModelIndex row = projects.index(0, 0), clientRow = clients.index(0, 0);
-  auto shows = [](const QModelIndex& index, int role) { return index.data(role).toString(); };
-  EXPECT_EQ(shows(row, WTObjectListModel::SubtitleRole), "No Client");
-  EXPECT_EQ(shows(row, WTObjectListModel::DurationTextRole), "00:30");
-  EXPECT_EQ(shows(row, WTObjectListModel::ImageRole), "folder_32");
+  // What a row shows: subtitle, duration, cost, image, tool tip.
+  auto shows = [](const QModelIndex& index) {
+    QStringList parts;
+    for (int role :
+         {int(WTObjectListModel::SubtitleRole), int(WTObjectListModel::DurationTextRole),
+          int(WTObjectListModel::CostTextRole), int(WTObjectListModel::ImageRole), int(Qt::ToolTipRole)})
+      parts << index.data(role).toString();
+    return parts.join(u'|');
+  };
+  EXPECT_EQ(shows(row), "No Client|00:30|25.00|folder_32|");
   // Only a project takes a client, and only a client is one.
-  EXPECT_FALSE(
-      projects.setData(row, WTObjectListModel::variantFromObject(task), WTObjectListModel::ClientRole));
-  EXPECT_FALSE(clients.setData(clientRow, WTObjectListModel::variantFromObject(client),
-                               WTObjectListModel::ClientRole));
-  ASSERT_TRUE(
-      projects.setData(row, WTObjectListModel::variantFromObject(client), WTObjectListModel::ClientRole));
+  auto clientOf = [](WTObjectListModel& list, const WTObject* object) {
+    return list.setData(list.index(0, 0), WTObjectListModel::variantFromObject(object),
+                        WTObjectListModel::ClientRole);
+  };
+  EXPECT_FALSE(clientOf(projects, task));
+  EXPECT_FALSE(clientOf(clients, client));
+  ASSERT_TRUE(clientOf(projects, client));
   EXPECT_EQ(project->client(), client);
-  // A client's row says the rate its work is billed at.
-  EXPECT_EQ(shows(clientRow, WTObjectListModel::SubtitleRole), "1 project · 100.00 an hour");
-  EXPECT_EQ(shows(clientRow, WTObjectListModel::CostTextRole), "50.00");
+  EXPECT_EQ(shows(clientRow), "1 project · 100.00 an hour|00:30|50.00|admin_2_32|");
   QSignalSpy changed(&projects, &QAbstractItemModel::dataChanged);
   QSignalSpy clientChanged(&clients, &QAbstractItemModel::dataChanged);
   project->setArchived(true);
@@ -56,11 +56,10 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   endTurn();
   EXPECT_GE(changed.count(), 1);
   EXPECT_GE(clientChanged.count(), 1);
-  EXPECT_EQ(shows(row, WTObjectListModel::SubtitleRole), "ACME Ltd");
-  EXPECT_EQ(shows(row, WTObjectListModel::ImageRole), "folder_32_dis");
+  // Archived, but no timer runs in it: no tip.
+  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.00|folder_32_dis|");
   EXPECT_TRUE(row.data(WTObjectListModel::ArchivedRole).toBool());
-  EXPECT_FALSE(row.data(Qt::ToolTipRole).isValid());  // archived, but no timer runs in it
-  EXPECT_EQ(shows(clientRow, WTObjectListModel::SubtitleRole), "1 project · 120.00 an hour");
+  EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00|admin_2_32|");
 }
 
 // The filtered list follows changes row by row, never by a reset; an archived project comes in, still
@@ -120,8 +119,7 @@ TEST_F(WTObjectListModelTest, AFilteredListFollowsChangesRowByRowAndShowsAnArchi
 
 // What a deletion asks and how Undo names it, for selections of records holding what goes with them.
 TEST_F(WTObjectListModelTest, ADeletionAsksOnlyWhenItemsOrARunningTimerGoAndNamesWhatGoes) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName("ACME");
+  auto* client = makeClient("ACME");
   auto* site = makeProject("Site");
   site->setClient(client);
   WTTask* general = makeTask(site, "General");
@@ -225,11 +223,8 @@ TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLast
   QMenu* menu = projects->rowMenu();
   projects->tableView()->setClickedRow(rowOf(archived));
   projects->menuNeedsUpdate(menu);
-  QAction* tagged = nullptr;
-  for (QAction* action : menu->actions())
-    if (action->data().toInt() == 1) tagged = action;
+  QAction* tagged = actionTitled(menu, "Unarchive");
   ASSERT_NE(tagged, nullptr);
-  EXPECT_EQ(tagged->text(), "Unarchive");
   tagged->trigger();
   EXPECT_FALSE(archived->archived());
   EXPECT_FALSE(c->archived());
@@ -304,18 +299,13 @@ TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {
 
 TEST_F(WTListControllerTest, TheClientChooserSetsTheProjectsClientAndClientsAreAdded) {
   auto* project = makeProject("Site");
-  auto* acme = WTClient::insertNewObject(context.get());
-  acme->setName("ACME");
-  auto* gone = WTClient::insertNewObject(context.get());
-  gone->setName("Gone");
+  auto* acme = makeClient("ACME");
+  auto* gone = makeClient("Gone");
   gone->setArchived(true);
   endTurn();
   std::unique_ptr<QMenu> menu(projects->clientMenu(project));
-  QStringList titles;
-  for (QAction* action : menu->actions())
-    if (!action->isSeparator()) titles << action->text();
-  EXPECT_EQ(titles, (QStringList{"No Client", "ACME", "Edit Clients…"}));
-  menu->actions()[2]->trigger();
+  EXPECT_EQ(titlesOf(menu.get()), (QStringList{"No Client", "", "ACME", "", "Edit Clients…"}));
+  actionTitled(menu.get(), "ACME")->trigger();
   EXPECT_EQ(project->client(), acme);
 
   WTClientsViewController clients(context.get());

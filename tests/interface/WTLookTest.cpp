@@ -52,28 +52,24 @@ int inkInMiddle(QAbstractItemView* view) {
 
 class WTLookTest : public UiTest {};
 
-TEST_F(WTLookTest, SelectedOutlineRowsTakeThePalettesHighlightAndItsTextColour) {
+TEST_F(WTLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour) {
   WTProject* project = makeProject("Website");
   WTTask* task = makeTask(project, "Design");
   WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
   ShownOutline shown(context.get(), project, QSize(800, 400));
+  ShownProjects list(context.get());
   endTurn();
   for (const WTObject* object : QList<const WTObject*>{task, time}) {
     SCOPED_TRACE(object->name().toStdString());
     shown.controller.expandContainerOfItem(time);
     expectHighlighted(shown.outline(), shown.rowOf(object));
   }
+  ASSERT_TRUE(list.projects.arrayController()->index(0, 0).isValid());
+  expectHighlighted(list.projects.tableView(), list.projects.arrayController()->index(0, 0));
 }
 
-TEST_F(WTLookTest, SelectedListRowsTakeThePalettesHighlightAndItsTextColour) {
-  makeProject("Website");
-  ShownProjects shown(context.get());
-  endTurn();
-  ASSERT_TRUE(shown.projects.arrayController()->index(0, 0).isValid());
-  expectHighlighted(shown.projects.tableView(), shown.projects.arrayController()->index(0, 0));
-}
-
-TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRowAndForgetsItOnceThereIsOne) {
+// An empty list or outline says how to add the first row, and forgets it once there is one.
+TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
   WTClientsViewController clients(context.get());
   clients.view()->resize(600, 400);
   clients.view()->show();
@@ -81,14 +77,12 @@ TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRowAndForgetsItOnceThereIsOne)
   WTListView* list = clients.tableView();
   EXPECT_EQ(list->emptyHint(), "No clients yet — press Ctrl+N");
   EXPECT_GT(inkInMiddle(list), 30);
-  WTClient::insertNewObject(context.get())->setName("Acme");
+  makeClient("Acme");
   endTurn();
   clients.arrayController()->rearrangeObjects();
   ASSERT_EQ(list->model()->rowCount(), 1);
   EXPECT_EQ(inkInMiddle(list), 0);
-}
 
-TEST_F(WTLookTest, AProjectWithoutTasksSaysHowToAddOne) {
   WTProject* project = makeProject("Website");
   ShownOutline shown(context.get(), project, QSize(800, 400));
   endTurn();

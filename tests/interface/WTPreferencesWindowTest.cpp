@@ -1,18 +1,15 @@
 #include "MemoryKeychain.h"
 #include "SyncTestSupport.h"
+#include "UiFixture.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
 #include "WTRateField.h"
 
-#include <gtest/gtest.h>
-
 #include <QCheckBox>
 #include <QDesktopServices>
 #include <QLabel>
-#include <QLineEdit>
 #include <QPushButton>
 #include <QSpinBox>
-#include <QTest>
 
 namespace {
 
@@ -33,15 +30,6 @@ class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
  private:
   UserDefaults& defaults_;
   WTPasswordStore& passwords_;
-};
-
-class UrlCatcher : public QObject {
-  Q_OBJECT
- public slots:
-  void open(const QUrl& url) { opened.append(url); }
-
- public:
-  QList<QUrl> opened;
 };
 
 // An installation with no account yet whose manager asks the password store for the password, as the
@@ -70,18 +58,11 @@ class WTPreferencesWindowTest : public ::testing::Test {
     EXPECT_EQ(name, window->statusImageName());
     const QImage image = view->pixmap().toImage();
     const QColor centre = image.pixelColor(image.width() / 2, image.height() * 2 / 3);
-    const int channels[] = {centre.red(), centre.green(), centre.blue()};
-    const QString colour = QStringList{"red", "green", "blue"}.at(
-        int(std::max_element(std::begin(channels), std::end(channels)) - std::begin(channels)));
+    const int r = centre.red(), g = centre.green(), b = centre.blue();
+    const QString colour = r >= g && r >= b ? "red" : g >= b ? "green" : "blue";
     EXPECT_EQ(colour, name) << "the light shows " << colour.toStdString();
     EXPECT_EQ(centre.alpha(), 255);
     return name;
-  }
-  static void type(QLineEdit* field, const QString& text, bool andReturn = false) {
-    field->setFocus();
-    field->selectAll();
-    QTest::keyClicks(field, text);
-    if (andReturn) QTest::keyClick(field, Qt::Key_Return);
   }
   void startSync(const QString& user, const QString& password) {
     type(window->emailTextField(), user);
@@ -104,8 +85,7 @@ class WTPreferencesWindowTest : public ::testing::Test {
 TEST_F(WTPreferencesWindowTest, TheLightIsBlueWithoutAnAccountRedWhenSyncingIsOffAndGreenWhenOn) {
   defaults->setValue("WTSyncUser", kUser);
   open();
-  EXPECT_TRUE(window->emailTextField()->text().isEmpty());
-  EXPECT_TRUE(window->passwordTextField()->text().isEmpty());
+  EXPECT_EQ(window->emailTextField()->text() + window->passwordTextField()->text(), "");
   EXPECT_EQ(light(), "blue");
   manager->enableSync();
   EXPECT_EQ(light(), "blue");
@@ -151,7 +131,6 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKey
   EXPECT_TRUE(bytes.contains("ann@example.org"));
   EXPECT_FALSE(bytes.contains("horse"));
 
-  // Return in the password field starts syncing too.
   manager->disableSync();
   type(window->passwordTextField(), "battery staple", true);
   EXPECT_EQ(keychain.entries.value("sync-password"), "battery staple");
@@ -194,8 +173,9 @@ TEST_F(WTPreferencesWindowTest, AServerErrorTurnsTheLightRedAndStartSyncTurnsItG
   EXPECT_EQ(light(), "red");
   EXPECT_EQ(installation.presenter.syncErrors, QStringList{"Wrong e-mail address or password. - (Code: 2)"});
   ASSERT_EQ(server.requests.size(), 1);
-  EXPECT_EQ(server.requests[0].json().value("user").toString(), kUser);
-  EXPECT_EQ(server.requests[0].json().value("password").toString(), kPassword);
+  const QVariantMap sent = server.requests[0].json();
+  EXPECT_EQ(QStringList({sent.value("user").toString(), sent.value("password").toString()}),
+            QStringList({kUser, kPassword}));
 
   refuse = false;
   QTest::mouseClick(window->startSyncButton(), Qt::LeftButton);
@@ -265,8 +245,7 @@ TEST_F(WTPreferencesWindowTest, TheServerAndRateFieldsStoreWhatTheyTakeAndRefuse
 
 TEST_F(WTPreferencesWindowTest, SignUpOpensTheServersPageInTheBrowser) {
   UrlCatcher catcher;
-  QDesktopServices::setUrlHandler("https", &catcher, "open");
-  QDesktopServices::setUrlHandler("http", &catcher, "open");
+  for (const char* scheme : {"https", "http"}) QDesktopServices::setUrlHandler(scheme, &catcher, "open");
   open();
   EXPECT_FALSE(window->signUp());
   type(window->serverField(), "sync.example.org");
@@ -279,8 +258,7 @@ TEST_F(WTPreferencesWindowTest, SignUpOpensTheServersPageInTheBrowser) {
   EXPECT_EQ(catcher.opened, (QList<QUrl>{QUrl("https://sync.example.org/sync/tessal/signup.php"),
                                          QUrl("http://127.0.0.1:8080/tessal/sync/tessal/signup.php")}));
   EXPECT_EQ(manager->configuredEndpoint(), QUrl("http://127.0.0.1:8080/tessal/sync/tessal/sync.php"));
-  QDesktopServices::unsetUrlHandler("https");
-  QDesktopServices::unsetUrlHandler("http");
+  for (const char* scheme : {"https", "http"}) QDesktopServices::unsetUrlHandler(scheme);
 }
 
 TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
@@ -313,5 +291,3 @@ TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
 }
 
 }  // namespace
-
-#include "WTPreferencesWindowTest.moc"

@@ -11,7 +11,6 @@
 #include "WTRateField.h"
 
 #include <QLabel>
-#include <QMenu>
 #include <QSignalSpy>
 #include <QTimer>
 
@@ -30,18 +29,12 @@ class WTRatesTest : public OutlineTest {
  protected:
   void SetUp() override {
     OutlineTest::SetUp();
-    acme = WTClient::insertNewObject(context.get());
-    acme->setName("Acme");
+    acme = makeClient("Acme");
     acme->setRate(Decimal(80));
     project->setClient(acme);
     endTurn();
   }
 
-  static QAction* actionTitled(QMenu* menu, const QString& title) {
-    for (QAction* action : menu->actions())
-      if (action->text() == title) return action;
-    return nullptr;
-  }
   // Runs `fill` on the rate sheet once it is open, from inside its own event loop.
   static void whenRateDialogOpens(std::function<void(WTRateDialog*)> fill) {
     QTimer::singleShot(0, [fill] {
@@ -50,11 +43,6 @@ class WTRatesTest : public OutlineTest {
       fill(dialog);
       if (dialog->isVisible()) dialog->reject();
     });
-  }
-  static void type(QLineEdit* field, const QString& text) {
-    field->setFocus();
-    field->selectAll();
-    QTest::keyClicks(field, text);
   }
   // Whether the text was refused in place: still in its field, marked, with a reason.
   static bool refusedIn(QLineEdit* field, const QString& text) {
@@ -68,8 +56,7 @@ class WTRatesTest : public OutlineTest {
     outline()->edit(rowOf(item));
     QLineEdit* editor = shown->openEditor();
     if (!editor) return false;
-    type(editor, text);
-    QTest::keyClick(editor, Qt::Key_Return);
+    type(editor, text, true);
     editor = shown->openEditor();
     const bool refused = editor && outline()->isEditing() && refusedIn(editor, text);
     if (editor) QTest::keyClick(editor, Qt::Key_Escape);
@@ -109,7 +96,6 @@ TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) 
   EXPECT_TRUE(field->toolTip().isEmpty());
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), Decimal(7));
-  // Emptied, the project inherits again.
   field->clear();
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), std::nullopt);
@@ -143,8 +129,7 @@ TEST_F(WTRatesTest, MoneyTypedInEveryFieldIsReadInTheUsersLocale) {
     };
   };
   auto withReturn = [&](QLineEdit* field, const QString& text) {
-    type(field, text);
-    QTest::keyClick(field, Qt::Key_Return);
+    type(field, text, true);
     return refusedIn(field, text);
   };
   const std::pair<const char*, std::function<Outcome(const QString&)>> paths[] = {
@@ -247,7 +232,7 @@ TEST_F(WTRatesTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
 
 TEST_F(WTRatesTest, ATaskRowsMenuSetsItsRateAndKeepsTheSheetOpenOnAMistake) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(design));
-  QAction* setRate = actionTitled(menu.get(), QStringLiteral("Set Rate…"));
+  QAction* setRate = actionTitled(menu.get(), "Set Rate…");
   ASSERT_NE(setRate, nullptr);
   bool checked = false;
   whenRateDialogOpens([&](WTRateDialog* dialog) {
@@ -273,7 +258,7 @@ TEST_F(WTRatesTest, AClientRowsMenuSetsAndClearsItsRate) {
   clients.view()->show();
   endTurn();
   clients.tableView()->setClickedRow(clients.arrayController()->rowOfObject(acme));
-  QAction* setRate = actionTitled(clients.rowMenu(), QStringLiteral("Set Rate…"));
+  QAction* setRate = actionTitled(clients.rowMenu(), "Set Rate…");
   ASSERT_NE(setRate, nullptr);
   whenRateDialogOpens([](WTRateDialog* dialog) {
     EXPECT_EQ(dialog->field()->placeholderText(), "Inherited: 100.00");

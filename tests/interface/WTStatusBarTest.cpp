@@ -23,14 +23,17 @@ namespace {
 
 class StatusBarTest : public TrackingTest {
  protected:
+  static QList<QWidget*> shownRows(const WTStatusBarPopup& popup) {
+    QList<QWidget*> rows = popup.findChildren<QWidget*>("taskRow");
+    rows.removeIf([&](const QWidget* row) { return !row->isVisibleTo(&popup); });
+    return rows;
+  }
   // Each row of the popup as "TITLE:BUTTON", in order.
   static QStringList rowsOf(const WTStatusBarPopup& popup) {
     QStringList rows;
-    for (const QWidget* row : popup.findChildren<QWidget*>(QStringLiteral("taskRow"))) {
-      if (!row->isVisibleTo(&popup)) continue;
-      const QString title = row->findChild<QLabel*>(QStringLiteral("taskTitle"))->text().section(u'\n', 0, 0);
-      rows << title + ":" + row->findChild<QToolButton*>(QStringLiteral("timerButton"))->text();
-    }
+    for (const QWidget* row : shownRows(popup))
+      rows << row->findChild<QLabel*>("taskTitle")->text().section(u'\n', 0, 0) + ":" +
+                  row->findChild<QToolButton*>("timerButton")->text();
     return rows;
   }
 };
@@ -53,12 +56,8 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   EXPECT_GE(popup.y(), 24) << "below the icon it opened from";
 
   // The button of T8's row starts T8's timer; the list follows with the popup still open.
-  QToolButton* startT8 = nullptr;
-  for (QWidget* row : popup.findChildren<QWidget*>(QStringLiteral("taskRow")))
-    if (row->isVisibleTo(&popup) && row->findChild<QLabel*>(QStringLiteral("taskTitle"))->text() == "T8")
-      startT8 = row->findChild<QToolButton*>(QStringLiteral("timerButton"));
-  ASSERT_NE(startT8, nullptr);
-  startT8->click();
+  ASSERT_EQ(rowsOf(popup).indexOf("T8:Start"), 3);
+  shownRows(popup)[3]->findChild<QToolButton*>("timerButton")->click();
   settle();
   EXPECT_TRUE(tasks[8]->running());
   EXPECT_EQ(runningTimesOf(tasks[8]).size(), 1);
@@ -90,13 +89,12 @@ TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) 
   EXPECT_TRUE(iconIs("StopWatchRunning"));
 
   // The list shows the running task's minutes and follows the ticks in place, the rows left as they are.
-  makeTask(nullptr, QStringLiteral("Idle"));
+  makeTask(nullptr, "Idle");
   statusBar.statusBarClicked(QRect(600, 0, 24, 24));
   settle();
   auto labels = [&] {
     QList<const QLabel*> shown;
-    for (const QLabel* label : statusBar.popup()->findChildren<QLabel*>(QStringLiteral("taskElapsed")))
-      if (label->isVisibleTo(statusBar.popup())) shown << label;
+    for (const QWidget* row : shownRows(*statusBar.popup())) shown << row->findChild<QLabel*>("taskElapsed");
     return shown;
   };
   auto elapsed = [&] {
@@ -121,9 +119,8 @@ TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) 
 TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeAsItsLabel) {
   QDBusConnection watcherBus = PrivateBus::instance().connect();
   watcher.moveToThread(&serviceThread);
-  ASSERT_TRUE(watcherBus.registerObject(QStringLiteral("/StatusNotifierWatcher"), &watcher,
-                                        QDBusConnection::ExportAllSlots));
-  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  ASSERT_TRUE(watcherBus.registerObject("/StatusNotifierWatcher", &watcher, QDBusConnection::ExportAllSlots));
+  ASSERT_TRUE(watcherBus.registerService("org.kde.StatusNotifierWatcher"));
   WTTask* task = makeTask();
   startTimer(task, clockNow.addingSeconds(-30 * 60));
   updater->start();
@@ -132,7 +129,7 @@ TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeA
   ASSERT_TRUE(waitForBus([&] { return statusBar.isShowingIcon(); })) << "the watcher never took the item";
   ASSERT_EQ(watcher.registered().size(), 1);
   const QString item = watcher.registered().front();
-  EXPECT_TRUE(item.startsWith(QStringLiteral("org.kde.StatusNotifierItem-"))) << item.toStdString();
+  EXPECT_TRUE(item.startsWith("org.kde.StatusNotifierItem-")) << item.toStdString();
 
   // The host reads the item as AppIndicator hosts do, and hears its label change.
   QDBusConnection host = PrivateBus::instance().connect();
@@ -144,58 +141,56 @@ TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeA
     waitForBus([&] { return pending.isFinished(); });
     return pending.reply();
   };
+  const QString sni = "org.kde.StatusNotifierItem";
   auto property = [&](const QString& name) {
     const QDBusMessage reply =
-        call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.freedesktop.DBus.Properties"),
-             QStringLiteral("Get"), {QStringLiteral("org.kde.StatusNotifierItem"), name});
+        call("/StatusNotifierItem", "org.freedesktop.DBus.Properties", "Get", {sni, name});
     return reply.arguments().value(0).value<QDBusVariant>().variant();
   };
+  auto shows = [&] {
+    return QStringList{property("XAyatanaLabel").toString(), property("XAyatanaLabelGuide").toString(),
+                       property("IconName").toString()};
+  };
   LabelListener listener;
-  ASSERT_TRUE(host.connect(item, QStringLiteral("/StatusNotifierItem"),
-                           QStringLiteral("org.kde.StatusNotifierItem"), QStringLiteral("XAyatanaNewLabel"),
-                           &listener, SLOT(newLabel(QString, QString))));
-  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:30"));
-  EXPECT_EQ(property(QStringLiteral("XAyatanaLabelGuide")).toString(), QStringLiteral("00:00"));
-  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch-running"));
-  const auto icons = qdbus_cast<QList<WTStatusNotifierIcon>>(property(QStringLiteral("IconPixmap")));
+  ASSERT_TRUE(host.connect(item, "/StatusNotifierItem", sni, "XAyatanaNewLabel", &listener,
+                           SLOT(newLabel(QString, QString))));
+  EXPECT_EQ(shows(), QStringList({"00:30", "00:00", "tessal-stopwatch-running"}));
+  const auto icons = qdbus_cast<QList<WTStatusNotifierIcon>>(property("IconPixmap"));
   ASSERT_FALSE(icons.isEmpty());
   EXPECT_EQ(icons.front().pixels.size(), icons.front().width * icons.front().height * 4);
 
   advance(60);
   updater->update();
   ASSERT_TRUE(waitForBus([&] { return !listener.labels.isEmpty(); }));
-  EXPECT_EQ(listener.labels, QStringList({QStringLiteral("00:31")}));
-  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QStringLiteral("00:31"));
+  EXPECT_EQ(listener.labels, QStringList({"00:31"}));
+  EXPECT_EQ(property("XAyatanaLabel").toString(), "00:31");
 
   task->stopAllTimers();
   settle();
   ASSERT_TRUE(waitForBus([&] { return listener.labels.size() >= 2; }));
   EXPECT_EQ(listener.labels.back(), QString());
-  EXPECT_EQ(property(QStringLiteral("XAyatanaLabel")).toString(), QString());
-  EXPECT_EQ(property(QStringLiteral("IconName")).toString(), QStringLiteral("tessal-stopwatch"));
+  EXPECT_EQ(shows(), QStringList({"", "", "tessal-stopwatch"}));
 
   // Its menu is the tray menu, and a click on an entry is that entry's.
-  const QDBusMessage layout = call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"),
-                                   QStringLiteral("GetLayout"), {0, -1, QStringList()});
+  const QDBusMessage layout = call("/MenuBar", "com.canonical.dbusmenu", "GetLayout", {0, -1, QStringList()});
   ASSERT_EQ(layout.type(), QDBusMessage::ReplyMessage) << layout.errorMessage().toStdString();
   QStringList labels;
   for (const WTDBusMenuLayout& entry : qdbus_cast<WTDBusMenuLayout>(layout.arguments().value(1)).children)
-    labels << entry.properties.value(QStringLiteral("label")).toString();
+    labels << entry.properties.value("label").toString();
   EXPECT_EQ(labels, QStringList({"Show Tessal", "Recent Tasks", "", "Quit"}));
   QSignalSpy showRequested(&statusBar, &WTStatusBarController::showMainWindowRequested);
-  call(QStringLiteral("/MenuBar"), QStringLiteral("com.canonical.dbusmenu"), QStringLiteral("Event"),
-       {1, QStringLiteral("clicked"), QVariant::fromValue(QDBusVariant(QString())), 0u});
+  call("/MenuBar", "com.canonical.dbusmenu", "Event",
+       {1, "clicked", QVariant::fromValue(QDBusVariant(QString())), 0u});
   EXPECT_TRUE(waitForBus([&] { return showRequested.count() == 1; }));
   // A click on the item opens the list of tasks.
-  call(QStringLiteral("/StatusNotifierItem"), QStringLiteral("org.kde.StatusNotifierItem"),
-       QStringLiteral("Activate"), {600, 10});
+  call("/StatusNotifierItem", sni, "Activate", {600, 10});
   EXPECT_TRUE(waitForBus([&] { return statusBar.popup()->isVisible(); }));
 
   // A tray that restarts (GNOME reloading its extensions) gets the item again.
   QSignalSpy trayChanged(&statusBar, &WTStatusBarController::trayAvailabilityChanged);
-  ASSERT_TRUE(watcherBus.unregisterService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  ASSERT_TRUE(watcherBus.unregisterService("org.kde.StatusNotifierWatcher"));
   ASSERT_TRUE(waitForBus([&] { return !statusBar.isShowingIcon(); }));
-  ASSERT_TRUE(watcherBus.registerService(QStringLiteral("org.kde.StatusNotifierWatcher")));
+  ASSERT_TRUE(watcherBus.registerService("org.kde.StatusNotifierWatcher"));
   EXPECT_TRUE(waitForBus([&] { return statusBar.isShowingIcon(); }));
   EXPECT_EQ(watcher.registered(), QStringList({item, item}));
   EXPECT_EQ(trayChanged.count(), 2);
