@@ -28,8 +28,7 @@ std::string storageName(const testing::TestParamInfo<Storage>& info);
 // The PostgreSQL connection URI of the throw-away cluster (scripts/pg-test-cluster.sh), or empty.
 std::string postgresUri();
 
-// One storage location for one test: a SQLite file in a temp folder, or a fresh PostgreSQL schema that
-// is dropped afterwards.
+// A SQLite file in a temp folder, or a fresh PostgreSQL schema dropped afterwards.
 class StorageLocation {
  public:
   explicit StorageLocation(Storage storage);
@@ -103,8 +102,7 @@ class RawConnection {
   bool connected_ = false;
 };
 
-// The fixture: one server per test, parameterised by storage. PostgreSQL runs only when
-// TESSAL_TEST_POSTGRES names a cluster.
+// One server per test, on each storage (PostgreSQL when TESSAL_TEST_POSTGRES names a cluster).
 class ServerTest : public testing::TestWithParam<Storage> {
  protected:
   void SetUp() override;

@@ -20,8 +20,7 @@ Decimal dec(const char* text) {
 
 }  // namespace
 
-// Integers stay integers; every other number, money above all, is a decimal that goes out as the very
-// same text it came in as (no double on the way). Exponents are written out.
+// Integers stay integers; other numbers are decimals written as they came (exponents written out).
 TEST(RZSyncJSON, NumbersKeepTheirKindAndDigits) {
   const QMetaType integer = QMetaType::fromType<qint64>(), decimal = QMetaType::fromType<Decimal>();
   const struct {

@@ -79,8 +79,7 @@ TEST_F(RZSyncTrackTest, FileHoldsIterationAndTrackAndReadsBack) {
   EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
 }
 
-// Missing sections load empty; whatever cannot be read as a journal is kept aside, byte for byte, and
-// the journal starts over.
+// Missing sections load empty; an unreadable journal is kept aside, byte for byte, and starts over.
 TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
   const struct {
     const char* text;  // null: no file
@@ -181,8 +180,8 @@ TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
   }
 }
 
-// An update of a pending insertion stays one insertion; a deletion keeps the pending values and writing
-// the record again undoes it; a value that is not journaled still leaves an entry, a cleared one is null.
+// An update of a pending insertion stays one; writing a deleted record undoes the deletion; a cleared
+// value is null, one not journaled still leaves an entry.
 TEST(RZSyncTrackSections, ChangesCombinePerRecord) {
   RZSyncTrack track;
   track.insertValues({{"name", "a"}, {"notes", "n"}}, "A@WTTask");
