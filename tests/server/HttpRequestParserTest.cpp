@@ -1,5 +1,4 @@
-// The server's request parsing without sockets: bytes in, a request or a refusal out, the same however
-// the network splits the bytes.
+// Bytes in, a request or a refusal out, the same however the network splits the bytes.
 #include "HttpRequestParser.h"
 
 #include <gtest/gtest.h>

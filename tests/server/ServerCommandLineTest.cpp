@@ -5,12 +5,9 @@
 #include <QProcess>
 #include <QRegularExpression>
 
-#include <arpa/inet.h>
-#include <netinet/in.h>
 #include <poll.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <chrono>
 #include <csignal>
@@ -44,6 +41,25 @@ class ServerCommandLineTest : public testing::TestWithParam<Storage> {
     storage_ = std::make_unique<StorageLocation>(GetParam());
     db_ = QString::fromStdString(storage_->location());
   }
+  // Starts `serve` on a free port and gives the port it reports; 0 when it does not say.
+  int serve(QProcess& server, const QStringList& more = {}) {
+    server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE),
+                 QStringList{"serve", "--listen", "127.0.0.1:0", "--db", db_} + more);
+    EXPECT_TRUE(server.waitForStarted(10000) && server.waitForReadyRead(10000))
+        << server.readAllStandardError().toStdString();
+    const QString line = QString::fromUtf8(server.readLine());
+    const QRegularExpressionMatch match =
+        QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line);
+    EXPECT_TRUE(match.hasMatch()) << line.toStdString();
+    return match.captured(1).toInt();
+  }
+  // A clean stop on SIGTERM.
+  static void expectStopsOnTerm(QProcess& server) {
+    ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
+    ASSERT_TRUE(server.waitForFinished(10000));
+    EXPECT_EQ(server.exitStatus(), QProcess::NormalExit);
+    EXPECT_EQ(server.exitCode(), 0);
+  }
   std::unique_ptr<StorageLocation> storage_;
   QString db_;
 };
@@ -56,24 +72,13 @@ TEST_P(ServerCommandLineTest, AddUserThenServe) {
   EXPECT_EQ(run({"add-user", "short@example.com", "--db", db_}, "short\n").exitCode, 1);
 
   QProcess server;
-  server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE), {"serve", "--listen", "127.0.0.1:0", "--db", db_});
-  ASSERT_TRUE(server.waitForStarted(10000));
-  ASSERT_TRUE(server.waitForReadyRead(10000)) << server.readAllStandardError().toStdString();
-  const QString line = QString::fromUtf8(server.readLine());
-  const QRegularExpressionMatch match =
-      QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line);
-  ASSERT_TRUE(match.hasMatch()) << line.toStdString();
-  const int port = match.captured(1).toInt();
-
+  const int port = serve(server);
+  ASSERT_GT(port, 0);
   const Reply reply = post(port, "/sync/tessal/sync.php",
                            requestBody("cli@example.com", "a password on stdin", "head", 0, "cli-device"));
   EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
   EXPECT_EQ(get(port, "/sync/tessal/signup.php").status, 200);
-
-  ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
-  ASSERT_TRUE(server.waitForFinished(10000));
-  EXPECT_EQ(server.exitStatus(), QProcess::NormalExit);
-  EXPECT_EQ(server.exitCode(), 0);
+  expectStopsOnTerm(server);
 }
 
 // Under a low descriptor limit the server holds only the connections it has descriptors for and closes
@@ -85,42 +90,27 @@ TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce
     const rlimit files{160, 160};  // soft and hard: the server cannot raise it
     setrlimit(RLIMIT_NOFILE, &files);
   });
-  server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE),
-               {"serve", "--listen", "127.0.0.1:0", "--db", db_, "--threads", "4"});
-  ASSERT_TRUE(server.waitForStarted(10000));
-  ASSERT_TRUE(server.waitForReadyRead(10000)) << server.readAllStandardError().toStdString();
-  const QRegularExpressionMatch match = QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)")
-                                            .match(QString::fromUtf8(server.readLine()));
-  ASSERT_TRUE(match.hasMatch());
-  const int port = match.captured(1).toInt();
-
-  std::vector<int> clients;
+  const int port = serve(server, {"--threads", "4"});
+  ASSERT_GT(port, 0);
+  std::vector<std::unique_ptr<RawConnection>> clients;
   for (int i = 0; i < 300; ++i) {
-    const int fd = socket(AF_INET, SOCK_STREAM, 0);
-    ASSERT_GE(fd, 0);
-    sockaddr_in address{};
-    address.sin_family = AF_INET;
-    address.sin_port = htons(static_cast<uint16_t>(port));
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    ASSERT_EQ(connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
-    clients.push_back(fd);
+    clients.push_back(std::make_unique<RawConnection>(port));
+    ASSERT_TRUE(clients.back()->connected());
   }
   std::this_thread::sleep_for(std::chrono::milliseconds(500));
   int closedAtOnce = 0;
-  for (int fd : clients) {
-    pollfd readable{fd, POLLIN, 0};
+  for (const auto& client : clients) {
+    pollfd readable{client->fd(), POLLIN, 0};
     char byte;
-    if (poll(&readable, 1, 0) == 1 && recv(fd, &byte, 1, MSG_DONTWAIT) == 0) ++closedAtOnce;
+    if (poll(&readable, 1, 0) == 1 && recv(client->fd(), &byte, 1, MSG_DONTWAIT) == 0) ++closedAtOnce;
   }
-  for (int fd : clients) ::close(fd);
+  clients.clear();
   EXPECT_GE(closedAtOnce, 150) << "of 300, with descriptors for fewer than 160";
 
   const Reply reply = post(port, "/sync/tessal/sync.php",
                            requestBody("fd@example.com", "a password on stdin", "head", 0, "cli-device"));
   EXPECT_EQ(reply.status, 200) << reply.body;
-  ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
-  ASSERT_TRUE(server.waitForFinished(10000));
-  EXPECT_EQ(server.exitCode(), 0);
+  expectStopsOnTerm(server);
 }
 
 TEST_P(ServerCommandLineTest, WrongUsageExitsWith2) {

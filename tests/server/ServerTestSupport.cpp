@@ -80,17 +80,14 @@ Reply get(int port, const std::string& path) {
 
 std::string requestBody(const std::string& user, const std::string& password, const std::string& action,
                         int64_t iteration, const std::string& device, const std::string& data) {
-  std::string body = "{\"user\":";
-  appendJsonString(body, user);
-  body += ",\"password\":";
-  appendJsonString(body, password);
-  body += ",\"action\":";
-  appendJsonString(body, action);
-  body += ",\"iteration\":" + std::to_string(iteration);
-  if (!device.empty()) {
-    body += ",\"device\":";
-    appendJsonString(body, device);
-  }
+  const auto field = [](const char* name, const std::string& text) {
+    std::string out = std::string(",\"") + name + "\":";
+    appendJsonString(out, text);
+    return out;
+  };
+  std::string body = "{" + field("user", user).substr(1) + field("password", password) +
+                     field("action", action) + ",\"iteration\":" + std::to_string(iteration);
+  if (!device.empty()) body += field("device", device);
   if (!data.empty()) body += ",\"data\":" + data;
   return body + "}";
 }

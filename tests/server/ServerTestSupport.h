@@ -8,6 +8,11 @@
 
 #include <QTemporaryDir>
 
+#include <arpa/inet.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
 #include <memory>
 #include <optional>
 #include <string>
@@ -23,8 +28,7 @@ std::string storageName(const testing::TestParamInfo<Storage>& info);
 // The PostgreSQL connection URI of the throw-away cluster (scripts/pg-test-cluster.sh), or empty.
 std::string postgresUri();
 
-// One storage location for one test: a SQLite file in a temp folder, or a fresh PostgreSQL schema that
-// is dropped afterwards.
+// A SQLite file in a temp folder, or a fresh PostgreSQL schema dropped afterwards.
 class StorageLocation {
  public:
   explicit StorageLocation(Storage storage);
@@ -62,8 +66,43 @@ Reply get(int port, const std::string& path);
 std::string requestBody(const std::string& user, const std::string& password, const std::string& action,
                         int64_t iteration, const std::string& device = {}, const std::string& data = {});
 
-// The fixture: one server per test, parameterised by storage. PostgreSQL runs only when
-// TESSAL_TEST_POSTGRES names a cluster.
+// One TCP connection driven byte by byte, the way a hostile client would.
+class RawConnection {
+ public:
+  explicit RawConnection(int port) {
+    fd_ = socket(AF_INET, SOCK_STREAM, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(static_cast<uint16_t>(port));
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    connected_ = connect(fd_, reinterpret_cast<sockaddr*>(&address), sizeof address) == 0;
+    timeval timeout{5, 0};
+    setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
+  }
+  ~RawConnection() { ::close(fd_); }
+  bool connected() const { return connected_; }
+  int fd() const { return fd_; }
+  bool send(const std::string& bytes) {
+    return ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+  }
+  // Everything until the server closes (or 5 s pass).
+  std::string readAll() {
+    std::string out;
+    char buffer[4096];
+    for (ssize_t got; (got = recv(fd_, buffer, sizeof buffer, 0)) > 0;) out.append(buffer, size_t(got));
+    return out;
+  }
+  static int status(const std::string& response) {
+    if (response.rfind("HTTP/1.1 ", 0) != 0 || response.size() < 12) return 0;
+    return std::stoi(response.substr(9, 3));
+  }
+
+ private:
+  int fd_ = -1;
+  bool connected_ = false;
+};
+
+// One server per test, on each storage (PostgreSQL when TESSAL_TEST_POSTGRES names a cluster).
 class ServerTest : public testing::TestWithParam<Storage> {
  protected:
   void SetUp() override;

@@ -1,6 +1,4 @@
-// The sync endpoint as clients meet it: request and reply shapes, refusals, accounts, the sign-up page,
-// and how iterations, devices and deletes make concurrent clients of one account converge (each known
-// hazard as the requests such clients send, one conversation per row).
+// The sync endpoint as clients meet it; each known hazard of concurrent clients is one conversation row.
 #include "ServerTestSupport.h"
 
 #include <algorithm>
@@ -10,8 +8,7 @@
 namespace servertest {
 namespace {
 
-// A value with object members in name order and, when `sorted`, array elements too: the storages may
-// list records and deletions in any order.
+// Object members in name order, array elements too when `sorted` (storages list in any order).
 JsonValue canonical(const JsonValue& value, bool sorted = false) {
   if (value.isObject()) {
     std::vector<JsonValue::Member> members;
@@ -25,8 +22,7 @@ JsonValue canonical(const JsonValue& value, bool sorted = false) {
   return JsonValue::array(std::move(elements));
 }
 
-// A reply in short: "save 2", "code 4 at 0", or "head 3 {records} [deleted]". Every record of a head
-// comes under both "i" and "u"; only when they differ are both shown.
+// A reply in short: "save 2", "code 4 at 0", or "head 3 {records} [deleted]" ("i" and "u" if they differ).
 std::string describe(const Reply& reply) {
   if (reply.status != 200 || !reply.json) return "status " + std::to_string(reply.status);
   if (reply.code() != 0) {

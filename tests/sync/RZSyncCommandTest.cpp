@@ -63,10 +63,6 @@ TEST(RZSyncCommand, FailsWithAMessage) {
        {},
        "The server refused: Wrong e-mail address or password. - (Code: 2)"},
       {"no usable answer", LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"), {}, "Sync failed: "},
-      {"not of the protocol's shape",
-       LoopbackHttpServer::raw(R"({"action": "head", "iteration": -5, "result": {}})"),
-       {},
-       "Sync failed: "},
       {"no answer in time", QByteArray(), {"--timeout", "1"}, "Not in step with the server after 1 seconds."},
   };
   for (const Case& c : cases) {

@@ -20,8 +20,7 @@ Decimal dec(const char* text) {
 
 }  // namespace
 
-// Integers stay integers; every other number, money above all, is a decimal that goes out as the very
-// same text it came in as (no double on the way). Exponents are written out.
+// Integers stay integers; other numbers are decimals written as they came (exponents written out).
 TEST(RZSyncJSON, NumbersKeepTheirKindAndDigits) {
   const QMetaType integer = QMetaType::fromType<qint64>(), decimal = QMetaType::fromType<Decimal>();
   const struct {
@@ -66,14 +65,13 @@ TEST(RZSyncJSON, StringsRoundTripThroughAStandardParser) {
 }
 
 TEST(RZSyncJSON, ContainersNullsAndBooleans) {
+  // A repeated key: the last one counts.
   const QVariant value = parsed(R"({"a": [1, true, false, null, "x", {}], "b": {"c": []}, "b": {"d": 1}})");
-  const QVariantMap map = value.toMap();
-  const QVariantList a = map.value("a").toList();
-  ASSERT_EQ(a.size(), 6);
-  EXPECT_EQ(a[1].typeId(), QMetaType::Bool);
-  EXPECT_FALSE(a[3].isValid());  // null is a null variant
-  EXPECT_EQ(a[5].typeId(), QMetaType::QVariantMap);
-  EXPECT_EQ(map.value("b").toMap().keys(), QStringList{"d"});  // a repeated key: the last one counts
+  const QVariantList a = value.toMap().value("a").toList();
+  EXPECT_EQ(a.value(1).typeId(), QMetaType::Bool);
+  EXPECT_FALSE(a.value(3).isValid());  // null is a null variant
+  EXPECT_EQ(RZSyncJSON::write(value, RZSyncJSON::Style::Compact),
+            R"({"a":[1,true,false,null,"x",{}],"b":{"d":1}})");
   EXPECT_TRUE(RZSyncJSON::isContainer(value));
   EXPECT_TRUE(RZSyncJSON::isContainer(parsed("[]")));
   EXPECT_FALSE(RZSyncJSON::isContainer(parsed("\"text\"")));

@@ -40,6 +40,10 @@ class RZSyncManagerTest : public ::testing::Test {
       return request.json().value("action") == "save" ? saveReply(++head) : headReply(head);
     };
   }
+  // From now on heads get `head` and saves get `save`.
+  void answer(const QByteArray& head, const QByteArray& save) {
+    server.handler = [=](const HttpRequest& r) { return r.json().value("action") == "save" ? save : head; };
+  }
 
   // The bodies of the requests with this action since the fixture's set-up was done.
   QList<QVariantMap> sent(const QString& action) const {
@@ -90,8 +94,7 @@ TEST(RZSyncManagerEndpoint, ServerAddressBecomesTheEndpoint) {
   }
 }
 
-// Records, their owners, dates and money arrive as sent; a record named only as an owner is made, empty,
-// under its identity. What came from the server is saved but not journaled, and the user cannot undo it.
+// Records arrive as sent, owners named only made empty; saved, not journaled, not undoable.
 TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney) {
   const std::pair<QString, QString> records[] = {
       {"C@WTClient", R"({"name":"Acme"})"},
@@ -129,9 +132,7 @@ TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney
   EXPECT_EQ(synctest::storedRecord(*client.context, "P@WTProject"), records[1].second.toStdString());
 }
 
-// Local edits are saved (and journaled) before the server's changes arrive; the server's value of a key
-// replaces a pending local one, which then is not sent; the rest is sent with the head's iteration.
-// A cleared value arrives as null and clears it here.
+// Local edits are saved first; the server's value (null clears) replaces a pending one, which is not sent.
 TEST_F(RZSyncManagerTest, ServerValueWinsOverAPendingLocalKey) {
   WTTask* task = syncedTask();
   const QString id = task->uuid();
@@ -142,11 +143,9 @@ TEST_F(RZSyncManagerTest, ServerValueWinsOverAPendingLocalKey) {
   setUpRequests = server.requests.size();
   task->setName("Local name");
   task->setNotes("Local notes");  // not saved yet: the poll saves it first
-  server.handler = [&](const HttpRequest& request) {
-    if (request.json().value("action") == "save") return saveReply(6);
-    return headReply(
-        5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}, {"budget", {}}, {"rate", {}}}}}));
-  };
+  answer(
+      headReply(5, changeSet({}, {{id, QVariantMap{{"name", "Server name"}, {"budget", {}}, {"rate", {}}}}})),
+      saveReply(6));
   ASSERT_TRUE(client.syncOnce());
   EXPECT_EQ(synctest::storedRecord(*client.context, id),
             QString(R"({"name":"Server name","notes":"Local notes","project":"%1"})")
@@ -175,9 +174,8 @@ TEST_F(RZSyncManagerTest, ServerValueDropsThePendingKeyOfItsOwnSectionOnly) {
   EXPECT_EQ(client.find<WTTask>("A@WTTask")->notes(), "theirs");
 }
 
-// The server's deletion takes the record's items here too. What was pending for the record itself is
-// dropped; an item filed under it here only is deleted on the server with the next save (it may have
-// been moved there only here, and then the server still has it elsewhere).
+// The server's deletion takes the record's items here too; an item filed under it here only goes to the
+// server as a deletion (the server may still have it elsewhere).
 TEST_F(RZSyncManagerTest, ServerDeletionTakesOwnedRecordsHere) {
   WTTask* task = syncedTask();
   const QString taskId = task->uuid();
@@ -186,10 +184,7 @@ TEST_F(RZSyncManagerTest, ServerDeletionTakesOwnedRecordsHere) {
   note->setTask(task);
   const QString noteId = note->uuid();
   client.save();
-  server.handler = [&](const HttpRequest& request) {
-    if (request.json().value("action") == "save") return saveReply(20);
-    return headReply(10, changeSet({}, {}, {taskId, "Gone@WTNote"}));
-  };
+  answer(headReply(10, changeSet({}, {}, {taskId, "Gone@WTNote"})), saveReply(20));
   ASSERT_TRUE(client.syncOnce());
   EXPECT_EQ(client.find<WTTask>(taskId), nullptr);
   EXPECT_EQ(client.find<WTNote>(noteId), nullptr);
@@ -201,13 +196,11 @@ TEST_F(RZSyncManagerTest, ServerDeletionTakesOwnedRecordsHere) {
   EXPECT_EQ(client.track().iteration(), 20);
 }
 
-// A deletion still waiting to be sent wins: the merge neither brings the record back nor files
-// anything under it, and the deletion goes out with the next save.
+// A deletion still waiting to be sent wins: the merge neither revives the record nor files under it.
 TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
   WTTask* task = syncedTask();
   WTProject* project = task->project();
-  const QString taskId = task->uuid();
-  const QString projectId = project->uuid();
+  const QString taskId = task->uuid(), projectId = project->uuid();
   auto* kept = client.context->insertNewObject<WTTask>();
   kept->setProject(project);
   auto* movedItem = client.context->insertNewObject<WTNote>();
@@ -217,9 +210,7 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
   client.save();
   ASSERT_TRUE(client.syncOnce());
   setUpRequests = server.requests.size();
-  const QString keptId = kept->uuid();
-  const QString movedId = movedItem->uuid();
-  const QString acmeId = acme->uuid();
+  const QString keptId = kept->uuid(), movedId = movedItem->uuid(), acmeId = acme->uuid();
   client.context->deleteObject(task);
   client.context->deleteObject(acme);
   client.save();
@@ -232,14 +223,9 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
       {{taskId, QVariantMap{{"name", "Renamed elsewhere"}}},
        {movedId, QVariantMap{{"task", taskId}}},
        {projectId, QVariantMap{{"tasks", QStringList{taskId, keptId}}}}});
-  server.handler = [&](const HttpRequest& request) {
-    if (request.json().value("action") == "save") return saveReply(31);
-    return headReply(30, result);
-  };
+  answer(headReply(30, result), saveReply(31));
   ASSERT_TRUE(client.syncOnce());
 
-  // Nothing is filed under the deleted task or client; the server takes care of what it has there once
-  // the deletions arrive (it deletes or clears them and tells every device).
   const std::pair<QString, QString> records[] = {
       {taskId, "(none)"},
       {acmeId, "(none)"},
@@ -254,20 +240,16 @@ TEST_F(RZSyncManagerTest, PendingDeletionWinsOverTheMerge) {
     EXPECT_EQ(synctest::storedRecord(*client.context, uuid), values.toStdString());
   ASSERT_EQ(sent("save").size(), 1);
   const QStringList deleted = sent("save")[0].value("data").toMap().value("x").toStringList();
-  EXPECT_TRUE(deleted.contains(taskId));
-  EXPECT_TRUE(deleted.contains(acmeId));
+  EXPECT_TRUE(deleted.contains(taskId) && deleted.contains(acmeId)) << deleted.join(' ').toStdString();
   EXPECT_FALSE(client.track().hasChanges());
 }
 
-// Once a head is merged and saved the journal is at that head, even when the save that follows is
-// refused: the next poll must not bring the same changes again.
+// A merged head moves the journal's iteration even when the save after it is refused.
 TEST_F(RZSyncManagerTest, IterationMovesToTheMergedHeadBeforeTheSave) {
   WTTask* task = syncedTask();
   task->setName("Pending");
-  server.handler = [&](const HttpRequest& request) {
-    if (request.json().value("action") == "save") return errorReply("Poll head first", 4, 0);
-    return headReply(9, changeSet({{"Other@WTTask", QVariantMap{{"name", "from elsewhere"}}}}));
-  };
+  answer(headReply(9, changeSet({{"Other@WTTask", QVariantMap{{"name", "from elsewhere"}}}})),
+         errorReply("Poll head first", 4, 0));
   ASSERT_TRUE(client.syncOnce());
   EXPECT_EQ(client.track().iteration(), 9);
   EXPECT_TRUE(client.track().hasChanges());
@@ -278,15 +260,12 @@ TEST_F(RZSyncManagerTest, IterationMovesToTheMergedHeadBeforeTheSave) {
   EXPECT_EQ(heads[1].value("iteration").toLongLong(), 9);
 }
 
-// A save whose connection closes before any answer, however often it is tried, keeps the whole journal;
-// what the user does while a save is on its way stays in the journal after the server confirms it.
+// A save that gets no answer keeps the journal; edits made while one is on its way outlive its reply.
 TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
   WTTask* task = syncedTask();
   task->setName("First");
   task->setNotes("Notes");
-  server.handler = [&](const HttpRequest& request) {
-    return request.json().value("action") == "save" ? QByteArray() : headReply(head);
-  };
+  answer(headReply(head), QByteArray());
   client.manager->sync();
   ASSERT_TRUE(waitUntil([&] {
     server.dropHeld();
@@ -311,9 +290,7 @@ TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
   EXPECT_EQ(RZSyncTrack(client.journalPath()).iteration(), 4);
 }
 
-// How a refusal is taken: a stale head (code 4) naming an iteration resends the journal claiming it, one
-// naming none keeps the journal for the next poll, a reply without an iteration changes nothing, and any
-// other code is shown once and switches syncing off.
+// Stale head (code 4): with an iteration resend claiming it, without keep the journal; others stop syncing.
 struct RefusalCase {
   const char* what;
   QByteArray answer;      // to the first request; later heads find nothing new and saves are confirmed
@@ -371,8 +348,7 @@ INSTANTIATE_TEST_SUITE_P(
                                   "Wrong e-mail address or password. - (Code: 2)", nullptr}),
     [](const auto& info) { return std::string(info.param.what); });
 
-// Which wait comes next: none while off, the poll's while all goes well, the retry's after a failure,
-// the short one after a save.
+// The next wait: none while off, the poll's, the retry's after a failure, the short one after a save.
 TEST_F(RZSyncManagerTest, TheWaitBeforeTheNextPollFollowsWhatHappened) {
   RZSyncManager& manager = *client.manager;
   EXPECT_EQ(manager.scheduledInterval(), -1);  // off until enabled
@@ -446,8 +422,7 @@ TEST_F(RZSyncManagerTest, NothingIsSentWithoutAServerAddress) {
   EXPECT_TRUE(client.idle());
 }
 
-// The merge waits until local edits are saved (and so journaled): when that save fails, the reply is
-// left alone and the next poll asks again from the same iteration.
+// When saving local edits fails, the reply is not merged and the next poll asks from the same iteration.
 TEST_F(RZSyncManagerTest, NoMergeWhenLocalEditsCannotBeSaved) {
   WTTask* task = syncedTask();
   task->setName("Unsaved");
@@ -457,10 +432,7 @@ TEST_F(RZSyncManagerTest, NoMergeWhenLocalEditsCannotBeSaved) {
     return Error{1, QStringLiteral("disk full")};
   });
   const qint64 iteration = client.track().iteration();
-  server.handler = [&](const HttpRequest& request) {
-    if (request.json().value("action") == "save") return saveReply(51);
-    return headReply(50, changeSet({{"New@WTTask", QVariantMap{{"name", "from elsewhere"}}}}));
-  };
+  answer(headReply(50, changeSet({{"New@WTTask", QVariantMap{{"name", "from elsewhere"}}}})), saveReply(51));
   ASSERT_TRUE(client.syncOnce());
   EXPECT_EQ(saves, 1);
   EXPECT_EQ(client.find<WTTask>("New@WTTask"), nullptr);
@@ -472,15 +444,16 @@ TEST_F(RZSyncManagerTest, NoMergeWhenLocalEditsCannotBeSaved) {
   EXPECT_EQ(sent("head").last().value("iteration").toLongLong(), iteration);
 }
 
-// A reply not of the protocol's exact shape is a failed exchange: shown once for the run of failures,
-// retried, and nothing of it reaches the journal, its file or the store.
+// A reply of the wrong shape fails (shown once per run of failures) and reaches neither journal nor store.
 TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
   WTTask* task = syncedTask();
   const qint64 before = client.track().iteration();
-  QFile file(client.journalPath());
-  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
-  const QByteArray journalFile = file.readAll();
-  file.close();
+  const auto journalFile = [&] {
+    QFile file(client.journalPath());
+    return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
+  };
+  const QByteArray journalBefore = journalFile();
+  ASSERT_FALSE(journalBefore.isEmpty());
   std::istringstream bad(
       R"({"action":"head","iteration":-5,"result":{}} {"action":"head","iteration":"abc","result":{}})"
       R"( {"action":"head","iteration":true,"result":{}} {"action":"head","iteration":1e300,"result":{}})"
@@ -502,14 +475,12 @@ TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
     EXPECT_EQ(client.track().iteration(), before);
     EXPECT_EQ(task->name(), "Design");
   }
-  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
-  EXPECT_EQ(file.readAll(), journalFile);
+  EXPECT_EQ(journalFile(), journalBefore);
   ASSERT_EQ(client.presenter.networkErrors.size(), 1);  // one run of failures, shown once
   EXPECT_TRUE(client.presenter.networkErrors[0].contains("not in the expected form"))
       << client.presenter.networkErrors[0].toStdString();
   EXPECT_TRUE(client.presenter.syncErrors.isEmpty());
 
-  // The next good reply ends the run and is taken.
   server.handler = [&](const HttpRequest&) { return headReply(before + 1); };
   ASSERT_TRUE(client.syncOnce());
   EXPECT_FALSE(client.manager->hasNetworkError());

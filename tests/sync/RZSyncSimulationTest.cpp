@@ -1,8 +1,5 @@
-// Several installations on one account make random edits, sync at random moments through a proxy that
-// loses requests and replies, while the real server restarts once; run to quiescence, every store must
-// hold the same records with the same values, and every change the server applied must be there unless
-// a later change replaced it or a deletion took it.
-//
+// Installations make random edits and sync through a lossy proxy while the real server restarts; once
+// quiet, all stores are equal and hold every applied change not replaced or deleted since.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
 #include "Decimal.h"
 #include "ServerTestSupport.h"
@@ -18,8 +15,6 @@
 
 #include <gtest/gtest.h>
 
-#include <QTcpSocket>
-
 #include <iostream>
 #include <random>
 
@@ -32,11 +27,8 @@ using synctest::SyncServerProcess;
 
 namespace {
 
-// Sits between the clients and the server and holds every request until the simulation releases it:
-// then it forwards the request and its answer, unless it loses the request (the server never sees it)
-// or the reply (the server acts on it, the client hears a gateway error). Keeps, in order, every save
-// the server accepted: that is what must survive. Holding makes a run depend on its seed only, not on
-// how fast the machine is.
+// Holds every request until released (so a run depends on its seed only, not on the machine's speed),
+// then forwards it or loses the request or the reply; keeps every save the server accepted, in order.
 class LossyProxy {
  public:
   LossyProxy() {
@@ -56,26 +48,17 @@ class LossyProxy {
       front.answerHeld(kGatewayError);
       return;
     }
-    const QByteArray answer = forward(request);
-    const qsizetype bodyStart = answer.indexOf("\r\n\r\n");
-    const QVariantMap reply = RZSyncJSON::parse(answer.mid(bodyStart + 4)).value_or(QVariant()).toMap();
-    if (qEnvironmentVariableIsSet("TESSAL_SYNC_TRACE")) {
-      QVariantMap shown = request.json();
-      shown.remove("password");
-      shown.insert("device", shown.value("device").toString().left(8));
-      std::cerr << "REQUEST " << RZSyncJSON::write(shown, RZSyncJSON::Style::Compact).toStdString()
-                << "\nREPLY " << (fate == Fate::LoseReply ? "(lost) " : "")
-                << answer.mid(bodyStart + 4).toStdString() << "\n";
-    }
-    if (reply.value("action") == "save" && !reply.contains("error")) {
+    const servertest::Reply reply =
+        servertest::post(backendPort_, request.path.toStdString(), request.body.toStdString());
+    const QByteArray body = QByteArray::fromStdString(reply.body);
+    const QVariantMap answer = RZSyncJSON::parse(body).value_or(QVariant()).toMap();
+    if (answer.value("action") == "save" && !answer.contains("error"))
       appliedSaves.append(request.json().value("data").toMap());
-    }
-    if (answer.isEmpty() || fate == Fate::LoseReply) {
-      if (fate == Fate::LoseReply) ++lostReplies;
-      front.answerHeld(kGatewayError);  // a lost reply, or the server is down
-      return;
-    }
-    front.answerHeld(answer);
+    lostReplies += fate == Fate::LoseReply ? 1 : 0;
+    // A lost reply, or the server is down.
+    front.answerHeld(reply.status == 0 || fate == Fate::LoseReply
+                         ? kGatewayError
+                         : LoopbackHttpServer::raw(body, reply.status));
   }
   // Requests that arrived and wait for release.
   qsizetype held() const { return front.requests.size() - released_; }
@@ -86,31 +69,12 @@ class LossyProxy {
   LoopbackHttpServer front;
 
  private:
-  // One blocking exchange with the server; empty when it cannot be reached.
-  QByteArray forward(const HttpRequest& request) const {
-    QTcpSocket socket;
-    socket.connectToHost(QHostAddress::LocalHost, quint16(backendPort_));
-    if (!socket.waitForConnected(2000)) return {};
-    socket.write(
-        request.method + ' ' + request.path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n" +
-        "Content-Type: application/json\r\nContent-Length: " + QByteArray::number(request.body.size()) +
-        "\r\n\r\n" + request.body);
-    QByteArray answer;
-    while (socket.state() == QAbstractSocket::ConnectedState || socket.bytesAvailable() > 0) {
-      if (socket.bytesAvailable() == 0 && !socket.waitForReadyRead(10000)) break;
-      answer += socket.readAll();
-    }
-    answer += socket.readAll();
-    return answer.startsWith("HTTP/1.1 ") ? answer : QByteArray();
-  }
-
   int backendPort_ = 0;
   qsizetype released_ = 0;
 };
 
-// What the accepted saves add up to: per record, deleted or its last value of each key. After each
-// save the server's own consequences follow, as it applies them: what is filed under a deleted task or
-// project goes too (for good), a project under a deleted client loses it.
+// What the accepted saves add up to, with the server's consequences: what is filed under a deleted task
+// or project goes too, a project under a deleted client loses it.
 struct Expected {
   QSet<QString> deleted;
   QMap<QString, QVariantMap> values;
@@ -119,14 +83,13 @@ struct Expected {
     for (const char* section : {"i", "u"}) {
       const QVariantMap entries = save.value(section).toMap();
       for (auto it = entries.begin(); it != entries.end(); ++it) {
-        if (deleted.contains(it.key())) continue;  // a deleted record stays deleted
-        QVariantMap& record = values[it.key()];
-        const QVariantMap fields = it.value().toMap();
-        for (auto field = fields.begin(); field != fields.end(); ++field)
-          record.insert(field.key(), field.value());
+        if (!deleted.contains(it.key())) values[it.key()].insert(it.value().toMap());  // deleted stays so
       }
     }
-    for (const QVariant& uuid : save.value("x").toList()) remove(uuid.toString());
+    for (const QVariant& uuid : save.value("x").toList()) {
+      deleted.insert(uuid.toString());
+      values.remove(uuid.toString());
+    }
     for (bool changed = true; changed;) {
       changed = false;
       for (auto it = values.begin(); it != values.end();) {
@@ -149,13 +112,6 @@ struct Expected {
       }
     }
   }
-
-  void remove(const QString& uuid) {
-    deleted.insert(uuid);
-    values.remove(uuid);
-  }
-
-  bool isLive(const QString& uuid) const { return values.contains(uuid); }
 };
 
 class Simulation {
@@ -165,13 +121,8 @@ class Simulation {
     std::uniform_int_distribution<int> clients(3, 5);
     const int count = clients(random_);
     // Syncing stays "off": no timer polls on its own, every exchange is one the run starts.
-    for (int i = 0; i < count; ++i) {
+    for (int i = 0; i < count; ++i)
       clients_.push_back(std::make_unique<SyncClient>(proxy_.address(), kUser, kPassword));
-      if (qEnvironmentVariableIsSet("TESSAL_SYNC_TRACE")) {
-        std::cerr << "CLIENT " << i << " " << clients_.back()->network().device().left(8).toStdString()
-                  << "\n";
-      }
-    }
   }
 
   static inline const QString kUser = QStringLiteral("sim@example.org");
@@ -218,10 +169,7 @@ class Simulation {
     return false;
   }
   void check() {
-    for (auto& client : clients_) {
-      EXPECT_TRUE(client->presenter.syncErrors.isEmpty())
-          << client->presenter.syncErrors.join('\n').toStdString();
-    }
+    for (auto& client : clients_) EXPECT_EQ(client->presenter.syncErrors.join('\n').toStdString(), "");
     const auto first = snapshot(*clients_[0]->context);
     for (size_t i = 1; i < clients_.size(); ++i) {
       const auto other = snapshot(*clients_[i]->context);
@@ -231,18 +179,14 @@ class Simulation {
     Expected expected;
     for (const QVariantMap& save : proxy_.appliedSaves) expected.apply(save);
     WTObjectContext& context = *clients_[0]->context;
-    QSet<QString> live;
-    for (auto it = expected.values.begin(); it != expected.values.end(); ++it) {
-      if (expected.isLive(it.key())) live.insert(it.key());
+    for (const QString& uuid : first.keys() + expected.values.keys()) {
+      EXPECT_TRUE(first.contains(uuid) && expected.values.contains(uuid))
+          << uuid.toStdString()
+          << (first.contains(uuid) ? " is in the stores but was deleted or never sent" : " is missing");
     }
-    for (const QString& uuid : first.keys()) {
-      EXPECT_TRUE(live.contains(uuid))
-          << uuid.toStdString() << " is in the stores but was deleted or never sent";
-    }
-    for (const QString& uuid : live) {
+    for (auto [uuid, values] : expected.values.asKeyValueRange()) {
       WTObject* object = context.objectWithUUID(uuid, false);
-      ASSERT_NE(object, nullptr) << uuid.toStdString() << " was saved and not deleted, but is missing";
-      const QVariantMap values = expected.values.value(uuid);
+      if (!object) continue;
       for (auto value = values.begin(); value != values.end(); ++value) {
         // The server keeps the task order itself.
         if (value.key() == "tasks" || value.key() == "uuid") continue;
@@ -260,10 +204,12 @@ class Simulation {
     }
   }
 
-  int saves() const { return int(proxy_.appliedSaves.size()); }
-  int lost() const { return proxy_.lostRequests + proxy_.lostReplies; }
-  size_t clientCount() const { return clients_.size(); }
-  qsizetype records() const { return clients_[0]->context->count(); }
+  void printSummary() const {
+    std::cout << "seed " << seed_ << ": " << clients_.size() << " clients, " << proxy_.appliedSaves.size()
+              << " saves applied, " << proxy_.lostRequests + proxy_.lostReplies
+              << " requests or replies lost, " << clients_[0]->context->count()
+              << " records in every store\n";
+  }
 
  private:
   int roll(int n) { return std::uniform_int_distribution<int>(0, n - 1)(random_); }
@@ -316,24 +262,18 @@ class Simulation {
       WTTask* task = any<WTTask>(client);
       if (!task) return;
       const int type = roll(5);
-      WTItem* item = type == 3 ? static_cast<WTItem*>(insert<WTNote>(client)) : nullptr;
-      if (type == 0) {
-        auto* time = insert<WTTime>(client);
+      WTItem* item = type == 0   ? insert<WTTime>(client)
+                     : type == 1 ? insert<WTFlat>(client)
+                     : type == 2 ? insert<WTExpense>(client)
+                     : type == 3 ? static_cast<WTItem*>(insert<WTNote>(client))
+                                 : insert<WTToDo>(client);
+      if (auto* time = dynamic_cast<WTTime*>(item)) {
         const Date start = day();
         time->setStartDate(start);
         time->setEndDate(start.addingSeconds(60.0 * roll(300)));
-        item = time;
-      } else if (type == 1) {
-        auto* flat = insert<WTFlat>(client);
-        flat->setMinutes(roll(600));
-        item = flat;
-      } else if (type == 2) {
-        auto* expense = insert<WTExpense>(client);
-        expense->setExpense(money());
-        item = expense;
-      } else if (type == 4) {
-        item = insert<WTToDo>(client);
       }
+      if (auto* flat = dynamic_cast<WTFlat*>(item)) flat->setMinutes(roll(600));
+      if (auto* expense = dynamic_cast<WTExpense*>(item)) expense->setExpense(money());
       item->setStartDate(day());
       item->setName(text());
       item->setTask(task);
@@ -344,11 +284,7 @@ class Simulation {
       if (change == 0) object->setName(text());
       if (change == 1) object->setNotes(text());
       if (change == 2) object->setRate(money());
-      if (change == 3 && roll(2)) {
-        object->setRate(std::nullopt);
-      } else if (change == 3) {
-        object->setNotes(QString());
-      }
+      if (change == 3) roll(2) ? object->setRate(std::nullopt) : object->setNotes(QString());
       if (change == 4) {
         if (auto* task = dynamic_cast<WTTask*>(object))
           task->setBudget(roll(2) ? std::optional(money()) : std::nullopt);
@@ -375,11 +311,9 @@ class Simulation {
       WTTask* task = any<WTTask>(client);
       WTProject* project = any<WTProject>(client);
       if (!task || !project) return;
-      if (task->project() == project) {
-        project->moveTask(task, roll(int(project->tasks().size())));
-      } else {
-        task->setProject(project, roll(int(project->tasks().size()) + 1));
-      }
+      const int tasks = int(project->tasks().size());
+      if (task->project() == project) project->moveTask(task, roll(tasks));
+      if (task->project() != project) task->setProject(project, roll(tasks + 1));
       if (roll(2)) task->setBudget(money());
     } else if (kind == 8 && roll(2)) {  // move an item
       WTItem* item = anyItem(client);
@@ -477,9 +411,7 @@ TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
     simulation.run(600);
     ASSERT_TRUE(simulation.settle()) << "no quiescence";
     simulation.check();
-    std::cout << "seed " << seed << ": " << simulation.clientCount() << " clients, " << simulation.saves()
-              << " saves applied, " << simulation.lost() << " requests or replies lost, "
-              << simulation.records() << " records in every store\n";
+    simulation.printSummary();
     if (HasFailure()) break;
   }
 }

@@ -1,8 +1,7 @@
 #pragma once
 
-// Real parts for the sync tests: an HTTP server on 127.0.0.1 inside the test (answers are scripted per
-// test), a client made of a real store file, context and sync manager in a temp folder, and the real
-// tessal-sync-server process.
+// Real parts for the sync tests: a scripted HTTP server on 127.0.0.1, a client over a real store file,
+// and the real tessal-sync-server process.
 #include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
@@ -33,8 +32,7 @@
 
 namespace synctest {
 
-// Runs the event loop until `done` holds or `ms` pass; returns `done()`. Looks again after every batch
-// of events (QTest::qWaitFor sleeps between looks, which adds up over a long simulation).
+// Runs the event loop until `done` holds or `ms` pass, looking after every batch (qWaitFor sleeps).
 inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
   const QDeadlineTimer deadline(ms);
   QTimer wake;  // no batch of events ever waits longer than this
@@ -69,9 +67,8 @@ struct HttpRequest {
   QVariantMap json() const { return RZSyncJSON::parse(body).value_or(QVariant()).toMap(); }
 };
 
-// An HTTP/1.1 server on the main thread's event loop. Every request is recorded and answered with the
-// raw bytes the handler returns; an empty answer holds the request (the client keeps waiting) until
-// answerHeld() answers it.
+// An HTTP/1.1 server on the event loop: records each request and answers the handler's raw bytes; an
+// empty answer holds the request until answerHeld().
 class LoopbackHttpServer {
  public:
   using Handler = std::function<QByteArray(const HttpRequest&)>;
@@ -202,8 +199,7 @@ class DefaultsCredentials final : public RZSyncNetworkCredentialDelegate {
   UserDefaults& defaults_;
 };
 
-// One installation: its own folder with settings, store file and journal, and a sync manager over them.
-// The manager is made with syncing off; tests drive it with sync() or enableSync().
+// One installation in its own folder, with a sync manager made with syncing off.
 class SyncClient {
  public:
   SyncClient(const QString& server, const QString& user = QStringLiteral("ann@example.org"),
@@ -234,10 +230,7 @@ class SyncClient {
     manager.reset();
     context.reset();
   }
-  void reopen() {
-    close();
-    open();
-  }
+  void reopen() { close(), open(); }
 
   QString journalPath() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
   RZSyncTrack& track() const { return *manager->syncTrack(); }
@@ -277,8 +270,7 @@ inline QVariant storedValue(const WTObject* object, const QString& key) {
   return object->valueForKey(key);
 }
 
-// A record's stored values in journal form (dates in whole seconds, money as written, records as their
-// uuid), a project's task order included.
+// A record's stored values in journal form, a project's task order included.
 inline QVariantMap journalValues(const WTObject* object) {
   QVariantMap values;
   QStringList keys = object->storedKeys();
@@ -300,14 +292,12 @@ inline QVariantMap journalValues(const WTObject* object) {
 inline QMap<QString, QString> snapshot(WTObjectContext& context) {
   QMap<QString, QString> records;
   for (WTObject* object :
-       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>())) {
+       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
     records.insert(object->uuid(), compact(journalValues(object)));
-  }
   return records;
 }
 
-// One record's journal values without those left unset (null, false, empty, the uuid), as one line;
-// "(none)" when the store has no such record.
+// One record's journal values without unset ones or the uuid, as one line; "(none)" when missing.
 inline std::string storedRecord(WTObjectContext& context, const QString& uuid) {
   const WTObject* object = context.objectWithUUID(uuid, false);
   if (!object) return "(none)";
