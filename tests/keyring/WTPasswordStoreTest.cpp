@@ -285,8 +285,11 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     EXPECT_EQ(store.password(), kPassword);
     EXPECT_EQ(fileBytes().contains("horse"), row.where == Location::SettingsFile);
     EXPECT_EQ(kept.count(), row.where == Location::SettingsFile ? 1 : 0);
-    if (row.where == Location::Keychain) EXPECT_EQ(service.secret(kKey), kPassword.toUtf8());
-    if (row.where == Location::SettingsFile) EXPECT_EQ(fileMode(), 0600);
+    if (row.where == Location::Keychain) {
+      EXPECT_EQ(service.secret(kKey), kPassword.toUtf8());
+    } else {
+      EXPECT_EQ(fileMode(), 0600);
+    }
     if (row.behaviour.prompt == Prompt::Accepted && row.where == Location::SettingsFile) {
       // The late answer still lands in the keyring; the store has moved on, and the file keeps its copy.
       waitUntil([&] { return service.secret(kKey) == kPassword.toUtf8(); });
