@@ -43,7 +43,9 @@ TEST(DurationText, DurationsAreReadLenientlyOrStrictlyInTheUsersLocale) {
     const bool german = name == std::string("de_DE");
     for (const auto& c : cases) {
       const QString text = QString::fromUtf8(c.text);
-      if (!german) EXPECT_EQ(DurationText::minutesFromString(text), c.lenient) << '"' << c.text << '"';
+      if (!german) {
+        EXPECT_EQ(DurationText::minutesFromString(text), c.lenient) << '"' << c.text << '"';
+      }
       QString refusal = QStringLiteral("stale");
       const int expected = german ? c.typedInGerman : c.typedInEnglish;
       EXPECT_EQ(DurationText::minutesFromTypedText(text, &refusal).value_or(-1), expected)
