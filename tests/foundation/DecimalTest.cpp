@@ -52,11 +52,10 @@ std::vector<Vector> loadVectors(const std::string& op) {
     const QByteArray text = file.readLine().trimmed();
     ++line;
     if (text.isEmpty() || text.startsWith('#')) continue;
-    const QList<QByteArray> fields = text.split('\t');
-    EXPECT_EQ(fields.size(), 5) << "line " << line;
-    if (fields.size() != 5 || fields[0].toStdString() != op) continue;
-    vectors.push_back({line, fields[0].toStdString(), fields[1].toStdString(), fields[2].toStdString(),
-                       fields[3].toStdString(), fields[4].toStdString()});
+    std::vector<std::string> f;
+    for (const QByteArray& field : text.split('\t')) f.push_back(field.toStdString());
+    EXPECT_EQ(f.size(), 5u) << "line " << line;
+    if (f.size() == 5 && f[0] == op) vectors.push_back({line, f[0], f[1], f[2], f[3], f[4]});
   }
   return vectors;
 }
@@ -84,12 +83,8 @@ TEST_P(DecimalVectorTest, AgreesWithPythonsDecimalModule) {
       EXPECT_EQ(a.isIdenticalTo(b), v.exponent == "same");
       continue;
     }
-    std::optional<Decimal> result;
-    if (op == "parse") {
-      result = Decimal::fromString(QString::fromStdString(v.a));
-    } else {
-      result = apply(op, dec(v.a.c_str()), dec(v.b.c_str()));
-    }
+    const std::optional<Decimal> result = op == "parse" ? Decimal::fromString(QString::fromStdString(v.a))
+                                                        : apply(op, dec(v.a.c_str()), dec(v.b.c_str()));
     if (v.plain == "none") {
       EXPECT_FALSE(result.has_value());
       continue;
