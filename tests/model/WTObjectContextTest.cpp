@@ -128,7 +128,8 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   expense->setExpense(dec("12.30"));
   auto* todo = makeItem<WTToDo>(project->tasks()[0], start);
   todo->setCompleted(true);
-  const QString expenseId = expense->uuid();
+  const QString clientId = client->uuid(), flatId = flat->uuid(), expenseId = expense->uuid(),
+                todoId = todo->uuid();
   project->tasks()[0]->toggleTimer();
   const QMap<QString, QString> before = storedValues(*context);
   EXPECT_EQ(before.value(client->uuid() + ".rate"), "120.00");
@@ -137,8 +138,14 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
 
   saveAndReopen();
   EXPECT_EQ(storedValues(*context), before);
-  // The project's tasks keep their order, and the expense its places, as the entities' accessors read them.
+  // And as each entity's own accessors read them.
+  const WTClient* c = WTClient::objectWithUUID(clientId, context.get());
+  const WTFlat* f = WTFlat::objectWithUUID(flatId, context.get());
+  const WTToDo* t = WTToDo::objectWithUUID(todoId, context.get());
+  ASSERT_TRUE(c && f && t);
+  EXPECT_EQ(c->addressBookUID() + c->totalsUID() + QString::number(f->minutes().value_or(-1)), "ab:1tot45");
   EXPECT_EQ(WTExpense::objectWithUUID(expenseId, context.get())->expense()->toString(), "12.30");
+  EXPECT_TRUE(t->completed());
   const QList<WTTask*> tasks = context->fetch<WTProject>()[0]->tasks();
   ASSERT_EQ(tasks.size(), 3);
   EXPECT_EQ(tasks[0]->name() + tasks[1]->name() + tasks[2]->name(), "thirdfirstsecond");
