@@ -11,22 +11,14 @@
 namespace {
 
 TEST(DurationText, MinutesAsHoursAndMinutes) {
+  constexpr std::int32_t max = std::numeric_limits<std::int32_t>::max(), min = -max - 1;
+  // Hours never roll into days; negative values keep their historical look: a "0" before each signed part.
+  // clang-format off
   const std::pair<std::int32_t, const char*> cases[] = {
-      {0, "00:00"},
-      {5, "00:05"},
-      {59, "00:59"},
-      {60, "01:00"},
-      {61, "01:01"},
-      {549, "09:09"},
-      {610, "10:10"},
-      {6000, "100:00"},  // hours never roll into days
-      // Negative values keep their historical look: a "0" in front of each signed part.
-      {-5, "00:0-5"},
-      {-60, "0-1:00"},
-      {-90, "0-1:0-30"},
-      {-600, "0-10:00"},
-      {std::numeric_limits<std::int32_t>::max(), "35791394:07"},
-      {std::numeric_limits<std::int32_t>::min(), "0-35791394:0-8"}};
+      {0, "00:00"}, {5, "00:05"}, {59, "00:59"}, {60, "01:00"}, {61, "01:01"}, {549, "09:09"}, {610, "10:10"},
+      {6000, "100:00"}, {-5, "00:0-5"}, {-60, "0-1:00"}, {-90, "0-1:0-30"}, {-600, "0-10:00"},
+      {max, "35791394:07"}, {min, "0-35791394:0-8"}};
+  // clang-format on
   for (const auto& [minutes, text] : cases)
     EXPECT_EQ(DurationText::stringWithMinutes(minutes), text) << minutes;
 }
@@ -37,30 +29,15 @@ TEST(DurationText, DurationsAreReadLenientlyOrStrictlyInTheUsersLocale) {
   const struct {
     const char* text;
     int lenient, typedInEnglish, typedInGerman;
-  } cases[] = {{"45", 45, 45, 45},
-               {"1:30", 90, 90, 90},
-               {"2:0", 120, 120, 120},
-               {"0:90", 90, 90, 90},
-               {"1:00:00", 1440, 1440, 1440},  // days, hours, minutes
-               {":15", 15, 15, 15},
-               {"1:", 60, 60, 60},
-               {" 1 : 30 ", 90, 90, 90},
-               {"", 0, 0, 0},
-               {"1:2:3:4", 3064, -1, -1},  // the leftmost piece is ignored
-               {"0:0:0:0:0:7", 7, -1, -1},
-               {"abc", 0, -1, -1},
-               {"::", 0, 0, 0},
-               {"1:abc", 60, -1, -1},
-               {"5m", 0, -1, -1},
-               {"2.5", 2, -1, -1},
-               {"2,5", 0, -1, -1},
-               {"1:2.5", 62, -1, -1},
-               {"-5", -5, -1, -1},
-               {"1:-30", 30, -1, -1},
-               {"+7", 7, -1, -1},
-               {"1,000", 1000, 1000, 1},
-               {"1.000", 1, 1, 1000},
-               {"99999999999", std::numeric_limits<int>::max(), -1, -1}};
+  } cases[] = {// "1:00:00" is days, hours, minutes; of more pieces the leftmost is ignored
+               // clang-format off
+      {"45", 45, 45, 45}, {"1:30", 90, 90, 90}, {"2:0", 120, 120, 120}, {"0:90", 90, 90, 90},
+      {"1:00:00", 1440, 1440, 1440}, {":15", 15, 15, 15}, {"1:", 60, 60, 60}, {" 1 : 30 ", 90, 90, 90},
+      {"", 0, 0, 0}, {"1:2:3:4", 3064, -1, -1}, {"0:0:0:0:0:7", 7, -1, -1}, {"abc", 0, -1, -1},
+      {"::", 0, 0, 0}, {"1:abc", 60, -1, -1}, {"5m", 0, -1, -1}, {"2.5", 2, -1, -1}, {"2,5", 0, -1, -1},
+      {"1:2.5", 62, -1, -1}, {"-5", -5, -1, -1}, {"1:-30", 30, -1, -1}, {"+7", 7, -1, -1},
+      {"1,000", 1000, 1000, 1}, {"1.000", 1, 1, 1000}, {"99999999999", 2147483647, -1, -1}};
+  // clang-format on
   for (const char* name : {"en_US", "de_DE"}) {
     const UserLocale user(name);
     const bool german = name == std::string("de_DE");

@@ -25,6 +25,8 @@ static void PrintTo(const Date& date, std::ostream* out) {
 
 namespace {
 
+using namespace Qt::StringLiterals;
+
 // Expected instants are built by Qt's own time-zone code (the system's tz files), not by ICU.
 Date utc(int year, int month, int day, int hour = 0, int minute = 0, int second = 0, int ms = 0) {
   return Date::fromQDateTime(
@@ -99,18 +101,14 @@ TEST_P(RZDateInZone, TakingFieldsFromAnotherDate) {
     unsigned flags;
     Wall expected;
   };
+  // clang-format off
   const Case cases[] = {
-      {RZDate::DayUnits, {2023, 11, 3, 14, 30, 15}},
-      {RZDate::TimeUnits, {2024, 5, 14, 8, 45, 50}},
-      {RZDate::MinuteUnits, {2023, 11, 3, 8, 45, 15}},
-      {RZDate::AllFields, {2023, 11, 3, 8, 45, 50}},
-      {RZDate::Year, {2023, 5, 14, 14, 30, 15}},
-      {RZDate::Month, {2024, 11, 14, 14, 30, 15}},
-      {RZDate::Minute | RZDate::Second, {2024, 5, 14, 14, 45, 50}},
-      {0, {2024, 5, 14, 14, 30, 15}},
-      {RZDate::Weekday, {2024, 5, 14, 14, 30, 15}},
-      {RZDate::WeekUnits, {2023, 11, 3, 14, 30, 15}},
-  };
+      {RZDate::DayUnits, {2023, 11, 3, 14, 30, 15}}, {RZDate::TimeUnits, {2024, 5, 14, 8, 45, 50}},
+      {RZDate::MinuteUnits, {2023, 11, 3, 8, 45, 15}}, {RZDate::AllFields, {2023, 11, 3, 8, 45, 50}},
+      {RZDate::Year, {2023, 5, 14, 14, 30, 15}}, {RZDate::Month, {2024, 11, 14, 14, 30, 15}},
+      {RZDate::Minute | RZDate::Second, {2024, 5, 14, 14, 45, 50}}, {0, {2024, 5, 14, 14, 30, 15}},
+      {RZDate::Weekday, {2024, 5, 14, 14, 30, 15}}, {RZDate::WeekUnits, {2023, 11, 3, 14, 30, 15}}};
+  // clang-format on
   for (const Case& c : cases)
     EXPECT_EQ(RZDate::dateByTakingComponents(receiver, c.flags, other), at(c.expected))
         << "flags " << c.flags;
@@ -164,23 +162,24 @@ TEST_P(RZDateInZone, DaysAndRangesAgreeWithTheZone) {
       };
       const auto months = [&](int n) { return start(month.addMonths(n), day.day() - 1); };
       const std::string at = t.toQDateTime().toUTC().toString(Qt::ISODate).toStdString();
-      ASSERT_EQ(RZDate::midnight(t), start(day)) << at;
-      ASSERT_EQ(RZDate::tomorrow(t), start(day, 1)) << at;
-      ASSERT_EQ(RZDate::yesterday(t), start(day, -1)) << at;
-      ASSERT_EQ(RZDate::nextWeek(t), start(day, 7)) << at;
-      ASSERT_EQ(RZDate::lastWeek(t), start(day, -7)) << at;
-      ASSERT_EQ(RZDate::beginOfWeek(t), start(week)) << at;
-      ASSERT_EQ(RZDate::beginOfNextMonth(t), start(month.addMonths(1))) << at;
-      ASSERT_EQ(RZDate::beginOfLastMonth(t), start(month.addMonths(-1))) << at;
-      ASSERT_EQ(RZDate::beginOfYear(t), start(year)) << at;
-      ASSERT_EQ(RZDate::beginOfNextYear(t), start(year.addYears(1))) << at;
-      ASSERT_EQ(RZDate::beginOfLastYear(t), start(year.addYears(-1))) << at;
-      ASSERT_EQ(RZDate::nextMonth(t), months(1)) << at;
-      ASSERT_EQ(RZDate::nextYear(t), months(12)) << at;
+      // clang-format off
+      const std::pair<Op, Date> days[] = {
+          {RZDate::midnight, start(day)}, {RZDate::tomorrow, start(day, 1)},
+          {RZDate::yesterday, start(day, -1)},
+          {RZDate::nextWeek, start(day, 7)}, {RZDate::lastWeek, start(day, -7)},
+          {RZDate::beginOfWeek, start(week)},
+          {RZDate::beginOfNextMonth, start(month.addMonths(1))},
+          {RZDate::beginOfLastMonth, start(month.addMonths(-1))},
+          {RZDate::beginOfYear, start(year)}, {RZDate::beginOfNextYear, start(year.addYears(1))},
+          {RZDate::beginOfLastYear, start(year.addYears(-1))}, {RZDate::nextMonth, months(1)},
+          {RZDate::nextYear, months(12)},
+          {RZDate::beginOfMinute, Date::fromSeconds(std::floor(t.secondsSince1970() / 60) * 60)}};
+      // clang-format on
+      for (std::size_t i = 0; i < std::size(days); ++i)
+        ASSERT_EQ(days[i].first(t), days[i].second) << at << " #" << i;
       for (int n : {-17, -1, 0, 25}) ASSERT_EQ(RZDate::addMonth(t, n), months(n)) << at << " " << n;
-      ASSERT_EQ(RZDate::beginOfMinute(t), Date::fromSeconds(std::floor(t.secondsSince1970() / 60) * 60))
-          << at;
       fixClock(t);
+      // clang-format off
       const std::pair<RZDate::Range (*)(), RZDate::Range> ranges[] = {
           {RZDate::rangeForToday, {start(day), start(day, 1)}},
           {RZDate::rangeForYesterday, {start(day, -1), start(day)}},
@@ -190,6 +189,7 @@ TEST_P(RZDateInZone, DaysAndRangesAgreeWithTheZone) {
           {RZDate::rangeForLastMonth, {start(month.addMonths(-1)), start(month)}},
           {RZDate::rangeForThisYear, {start(year), start(year.addYears(1))}},
           {RZDate::rangeForLastYear, {start(year.addYears(-1)), start(year)}}};
+      // clang-format on
       for (const auto& [range, expected] : ranges) ASSERT_EQ(range(), expected) << at;
       // Days compare by their local day, and so does today.
       const Date lastOfYesterday = start(day).addingSeconds(-0.5), tomorrow = start(day, 1);
@@ -305,16 +305,14 @@ TEST(RZDateFormat, NumericPatternsAreWrittenAsTheFormatterWritesThem) {
 TEST(RZDateTransitions, RepeatedMidnightIsTheLaterOne) {
   DateEnvironment environment;
   ASSERT_TRUE(RZDate::setDefaultTimeZone("America/Havana"));
-  const struct {
-    Date at, midnight;
-  } walk[] = {
+  const std::pair<Date, Date> walk[] = {
+      // an instant and its midnight
       {utc(2024, 11, 2, 16), utc(2024, 11, 2, 4)},    {utc(2024, 11, 3, 3, 59, 59), utc(2024, 11, 2, 4)},
       {utc(2024, 11, 3, 4, 30), utc(2024, 11, 3, 5)}, {utc(2024, 11, 3, 4, 59, 59), utc(2024, 11, 3, 5)},
       {utc(2024, 11, 3, 5), utc(2024, 11, 3, 5)},     {utc(2024, 11, 3, 5, 30), utc(2024, 11, 3, 5)},
       {utc(2024, 11, 2, 16), utc(2024, 11, 2, 4)},    {utc(2024, 11, 3, 4, 15), utc(2024, 11, 3, 5)},
   };
-  for (const auto& step : walk)
-    EXPECT_EQ(RZDate::midnight(step.at), step.midnight) << step.at.secondsSince1970();
+  for (const auto& [at, midnight] : walk) EXPECT_EQ(RZDate::midnight(at), midnight) << at.secondsSince1970();
   EXPECT_EQ(RZDate::tomorrow(utc(2024, 11, 2, 16)), utc(2024, 11, 3, 5));
   EXPECT_TRUE(RZDate::isEarlierThen(utc(2024, 11, 3, 3, 59, 59), utc(2024, 11, 3, 4, 30)));
 }
@@ -359,9 +357,8 @@ TEST(RZDateZone, WeeksBeginOnSundayInAMondayLocale) {
   DateEnvironment environment;
   setLocale("de_DE");
   ASSERT_TRUE(RZDate::setDefaultTimeZone("Europe/Berlin"));  // the calendar is made afresh under de_DE
-  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 15, 10)), utc(2024, 5, 11, 22));
-  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 12, 10)), utc(2024, 5, 11, 22));
-  EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, 13, 10)), utc(2024, 5, 11, 22));
+  for (int day : {12, 13, 15})
+    EXPECT_EQ(RZDate::beginOfWeek(utc(2024, 5, day, 10)), utc(2024, 5, 11, 22)) << day;
   fixClock(utc(2024, 5, 13, 10));  // a Monday
   EXPECT_EQ(RZDate::rangeForThisWeek()[0], utc(2024, 5, 11, 22));
 }
@@ -377,10 +374,10 @@ TEST(RZDateFormat, ShortFormatsFollowLocaleAndZone) {
     QString date_text, date_time_text;
   };
   const Case cases[] = {
-      {"en_US", "Europe/Berlin", afternoon, "5/14/24", QString::fromUtf8("5/14/24, 2:30\u202fPM")},
-      {"en_US", "America/New_York", afternoon, "5/14/24", QString::fromUtf8("5/14/24, 8:30\u202fAM")},
-      {"en_US", "Europe/Berlin", lateEvening, "5/15/24", QString::fromUtf8("5/15/24, 1:30\u202fAM")},
-      {"en_US", "America/New_York", lateEvening, "5/14/24", QString::fromUtf8("5/14/24, 7:30\u202fPM")},
+      {"en_US", "Europe/Berlin", afternoon, "5/14/24", u"5/14/24, 2:30\u202fPM"_s},
+      {"en_US", "America/New_York", afternoon, "5/14/24", u"5/14/24, 8:30\u202fAM"_s},
+      {"en_US", "Europe/Berlin", lateEvening, "5/15/24", u"5/15/24, 1:30\u202fAM"_s},
+      {"en_US", "America/New_York", lateEvening, "5/14/24", u"5/14/24, 7:30\u202fPM"_s},
       {"de_DE", "Europe/Berlin", afternoon, "14.05.24", "14.05.24, 14:30"},
       {"de_DE", "Australia/Lord_Howe", afternoon, "14.05.24", "14.05.24, 23:00"},
   };
@@ -424,28 +421,15 @@ TEST(RZDateZone, GMTShiftsUseTheOffsetOfNow) {
 // ---------------------------------------------------------------------------------------------------
 // Date itself.
 
-TEST(DateTest, ClockCanBeReplacedAndRestored) {
-  DateEnvironment environment;
-  fixClock(Date::fromSeconds(1234.5));
-  EXPECT_EQ(Date::now(), Date::fromSeconds(1234.5));
-  Date::setClockForTesting({});
-  const double system = double(QDateTime::currentMSecsSinceEpoch()) / 1000.0;
-  EXPECT_NEAR(Date::now().secondsSince1970(), system, 5.0);
-  // Sub-second precision: successive readings differ within a second and carry fractions.
+// The system clock reads with fractions of a second (a few readings, in case one falls on a whole second).
+TEST(DateTest, TheClockCarriesFractionsAndQDateTimesKeepMilliseconds) {
   bool sawFraction = false;
-  for (int i = 0; i < 5 && !sawFraction; ++i) {
-    const double s = Date::now().secondsSince1970();
-    sawFraction = s != std::floor(s);
-  }
+  for (int i = 0; i < 5 && !sawFraction; ++i) sawFraction = std::fmod(Date::now().secondsSince1970(), 1) != 0;
   EXPECT_TRUE(sawFraction);
-}
-
-TEST(DateTest, QDateTimeRoundTripKeepsMilliseconds) {
+  EXPECT_NEAR(Date::now().secondsSince1970(), double(QDateTime::currentMSecsSinceEpoch()) / 1000.0, 5.0);
   const QDateTime dateTime(QDate(2024, 5, 14), QTime(12, 30, 40, 123), QTimeZone::utc());
-  const Date date = Date::fromQDateTime(dateTime);
-  EXPECT_DOUBLE_EQ(date.secondsSince1970(), 1715689840.123);
-  EXPECT_EQ(date.toQDateTime(), dateTime);
-  EXPECT_EQ(date.toQDateTime().toMSecsSinceEpoch(), dateTime.toMSecsSinceEpoch());
+  EXPECT_DOUBLE_EQ(Date::fromQDateTime(dateTime).secondsSince1970(), 1715689840.123);
+  EXPECT_EQ(Date::fromQDateTime(dateTime).toQDateTime(), dateTime);
 }
 
 }  // namespace

@@ -12,7 +12,6 @@
 #include <QFile>
 #include <QLibrary>
 #include <QProcess>
-#include <QScopeGuard>
 #include <QSignalSpy>
 #include <QStandardPaths>
 #include <QTemporaryDir>
@@ -45,9 +44,14 @@ void waitFor(const std::optional<T>& answer) {
 
 Result<QString> readNow(WTKeychain& keychain) {
   std::optional<Result<QString>> answer;
-  keychain.readPassword(QStringLiteral("sync-password"), [&](const Result<QString>& read) { answer = read; });
+  keychain.readPassword(kKey, [&](const Result<QString>& read) { answer = read; });
   waitFor(answer);
   return answer.value_or(Result<QString>(Error{-1, QStringLiteral("no answer")}));
+}
+
+// The password read, or the error in its place.
+QString textOf(const Result<QString>& read) {
+  return read.ok() ? read.value() : QStringLiteral("error: ") + read.error().message;
 }
 
 Location storeNow(WTPasswordStore& store, const QString& password) {
@@ -55,6 +59,10 @@ Location storeNow(WTPasswordStore& store, const QString& password) {
   store.setPassword(password, [&](Location location) { where = location; });
   waitFor(where);
   return where.value_or(Location::None);
+}
+
+std::unique_ptr<WTQtKeychain> realKeychain(int timeoutMs) {
+  return std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), timeoutMs);
 }
 
 void loadNow(WTPasswordStore& store, WTPasswordStore::FilePassword filePassword = {}) {
@@ -192,10 +200,19 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
   }
 }
 
-// Sets an environment variable, or removes it for a null value.
-void setEnvironment(const char* name, const QByteArray& value) {
-  value.isNull() ? void(qunsetenv(name)) : void(qputenv(name, value));
-}
+// Sets an environment variable (unsets it for a null value) until the end of the scope.
+class ScopedEnvironment {
+ public:
+  ScopedEnvironment(const char* name, const QByteArray& value) : name_(name), previous_(qgetenv(name)) {
+    set(value);
+  }
+  ~ScopedEnvironment() { set(previous_); }
+  void set(const QByteArray& value) { value.isNull() ? void(qunsetenv(name_)) : void(qputenv(name_, value)); }
+
+ private:
+  const char* name_;
+  QByteArray previous_;
+};
 
 // The real adapter where there is no session bus (a server, an SSH login): nothing is asked, so
 // neither D-Bus nor GLib tries to start a bus through a display, and the settings file is where the
@@ -205,22 +222,15 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
   const QByteArray runtimeWithoutBus = QFile::encodeName(dir.path());
   for (const QByteArray& address : {deadSocket, QByteArray()}) {
     SCOPED_TRACE(address.toStdString());
-    const QByteArray bus = qgetenv("DBUS_SESSION_BUS_ADDRESS"), runtime = qgetenv("XDG_RUNTIME_DIR");
-    const auto restore = qScopeGuard([&] {
-      setEnvironment("DBUS_SESSION_BUS_ADDRESS", bus);
-      setEnvironment("XDG_RUNTIME_DIR", runtime);
-    });
-    setEnvironment("DBUS_SESSION_BUS_ADDRESS", address);
-    setEnvironment("XDG_RUNTIME_DIR", runtimeWithoutBus);
+    const ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address),
+        runtime("XDG_RUNTIME_DIR", runtimeWithoutBus);
     WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
     std::optional<Result<QString>> read;
-    secrets.readPassword(QStringLiteral("sync-password"),
-                         [&](const Result<QString>& answer) { read = answer; });
+    secrets.readPassword(kKey, [&](const Result<QString>& answer) { read = answer; });
     ASSERT_TRUE(read.has_value()) << "answered at once";
     EXPECT_EQ(read->error().code, WTKeychain::NoSession) << read->error().message.toStdString();
 
-    WTPasswordStore store(defaults.get(),
-                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 10000));
+    WTPasswordStore store(defaults.get(), realKeychain(10000));
     QSignalSpy kept(&store, &WTPasswordStore::keptInSettingsFile);
     EXPECT_EQ(storeNow(store, kPassword), Location::SettingsFile);
     EXPECT_EQ(fileMode(), 0600);
@@ -237,33 +247,25 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   using fakesecrets::FakeSecretService;
   const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  const QByteArray previousBus = qgetenv("DBUS_SESSION_BUS_ADDRESS");
-  const auto restore = qScopeGuard([&] { setEnvironment("DBUS_SESSION_BUS_ADDRESS", previousBus); });
-  qputenv("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
+  const ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
   FakeSecretService service;
   ASSERT_TRUE(service.start(address));
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
-  struct Row {
+  using Answer = FakeSecretService::Answer;
+  using Prompt = FakeSecretService::Prompt;
+  const struct Row {
     const char* name;
     FakeSecretService::Behaviour behaviour;
     int timeoutMs;
     Location where;
-  };
-  const Row rows[] = {
-      {"prompt answered in time",
-       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 300},
-       10000,
-       Location::Keychain},
-      {"refuses", {FakeSecretService::Answer::Refuse}, 10000, Location::SettingsFile},
-      {"prompt dismissed",
-       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Dismissed},
-       10000,
-       Location::SettingsFile},
-      {"prompt answered late",
-       {FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Accepted, 1500},
-       300,
-       Location::SettingsFile},
-      {"never answers", {FakeSecretService::Answer::Never}, 300, Location::SettingsFile},
+  } rows[] = {
+      // clang-format off
+      {"prompt answered in time", {Answer::Keyring, Prompt::Accepted, 300}, 10000, Location::Keychain},
+      {"refuses", {Answer::Refuse}, 10000, Location::SettingsFile},
+      {"prompt dismissed", {Answer::Keyring, Prompt::Dismissed}, 10000, Location::SettingsFile},
+      {"prompt answered late", {Answer::Keyring, Prompt::Accepted, 1500}, 300, Location::SettingsFile},
+      {"never answers", {Answer::Never}, 300, Location::SettingsFile},
+      // clang-format on
   };
   for (const Row& row : rows) {
     SCOPED_TRACE(row.name);
@@ -271,8 +273,7 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     defaults->setValue(kUser, QStringLiteral("ann@example.org"));
     defaults->removeValue(SettingsKeys::kSyncPasswordKeptInFile);
     defaults->setValue(kInFile, kPassword);
-    WTPasswordStore store(defaults.get(),
-                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), row.timeoutMs));
+    WTPasswordStore store(defaults.get(), realKeychain(row.timeoutMs));
     QSignalSpy kept(&store, &WTPasswordStore::keptInSettingsFile);
     std::optional<bool> done;
     store.load([&] { done = true; });
@@ -284,14 +285,14 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     EXPECT_EQ(store.password(), kPassword);
     EXPECT_EQ(fileBytes().contains("horse"), row.where == Location::SettingsFile);
     EXPECT_EQ(kept.count(), row.where == Location::SettingsFile ? 1 : 0);
-    if (row.where == Location::SettingsFile) {
-      EXPECT_EQ(fileMode(), 0600);
+    if (row.where == Location::Keychain) {
+      EXPECT_EQ(service.secret(kKey), kPassword.toUtf8());
     } else {
-      EXPECT_EQ(service.secret(QStringLiteral("sync-password")), kPassword.toUtf8());
+      EXPECT_EQ(fileMode(), 0600);
     }
-    if (row.behaviour.prompt == FakeSecretService::Prompt::Accepted && row.where == Location::SettingsFile) {
+    if (row.behaviour.prompt == Prompt::Accepted && row.where == Location::SettingsFile) {
       // The late answer still lands in the keyring; the store has moved on, and the file keeps its copy.
-      waitUntil([&] { return service.secret(QStringLiteral("sync-password")) == kPassword.toUtf8(); });
+      waitUntil([&] { return service.secret(kKey) == kPassword.toUtf8(); });
       waitUntil([&] { return readNow(secrets).ok(); });
       EXPECT_TRUE(fileBytes().contains("horse"));
     }
@@ -333,36 +334,29 @@ TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
 
   qputenv("DBUS_SESSION_BUS_ADDRESS", childBus);
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 20000);
-  const Result<QString> none = readNow(secrets);
-  ASSERT_FALSE(none.ok());
-  EXPECT_EQ(none.error().code, WTKeychain::EntryNotFound) << none.error().message.toStdString();
+  EXPECT_EQ(readNow(secrets).error().code, WTKeychain::EntryNotFound);
 
   // Through the store: into the keyring, never into the file, and read back by a store of its own.
   defaults->setValue(kUser, QStringLiteral("ann@example.org"));
   defaults->setValue(kInFile, kPassword);
   {
-    WTPasswordStore store(defaults.get(),
-                          std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 20000));
+    WTPasswordStore store(defaults.get(), realKeychain(20000));
     loadNow(store);
     ASSERT_EQ(store.location(), Location::Keychain) << store.keychainError().toStdString();
   }
   EXPECT_FALSE(fileBytes().contains("horse"));
-  const Result<QString> moved = readNow(secrets);
-  ASSERT_TRUE(moved.ok()) << moved.error().message.toStdString();
-  EXPECT_EQ(moved.value(), kPassword);
+  EXPECT_EQ(textOf(readNow(secrets)), kPassword);
 
-  WTPasswordStore store(defaults.get(), std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), 20000));
+  WTPasswordStore store(defaults.get(), realKeychain(20000));
   loadNow(store);
   EXPECT_EQ(store.password(), kPassword);
   EXPECT_EQ(store.location(), Location::Keychain);
   EXPECT_EQ(storeNow(store, QStringLiteral("battery staple")), Location::Keychain);
   EXPECT_FALSE(fileBytes().contains("staple"));
-  EXPECT_EQ(readNow(secrets).value(), QStringLiteral("battery staple"));
+  EXPECT_EQ(textOf(readNow(secrets)), QStringLiteral("battery staple"));
 
   store.removePassword();
-  const Result<QString> removed = readNow(secrets);
-  ASSERT_FALSE(removed.ok());
-  EXPECT_EQ(removed.error().code, WTKeychain::EntryNotFound);
+  EXPECT_EQ(readNow(secrets).error().code, WTKeychain::EntryNotFound);
 }
 
 }  // namespace

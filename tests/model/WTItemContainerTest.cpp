@@ -15,22 +15,20 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
 
   const auto& children = task->children();
   ASSERT_EQ(children.size(), 3u);
-  EXPECT_FALSE(children[0]->date().has_value());
   EXPECT_EQ(children[0]->title(), "Pending");
-  EXPECT_EQ(children[0]->items(), (QList<WTItem*>{newerOpen, olderOpen}));
-  EXPECT_EQ(children[1]->date(), berlin(2026, 4, 2));
-  EXPECT_EQ(children[1]->items(), (QList<WTItem*>{evening, done, morning}));
-  EXPECT_EQ(children[2]->date(), berlin(2026, 3, 31));
-  EXPECT_EQ(children[2]->items(), QList<WTItem*>{earlier});
+  const std::vector<std::pair<std::optional<Date>, QList<WTItem*>>> expected = {
+      {std::nullopt, {newerOpen, olderOpen}},
+      {berlin(2026, 4, 2), {evening, done, morning}},
+      {berlin(2026, 3, 31), {earlier}}};
+  for (std::size_t i = 0; i < expected.size(); ++i)
+    EXPECT_EQ(std::pair(children[i]->date(), children[i]->items()), expected[i]) << i;
   EXPECT_EQ(children[1]->duration(), 60 + 31);
 
   EXPECT_EQ(task->itemContainerForItem(olderOpen), children[0]);
   EXPECT_EQ(task->itemContainerForItem(done), children[1]);
-  auto* elsewhere = makeItem<WTNote>(task, berlin(2026, 1, 1));
-  EXPECT_EQ(task->itemContainerForItem(elsewhere), nullptr);  // not rebuilt yet
-
-  WTTask* empty = makeTask();
-  EXPECT_TRUE(empty->children().empty());
+  EXPECT_EQ(task->itemContainerForItem(makeItem<WTNote>(task, berlin(2026, 1, 1))),
+            nullptr);  // not rebuilt yet
+  EXPECT_TRUE(makeTask()->children().empty());
 
   // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
   WTTask* spring = makeTask();
@@ -38,8 +36,8 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
   makeTime(spring, berlin(2026, 3, 29, 23, 30), berlin(2026, 3, 29, 23, 45));
   makeTime(spring, berlin(2026, 3, 30, 0, 10), berlin(2026, 3, 30, 0, 20));
   ASSERT_EQ(spring->children().size(), 2u);
-  EXPECT_EQ(spring->children()[1]->items().size(), 2);
-  EXPECT_EQ(spring->children()[1]->date(), berlin(2026, 3, 29));
+  EXPECT_EQ(std::pair(spring->children()[1]->items().size(), spring->children()[1]->date()),
+            std::pair(qsizetype(2), std::optional(berlin(2026, 3, 29))));
 }
 
 // Days and months are grouped by their dates, items without a date in one group after every day; any
@@ -55,12 +53,16 @@ TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirVal
   WTTime* laterFirst = makeTime(task, berlin(2026, 4, 1, 15), berlin(2026, 4, 1, 16));
   const QList<WTItem*> items{second, undatedFee, first, undatedExpense, laterFirst};
 
+  // The items of each group, newest first.
+  const auto itemsOf = [](const auto& groups) {
+    QList<QList<WTItem*>> result;
+    for (const auto& group : groups) result.append(group->items());
+    return result;
+  };
   const auto days = WTItemContainer::containersByKeyPath(QStringLiteral("startDate.midnight"), items);
-  ASSERT_EQ(days.size(), 3u);
-  EXPECT_EQ(days[0]->items(), QList<WTItem*>{second});
-  EXPECT_EQ(days[1]->items(), (QList<WTItem*>{laterFirst, first}));
-  EXPECT_EQ(days[2]->items(), (QList<WTItem*>{undatedFee, undatedExpense}));
-  EXPECT_FALSE(days[2]->date().has_value());
+  EXPECT_EQ(itemsOf(days),
+            (QList<QList<WTItem*>>{{second}, {laterFirst, first}, {undatedFee, undatedExpense}}));
+  EXPECT_FALSE(days.back()->date().has_value());
   EXPECT_EQ(WTItemContainer::containersByKeyPath(QStringLiteral("startDate.beginOfMonth"), items).size(), 2u);
 
   second->setName(QStringLiteral("b"));
@@ -68,9 +70,7 @@ TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirVal
   laterFirst->setName(QStringLiteral("b"));
   const auto named =
       WTItemContainer::containersByKeyPath(QStringLiteral("name"), QList<WTItem*>{second, first, laterFirst});
-  ASSERT_EQ(named.size(), 2u);
-  EXPECT_EQ(named[0]->items(), (QList<WTItem*>{second, laterFirst}));  // newest first within a group
-  EXPECT_EQ(named[1]->items(), QList<WTItem*>{first});
+  EXPECT_EQ(itemsOf(named), (QList<QList<WTItem*>>{{second, laterFirst}, {first}}));
 }
 
 TEST_F(WTItemContainerTest, IdentityFindsTheSameDayGroupAgainButNeverPending) {
@@ -99,27 +99,24 @@ TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
   WTTime* second = makeTime(task, berlin(2026, 4, 2, 11), berlin(2026, 4, 2, 12));
   WTItemContainer group({first}, first->startDate(), task);
   EXPECT_FALSE(group.isObserving());
-
   QStringList heard;
+  // Whether the group announced a new duration when `item` got `minutes`.
+  const auto heardChanging = [&](WTTime* item, int minutes) {
+    heard.clear();
+    item->setDuration(minutes);
+    return heard.contains("duration");
+  };
   auto connection =
       QObject::connect(&group, &WTItemContainer::valueChanged, [&](const QString& key) { heard << key; });
   EXPECT_TRUE(group.isObserving());
-  first->setDuration(90);
-  EXPECT_TRUE(heard.contains("duration"));
-
+  EXPECT_TRUE(heardChanging(first, 90));
   // New items are observed in place of the old ones while the listener stays.
   group.setItems({second});
-  heard.clear();
-  first->setDuration(30);
-  EXPECT_TRUE(heard.isEmpty());
-  second->setDuration(30);
-  EXPECT_TRUE(heard.contains("duration"));
-
+  EXPECT_FALSE(heardChanging(first, 30));
+  EXPECT_TRUE(heardChanging(second, 30));
   QObject::disconnect(connection);
   EXPECT_FALSE(group.isObserving());
-  heard.clear();
-  second->setDuration(45);
-  EXPECT_TRUE(heard.isEmpty());
+  EXPECT_FALSE(heardChanging(second, 45));
 }
 
 TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
@@ -133,9 +130,9 @@ TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
 
   const auto months = WTItemContainer::containersByKeyPath("startDate.beginOfMonth", QList<WTTask*>{a, b});
   ASSERT_EQ(months.size(), 2u);
-  EXPECT_EQ(months[0]->items().size(), 1);  // February: the expense, not the note
-  EXPECT_EQ(months[1]->items().size(), 2);
-  EXPECT_EQ(months[1]->duration(), 90);
+  // February: the expense, not the note.
+  EXPECT_EQ(QList({months[0]->items().size(), months[1]->items().size(), qsizetype(months[1]->duration())}),
+            QList<qsizetype>({1, 2, 90}));
   // A group's date is its last item's start, not the month start.
   EXPECT_EQ(months[1]->date(), berlin(2026, 1, 15, 9));
   EXPECT_EQ(months[1]->task(), a);

@@ -149,6 +149,9 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
   };
   const char* const allTotals =
       "client.cost project.cost task.cost client.duration project.duration task.duration";
+  const auto setTaskRate = [](Records& r) { r.task->setRate(dec("60")); };
+  const auto setProjectRate = [](Records& r) { r.project->setRate(dec("60")); };
+  // clang-format off
   const struct {
     const char* name;
     std::function<void(Records&)> prepare, change;
@@ -161,35 +164,16 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
       {"entry start", {}, startEarlier, allTotals, "", 75, 75, "125"},
       {"entry start undone", startEarlier, undo, "time.duration client.cost client.duration task.duration",
        "", 60, 60, "100"},
-      {"task rate undone", [](Records& r) { r.task->setRate(dec("60")); }, undo,
-       "client.cost project.cost task.cost", "", 60, 60, "100"},
-      {"project rate undone", [](Records& r) { r.project->setRate(dec("60")); }, undo,
-       "client.cost project.cost task.cost", "", 60, 60, "100"},
-      {"expense",
-       {},
-       [](Records& r) { r.expense->setExpense(dec("19.99")); },
-       "client.cost task.cost",
-       "client.duration task.duration",
-       60,
-       60,
-       "119.99"},
-      {"client rate",
-       {},
-       [](Records& r) { r.client->setRate(dec("130")); },
-       "task.rate task.inheritedRate task.cost project.inheritedRate client.cost",
-       "",
-       60,
-       60,
-       "130"},
-      {"entry to another task",
-       {},
-       [](Records& r) { r.time->setTask(r.other); },
-       "task.duration task.children other.duration client.duration",
-       "",
-       60,
-       30,
-       "100"},
+      {"task rate undone", setTaskRate, undo, "client.cost project.cost task.cost", "", 60, 60, "100"},
+      {"project rate undone", setProjectRate, undo, "client.cost project.cost task.cost", "", 60, 60, "100"},
+      {"expense", {}, [](Records& r) { r.expense->setExpense(dec("19.99")); }, "client.cost task.cost",
+       "client.duration task.duration", 60, 60, "119.99"},
+      {"client rate", {}, [](Records& r) { r.client->setRate(dec("130")); },
+       "task.rate task.inheritedRate task.cost project.inheritedRate client.cost", "", 60, 60, "130"},
+      {"entry to another task", {}, [](Records& r) { r.time->setTask(r.other); },
+       "task.duration task.children other.duration client.duration", "", 60, 30, "100"},
   };
+  // clang-format on
   for (const auto& test : cases) {
     SCOPED_TRACE(test.name);
     Records r;

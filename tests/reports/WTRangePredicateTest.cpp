@@ -48,8 +48,7 @@ TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
   const struct {
     const char* zone;
     Wall now, entry;
-    const char*
-        presets;  // today, yesterday, this week, last week, this month, last month, this year, last year
+    const char* presets;  // today, yesterday, this/last week, this/last month, this/last year
   } cases[] = {
       // Tuesday 2 April 2024; the week began on Sunday 31 March.
       {"Europe/Berlin", {2024, 4, 2, 12}, {2024, 4, 2}, "11101010"},
@@ -82,11 +81,12 @@ TEST_F(RangePredicateTest, CustomRangesAndAnyDate) {
   const Date march3 = berlin(2024, 3, 3, 15, 20);
   const WTItemPredicate custom = WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, march3);
   ASSERT_TRUE(custom);
+  // clang-format off
   for (const auto& [entry, taken] : {std::pair{berlin(2024, 3, 3), true},
                                      {berlin(2024, 3, 3, 23, 59, 59), true},
-                                     {berlin(2024, 3, 4), true},
-                                     {berlin(2024, 3, 2, 23, 59, 59), false},
+                                     {berlin(2024, 3, 4), true}, {berlin(2024, 3, 2, 23, 59, 59), false},
                                      {berlin(2024, 3, 4, 0, 0, 1), false}})
+    // clang-format on
     EXPECT_EQ(custom(entryAt(entry)), taken) << entry.secondsSince1970();
   // Missing custom dates and unknown tags give no predicate at all.
   EXPECT_FALSE(WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, std::nullopt));
@@ -111,17 +111,12 @@ TEST_F(RangePredicateTest, CommandLineWords) {
     const char* word;
     bool monday;
     bool lastYear;
-  } cases[] = {{"today", false, false},
-               {"yesterday", true, false},
-               {"this-week", true, false},
-               {"last-week", false, false},
-               {"this-month", true, false},
-               {"last-month", false, false},
-               {"this-year", true, false},
-               {"last-year", false, true},
-               {"any", true, true},
-               {"2024-04-01..2024-04-01", true, false},
-               {"2023-01-01..2024-03-31", false, true}};
+  } cases[] = {// clang-format off
+      {"today", false, false}, {"yesterday", true, false}, {"this-week", true, false},
+      {"last-week", false, false}, {"this-month", true, false}, {"last-month", false, false},
+      {"this-year", true, false}, {"last-year", false, true}, {"any", true, true},
+      {"2024-04-01..2024-04-01", true, false}, {"2023-01-01..2024-03-31", false, true}};
+  // clang-format on
   for (const auto& c : cases) {
     const Result<WTItemPredicate> predicate =
         WTRangePredicate::predicateForRangeWord(QString::fromUtf8(c.word));

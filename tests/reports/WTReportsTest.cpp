@@ -105,6 +105,16 @@ QVariant at(WTObject* object, const char* keyPath) {
   return KeyPath::valueForKeyPath(KeyPath::variantFromObject(object), QString::fromUtf8(keyPath));
 }
 
+// Each group as "items/minutes/cost", newest first.
+std::string groups(const QVariant& list) {
+  QStringList result;
+  for (const QVariant& group : list.toList()) {
+    const auto value = [&](const char16_t* key) { return KeyPath::valueForKeyPath(group, key).toString(); };
+    result << value(u"items.@count") + '/' + value(u"duration") + '/' + value(u"cost");
+  }
+  return result.join(' ').toStdString();
+}
+
 }  // namespace
 
 // The lists a template walks, by key and by mode: valuable items (no notes or to-dos) newest first
@@ -119,7 +129,7 @@ TEST_F(ReportTest, TasksAnswerTheirItemListsAndGroupTotalsPerMode) {
   const QVariantList children = at(design, "children").toList();
   ASSERT_EQ(children.size(), 5);
   EXPECT_FALSE(KeyPath::valueForKeyPath(children[0], u"date").isValid());
-  EXPECT_EQ(KeyPath::valueForKeyPath(children[0], u"items.@count").toInt(), 1);
+  EXPECT_TRUE(groups(children).starts_with("1/0/0 ")) << groups(children);
   // The period of the valuable items: the later note and open to-do do not extend it.
   EXPECT_EQ(at(design, "firstItemDate").value<Date>(), berlin(2024, 2, 10, 10));
   EXPECT_EQ(at(design, "lastItemDate").value<Date>(), berlin(2024, 3, 4, 8));
@@ -130,26 +140,15 @@ TEST_F(ReportTest, TasksAnswerTheirItemListsAndGroupTotalsPerMode) {
   EXPECT_EQ(KeyPath::valueForKeyPath(generator.filteredItemsForTask(design, 1), u"name").toStringList(),
             QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
   // Days: 4 March (the expense), 3 March (two entries), 10 February; months: March, February.
-  const QVariantList days = generator.filteredItemsForTask(design, 2).toList();
-  const QVariantList months = generator.filteredItemsForTask(design, 3).toList();
-  ASSERT_EQ(days.size(), 3);
-  ASSERT_EQ(months.size(), 2);
-  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[0], u"cost")), dec("1234.5"));
-  EXPECT_EQ(Decimal::fromVariant(KeyPath::valueForKeyPath(days[1], u"cost")), dec("120"));
-  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"duration").toInt(), 120);
-  EXPECT_EQ(KeyPath::valueForKeyPath(days[1], u"items.@count").toInt(), 2);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"items.@count").toInt(), 3);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[0], u"duration").toInt(), 120);
-  EXPECT_EQ(KeyPath::valueForKeyPath(months[1], u"duration").toInt(), 60);
+  EXPECT_EQ(groups(generator.filteredItemsForTask(design, 2)), "1/0/1234.5 2/120/120.0 1/60/60");
+  EXPECT_EQ(groups(generator.filteredItemsForTask(design, 3)), "3/120/1354.5 1/60/60");
   EXPECT_EQ(at(design, "monthlyItems").toList().size(), 2);
 }
 
 TEST_F(ReportTest, VariablesFollowProjectsAndMode) {
   WTReportGenerator generator(projects(), 2);
-  const WTReport report =
-      generator.renderText(QStringLiteral("{{ mode }}|{{ client.name }}|{{ projects.@count }}"));
-  EXPECT_TRUE(report.errors.empty());
-  EXPECT_EQ(report.html, QStringLiteral("2|Acme|2"));
+  EXPECT_EQ(generator.renderText(QStringLiteral("{{ mode }}|{{ client.name }}|{{ projects.@count }}")).html,
+            QStringLiteral("2|Acme|2"));
   generator.setMode(0);
   EXPECT_EQ(generator.renderText(QStringLiteral("{{ mode }}")).html, QStringLiteral("0"));
   WTReportGenerator empty;
@@ -161,8 +160,7 @@ TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
   EXPECT_EQ(WTCSVExport::reportCSV(projects(), 0),
             QStringLiteral("\"Web \\\"Site\\\"\",\"Design\",\"03:00\",\"1,414.50\"\n"
                            "\"Backend\",\"API\",\"02:00\",\"200.00\"\n"));
-  const QString mode1 = WTCSVExport::reportCSV(projects(), 1);
-  QStringList lines = mode1.split(QLatin1Char('\n'), Qt::SkipEmptyParts);
+  QStringList lines = WTCSVExport::reportCSV(projects(), 1).split(QLatin1Char('\n'), Qt::SkipEmptyParts);
   lines.sort();
   EXPECT_EQ(lines, QStringList({
                        "\"Backend\",\"API\",\"2024-03-06 09:00\",\"02:00\",\"200.00\"",
@@ -308,11 +306,7 @@ TEST_F(ReportTest, DayLinesNameTheirItemsOnceOrCountThem) {
       "#{{ day.items.@count }}{% /if %};{% /for %}{% /for %}{% /for %}"));
   EXPECT_TRUE(report.errors.empty());
   // Two entries on 3 March; the open to-do and the note have no value and are no day's items.
-  EXPECT_TRUE(report.html.contains(QStringLiteral("03-03=Review; Kick \"off\";")))
-      << report.html.toStdString();
-  EXPECT_TRUE(report.html.contains(QStringLiteral("03-06=Setup;"))) << report.html.toStdString();
-  EXPECT_TRUE(report.html.contains(QStringLiteral("02-10=Sketch;"))) << report.html.toStdString();
-  EXPECT_FALSE(report.html.contains(QStringLiteral("Open question")));
+  EXPECT_EQ(report.html, QStringLiteral("03-04=Fonts;03-03=Review; Kick \"off\";02-10=Sketch;03-06=Setup;"));
 }
 
 TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
@@ -325,11 +319,10 @@ TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
   EXPECT_EQ(copied.value(), user);
   EXPECT_EQ(readAll(user), readAll(WTReportGenerator::builtInTemplatePath()));
 
-  {
-    QFile file(user);
-    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-    file.write("Mine: {{ mode }} {{ client.name }}");
-  }
+  QFile file(user);
+  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
+  file.write("Mine: {{ mode }} {{ client.name }}");
+  file.close();
   ASSERT_TRUE(WTReportGenerator::copyBuiltInTemplateToUserFolder().ok());
   EXPECT_EQ(readAll(user), QStringLiteral("Mine: {{ mode }} {{ client.name }}"));
   WTReportGenerator generator(projects(), 3);
