@@ -154,20 +154,13 @@ TEST_P(IdleQuestionTest, AsksOnlyAtTheThresholdAndNoKeepsTheIdleTime) {
   settle();
   if (!row.asks) {
     EXPECT_TRUE(presenter.shown.empty());
-    if (!row.running) {
-      EXPECT_EQ(idle.asked, 0) << "with nothing running the desktop is not even asked";
-    }
+    if (!row.running) EXPECT_EQ(idle.asked, 0) << "with nothing running the desktop is not even asked";
     return;
   }
   ASSERT_EQ(presenter.shown.size(), 1u);
-  const WTTrackingAlert& alert = presenter.shown.front();
-  EXPECT_EQ(alert.messageText, QStringLiteral("Idle time"));
-  EXPECT_EQ(alert.informativeText,
-            QStringLiteral("Would you like to substract the idle time and restart the timers?"));
-  EXPECT_EQ(alert.defaultButton, QStringLiteral("No"));
-  EXPECT_EQ(alert.alternateButton, QStringLiteral("Yes"));
-  EXPECT_TRUE(time->running());
-  EXPECT_FALSE(time->endDate());
+  EXPECT_EQ(presenter.said(0),
+            "Idle time | Would you like to substract the idle time and restart the timers? | No | Yes");
+  EXPECT_TRUE(time->running() && !time->endDate());
   EXPECT_EQ(task->times().size(), 1);
   EXPECT_EQ(updater->totalActiveDuration(), 60);
   advance(5);
@@ -233,14 +226,9 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
 
   ASSERT_EQ(presenter.shown.size(), 1u);
   EXPECT_EQ(presenter.shown.front().messageText, QStringLiteral("Idle time"));
-  for (WTTime* stopped : {first, second, single}) {
-    EXPECT_FALSE(stopped->running());
-    EXPECT_EQ(stopped->endDate(), std::optional<Date>(idleStart));
-  }
-  for (WTTime* untouched : {recent, atIdleStart}) {
-    EXPECT_TRUE(untouched->running());
-    EXPECT_FALSE(untouched->endDate());
-  }
+  for (WTTime* stopped : {first, second, single})
+    EXPECT_TRUE(!stopped->running() && stopped->endDate() == std::optional<Date>(idleStart));
+  for (WTTime* untouched : {recent, atIdleStart}) EXPECT_TRUE(untouched->running() && !untouched->endDate());
   ASSERT_EQ(runningTimesOf(twice).size(), 1);
   ASSERT_EQ(runningTimesOf(once).size(), 1);
   EXPECT_EQ(runningTimesOf(late).size(), 2) << "no new entry for a task whose entries all started later";
@@ -252,9 +240,7 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
   // Saved and read back, the record is the one the user chose.
   updater.reset();
   saveAndReopen();
-  int running = 0;
-  for (WTTime* time : context->fetch<WTTime>()) running += time->running() ? 1 : 0;
-  EXPECT_EQ(running, 4);
+  EXPECT_EQ(context->fetch<WTTime>([](const WTTime* time) { return time->running(); }).size(), 4);
 }
 
 TEST_F(TrackingTest, AnOpenIdleAlertIsNeverStackedAndTheTickerGoesOn) {
@@ -358,21 +344,17 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
   presenter.answers = {Answer::Alternate};
   updater->applicationWillTerminate();
   ASSERT_EQ(presenter.shown.size(), 1u);
-  const WTTrackingAlert& alert = presenter.shown.front();
-  EXPECT_EQ(alert.messageText, QStringLiteral("Running Timer"));
-  EXPECT_EQ(alert.informativeText,
-            QStringLiteral("Would you like to stop the running timers before quitting?"));
-  EXPECT_EQ(alert.defaultButton, QStringLiteral("Stop"));
-  EXPECT_EQ(alert.alternateButton, QStringLiteral("Keep running"));
+  EXPECT_EQ(
+      presenter.said(0),
+      "Running Timer | Would you like to stop the running timers before quitting? | Stop | Keep running");
   EXPECT_TRUE(time->running());
   EXPECT_EQ(saves, 0);
 
   const QString uuid = time->uuid();
   updater.reset();
   saveAndReopen();
-  auto* kept = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(kept, nullptr);
-  EXPECT_TRUE(kept->running()) << "kept running across the quit";
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(stored(uuid)->running()) << "kept running across the quit";
 
   makeUpdater();
   countSaves();
@@ -384,10 +366,8 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
   EXPECT_EQ(saves, 1);
   updater.reset();
   openContext();  // no save of our own: what the prompt saved is what is on disk
-  auto* stopped = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(stopped, nullptr);
-  EXPECT_FALSE(stopped->running());
-  EXPECT_EQ(stopped->endDate(), std::optional<Date>(clockNow));
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(!stored(uuid)->running() && stored(uuid)->endDate() == std::optional<Date>(clockNow));
 }
 
 TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
@@ -403,9 +383,8 @@ TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
   const QString uuid = time->uuid();
   updater.reset();
   openContext();
-  auto* stored = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(stored, nullptr);
-  EXPECT_TRUE(stored->running());
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(stored(uuid)->running());
 }
 
 }  // namespace
