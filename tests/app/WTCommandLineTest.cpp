@@ -21,29 +21,21 @@ TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
       "report.txt",
       "{% for p in projects %}{{ p.name | uppercase }}: {{ p.minutes | digiclock }}\n{% /for %}{{ nobody }}");
   const QString vars = here.file("vars.json", R"({"projects": [{"name": "Atlas", "minutes": 95}]})");
-  const Outcome rendered = here.tessal({"template", templateFile, "--vars", vars});
-  EXPECT_EQ(rendered.code, 0) << rendered.err.toStdString();
-  EXPECT_EQ(rendered.out, "ATLAS: 01:35\n");
-  EXPECT_EQ(rendered.err, "error 3: \"nobody\" is not a valid variable\n");
+  const Outcome rendered = here.expect({"template", templateFile, "--vars", vars}, 0, "ATLAS: 01:35\n");
+  EXPECT_EQ(rendered.out + rendered.err, "ATLAS: 01:35\nerror 3: \"nobody\" is not a valid variable\n");
 }
 
 TEST(WTCommandLine, HelpAndBadArgumentsNeedNoDisplay) {
   Installation here;
   for (const char* flag : {"--help", "-h"}) {
-    const Outcome help = here.tessal({flag});
-    EXPECT_EQ(help.code, 0) << flag << ": " << help.err.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal template TEMPLATE_FILE")) << help.out.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal sync")) << help.out.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal add TASK (DURATION | START-END)")) << help.out.toStdString();
+    for (const char* line :
+         {"tessal template TEMPLATE_FILE", "tessal sync", "tessal add TASK (DURATION | START-END)"})
+      here.expect({flag}, 0, line);
   }
   EXPECT_EQ(here.tessal({"--version"}).code, 0);
   // Neither a command nor a Qt option: refused with a usage line before anything needs a display.
-  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}}) {
-    const Outcome run = here.tessal(bad);
-    EXPECT_EQ(run.code, 2) << bad.join(' ').toStdString() << ": " << run.err.toStdString();
-    EXPECT_TRUE(run.err.contains("usage: tessal")) << run.err.toStdString();
-    EXPECT_EQ(run.out, "");
-  }
+  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}})
+    EXPECT_EQ(here.expect(bad, 2, "usage: tessal").out, "");
   EXPECT_FALSE(QFile::exists(here.storePath()));
 }
 
@@ -51,21 +43,27 @@ TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
   Installation here;
   WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
   ASSERT_TRUE(desktop.start());
-  const Outcome run = here.tessal({"sync"});
-  EXPECT_EQ(run.code, 1);
-  EXPECT_TRUE(run.err.contains("Tessal is running")) << run.err.toStdString();
+  here.expect({"sync"}, 1, "Tessal is running");
   EXPECT_FALSE(QFile::exists(here.storePath()));  // the running copy's store is not opened twice
 }
 
 // A first start of the desktop copy with a password an earlier version left in the settings file, and a
 // keyring whose default collection does not exist yet: its prompt is never answered. The window and the
 // store come first, and the keyring is asked only for an account.
-TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
-  using fakesecrets::FakeSecretService;
+using fakesecrets::FakeSecretService;
+
+// A keyring on the private bus.
+class WTCommandLineKeyring : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
+    ASSERT_TRUE(keyring.start(address));
+  }
   const QString address = PrivateBus::instance().address();
-  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
   FakeSecretService keyring;
-  ASSERT_TRUE(keyring.start(address));
+};
+
+TEST_F(WTCommandLineKeyring, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
   keyring.setBehaviour({FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Never});
   for (const bool account : {false, true}) {
     SCOPED_TRACE(account ? "an account" : "no account");
@@ -98,12 +96,7 @@ TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForA
 
 // `tessal sync` says once where its password came from. Without a session bus the settings file is the
 // store, and nothing else is said; a keyring that does not answer costs a few seconds and is named.
-TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
-  using fakesecrets::FakeSecretService;
-  const QString address = PrivateBus::instance().address();
-  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  FakeSecretService keyring;
-  ASSERT_TRUE(keyring.start(address));
+TEST_F(WTCommandLineKeyring, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
   keyring.setBehaviour({FakeSecretService::Answer::Never});
   struct Row {
     const char* name;
@@ -133,19 +126,11 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
     here.setSetting("WTSyncUser", "ann@example.org");
     if (!row.password.isEmpty()) here.setSetting("WTSyncPassword", row.password);
     if (!row.server.isEmpty()) here.setSetting("WTSyncServer", row.server);
-    QProcess sync;
-    QProcessEnvironment environment = here.environment();
-    if (row.bus.isEmpty())
-      environment.remove("DBUS_SESSION_BUS_ADDRESS");
-    else
-      environment.insert("DBUS_SESSION_BUS_ADDRESS", row.bus);
-    sync.setProcessEnvironment(environment);
-    sync.start(QString::fromUtf8(TESSAL_EXE), {"sync", "--timeout", "5"});
-    const Outcome run = Installation::finish(sync);
-    EXPECT_EQ(run.code, 1) << "no server is set, or it refuses";
-    EXPECT_EQ(run.err.count(row.said), 1) << run.err.toStdString();
-    EXPECT_FALSE(run.err.contains("No secret service")) << run.err.toStdString();
-    EXPECT_FALSE(run.err.contains("D-Bus")) << run.err.toStdString();
+    // An empty address is no bus at all.
+    const Outcome run =
+        here.expect({"sync", "--timeout", "5"}, 1, row.said, {{"DBUS_SESSION_BUS_ADDRESS", row.bus}});
+    EXPECT_EQ(run.err.count(row.said), 1) << "said once";
+    EXPECT_FALSE(run.err.contains("No secret service") || run.err.contains("D-Bus")) << run.err.toStdString();
   }
 }
 

@@ -47,22 +47,16 @@ TEST(WTSingleInstanceTest, ACopyThatIsTooBusyToAnswerStillCounts) {
   WTSingleInstance busy(path);
   ASSERT_TRUE(busy.start());
   WTSingleInstance second(path);  // asks from this thread, so the first cannot answer meanwhile
-  EXPECT_FALSE(second.start(false));
-  EXPECT_FALSE(second.isListening());
-  EXPECT_TRUE(busy.isListening());
-  EXPECT_TRUE(QFile::exists(path));
+  EXPECT_FALSE(second.start(false) || second.isListening());
+  EXPECT_TRUE(busy.isListening() && QFile::exists(path));
 }
 
 TEST(WTSingleInstanceTest, ASocketLeftByACopyThatDiedIsTakenOver) {
   QTemporaryDir dir;
   const QString path = dir.filePath("tessal.socket");
-  {
-    QFile stale(path);
-    ASSERT_TRUE(stale.open(QIODevice::WriteOnly));
-  }
+  ASSERT_TRUE(QFile(path).open(QIODevice::WriteOnly));
   WTSingleInstance instance(path);
-  EXPECT_TRUE(instance.start());
-  EXPECT_TRUE(instance.isListening());
+  EXPECT_TRUE(instance.start() && instance.isListening());
   // Nobody else listens: asking a copy to come forward reaches nobody.
   WTSingleInstance other(dir.filePath("other.socket"));
   EXPECT_FALSE(other.notifyRunningInstance(200));
