@@ -7,7 +7,7 @@
 
 namespace {
 
-using commandtest::Installation;
+using namespace commandtest;
 
 const QString kCompletion = QStringLiteral(TESSAL_TEST_DATA_DIR "/../../packaging/tessal.bash-completion");
 
@@ -27,8 +27,6 @@ class BashCompletion : public ::testing::Test {
     acme->setName("Acme Corp");
     auto* other = WTClient::insertNewObject(context.get());
     other->setName("Other");
-    using commandtest::project;
-    using commandtest::task;
     WTProject* atlas = project(*context, "Atlas", acme);
     WTProject* beacon = project(*context, "Beacon", other);
     task(*context, atlas, "Build \"it\" now");

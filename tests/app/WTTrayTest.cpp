@@ -16,7 +16,7 @@
 
 namespace {
 
-using commandtest::Installation;
+using namespace commandtest;
 
 struct Geometry {
   int x = 0, y = 0, width = 0, height = 0;
