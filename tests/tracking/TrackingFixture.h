@@ -81,6 +81,20 @@ class TrackingTest : public ModelTest {
     for (int i = 0; i < 3; ++i) QCoreApplication::processEvents();
   }
 
+  // The updater's running set once the turn's queued work has run.
+  QList<WTTime*> runningNow() {
+    settle();
+    return updater->times();
+  }
+  // What the ticker shows: "TICKS ticks, N running, badge "LABEL", ticking|stopped".
+  std::string ticker() const {
+    return QStringLiteral("%1 ticks, %2 running, badge \"%3\", %4")
+        .arg(ticks)
+        .arg(updater->times().size())
+        .arg(updater->badgeLabel(), updater->isTicking() ? "ticking" : "stopped")
+        .toStdString();
+  }
+
   void advance(double seconds) { clockNow = clockNow.addingSeconds(seconds); }
 
   void turnIdleHandlingOn(int minutes) {
