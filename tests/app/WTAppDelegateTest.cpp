@@ -9,18 +9,14 @@
 
 #include <QToolButton>
 
-namespace {
-
 // Each test gets its own data and settings folders.
 class WTAppDelegateTest : public AppTest {};
-
-}  // namespace
 
 TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   {
     auto delegate = makeDelegate();
-    EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
-    EXPECT_TRUE(delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
+    EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite") &&
+                delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
     EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
     // Made with the store, not by the window: a command that makes the store gets it too.
     EXPECT_EQ(delegate->managedObjectContext()->fetch<WTProject>().size(), 1);
@@ -28,17 +24,16 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     EXPECT_TRUE(QFile::exists(delegate->storePath()));
     const QList<WTProject*> projects = window.fetchProjects();
     ASSERT_EQ(projects.size(), 1);
-    EXPECT_EQ(projects[0]->name(), "Default Project");
     ASSERT_EQ(projects[0]->tasks().size(), 1);
-    EXPECT_EQ(projects[0]->tasks()[0]->name(), "Default Task");
+    EXPECT_EQ(projects[0]->name() + " › " + projects[0]->tasks()[0]->name(),
+              "Default Project › Default Task");
     // Opened before the window shows, the outline lists its task.
     window.projectsViewController()->openProject(projects[0]);
     ASSERT_TRUE(QTest::qWaitFor(
         [&] { return window.projectsNavigationController()->viewControllers().size() == 2; }));
     WTItemsModel* outline = window.projectsViewController()->itemsViewController()->treeController();
-    ASSERT_EQ(outline->rowCount(), 1);
+    EXPECT_EQ(outline->rowCount(), 1);
     EXPECT_EQ(outline->index(0, 0).data(WTItemsModel::NameRole).toString(), "Default Task");
-
     EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
     EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
   }

@@ -19,14 +19,58 @@ namespace {
 
 using namespace commandtest;
 
-TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
+// `tessal template` as a report author runs it: JSON variables in, the engine's text with the report filters
+// on stdout, its errors on stderr in the order reported; a refusal is one line naming the cause.
+TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
   Installation here;
-  const QString templateFile = here.file(
-      "report.txt",
-      "{% for p in projects %}{{ p.name | uppercase }}: {{ p.minutes | digiclock }}\n{% /for %}{{ nobody }}");
-  const QString vars = here.file("vars.json", R"({"projects": [{"name": "Atlas", "minutes": 95}]})");
-  const Outcome rendered = here.expect({"template", templateFile, "--vars", vars}, 0, "ATLAS: 01:35\n");
-  EXPECT_EQ(rendered.out + rendered.err, "ATLAS: 01:35\nerror 3: \"nobody\" is not a valid variable\n");
+  const QString templ =
+      here.file("report.txt",
+                "{{ client.name | uppercase }}: {% for item in items %}{{ item.minutes | digiclock }} "
+                "{{ item.cost | decimal }} {{ item.cost }}{% if item.billed %} billed{% /if %}\n{% /for %}"
+                "{{ count }} {{ ratio }} {{ huge }} {{ items.1.note }}{% bogus %}{% for 1 to 2 %}");
+  const QString vars = here.file("vars.json", R"({"client": {"name": "Acme"},
+      "items": [{"minutes": 90, "cost": 1234.50, "billed": true, "note": null},
+                {"minutes": 5, "cost": 2, "billed": false}],
+      "count": 2, "ratio": 0.1, "huge": 123456789012345678901234567890})");
+  const Outcome run = here.expect({"template", templ, "--vars", vars}, 0, "", {{"LANG", "en_US.UTF-8"}});
+  EXPECT_EQ(run.out,
+            "ACME: 01:30 1,234.50 1234.50 billed\n00:05 2.00 2\n2 0.1 123456789012345678901234567890 ");
+  // null is absent: the note is no variable.
+  EXPECT_EQ(run.err,
+            "error 3: \"items.1.note\" is not a valid variable\nerror 2: \"bogus\" is not a valid marker\n"
+            "error 6: Finished processing template, but 1 block was left open (for).\n");
+
+  const QString x = here.file("x.txt", "x");
+  const QString bad[] = {here.file("bad1.json", "{\"a\": }"), here.file("bad2.json", "[1, 2]"),
+                         here.file("bad3.json", "")};
+  const QString usage = QStringLiteral("usage: tessal template");
+  // 2 for what the user typed wrong, 1 when the template gave no result.
+  const struct {
+    QStringList arguments;
+    int code;
+    QString says;
+  } cases[] = {
+      {{here.path("missing.txt")}, 2, here.path("missing.txt")},
+      {{x, "--vars", bad[0]}, 2, bad[0]},
+      {{x, "--vars", bad[1]}, 2, bad[1]},
+      {{x, "--vars", bad[2]}, 2, bad[2]},
+      {{x, "--vars", here.path("none.json")}, 2, here.path("none.json")},
+      {{here.file("latin1.txt",
+                  "Gr\xfc\xdf"
+                  "e")},
+       1,
+       "latin1.txt"},
+      {{here.path("")}, 1, here.path("")},  // a folder is no text
+      {{}, 2, usage},
+      {{x, x}, 2, usage},
+      {{x, "--vars"}, 2, usage},
+      {{"--verbose", x}, 2, usage},
+  };
+  for (const auto& c : cases) {
+    const Outcome refused = here.expect(QStringList{"template"} + c.arguments, c.code, c.says);
+    EXPECT_EQ(refused.out + QString::number(refused.err.count(u'\n')), "1") << refused.err.toStdString();
+  }
+  EXPECT_EQ(here.out({"template", "--vars", here.file("v.json", "{}"), x}), "x");
 }
 
 TEST(WTCommandLine, HelpAndBadArgumentsNeedNoDisplay) {

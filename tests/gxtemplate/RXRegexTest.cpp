@@ -148,6 +148,7 @@ TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
       "expression.\nNSLocalizedFailureReason=The error U_REGEX_MISMATCHED_PAREN occured at line 1, column "
       "3: ab(<<HERE>>\nRXICURegexRegex=ab(\nRXICURegexRegexOptions=0\nRXICURegexLine=1\nRXICURegexOffset=3"
       "\nRXICURegexPreContext=ab(\nRXICURegexPostContext=\nRXICURegexErrorName=U_REGEX_MISMATCHED_PAREN");
+  EXPECT_EQ(error.value("RXICURegexOffset").toInt(), 3) << "looked up by its key";
   EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("ab(")), -1);
   // Without an out-parameter the search just finds nothing; a later good search clears the error.
   EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("ab(")), kNone);
