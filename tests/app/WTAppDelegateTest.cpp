@@ -91,6 +91,34 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
       << "and the first project";
 }
 
+// A save with nothing to save touches nothing the user is typing in; one with changes commits the edit in
+// progress with them.
+TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressOnlyWhenThereIsSomethingToSave) {
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  WTProject* project = WTProject::insertNewObject(context);
+  ASSERT_TRUE(delegate->saveChanges());
+  int commits = 0;
+  delegate->setCommitEditingHandler([&] {
+    ++commits;
+    project->setName("typed, not yet committed");
+    return true;
+  });
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(commits, 0);
+  WTProject::insertNewObject(context)->setName("another change");
+  ASSERT_TRUE(delegate->saveChanges());
+  EXPECT_EQ(commits, 1);
+  EXPECT_FALSE(context->hasChanges());
+  auto other = makeDelegate();
+  delegate.reset();
+  QStringList names;
+  for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
+    names << stored->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Default Project", "another change", "typed, not yet committed"}));
+}
+
 // The sync manager is made with the context, journals what the delegate saves beside the store, asks
 // the delegate for the account, and stops when the application quits.
 TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) {
