@@ -6,13 +6,29 @@
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
+#include "WTClient.h"
+#include "WTClientsViewController.h"
 #include "WTItemsViewController.h"
+#include "WTListView.h"
 #include "WTMainWindowController.h"
 #include "WTNavigationController.h"
+#include "WTObjectContext.h"
+#include "WTObjectListModel.h"
+#include "WTOutlineView.h"
+#include "WTProject.h"
 #include "WTProjectsViewController.h"
+#include "WTStore.h"
+#include "WTTask.h"
+#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
+#include <QAction>
+#include <QApplication>
+#include <QDir>
+#include <QFile>
+#include <QLineEdit>
+#include <QPointer>
 #include <QStringList>
 #include <QTemporaryDir>
 #include <QTest>

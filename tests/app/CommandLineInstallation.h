@@ -70,7 +70,8 @@ class Installation {
     process->start(QString::fromUtf8(TESSAL_EXE), arguments);
     return process;
   }
-  // What a process of this installation runs with: its folders, no display; `extra` added or replacing.
+  // What a process of this installation runs with: its folders, no display; `extra` added or replacing
+  // (an empty value removes).
   QProcessEnvironment environment(const QMap<QString, QString>& extra = {}) const {
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
     environment.insert("XDG_DATA_HOME", home_.filePath("data"));
@@ -78,8 +79,12 @@ class Installation {
     environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
     // As on a server or over ssh: no display of any kind, and no platform plugin chosen for us.
     for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
-    for (auto variable = extra.begin(); variable != extra.end(); ++variable)
-      environment.insert(variable.key(), variable.value());
+    for (auto variable = extra.begin(); variable != extra.end(); ++variable) {
+      if (variable.value().isEmpty())
+        environment.remove(variable.key());
+      else
+        environment.insert(variable.key(), variable.value());
+    }
     return environment;
   }
   // Runs `tessal` with `arguments` to its end.
@@ -97,6 +102,20 @@ class Installation {
     run.out = QString::fromUtf8(process.readAllStandardOutput());
     run.err = QString::fromUtf8(process.readAllStandardError());
     return run;
+  }
+  // Runs `tessal`: its exit code must be `code` and what it said (stdout on success, else stderr) hold
+  // `text`.
+  Outcome expect(const QStringList& arguments, int code, const QString& text,
+                 const QMap<QString, QString>& extra = {}) const {
+    Outcome run = tessal(arguments, extra);
+    const std::string what = arguments.join(' ').toStdString() + ": " + (run.out + run.err).toStdString();
+    EXPECT_EQ(run.code, code) << what;
+    EXPECT_TRUE((code == 0 ? run.out : run.err).contains(text)) << what;
+    return run;
+  }
+  // What a run printed on stdout, for exact comparisons.
+  std::string out(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
+    return tessal(arguments, extra).out.toStdString();
   }
   QString path(const QString& name) const { return home_.filePath(name); }
   QString file(const QString& name, const QByteArray& contents) const {

@@ -1,5 +1,5 @@
 // The `tessal` executable's window-less commands, run as a user's shell would run them: a separate
-// process with its own data and settings folders.
+// process with its own data and settings folders; and the socket that keeps one desktop copy.
 #include "CommandLineInstallation.h"
 #include "FakeSecretService.h"
 #include "PrivateBus.h"
@@ -8,42 +8,82 @@
 
 #include <gtest/gtest.h>
 
+#include <QSignalSpy>
+#include <QTemporaryDir>
 #include <QTest>
+
+#include <atomic>
+#include <thread>
 
 namespace {
 
-using commandtest::Installation;
-using commandtest::Outcome;
+using namespace commandtest;
 
-TEST(WTCommandLine, TemplatePrintsExactlyWhatTheEngineProduced) {
+// `tessal template` as a report author runs it: JSON variables in, the engine's text with the report filters
+// on stdout, its errors on stderr in the order reported; a refusal is one line naming the cause.
+TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
   Installation here;
-  const QString templateFile = here.file(
-      "report.txt",
-      "{% for p in projects %}{{ p.name | uppercase }}: {{ p.minutes | digiclock }}\n{% /for %}{{ nobody }}");
-  const QString vars = here.file("vars.json", R"({"projects": [{"name": "Atlas", "minutes": 95}]})");
-  const Outcome rendered = here.tessal({"template", templateFile, "--vars", vars});
-  EXPECT_EQ(rendered.code, 0) << rendered.err.toStdString();
-  EXPECT_EQ(rendered.out, "ATLAS: 01:35\n");
-  EXPECT_EQ(rendered.err, "error 3: \"nobody\" is not a valid variable\n");
+  const QString templ =
+      here.file("report.txt",
+                "{{ client.name | uppercase }}: {% for item in items %}{{ item.minutes | digiclock }} "
+                "{{ item.cost | decimal }} {{ item.cost }}{% if item.billed %} billed{% /if %}\n{% /for %}"
+                "{{ count }} {{ ratio }} {{ huge }} {{ items.1.note }}{% bogus %}{% for 1 to 2 %}");
+  const QString vars = here.file("vars.json", R"({"client": {"name": "Acme"},
+      "items": [{"minutes": 90, "cost": 1234.50, "billed": true, "note": null},
+                {"minutes": 5, "cost": 2, "billed": false}],
+      "count": 2, "ratio": 0.1, "huge": 123456789012345678901234567890})");
+  const Outcome run = here.expect({"template", templ, "--vars", vars}, 0, "", {{"LANG", "en_US.UTF-8"}});
+  EXPECT_EQ(run.out,
+            "ACME: 01:30 1,234.50 1234.50 billed\n00:05 2.00 2\n2 0.1 123456789012345678901234567890 ");
+  // null is absent: the note is no variable.
+  EXPECT_EQ(run.err,
+            "error 3: \"items.1.note\" is not a valid variable\nerror 2: \"bogus\" is not a valid marker\n"
+            "error 6: Finished processing template, but 1 block was left open (for).\n");
+
+  const QString x = here.file("x.txt", "x");
+  const QString bad[] = {here.file("bad1.json", "{\"a\": }"), here.file("bad2.json", "[1, 2]"),
+                         here.file("bad3.json", "")};
+  const QString usage = QStringLiteral("usage: tessal template");
+  // 2 for what the user typed wrong, 1 when the template gave no result.
+  const struct {
+    QStringList arguments;
+    int code;
+    QString says;
+  } cases[] = {
+      {{here.path("missing.txt")}, 2, here.path("missing.txt")},
+      {{x, "--vars", bad[0]}, 2, bad[0]},
+      {{x, "--vars", bad[1]}, 2, bad[1]},
+      {{x, "--vars", bad[2]}, 2, bad[2]},
+      {{x, "--vars", here.path("none.json")}, 2, here.path("none.json")},
+      {{here.file("latin1.txt",
+                  "Gr\xfc\xdf"
+                  "e")},
+       1,
+       "latin1.txt"},
+      {{here.path("")}, 1, here.path("")},  // a folder is no text
+      {{}, 2, usage},
+      {{x, x}, 2, usage},
+      {{x, "--vars"}, 2, usage},
+      {{"--verbose", x}, 2, usage},
+  };
+  for (const auto& c : cases) {
+    const Outcome refused = here.expect(QStringList{"template"} + c.arguments, c.code, c.says);
+    EXPECT_EQ(refused.out + QString::number(refused.err.count(u'\n')), "1") << refused.err.toStdString();
+  }
+  EXPECT_EQ(here.out({"template", "--vars", here.file("v.json", "{}"), x}), "x");
 }
 
 TEST(WTCommandLine, HelpAndBadArgumentsNeedNoDisplay) {
   Installation here;
   for (const char* flag : {"--help", "-h"}) {
-    const Outcome help = here.tessal({flag});
-    EXPECT_EQ(help.code, 0) << flag << ": " << help.err.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal template TEMPLATE_FILE")) << help.out.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal sync")) << help.out.toStdString();
-    EXPECT_TRUE(help.out.contains("tessal add TASK (DURATION | START-END)")) << help.out.toStdString();
+    for (const char* line :
+         {"tessal template TEMPLATE_FILE", "tessal sync", "tessal add TASK (DURATION | START-END)"})
+      here.expect({flag}, 0, line);
   }
   EXPECT_EQ(here.tessal({"--version"}).code, 0);
   // Neither a command nor a Qt option: refused with a usage line before anything needs a display.
-  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}}) {
-    const Outcome run = here.tessal(bad);
-    EXPECT_EQ(run.code, 2) << bad.join(' ').toStdString() << ": " << run.err.toStdString();
-    EXPECT_TRUE(run.err.contains("usage: tessal")) << run.err.toStdString();
-    EXPECT_EQ(run.out, "");
-  }
+  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}})
+    EXPECT_EQ(here.expect(bad, 2, "usage: tessal").out, "");
   EXPECT_FALSE(QFile::exists(here.storePath()));
 }
 
@@ -51,21 +91,27 @@ TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
   Installation here;
   WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
   ASSERT_TRUE(desktop.start());
-  const Outcome run = here.tessal({"sync"});
-  EXPECT_EQ(run.code, 1);
-  EXPECT_TRUE(run.err.contains("Tessal is running")) << run.err.toStdString();
+  here.expect({"sync"}, 1, "Tessal is running");
   EXPECT_FALSE(QFile::exists(here.storePath()));  // the running copy's store is not opened twice
 }
 
 // A first start of the desktop copy with a password an earlier version left in the settings file, and a
 // keyring whose default collection does not exist yet: its prompt is never answered. The window and the
 // store come first, and the keyring is asked only for an account.
-TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
-  using fakesecrets::FakeSecretService;
+using fakesecrets::FakeSecretService;
+
+// A keyring on the private bus.
+class WTCommandLineKeyring : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
+    ASSERT_TRUE(keyring.start(address));
+  }
   const QString address = PrivateBus::instance().address();
-  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
   FakeSecretService keyring;
-  ASSERT_TRUE(keyring.start(address));
+};
+
+TEST_F(WTCommandLineKeyring, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForAnAccount) {
   keyring.setBehaviour({FakeSecretService::Answer::Keyring, FakeSecretService::Prompt::Never});
   for (const bool account : {false, true}) {
     SCOPED_TRACE(account ? "an account" : "no account");
@@ -98,12 +144,7 @@ TEST(WTCommandLine, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksItOnlyForA
 
 // `tessal sync` says once where its password came from. Without a session bus the settings file is the
 // store, and nothing else is said; a keyring that does not answer costs a few seconds and is named.
-TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
-  using fakesecrets::FakeSecretService;
-  const QString address = PrivateBus::instance().address();
-  ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  FakeSecretService keyring;
-  ASSERT_TRUE(keyring.start(address));
+TEST_F(WTCommandLineKeyring, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
   keyring.setBehaviour({FakeSecretService::Answer::Never});
   struct Row {
     const char* name;
@@ -133,20 +174,62 @@ TEST(WTCommandLine, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
     here.setSetting("WTSyncUser", "ann@example.org");
     if (!row.password.isEmpty()) here.setSetting("WTSyncPassword", row.password);
     if (!row.server.isEmpty()) here.setSetting("WTSyncServer", row.server);
-    QProcess sync;
-    QProcessEnvironment environment = here.environment();
-    if (row.bus.isEmpty())
-      environment.remove("DBUS_SESSION_BUS_ADDRESS");
-    else
-      environment.insert("DBUS_SESSION_BUS_ADDRESS", row.bus);
-    sync.setProcessEnvironment(environment);
-    sync.start(QString::fromUtf8(TESSAL_EXE), {"sync", "--timeout", "5"});
-    const Outcome run = Installation::finish(sync);
-    EXPECT_EQ(run.code, 1) << "no server is set, or it refuses";
-    EXPECT_EQ(run.err.count(row.said), 1) << run.err.toStdString();
-    EXPECT_FALSE(run.err.contains("No secret service")) << run.err.toStdString();
-    EXPECT_FALSE(run.err.contains("D-Bus")) << run.err.toStdString();
+    // An empty address is no bus at all.
+    const Outcome run =
+        here.expect({"sync", "--timeout", "5"}, 1, row.said, {{"DBUS_SESSION_BUS_ADDRESS", row.bus}});
+    EXPECT_EQ(run.err.count(row.said), 1) << "said once";
+    EXPECT_FALSE(run.err.contains("No secret service") || run.err.contains("D-Bus")) << run.err.toStdString();
   }
+}
+
+TEST(WTSingleInstanceTest, ASecondCopyBringsTheFirstForwardAndLeaves) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  WTSingleInstance first(path);
+  ASSERT_TRUE(first.start());
+  EXPECT_TRUE(first.isListening());
+  QSignalSpy reopened(&first, &WTSingleInstance::reopenRequested);
+
+  // The second copy runs elsewhere (its own thread here) while the first keeps serving events.
+  auto startSecondCopy = [&](bool bringForward) {
+    std::atomic<int> started{-1};
+    std::thread second([&] {
+      WTSingleInstance copy(path);
+      started = copy.start(bringForward) ? 1 : 0;
+    });
+    const bool finished = QTest::qWaitFor([&] { return started != -1; }, 5000);
+    second.join();
+    EXPECT_TRUE(finished);
+    return started.load();
+  };
+  EXPECT_EQ(startSecondCopy(true), 0);
+  EXPECT_EQ(reopened.count(), 1);
+  // A command-line run only learns that a copy is running; the window stays where it is.
+  EXPECT_EQ(startSecondCopy(false), 0);
+  EXPECT_EQ(reopened.count(), 1);
+}
+
+// A copy too busy to answer (its event loop held up by a long save) keeps its store: a second copy
+// that took over its socket would open the same store twice.
+TEST(WTSingleInstanceTest, ACopyThatIsTooBusyToAnswerStillCounts) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  WTSingleInstance busy(path);
+  ASSERT_TRUE(busy.start());
+  WTSingleInstance second(path);  // asks from this thread, so the first cannot answer meanwhile
+  EXPECT_FALSE(second.start(false) || second.isListening());
+  EXPECT_TRUE(busy.isListening() && QFile::exists(path));
+}
+
+TEST(WTSingleInstanceTest, ASocketLeftByACopyThatDiedIsTakenOver) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("tessal.socket");
+  ASSERT_TRUE(QFile(path).open(QIODevice::WriteOnly));
+  WTSingleInstance instance(path);
+  EXPECT_TRUE(instance.start() && instance.isListening());
+  // Nobody else listens: asking a copy to come forward reaches nobody.
+  WTSingleInstance other(dir.filePath("other.socket"));
+  EXPECT_FALSE(other.notifyRunningInstance(200));
 }
 
 }  // namespace

@@ -7,8 +7,8 @@
 
 #include <gtest/gtest.h>
 
-#include <QElapsedTimer>
 #include <QStandardPaths>
+#include <QTest>
 #include <QThread>
 
 #include <functional>
@@ -16,7 +16,7 @@
 
 namespace {
 
-using commandtest::Installation;
+using namespace commandtest;
 
 struct Geometry {
   int x = 0, y = 0, width = 0, height = 0;
@@ -24,13 +24,7 @@ struct Geometry {
 
 // Polls `probe` every 50 ms for up to `ms`.
 bool waitFor(const std::function<bool()>& probe, int ms = 20000) {
-  QElapsedTimer waited;
-  waited.start();
-  while (!probe()) {
-    if (waited.elapsed() > ms) return false;
-    QThread::msleep(50);
-  }
-  return true;
+  return QTest::qWaitFor(probe, ms);
 }
 
 class TrayTest : public ::testing::Test {
@@ -75,19 +69,16 @@ class TrayTest : public ::testing::Test {
   }
   QString xdotool(const QStringList& arguments) const { return x.xdotool(arguments); }
   // The first visible window of the desktop copy whose name matches `pattern` and that `fits`.
-  std::optional<Geometry> window(const QString& pattern,
-                                 const std::function<bool(const Geometry&)>& fits = [](const Geometry&) { return true; }) const {
-    const QString ids =
-        xdotool({"search", "--onlyvisible", "--pid", QString::number(tessal->processId()), "--name", pattern});
+  std::optional<Geometry> window(
+      const QString& pattern,
+      const std::function<bool(const Geometry&)>& fits = [](const Geometry&) { return true; }) const {
+    const QString ids = xdotool(
+        {"search", "--onlyvisible", "--pid", QString::number(tessal->processId()), "--name", pattern});
     for (const QString& id : ids.split('\n', Qt::SkipEmptyParts)) {
-      Geometry geometry;
-      for (const QString& line : xdotool({"getwindowgeometry", "--shell", id}).split('\n')) {
-        const QString value = line.section('=', 1);
-        if (line.startsWith("X=")) geometry.x = value.toInt();
-        if (line.startsWith("Y=")) geometry.y = value.toInt();
-        if (line.startsWith("WIDTH=")) geometry.width = value.toInt();
-        if (line.startsWith("HEIGHT=")) geometry.height = value.toInt();
-      }
+      QMap<QString, int> shell;  // "X=…", "Y=…", "WIDTH=…", "HEIGHT=…", one a line
+      for (const QString& line : xdotool({"getwindowgeometry", "--shell", id}).split('\n'))
+        shell[line.section('=', 0, 0)] = line.section('=', 1).toInt();
+      const Geometry geometry{shell["X"], shell["Y"], shell["WIDTH"], shell["HEIGHT"]};
       if (fits(geometry)) return geometry;
     }
     return std::nullopt;
@@ -125,10 +116,11 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
   EXPECT_GE(icon->x, 1280 - 28 * 2);
 
   // A click opens the list below the icon, inside the screen.
-  xdotool({"mousemove", QString::number(icon->x + icon->width / 2), QString::number(icon->y + icon->height / 2),
-           "click", "1"});
+  xdotool({"mousemove", QString::number(icon->x + icon->width / 2),
+           QString::number(icon->y + icon->height / 2), "click", "1"});
   std::optional<Geometry> list;
-  ASSERT_TRUE(waitFor([&] { return (list = window("Recent Tasks")).has_value(); })) << "the list did not open";
+  ASSERT_TRUE(waitFor([&] { return (list = window("Recent Tasks")).has_value(); }))
+      << "the list did not open";
   EXPECT_GE(list->y, icon->y + icon->height - 1);
   EXPECT_LE(list->x + list->width, 1280);
   EXPECT_GE(list->height, 5 * 24) << "five rows";

@@ -2,46 +2,47 @@
 // the open editor, its text, cursor and selection, and the keyboard focus exactly as they were.
 #include "AppFixture.h"
 #include "SyncTestSupport.h"
-#include "WTClient.h"
-#include "WTClientsViewController.h"
-#include "WTItemsViewController.h"
-#include "WTListView.h"
-#include "WTMainWindowController.h"
-#include "WTNavigationController.h"
-#include "WTObjectContext.h"
-#include "WTOutlineView.h"
-#include "WTProject.h"
-#include "WTProjectsViewController.h"
-#include "WTTask.h"
-
-#include <gtest/gtest.h>
 
 #include <QAbstractItemView>
-#include <QAction>
-#include <QApplication>
-#include <QLineEdit>
-#include <QPointer>
-#include <QTest>
 
 namespace {
 
 class WTTypingAcrossSavesTest : public WindowTest {
  protected:
   // A new client with its name editor open, as Ctrl+2 then Ctrl+N leave it.
-  QLineEdit* newClientEditor() {
+  QPointer<QLineEdit> newClientEditor() {
     window->showClients();
     window->clientsViewController()->addObject();
     return qobject_cast<QLineEdit*>(QApplication::focusWidget());
   }
   // Another record changes, as a merge or another window would change it, so that the save has work.
-  void changeSomethingElse(const QString& name) {
-    WTProject::insertNewObject(delegate->managedObjectContext())->setName(name);
+  bool saveWithOtherChanges() {
+    WTProject::insertNewObject(delegate->managedObjectContext())->setName("merged elsewhere");
+    return delegate->saveChanges();
+  }
+  // The editor is still open (a closed one is hidden, then deleted), has the focus and holds `text`, with
+  // `selected` selected and the cursor at `cursor`.
+  static void expectUntouched(const QPointer<QLineEdit>& editor, const QString& text, const QString& selected,
+                              int cursor) {
+    ASSERT_TRUE(editor);
+    EXPECT_EQ(QApplication::focusWidget(), editor.data());
+    EXPECT_TRUE(editor->isVisible());
+    EXPECT_EQ(QStringLiteral("%1 [%2] @%3")
+                  .arg(editor->text(), editor->selectedText())
+                  .arg(editor->cursorPosition()),
+              QStringLiteral("%1 [%2] @%3").arg(text, selected).arg(cursor));
+  }
+  // Return commits the name: the view closes its editor on its next turn of the event loop.
+  static void commit(QPointer<QLineEdit>& editor) {
+    QTest::keyClick(editor, Qt::Key_Return);
+    ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
   }
   QStringList storedClientNames() {
     QStringList names;
     auto other = makeDelegate();
     for (WTClient* client : WTClient::fetchByPredicate({}, other->managedObjectContext()))
       names << client->name();
+    names.sort();
     return names;
   }
 };
@@ -51,34 +52,22 @@ TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChang
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
   QTest::keyClicks(editor, "Alpha");
-
   // Nothing else changed since the insertion was saved: the save must not even look at the editor.
   ASSERT_TRUE(delegate->managedObjectContext()->save());
   ASSERT_TRUE(delegate->saveChanges());
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
-  EXPECT_EQ(editor->text(), "Alpha");
+  expectUntouched(editor, "Alpha", "", 5);
 
   // With something to save, the typed text is saved too, and the editor stays as the user left it.
   QTest::keyClicks(editor, "Beta");
   editor->setSelection(5, 3);  // "Bet", cursor after it
-  changeSomethingElse("merged elsewhere");
-  ASSERT_TRUE(delegate->saveChanges());
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
-  EXPECT_EQ(editor->text(), "AlphaBeta");
-  EXPECT_EQ(editor->selectedText(), "Bet");
-  EXPECT_EQ(editor->cursorPosition(), 8);
+  ASSERT_TRUE(saveWithOtherChanges());
+  expectUntouched(editor, "AlphaBeta", "Bet", 8);
   EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
   EXPECT_EQ(storedClientNames(), QStringList({"AlphaBeta"}));
 
   editor->end(false);
   QTest::keyClicks(editor, "Gamma");
-  QTest::keyClick(editor, Qt::Key_Return);
-  // The view commits and closes on its next turn of the event loop.
-  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  commit(editor);
   ASSERT_TRUE(delegate->saveChanges());
   EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
 }
@@ -94,23 +83,15 @@ TEST_F(WTTypingAcrossSavesTest, AnEditorFollowsItsRowWhenTheCommittedNameReorder
   ASSERT_TRUE(view);
   ASSERT_EQ(view->indexAt(editor->geometry().center()).row(), 0);  // an empty name sorts first
   QTest::keyClicks(editor, "Zed");
-
-  changeSomethingElse("merged elsewhere");
-  ASSERT_TRUE(delegate->saveChanges());
+  ASSERT_TRUE(saveWithOtherChanges());
   QCoreApplication::processEvents();  // the list re-sorts on its next turn
   QCoreApplication::processEvents();
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());
-  EXPECT_EQ(editor->text(), "Zed");
+  expectUntouched(editor, "Zed", "", 3);
   EXPECT_EQ(view->indexAt(editor->geometry().center()).row(), 1);
   QTest::keyClicks(editor, "ta");
-  QTest::keyClick(editor, Qt::Key_Return);
-  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  commit(editor);
   ASSERT_TRUE(delegate->saveChanges());
-  QStringList names = storedClientNames();
-  names.sort();
-  EXPECT_EQ(names, QStringList({"Mia", "Zedta"}));
+  EXPECT_EQ(storedClientNames(), QStringList({"Mia", "Zedta"}));
 }
 
 // In a project's outline: the rate field with the focus, then a new task's name editor.
@@ -120,34 +101,24 @@ TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorA
   ASSERT_TRUE(project);
   WTItemsViewController* items = openOutline(project);
   ASSERT_TRUE(items);
-  QLineEdit* rate = items->rateField();
+  QPointer<QLineEdit> rate = items->rateField();
   rate->setFocus();
   ASSERT_TRUE(QTest::qWaitFor([&] { return rate->hasFocus(); }, 2000));
   QTest::keyClicks(rate, "125");
   rate->setCursorPosition(1);
-  changeSomethingElse("merged elsewhere");
-  ASSERT_TRUE(delegate->saveChanges());
-  EXPECT_EQ(QApplication::focusWidget(), rate);
-  EXPECT_EQ(rate->text(), "125");
-  EXPECT_EQ(rate->cursorPosition(), 1);
+  ASSERT_TRUE(saveWithOtherChanges());
+  expectUntouched(rate, "125", "", 1);
   ASSERT_TRUE(project->storedRate());
   EXPECT_EQ(project->storedRate()->toString(), "125");
 
   items->addObject();  // a new task, its name editor open
   QPointer<QLineEdit> editor = qobject_cast<QLineEdit*>(QApplication::focusWidget());
-  ASSERT_TRUE(editor);
-  ASSERT_TRUE(items->outlineView()->isAncestorOf(editor));
+  ASSERT_TRUE(editor && items->outlineView()->isAncestorOf(editor));
   editor->selectAll();
   QTest::keyClicks(editor, "Deploy");
   editor->setSelection(6, -3);  // "loy", cursor before it
-  changeSomethingElse("merged again");
-  ASSERT_TRUE(delegate->saveChanges());
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());
-  EXPECT_EQ(editor->text(), "Deploy");
-  EXPECT_EQ(editor->selectedText(), "loy");
-  EXPECT_EQ(editor->cursorPosition(), 3);
+  ASSERT_TRUE(saveWithOtherChanges());
+  expectUntouched(editor, "Deploy", "loy", 3);
   QStringList names;
   auto other = makeDelegate();
   for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
@@ -158,38 +129,30 @@ TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorA
 // Undo and Redo take back typing where it was typed, and records with the keyboard focus kept where it was.
 TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
   open();
-  auto* undo = action("undo");
-  ASSERT_TRUE(undo);
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
   ASSERT_TRUE(delegate->managedObjectContext()->save());
   QTest::keyClicks(editor, "Alpha");
-  undo->trigger();
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());
-  EXPECT_EQ(editor->text(), "");
+  action("undo")->trigger();
+  expectUntouched(editor, "", "", 0);
   EXPECT_EQ(WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size(), 1);
+  action("redo")->trigger();
+  expectUntouched(editor, "Alpha", "", 5);
 
-  auto* redo = action("redo");
-  ASSERT_TRUE(redo);
-  redo->trigger();
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_EQ(editor->text(), "Alpha");
+  // Quitting is the one save that stores an edit in progress even when nothing else changed.
+  EXPECT_TRUE(window->close());
+  EXPECT_EQ(storedClientNames(), QStringList({"Alpha"}));
 }
 
 TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   open();
-  auto* undo = action("undo");
-  ASSERT_TRUE(undo);
+  QAction* undo = action("undo");
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
   QTest::keyClicks(editor, "Alpha");
-  QTest::keyClick(editor, Qt::Key_Return);
-  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  commit(editor);
   QCoreApplication::processEvents();  // the name's undo group ends with this turn
-  QWidget* list = QApplication::focusWidget();
+  auto* list = qobject_cast<QAbstractItemView*>(QApplication::focusWidget());
   ASSERT_TRUE(list);
   WTClient* client = WTClient::fetchByPredicate({}, delegate->managedObjectContext()).value(0);
   ASSERT_TRUE(client);
@@ -198,39 +161,20 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
   EXPECT_EQ(client->name(), "");
   EXPECT_EQ(QApplication::focusWidget(), list);
 
-  // An editor opened on the row, nothing typed: undoing the row's name must not leave the editor showing
-  // (and on Return storing) the name the undo replaced.
+  // An editor opened on the row, nothing typed: undoing (or redoing) the row's name must not leave the
+  // editor showing (and on Return storing) the name the undo replaced.
   client->setName("Beta");
   QCoreApplication::processEvents();
-  auto* view = qobject_cast<QAbstractItemView*>(list);
-  ASSERT_TRUE(view);
-  view->edit(view->currentIndex());
-  QPointer<QLineEdit> untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
-  ASSERT_TRUE(untouched);
-  ASSERT_EQ(untouched->text(), "Beta");
-  undo->trigger();
-  EXPECT_EQ(client->name(), "");
-  EXPECT_TRUE(!untouched || !untouched->isVisible());
-  EXPECT_EQ(QApplication::focusWidget(), list);
-
-  view->edit(view->currentIndex());
-  untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
-  ASSERT_TRUE(untouched);
-  action("redo")->trigger();
-  EXPECT_EQ(client->name(), "Beta");
-  EXPECT_TRUE(!untouched || !untouched->isVisible());
-  EXPECT_EQ(QApplication::focusWidget(), list);
-}
-
-// Quitting is the one save that stores an edit in progress even when nothing else changed.
-TEST_F(WTTypingAcrossSavesTest, QuittingStoresWhatIsBeingTyped) {
-  open();
-  QPointer<QLineEdit> editor = newClientEditor();
-  ASSERT_TRUE(editor);
-  ASSERT_TRUE(delegate->managedObjectContext()->save());
-  QTest::keyClicks(editor, "Alpha");
-  EXPECT_TRUE(window->close());
-  EXPECT_EQ(storedClientNames(), QStringList({"Alpha"}));
+  for (QAction* step : {undo, action("redo")}) {
+    list->edit(list->currentIndex());
+    QPointer<QLineEdit> untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
+    ASSERT_TRUE(untouched);
+    ASSERT_EQ(untouched->text(), client->name());
+    step->trigger();
+    EXPECT_EQ(client->name(), step == undo ? "" : "Beta");
+    EXPECT_TRUE(!untouched || !untouched->isVisible());
+    EXPECT_EQ(QApplication::focusWidget(), list);
+  }
 }
 
 // The real path of the report: a "head" reply that changes another record is merged and saved while the
@@ -282,20 +226,12 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   QTest::qWait(50);  // the list takes the new row on its next turn
   ASSERT_TRUE(synctest::waitUntil([&] { return !delegate->managedObjectContext()->hasChanges(); }));
 
-  ASSERT_TRUE(editor);
-  EXPECT_EQ(QApplication::focusWidget(), editor.data());
-  EXPECT_TRUE(editor->isVisible());  // still open: a closed editor is hidden, then deleted
-  EXPECT_EQ(editor->text(), "Alpha");
-  EXPECT_EQ(editor->cursorPosition(), 5);
-  EXPECT_FALSE(editor->hasSelectedText());  // or the next key would replace what was typed
+  expectUntouched(editor, "Alpha", "", 5);  // nothing selected, or the next key would replace what was typed
   QTest::keyClicks(editor, "BetaGamma");
-  QTest::keyClick(editor, Qt::Key_Return);
-  ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
+  commit(editor);
   sync->disableSync();
   ASSERT_TRUE(delegate->saveChanges());
-  QStringList names = storedClientNames();
-  names.sort();
-  EXPECT_EQ(names, QStringList({"Aaron", "AlphaBetaGamma"}));
+  EXPECT_EQ(storedClientNames(), QStringList({"Aaron", "AlphaBetaGamma"}));
 }
 
 }  // namespace

@@ -2,11 +2,13 @@
 #include "Date.h"
 #include "Decimal.h"
 #include "GXTemplateEngine.h"
+#include "GXTemplateStandardFilters.h"
+#include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
 #include "RXRegex.h"
 #include "RZDate.h"
-#include "TemplateTestSupport.h"
 
+#include <QColor>
 #include <QDateTime>
 #include <QDir>
 #include <QFile>
@@ -15,7 +17,66 @@
 
 #include <unicode/locid.h>
 
+#include <vector>
+
+// Readable failure messages for texts.
+inline void PrintTo(const QString& text, std::ostream* out) {
+  *out << '"' << text.toStdString() << '"';
+}
+
 namespace {
+
+// Records everything the engine tells its delegate.
+class RecordingDelegate : public GXTemplateEngineDelegate {
+ public:
+  struct Error {
+    int code;
+    QString message;
+    bool continuing;
+  };
+
+  void templateEngineBlockStarted(GXTemplateEngine*, const GXBlockInfo& block) override {
+    events.append(QStringLiteral("start ") + block.name);
+  }
+  void templateEngineBlockEnded(GXTemplateEngine*, const GXBlockInfo& block) override {
+    events.append(QStringLiteral("end ") + block.name);
+  }
+  void templateEngineFinishedProcessingTemplate(GXTemplateEngine*) override {
+    events.append(QStringLiteral("finished"));
+  }
+  void templateEngineEncounteredError(GXTemplateEngine*, const GXTemplateError& error,
+                                      bool continuing) override {
+    EXPECT_EQ(error.domain, QStringLiteral("GXTemplateEngineErrorDomain"));
+    errors.push_back({int(error.code), error.localizedDescription, continuing});
+  }
+
+  QList<int> codes() const {
+    QList<int> result;
+    for (const Error& error : errors) result.append(error.code);
+    return result;
+  }
+
+  std::vector<Error> errors;
+  QStringList events;
+};
+
+// An engine with the ICU matcher and a recording delegate, as the report window sets one up.
+class TemplateTest : public ::testing::Test {
+ protected:
+  TemplateTest() {
+    engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
+    engine.setDelegate(&delegate);
+  }
+
+  QString render(const QString& text, const QVariantMap& variables = {}) {
+    delegate.errors.clear();
+    delegate.events.clear();
+    return engine.processTemplate(text, variables);
+  }
+
+  GXTemplateEngine engine;
+  RecordingDelegate delegate;
+};
 
 // A marker handler that misbehaves on request, to drive the engine's error paths:
 // "both" reports a block both beginning and ending, "noend" starts a block without end markers,
@@ -184,73 +245,58 @@ TEST(EngineWithoutMatcher, ReportsFatalErrorSevenAndGivesNone) {
   engine.setDelegate(&delegate);
   EXPECT_TRUE(engine.processTemplate(QStringLiteral("x"), {}).isNull());
   ASSERT_EQ(delegate.errors.size(), 1u);
-  EXPECT_EQ(delegate.errors[0].code, 7);
-  EXPECT_EQ(delegate.errors[0].message,
-            QStringLiteral("Fatal Error: No matcher has been configured for the template engine"));
-  EXPECT_FALSE(delegate.errors[0].continuing);
+  EXPECT_EQ(QStringLiteral("%1 %2 %3")
+                .arg(delegate.errors[0].code)
+                .arg(delegate.errors[0].continuing)
+                .arg(delegate.errors[0].message),
+            QStringLiteral("7 0 Fatal Error: No matcher has been configured for the template engine"));
   EXPECT_TRUE(delegate.events.isEmpty());  // no run took place, so none finished
 }
 
-// Each error with what the run made of the template: the output (built up to a stop), the codes in order,
-// and the first error's message and whether it was reported as continuing.
+// Each error with what the run made of the template: "output | codes | first message", the message marked
+// "(stop)" when it was not reported as continuing.
 TEST_F(EngineErrorTest, ErrorsAreReportedWithTheirCodeMessageAndOutcome) {
   engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"both", "noend", "jump"}));
-  struct Case {
-    const char* text;
-    const char* output;
-    QList<int> codes;
-    const char* message;
-    bool continuing = true;
-  };
-  const Case cases[] = {
-      {"a{{ missing }}b", "ab", {3}, "\"missing\" is not a valid variable"},
-      {"{% if false %}{{ missing }}{% /if %}c", "c", {}, nullptr},  // silent while output is off
-      {"{{}}", "", {3}, "\"(null)\" is not a valid variable"},
-      {"a{% bogus x y %}b", "ab", {2}, "\"bogus\" is not a valid marker"},
-      {"{% if false %}{% bogus %}{% /if %}c", "c", {2}, "\"bogus\" is not a valid marker"},
-      {"{%%}", "", {2}, "\"(null)\" is not a valid marker"},
+  const std::pair<const char*, const char*> cases[] = {
+      {"a{{ missing }}b", "ab | 3 | \"missing\" is not a valid variable"},
+      {"{% if false %}{{ missing }}{% /if %}c", "c |  | "},  // silent while output is off
+      {"{{}}", " | 3 | \"(null)\" is not a valid variable"},
+      {"a{% bogus x y %}b", "ab | 2 | \"bogus\" is not a valid marker"},
+      {"{% if false %}{% bogus %}{% /if %}c", "c | 2 | \"bogus\" is not a valid marker"},
+      {"{%%}", " | 2 | \"(null)\" is not a valid marker"},
       // Markers whose arguments do not fit start no block; their end closes nothing.
-      {"{% for x in %}a{% /for %}b", "a", {1}, "Marker \"/for\" reported that a non-existent block ended"},
-      {"{% if not x %}A{% /if %}B", "A", {1}, "Marker \"/if\" reported that a non-existent block ended"},
-      {"{% if a b c d %}A{% /if %}B", "A", {1}, nullptr},
-      {"a{% comment x %}b{% /comment %}c", "ab", {1}, nullptr},
-      {"{% section %}x{% /section %}", "x", {1}, nullptr},
-      {"{% for x in items %}abc",
-       "abc",
-       {6},
-       "Finished processing template, but 1 block was left open (for)."},
+      {"{% for x in %}a{% /for %}b", "a | 1 | Marker \"/for\" reported that a non-existent block ended"},
+      {"{% if not x %}A{% /if %}B", "A | 1 | Marker \"/if\" reported that a non-existent block ended"},
+      {"{% if a b c d %}A{% /if %}B", "A | 1 | Marker \"/if\" reported that a non-existent block ended"},
+      {"a{% comment x %}b{% /comment %}c",
+       "ab | 1 | Marker \"/comment\" reported that a non-existent block ended"},
+      {"{% section %}x{% /section %}",
+       "x | 1 | Marker \"/section\" reported that a non-existent block ended"},
+      {"{% for x in items %}abc", "abc | 6 | Finished processing template, but 1 block was left open (for)."},
       {"{% for 1 to 2 %}{% if true %}{% section s %}x",
-       "x",
-       {6},
-       "Finished processing template, but 3 blocks were left open (for, if, section)."},
+       "x | 6 | Finished processing template, but 3 blocks were left open (for, if, section)."},
       // Reported as continuing, and yet the run ends.
-      {"a{% /for %}b{{ missing }}", "a", {1}, "Marker \"/for\" reported that a non-existent block ended"},
+      {"a{% /for %}b{{ missing }}", "a | 1 | Marker \"/for\" reported that a non-existent block ended"},
       {"{% section s %}x{% /if %}y{% /section %}z",
-       "x",
-       {1},
-       "Marker \"/if\" reported that a block ended, but current block was started by \"section\" marker"},
+       "x | 1 | Marker \"/if\" reported that a block ended, but current block was started by \"section\" "
+       "marker"},
       {"{% both %}{{ bothVar }}",
-       "BOTHkept",
-       {0},
-       "Marker \"both\" reported that a block simultaneously began and ended"},
+       "BOTHkept | 0 | Marker \"both\" reported that a block simultaneously began "
+       "and ended"},
       {"a{% noend %}b{{ noendVar }}",
-       "ab",
-       {4, 3},
-       "Marker \"noend\" started a block but did not supply any suitable end-markers"},
+       "ab | 4 3 | Marker \"noend\" started a block but did not supply any suitable end-markers"},
       {"before{% jump %}after",
-       "before",
-       {5},
-       "Fatal Error: Marker handler \"jump\" specified an invalid range to resume processing from",
-       false},
+       "before | 5 | Fatal Error: Marker handler \"jump\" specified an invalid range "
+       "to resume processing from (stop)"},
   };
-  for (const Case& c : cases) {
-    EXPECT_EQ(render(QString::fromUtf8(c.text), {{"items", QVariantList{1}}}), QString::fromUtf8(c.output))
-        << c.text;
-    EXPECT_EQ(delegate.codes(), c.codes) << c.text;
-    if (!c.message || delegate.errors.empty()) continue;
-    EXPECT_EQ(delegate.errors[0].message, QString::fromUtf8(c.message)) << c.text;
-    EXPECT_EQ(delegate.errors[0].continuing, c.continuing) << c.text;
-    EXPECT_EQ(delegate.events.last(), QStringLiteral("finished")) << c.text;
+  for (const auto& [text, expected] : cases) {
+    QStringList outcome{render(QString::fromUtf8(text), {{"items", QVariantList{1}}}), {}, {}};
+    for (const int code : delegate.codes())
+      outcome[1] += (outcome[1].isEmpty() ? "" : " ") + QString::number(code);
+    if (!delegate.errors.empty())
+      outcome[2] = delegate.errors[0].message + (delegate.errors[0].continuing ? "" : " (stop)");
+    EXPECT_EQ(outcome.join(" | ").toStdString(), expected) << text;
+    EXPECT_EQ(delegate.events.last(), QStringLiteral("finished")) << text;
   }
   render(QStringLiteral("{% both %}"));
   EXPECT_EQ(delegate.events, QStringList{"finished"});  // no block was opened or closed
@@ -389,6 +435,81 @@ TEST_F(EngineRunTest, LoadFindsClassesByName) {
   GXTemplateEngine other;
   other.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&other));
   EXPECT_EQ(other.processTemplate(text, vars), QStringLiteral("hihiHI"));
+}
+
+class FilterTest : public TemplateTest {
+ protected:
+  QString filtered(const QVariant& value, const QString& filter) {
+    return render(QStringLiteral("{{ v | %1 }}").arg(filter), {{"v", value}});
+  }
+};
+
+TEST(FilterFunctions, CapitalizedStartsEveryWord) {
+  struct Case {
+    const char* text;
+    const char* capitalized;
+  };
+  const Case cases[] = {{"hello world", "Hello World"},           {"HELLO wORLD", "Hello World"},
+                        {"o'neil-smith", "O'neil-Smith"},         {"123abc 4U", "123Abc 4U"},
+                        {"élan\tvital\nend", "Élan\tVital\nEnd"}, {"", ""}};
+  for (const Case& c : cases) {
+    EXPECT_EQ(GXTemplateStandardFilters::capitalized(QString::fromUtf8(c.text)),
+              QString::fromUtf8(c.capitalized))
+        << c.text;
+  }
+}
+
+TEST_F(FilterTest, DateTextsOfOneDayComeFromTheRightDay) {
+  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("America/New_York")));
+  // Hourly items across a local midnight, and one pattern with times: every text must match its own date.
+  QVariantList items;
+  const double start =
+      Date::fromQDateTime(QDateTime(QDate(2024, 11, 2), QTime(20, 0), Qt::UTC)).secondsSince1970();
+  for (int i = 0; i < 60; ++i) items.append(QVariant::fromValue(Date::fromSeconds(start + 1800.0 * i)));
+  const QString output = render(QStringLiteral("{% for d in items %}{{ d | date_format: \"yyyy-MM-dd\" }} "
+                                               "{{ d | date_format: \"d HH:mm\" }};{% /for %}"),
+                                {{"items", items}});
+  QString expected;
+  for (const QVariant& item : items) {
+    const Date date = item.value<Date>();
+    expected += RZDate::stringWithPattern(date, QStringLiteral("yyyy-MM-dd")) + QLatin1Char(' ') +
+                RZDate::stringWithPattern(date, QStringLiteral("d HH:mm")) + QLatin1Char(';');
+  }
+  EXPECT_EQ(output, expected);
+  // After a change of zone the same instant may fall on another day.
+  const QVariantMap late{
+      {"d", QVariant::fromValue(Date::fromSeconds(start + 4 * 3600.0))}};  // 00:00 UTC, 3 Nov
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"d\" }}"), late), QStringLiteral("2"));
+  ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
+  EXPECT_EQ(render(QStringLiteral("{{ d | date_format: \"d\" }}"), late), QStringLiteral("3"));
+  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
+}
+
+TEST(FilterFunctions, OnlyPatternsOfDayFieldsShareADaysText) {
+  for (const char* pattern : {"yyyy-MM-dd", "EEEE d. MMMM y 'um' QQQ", "w/W D F g e c", "'HH:mm' yy"}) {
+    EXPECT_TRUE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
+  }
+  for (const char* pattern : {"HH:mm", "yyyy a", "d z", "dd 'x''' ss", "yyyy-MM-dd'T'HH"}) {
+    EXPECT_FALSE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
+  }
+}
+
+TEST_F(FilterTest, ColorFormatWritesHexForHex) {
+  const QVariant red = QColor(255, 0, 0);
+  EXPECT_EQ(filtered(red, QStringLiteral("color_format: hex")), QStringLiteral("ff0000"));
+  EXPECT_EQ(filtered(red, QStringLiteral("color_format: HEX")), QStringLiteral("ff0000"));
+  EXPECT_EQ(filtered(QColor(18, 52, 86, 128), QStringLiteral("color_format: hex")), QStringLiteral("123456"));
+  EXPECT_EQ(filtered(QColor::fromHsv(240, 255, 255), QStringLiteral("color_format: hex")),
+            QStringLiteral("0000ff"));
+  EXPECT_EQ(filtered(QColor(), QStringLiteral("color_format: hex")), QStringLiteral("000000"));
+  // Anything else leaves the value as it is.
+  GXTemplateStandardFilters filters;
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {QStringLiteral("rgb")}, red), red);
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {}, red), red);
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("color_format"), {QStringLiteral("hex")},
+                                  QStringLiteral("ff0000")),
+            QVariant(QStringLiteral("ff0000")));
+  EXPECT_EQ(filters.filterInvoked(QStringLiteral("nosuch"), {}, red), red);
 }
 
 }  // namespace

@@ -26,43 +26,33 @@ class MatcherTest : public ::testing::Test {
   ICUTemplateMatcher matcher;
 };
 
+// Each match as "type name [args] filter [filter args]", with "-" for an absent name or filter.
 TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
-  struct Case {
-    const char* text;
-    const char* type;
-    const char* name;  // null: absent
-    QStringList args;
-    const char* filter;  // null: absent
-    QStringList filterArgs;
+  const std::pair<const char*, const char*> cases[] = {
+      {"{{ client.name }}", "expression client.name [] - []"},
+      {"{% for item in items %}", "marker for [item,in,items] - []"},
+      {"{{ d | date_format: \"%d.%m.%Y\" }}", "expression d [] date_format [%d.%m.%Y]"},
+      {"{{d|date_format:'yyyy MM'}}", "expression d [] date_format [yyyy MM]"},
+      {"{% if a == 'x y' %}", "marker if [a,==,x y] - []"},
+      {"{% set x '' 5 %}", "marker set [x] - []"},
+      {"{% cycle \"a \\\" b\" 'c' %}", "marker cycle [a \\\" b,c] - []"},
+      {"{{ a | b | c }}", "expression a [] b [|,c]"},
+      {"{{ a | f: x: y }}", "expression a [] f [x:,y]"},
+      {"{{ a | '' x }}", "expression a [] - []"},
+      {"{%  %}", "marker - [] - []"},
+      {"{{}}", "expression - [] - []"},
+      {"{% '' | upper %}", "marker - [] upper []"},
+      {"{%\tnow\n%}", "marker now [] - []"},  // blanks around the body may include a line end
   };
-  const Case cases[] = {
-      {"{{ client.name }}", "expression", "client.name", {}, nullptr, {}},
-      {"{% for item in items %}", "marker", "for", {"item", "in", "items"}, nullptr, {}},
-      {"{{ d | date_format: \"%d.%m.%Y\" }}", "expression", "d", {}, "date_format", {"%d.%m.%Y"}},
-      {"{{d|date_format:'yyyy MM'}}", "expression", "d", {}, "date_format", {"yyyy MM"}},
-      {"{% if a == 'x y' %}", "marker", "if", {"a", "==", "x y"}, nullptr, {}},
-      {"{% set x '' 5 %}", "marker", "set", {"x"}, nullptr, {}},
-      {"{% cycle \"a \\\" b\" 'c' %}", "marker", "cycle", {"a \\\" b", "c"}, nullptr, {}},
-      {"{{ a | b | c }}", "expression", "a", {}, "b", {"|", "c"}},
-      {"{{ a | f: x: y }}", "expression", "a", {}, "f", {"x:", "y"}},
-      {"{{ a | '' x }}", "expression", "a", {}, nullptr, {}},
-      {"{%  %}", "marker", nullptr, {}, nullptr, {}},
-      {"{{}}", "expression", nullptr, {}, nullptr, {}},
-      {"{% '' | upper %}", "marker", nullptr, {}, "upper", {}},
-      {"{%\tnow\n%}", "marker", "now", {}, nullptr, {}},  // blanks around the body may include a line end
-  };
-  for (const Case& c : cases) {
-    const QString text = QString::fromUtf8(c.text);
-    const std::shared_ptr<const GXTemplateMatch> match = first(text);
-    ASSERT_TRUE(match) << c.text;
-    EXPECT_EQ(match->range, (GXRange{0, std::uint64_t(text.size())})) << c.text;
-    EXPECT_EQ(match->type, QString::fromUtf8(c.type)) << c.text;
-    EXPECT_EQ(match->name, c.name ? QString::fromUtf8(c.name) : QString()) << c.text;
-    EXPECT_EQ(match->name.isNull(), c.name == nullptr) << c.text;
-    EXPECT_EQ(match->args, c.args) << c.text;
-    EXPECT_EQ(match->filter.isNull(), c.filter == nullptr) << c.text;
-    EXPECT_EQ(match->filter, c.filter ? QString::fromUtf8(c.filter) : QString()) << c.text;
-    EXPECT_EQ(match->filterArgs, c.filterArgs) << c.text;
+  for (const auto& [text, expected] : cases) {
+    const std::shared_ptr<const GXTemplateMatch> m = first(QString::fromUtf8(text));
+    ASSERT_TRUE(m) << text;
+    EXPECT_EQ(m->range, (GXRange{0, std::uint64_t(QString::fromUtf8(text).size())})) << text;
+    const QString described =
+        QStringList{m->type, m->name.isNull() ? "-" : m->name, "[" + m->args.join(',') + "]",
+                    m->filter.isNull() ? "-" : m->filter, "[" + m->filterArgs.join(',') + "]"}
+            .join(' ');
+    EXPECT_EQ(described.toStdString(), expected) << text;
   }
 }
 
@@ -109,26 +99,10 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {
   // The matcher starts its search where a match can begin; over random texts made of the pattern's own
   // pieces, every position must give exactly what the plain search from that position gives.
-  const QStringList pieces{"{{",
-                           "}}",
-                           "{%",
-                           "%}",
-                           "|",
-                           " ",
-                           "\t",
-                           "\n",
-                           "\r\n",
-                           "x",
-                           "ab",
-                           ":",
-                           "\"",
-                           "'",
-                           "\\",
-                           QString(QChar(0x2028)),
-                           QString(QChar(0x0085)),
-                           QString(QChar(0x00a0)),
-                           "{",
-                           "%"};
+  // clang-format off
+  const QStringList pieces{"{{", "}}", "{%", "%}", "|", " ", "\t", "\n", "\r\n", "x", "ab", ":", "\"", "'",
+                           "\\", QChar(0x2028), QChar(0x0085), QChar(0x00a0), "{", "%"};
+  // clang-format on
   std::uint32_t seed = 12345;
   auto next = [&seed] { return (seed = seed * 1664525u + 1013904223u) >> 8; };
   for (int round = 0; round < 300; ++round) {

@@ -30,6 +30,14 @@ class ScriptedPresenter final : public WTTrackingAlertPresenter {
     answers.pop_front();
     return answer;
   }
+  // The `index`th alert shown: "title | text | default button | alternate button".
+  std::string said(size_t index) const {
+    if (index >= shown.size()) return "(not shown)";
+    const WTTrackingAlert& alert = shown[index];
+    return QStringList{alert.messageText, alert.informativeText, alert.defaultButton, alert.alternateButton}
+        .join(" | ")
+        .toStdString();
+  }
   std::vector<WTTrackingAlert> shown;
   std::deque<WTTrackingAlertAnswer> answers;
   // Runs while the alert is "open", as a dialog's nested event loop would let other things happen.
@@ -73,6 +81,20 @@ class TrackingTest : public ModelTest {
     for (int i = 0; i < 3; ++i) QCoreApplication::processEvents();
   }
 
+  // The updater's running set once the turn's queued work has run.
+  QList<WTTime*> runningNow() {
+    settle();
+    return updater->times();
+  }
+  // What the ticker shows: "TICKS ticks, N running, badge "LABEL", ticking|stopped".
+  std::string ticker() const {
+    return QStringLiteral("%1 ticks, %2 running, badge \"%3\", %4")
+        .arg(ticks)
+        .arg(updater->times().size())
+        .arg(updater->badgeLabel(), updater->isTicking() ? "ticking" : "stopped")
+        .toStdString();
+  }
+
   void advance(double seconds) { clockNow = clockNow.addingSeconds(seconds); }
 
   void turnIdleHandlingOn(int minutes) {
@@ -87,6 +109,8 @@ class TrackingTest : public ModelTest {
   }
 
   QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
+  // The entry of the store's context with `uuid`, if any.
+  WTTime* stored(const QString& uuid) const { return static_cast<WTTime*>(context->objectWithUUID(uuid)); }
 
   // The updater's saves go to the store file, counted in `saves`.
   void countSaves() {

@@ -62,13 +62,11 @@ TEST_F(DesktopBusTest, AServiceThatErrorsOrNeverAnswersMovesOnToTheNext) {
   EXPECT_EQ(source.idleSeconds(), 7);
   EXPECT_LT(waited.elapsed(), 2000) << "a hung service costs the timeout, not the bus default";
 
-  screenSaver.mode = FakeMode::Error;
-  EXPECT_EQ(source.idleSeconds(), -1);
-  screenSaver.mode = FakeMode::Silent;
-  EXPECT_EQ(source.idleSeconds(), -1);
-
-  WTDBusIdleSource noBus(QDBusConnection(QStringLiteral("never-connected")));
-  EXPECT_EQ(noBus.idleSeconds(), -1);
+  for (const FakeMode mode : {FakeMode::Error, FakeMode::Silent}) {
+    screenSaver.mode = mode;
+    EXPECT_EQ(source.idleSeconds(), -1);
+  }
+  EXPECT_EQ(WTDBusIdleSource(QDBusConnection(QStringLiteral("never-connected"))).idleSeconds(), -1);
 }
 
 TEST_F(DesktopBusTest, TheUpdaterAsksTheBusForIdleTime) {
@@ -120,8 +118,7 @@ TEST_F(DesktopBusTest, LogindPrepareForSleepStopsTheTickerAndWakeTicksAtOnce) {
   EXPECT_TRUE(updater->isTicking());
   EXPECT_EQ(presenter.shown.size(), 1u) << "the three hours asleep are offered";
 
-  WTSleepMonitor withoutBus{QDBusConnection(QStringLiteral("never-connected"))};
-  EXPECT_FALSE(withoutBus.isListening());
+  EXPECT_FALSE(WTSleepMonitor(QDBusConnection(QStringLiteral("never-connected"))).isListening());
 }
 
 TEST_F(DesktopBusTest, LauncherEntryCarriesTheNumberOfRunningTimersAndIsSentOnlyWhenItChanges) {

@@ -1,5 +1,6 @@
 #include "LogCapture.h"
 #include "TrackingFixture.h"
+#include "WTRecentTasks.h"
 
 #include <QSignalSpy>
 #include <QTranslator>
@@ -18,20 +19,15 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesSetsTheBadgeAndSchedulesTheNextTick
 
   updater->start();
 
-  EXPECT_EQ(updater->times().size(), 2);
+  EXPECT_EQ(ticker(), "1 ticks, 2 running, badge \"01:15\", ticking");
   EXPECT_EQ(updater->totalActiveDuration(), 75);
-  EXPECT_EQ(updater->badgeLabel(), QStringLiteral("01:15"));
   EXPECT_EQ(updater->windowTitle(QStringLiteral("Tessal")), QStringLiteral("Tessal — 01:15"));
   ASSERT_EQ(badge.count(), 1);
   EXPECT_EQ(badge.at(0).at(0).toString(), QStringLiteral("01:15"));
-  EXPECT_EQ(ticks, 1);
-  EXPECT_TRUE(updater->isTicking());
-
   // A tick with nothing new keeps the badge and still reschedules.
   updater->update();
-  EXPECT_EQ(ticks, 2);
+  EXPECT_EQ(ticker(), "2 ticks, 2 running, badge \"01:15\", ticking");
   EXPECT_EQ(badge.count(), 1);
-  EXPECT_TRUE(updater->isTicking());
 }
 
 TEST_F(TrackingTest, EachTickPeeksSoTotalsMoveOncePerMinuteBoundary) {
@@ -56,29 +52,22 @@ TEST_F(TrackingTest, ChangingTheRunningSetTicksAtOnceAndOtherChangesDoNot) {
   WTTask* task = makeTask();
   updater->start();
   settle();
-  ASSERT_EQ(ticks, 1);
-  EXPECT_TRUE(updater->badgeLabel().isEmpty());
-
+  EXPECT_EQ(ticker(), "1 ticks, 0 running, badge \"\", ticking");
   task->setName(QStringLiteral("Renamed"));
   makeTime(task, clockNow.addingSeconds(-600), clockNow);
   settle();
   EXPECT_EQ(ticks, 1) << "no running entry came or went";
 
   WTTime* started = task->toggleTimer();
-  settle();
-  EXPECT_EQ(ticks, 2);
-  EXPECT_EQ(updater->times(), QList<WTTime*>{started});
-  EXPECT_EQ(updater->badgeLabel(), QStringLiteral("00:00"));
-
+  EXPECT_EQ(runningNow(), QList<WTTime*>{started});
+  EXPECT_EQ(ticker(), "2 ticks, 1 running, badge \"00:00\", ticking");
   QSignalSpy badge(updater.get(), &WTStopwatchUpdater::badgeDidChange);
   task->toggleTimer();
   settle();
-  EXPECT_EQ(ticks, 3);
-  EXPECT_TRUE(updater->times().isEmpty());
+  EXPECT_EQ(ticker(), "3 ticks, 0 running, badge \"\", ticking") << "the ticker runs on with nothing running";
   ASSERT_EQ(badge.count(), 1);
   EXPECT_TRUE(badge.at(0).at(0).toString().isEmpty());
   EXPECT_EQ(updater->windowTitle(QStringLiteral("Tessal")), QStringLiteral("Tessal"));
-  EXPECT_TRUE(updater->isTicking()) << "the ticker runs on with nothing running";
 }
 
 TEST_F(TrackingTest, RunningSetFollowsRestartsOfSavedEntriesDeletionAndUndo) {
@@ -90,38 +79,30 @@ TEST_F(TrackingTest, RunningSetFollowsRestartsOfSavedEntriesDeletionAndUndo) {
 
   // Stopped and started again between two saves: each change must still be seen.
   time->setRunning(false);
-  settle();
-  EXPECT_TRUE(updater->times().isEmpty());
+  EXPECT_TRUE(runningNow().isEmpty());
   time->setRunning(true);
-  settle();
-  EXPECT_EQ(updater->times(), QList<WTTime*>{time});
+  EXPECT_EQ(runningNow(), QList<WTTime*>{time});
   time->setRunning(false);
-  settle();
-  EXPECT_TRUE(updater->times().isEmpty());
+  EXPECT_TRUE(runningNow().isEmpty());
 
   // A running entry that is deleted leaves the set, whether it was saved or not.
   WTTime* fresh = task->toggleTimer();
-  settle();
-  ASSERT_EQ(updater->times(), QList<WTTime*>{fresh});
+  ASSERT_EQ(runningNow(), QList<WTTime*>{fresh});
   context->deleteObject(fresh);
-  settle();
-  EXPECT_TRUE(updater->times().isEmpty());
+  EXPECT_TRUE(runningNow().isEmpty());
   ASSERT_TRUE(context->save().ok());
   context->deleteObject(time);
   time->setRunning(true);  // a deleted record's value changing does not bring it back
-  settle();
-  EXPECT_TRUE(updater->times().isEmpty());
+  EXPECT_TRUE(runningNow().isEmpty());
 
   // Undo brings a deleted running entry back into the set.
   WTTask* second = makeTask(nullptr, QStringLiteral("Second"));
   WTTime* undone = second->toggleTimer();
   settle();
   context->deleteObject(undone);
-  settle();
-  ASSERT_TRUE(updater->times().isEmpty());
+  ASSERT_TRUE(runningNow().isEmpty());
   context->undoManager().undo();
-  settle();
-  EXPECT_EQ(updater->times(), QList<WTTime*>{undone});
+  EXPECT_EQ(runningNow(), QList<WTTime*>{undone});
 }
 
 // Whether a tick asks about idle time: only with the handling on, something running and the desktop's
@@ -135,10 +116,6 @@ struct IdleRow {
   bool running;
   bool asks;
 };
-
-void PrintTo(const IdleRow& row, std::ostream* os) {
-  *os << row.name;
-}
 
 class IdleQuestionTest : public TrackingTest, public ::testing::WithParamInterface<IdleRow> {};
 
@@ -154,20 +131,13 @@ TEST_P(IdleQuestionTest, AsksOnlyAtTheThresholdAndNoKeepsTheIdleTime) {
   settle();
   if (!row.asks) {
     EXPECT_TRUE(presenter.shown.empty());
-    if (!row.running) {
-      EXPECT_EQ(idle.asked, 0) << "with nothing running the desktop is not even asked";
-    }
+    EXPECT_TRUE(row.running || idle.asked == 0) << "with nothing running the desktop is not even asked";
     return;
   }
   ASSERT_EQ(presenter.shown.size(), 1u);
-  const WTTrackingAlert& alert = presenter.shown.front();
-  EXPECT_EQ(alert.messageText, QStringLiteral("Idle time"));
-  EXPECT_EQ(alert.informativeText,
-            QStringLiteral("Would you like to substract the idle time and restart the timers?"));
-  EXPECT_EQ(alert.defaultButton, QStringLiteral("No"));
-  EXPECT_EQ(alert.alternateButton, QStringLiteral("Yes"));
-  EXPECT_TRUE(time->running());
-  EXPECT_FALSE(time->endDate());
+  EXPECT_EQ(presenter.said(0),
+            "Idle time | Would you like to substract the idle time and restart the timers? | No | Yes");
+  EXPECT_TRUE(time->running() && !time->endDate());
   EXPECT_EQ(task->times().size(), 1);
   EXPECT_EQ(updater->totalActiveDuration(), 60);
   advance(5);
@@ -233,14 +203,9 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
 
   ASSERT_EQ(presenter.shown.size(), 1u);
   EXPECT_EQ(presenter.shown.front().messageText, QStringLiteral("Idle time"));
-  for (WTTime* stopped : {first, second, single}) {
-    EXPECT_FALSE(stopped->running());
-    EXPECT_EQ(stopped->endDate(), std::optional<Date>(idleStart));
-  }
-  for (WTTime* untouched : {recent, atIdleStart}) {
-    EXPECT_TRUE(untouched->running());
-    EXPECT_FALSE(untouched->endDate());
-  }
+  for (WTTime* stopped : {first, second, single})
+    EXPECT_TRUE(!stopped->running() && stopped->endDate() == std::optional<Date>(idleStart));
+  for (WTTime* untouched : {recent, atIdleStart}) EXPECT_TRUE(untouched->running() && !untouched->endDate());
   ASSERT_EQ(runningTimesOf(twice).size(), 1);
   ASSERT_EQ(runningTimesOf(once).size(), 1);
   EXPECT_EQ(runningTimesOf(late).size(), 2) << "no new entry for a task whose entries all started later";
@@ -252,9 +217,7 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
   // Saved and read back, the record is the one the user chose.
   updater.reset();
   saveAndReopen();
-  int running = 0;
-  for (WTTime* time : context->fetch<WTTime>()) running += time->running() ? 1 : 0;
-  EXPECT_EQ(running, 4);
+  EXPECT_EQ(context->fetch<WTTime>([](const WTTime* time) { return time->running(); }).size(), 4);
 }
 
 TEST_F(TrackingTest, AnOpenIdleAlertIsNeverStackedAndTheTickerGoesOn) {
@@ -358,21 +321,17 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
   presenter.answers = {Answer::Alternate};
   updater->applicationWillTerminate();
   ASSERT_EQ(presenter.shown.size(), 1u);
-  const WTTrackingAlert& alert = presenter.shown.front();
-  EXPECT_EQ(alert.messageText, QStringLiteral("Running Timer"));
-  EXPECT_EQ(alert.informativeText,
-            QStringLiteral("Would you like to stop the running timers before quitting?"));
-  EXPECT_EQ(alert.defaultButton, QStringLiteral("Stop"));
-  EXPECT_EQ(alert.alternateButton, QStringLiteral("Keep running"));
+  EXPECT_EQ(
+      presenter.said(0),
+      "Running Timer | Would you like to stop the running timers before quitting? | Stop | Keep running");
   EXPECT_TRUE(time->running());
   EXPECT_EQ(saves, 0);
 
   const QString uuid = time->uuid();
   updater.reset();
   saveAndReopen();
-  auto* kept = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(kept, nullptr);
-  EXPECT_TRUE(kept->running()) << "kept running across the quit";
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(stored(uuid)->running()) << "kept running across the quit";
 
   makeUpdater();
   countSaves();
@@ -384,10 +343,8 @@ TEST_F(TrackingTest, QuitPromptStopsAndSavesOrKeepsTimersRunningInTheStore) {
   EXPECT_EQ(saves, 1);
   updater.reset();
   openContext();  // no save of our own: what the prompt saved is what is on disk
-  auto* stopped = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(stopped, nullptr);
-  EXPECT_FALSE(stopped->running());
-  EXPECT_EQ(stopped->endDate(), std::optional<Date>(clockNow));
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(!stored(uuid)->running() && stored(uuid)->endDate() == std::optional<Date>(clockNow));
 }
 
 TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
@@ -403,9 +360,36 @@ TEST_F(TrackingTest, SessionEndAsksNothingAndStoresTheTimersRunning) {
   const QString uuid = time->uuid();
   updater.reset();
   openContext();
-  auto* stored = static_cast<WTTime*>(context->objectWithUUID(uuid));
-  ASSERT_NE(stored, nullptr);
-  EXPECT_TRUE(stored->running());
+  ASSERT_TRUE(stored(uuid));
+  EXPECT_TRUE(stored(uuid)->running());
+}
+
+QStringList names(const QList<WTTask*>& list) {
+  QStringList result;
+  for (const WTTask* task : list) result << task->name();
+  return result;
+}
+
+// The tray's list of tasks over the real model.
+TEST_F(TrackingTest, TheListHoldsFiveTasksRunningFirstThenTheLatestTrackedAndFollowsTheStoreWhileShown) {
+  makeTenTasks();
+  WTRecentTasks top(context.get());
+  EXPECT_EQ(names(top.tasks()), QStringList({"T4", "T1", "T9", "T8", "T7"}));
+
+  // Not on screen: a change is noted, not announced, and the next look arranges afresh.
+  int announced = 0;
+  QObject::connect(&top, &WTRecentTasks::tasksDidChange, [&] { ++announced; });
+  tasks[0]->toggleTimer();
+  settle();
+  EXPECT_EQ(announced, 0);
+  EXPECT_EQ(names(top.tasks()).mid(0, 3), QStringList({"T4", "T1", "T0"}));
+
+  top.setActive(true);
+  tasks[4]->stopAllTimers();
+  settle();
+  EXPECT_EQ(announced, 1);
+  EXPECT_EQ(names(top.tasks()), QStringList({"T1", "T0", "T4", "T9", "T8"}))
+      << "a stopped task moves down to its latest end, which is now";
 }
 
 }  // namespace
