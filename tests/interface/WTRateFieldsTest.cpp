@@ -25,7 +25,7 @@ static void PrintTo(const Decimal& value, std::ostream* out) {
 namespace {
 
 // The project's client Acme bills 80 an hour.
-class WTRatesTest : public OutlineTest {
+class WTRateFieldsTest : public OutlineTest {
  protected:
   void SetUp() override {
     OutlineTest::SetUp();
@@ -67,7 +67,7 @@ class WTRatesTest : public OutlineTest {
   WTClient* acme = nullptr;
 };
 
-TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) {
+TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) {
   QLineEdit* field = controller->rateField();
   EXPECT_EQ(field->placeholderText(), "Inherited: 80.00");
   acme->setRate(Decimal(1250));
@@ -103,7 +103,7 @@ TEST_F(WTRatesTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) 
 
 // Money typed into each field that takes it is read in the user's locale (how is the money format's);
 // what it refuses stays in its field, marked with the reason, and nothing is stored.
-TEST_F(WTRatesTest, MoneyTypedInEveryFieldIsReadInTheUsersLocale) {
+TEST_F(WTRateFieldsTest, MoneyTypedInEveryFieldIsReadInTheUsersLocale) {
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 11, 10));
   WTPasswordStore passwords(defaults.get(), std::make_unique<MemoryKeychain>());
   WTPreferencesWindowController preferences(defaults.get(), nullptr, &passwords);
@@ -185,7 +185,7 @@ TEST_F(WTRatesTest, MoneyTypedInEveryFieldIsReadInTheUsersLocale) {
 
 // Every row showing a cost repaints at once when a rate above it changes in the records or in the
 // preferences (which rates reach which records is the model's).
-TEST_F(WTRatesTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
+TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   WTTime* monday = makeItem<WTTime>(design, "Monday", at(2024, 3, 11, 9));
   WTTime* tuesday = makeItem<WTTime>(design, "Tuesday", at(2024, 3, 12, 9));
   endTurn();
@@ -230,7 +230,7 @@ TEST_F(WTRatesTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   EXPECT_EQ(totals->text().right(5), "60.00");
 }
 
-TEST_F(WTRatesTest, ATaskRowsMenuSetsItsRateAndKeepsTheSheetOpenOnAMistake) {
+TEST_F(WTRateFieldsTest, ATaskRowsMenuSetsItsRateAndKeepsTheSheetOpenOnAMistake) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(design));
   QAction* setRate = actionTitled(menu.get(), "Set Rate…");
   ASSERT_NE(setRate, nullptr);
@@ -252,7 +252,7 @@ TEST_F(WTRatesTest, ATaskRowsMenuSetsItsRateAndKeepsTheSheetOpenOnAMistake) {
   EXPECT_EQ(design->storedRate(), Decimal(90));
 }
 
-TEST_F(WTRatesTest, AClientRowsMenuSetsAndClearsItsRate) {
+TEST_F(WTRateFieldsTest, AClientRowsMenuSetsAndClearsItsRate) {
   WTClientsViewController clients(context.get());
   clients.view()->resize(600, 400);
   clients.view()->show();
