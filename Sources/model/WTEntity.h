@@ -22,5 +22,17 @@ bool isEntityName(QStringView name);
 inline bool isItem(WTEntity entity) {
   return entity >= WTEntity::Time;
 }
+// The entity a record of `entity` is filed under (a client, which has none, answers itself).
+constexpr WTEntity owner(WTEntity entity) {
+  switch (entity) {
+    case WTEntity::Client:
+    case WTEntity::Project:
+      return WTEntity::Client;
+    case WTEntity::Task:
+      return WTEntity::Project;
+    default:
+      return WTEntity::Task;
+  }
+}
 
 }  // namespace WTEntities

@@ -15,17 +15,6 @@ QString inverseOf(WTEntity entity, const QString& relationship) {
   return {};
 }
 
-WTEntity ownerEntity(WTEntity entity) {
-  switch (entity) {
-    case WTEntity::Project:
-      return WTEntity::Client;
-    case WTEntity::Task:
-      return WTEntity::Project;
-    default:
-      return WTEntity::Task;
-  }
-}
-
 struct Tables {
   QHash<QString, QStringList> local[8];
   QHash<QString, std::vector<WTKeyDependencies::RelatedDependency>> related[8];
@@ -44,7 +33,7 @@ struct Tables {
           // "project.rate": when a project announces "rate", each of its tasks announces `key`.
           const QString relationship = path.left(dot);
           const QString ownerKey = path.mid(dot + 1);
-          const int owner = static_cast<int>(ownerEntity(entity));
+          const int owner = static_cast<int>(WTEntities::owner(entity));
           related[owner][ownerKey].push_back({inverseOf(entity, relationship), key});
         }
       }

@@ -34,19 +34,6 @@ QVariant colorFromText(const QString& text) {
   return color;
 }
 
-// The entity a record of `entity` is filed under.
-WTEntity ownerEntity(WTEntity entity) {
-  switch (entity) {
-    case WTEntity::Client:
-    case WTEntity::Project:
-      return WTEntity::Client;
-    case WTEntity::Task:
-      return WTEntity::Project;
-    default:
-      return WTEntity::Task;
-  }
-}
-
 template <class>
 struct Pointee;
 template <class T, class C>
@@ -252,7 +239,7 @@ bool WTObject::setByType(const WTKeyDescriptor& key, const QVariant& value) {
     }
     case WTKeyType::ToOne: {
       auto* related = dynamic_cast<WTObject*>(KeyPath::objectFromVariant(value));
-      if (related && related->entity() != ownerEntity(entity_)) related = nullptr;
+      if (related && related->entity() != WTEntities::owner(entity_)) related = nullptr;
       if (!value.isNull() && !related) return false;
       changeOwner(related);
       return true;
