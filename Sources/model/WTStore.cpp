@@ -454,7 +454,18 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   return store;
 }
 
-void WTStore::keepLogOnClose() { sqlite3_db_config(db_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr); }
+void WTStore::keepLogOnClose() {
+  sqlite3_db_config(db_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+  // The hook takes the place of SQLite's own folding-in at 1,000 pages, so it does that too.
+  sqlite3_wal_hook(
+      db_,
+      [](void*, sqlite3* db, const char* name, int frames) {
+        if (frames >= 1000) sqlite3_wal_checkpoint(db, name);
+        if (frames > kLogFramesKeptOnClose) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
+        return SQLITE_OK;
+      },
+      nullptr);
+}
 
 Result<void> WTStore::prepareStatements() {
   const std::pair<sqlite3_stmt**, const char*> statements[] = {

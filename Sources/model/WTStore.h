@@ -55,11 +55,12 @@ class WTStore {
 
   QString path() const { return path_; }
 
-  // For a process that saves once and ends (a command): its close leaves the write-ahead log as it is
-  // instead of folding it into the file, which costs two more waits for the disk on every command. The
-  // log is as durable as the file; SQLite folds it in as it grows, and a process that closes without
-  // this (the desktop copy) folds in what is left.
+  // For a process that saves once and ends (a command): its close leaves a short write-ahead log as it
+  // is instead of folding it into the file, which costs two more waits for the disk on every command. The
+  // log is as durable as the file. A log kept is read whole by the next process that opens the file, so
+  // once it has grown past kLogFramesKeptOnClose pages the close folds it in after all.
   void keepLogOnClose();
+  static constexpr int kLogFramesKeptOnClose = 64;
 
   enum class Records {
     All,
