@@ -24,9 +24,10 @@ using bench::kProjects;
 using bench::kTasks;
 using bench::LargeStore;
 
+// Opened as the desktop copy opens its store.
 std::unique_ptr<WTObjectContext> openContext() {
   auto context = std::make_unique<WTObjectContext>();
-  auto store = WTStore::open(LargeStore::instance().path());
+  auto store = WTStore::open(LargeStore::instance().path(), nullptr, WTStore::Check::WholeFileBeforeSaving);
   if (!store || !context->attachStore(std::move(store.value()))) return nullptr;
   return context;
 }

@@ -51,7 +51,8 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   WTObjectContext::setDefaultContext(context_.get());
   const bool storeIsNew = !QFileInfo::exists(storePath());
   bool fill = false;
-  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath());
+  Result<std::unique_ptr<WTStore>> store =
+      WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
   if (store) {
     Result<void> loaded = context_->attachStore(std::move(store.value()));
     if (!loaded) presenter_->presentError(loaded.error().message);

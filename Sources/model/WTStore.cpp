@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <array>
 #include <iterator>
+#include <string>
 #include <utility>
 
 namespace {
@@ -197,6 +198,29 @@ int readText(sqlite3* db, const char* sql, QByteArray* text) {
   return query(db, sql, [&](sqlite3_stmt* statement) {
     *text = QByteArray(reinterpret_cast<const char*>(sqlite3_column_text(statement, 0)));
   });
+}
+
+// PRAGMA quick_check reads every page: what loading never visits (the identity index) too.
+int checkWholeFile(sqlite3* db, bool* damaged) {
+  QByteArray verdict;
+  const int code = readText(db, "PRAGMA quick_check(1)", &verdict);
+  *damaged = isDamage(code) || (code == SQLITE_OK && verdict != "ok");
+  return code;
+}
+
+// The check on a connection of its own, for a thread of its own: a connection serves one thread at a
+// time. A check that cannot run finds nothing, as a header check would.
+bool wholeFileIsDamaged(const QString& path, const std::string& vfs) {
+  sqlite3* db = nullptr;
+  bool damaged = false;
+  if (sqlite3_open_v2(QFile::encodeName(path).constData(), &db, SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX,
+                      vfs.empty() ? nullptr : vfs.c_str()) == SQLITE_OK) {
+    sqlite3_busy_timeout(db, kBusyTimeoutMs);
+    sqlite3_exec(db, "PRAGMA mmap_size = 268435456", nullptr, nullptr, nullptr);
+    checkWholeFile(db, &damaged);
+  }
+  sqlite3_close(db);
+  return damaged;
 }
 
 // Runs the migration steps from `version` to the current one in one transaction.
@@ -403,12 +427,16 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
           tr("The data file “%1” was written by a newer version of Tessal and cannot be opened.").arg(path)};
     }
     if (version < 1) return damagedError(path);
-    // Damage in pages that loading never visits (the identity index) would otherwise only show in a
-    // failed save, after the file had been changed.
-    if (check == Check::WholeFile) {
-      QByteArray verdict;
-      code = readText(db, "PRAGMA quick_check(1)", &verdict);
-      if (isDamage(code) || (code == SQLITE_OK && verdict != "ok")) return damagedError(path);
+    // A file to migrate is checked before the migration changes it; one to read only, before it is read.
+    const bool checkBeforeSaving =
+        check == Check::WholeFileBeforeSaving && !readOnly && version == kSchemaVersion;
+    if (checkBeforeSaving) {
+      store->damageCheck_ = std::async(std::launch::async, wholeFileIsDamaged, path,
+                                       vfs ? std::string(vfs) : std::string());
+    } else if (check != Check::Header) {
+      bool damaged = false;
+      code = checkWholeFile(db, &damaged);
+      if (damaged) return damagedError(path);
       if (code != SQLITE_OK) {
         return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
       }
@@ -547,6 +575,8 @@ Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStr
   if (nameless)
     return Error{WriteFailed,
                  tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
+  if (damageCheck_.valid()) damaged_ = damageCheck_.get();
+  if (damaged_) return Error{Damaged, tr("The data file “%1” is damaged; nothing was written to it.").arg(path_)};
   if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading before the file had a table
   int code = stepOnce(begin_);
   for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {

@@ -7,6 +7,7 @@
 #include <QStringList>
 
 #include <functional>
+#include <future>
 #include <memory>
 #include <vector>
 
@@ -34,10 +35,13 @@ class WTStore {
     Damaged = 7
   };
 
-  // How much of an existing file is checked for damage before it is accepted. Opening a store to work in
-  // checks all of it: damage anywhere would otherwise only show in a failed save, after the user's work.
-  // A command that reads or changes a few records, and reports a failed save at once, checks the header.
-  enum class Check { WholeFile, Header };
+  // How much of an existing file is checked for damage, and when. Damage anywhere would otherwise only
+  // show in a failed save, after the file had been changed. WholeFile checks all of it before the file
+  // is accepted. WholeFileBeforeSaving (the desktop copy) checks all of it on a thread of its own while
+  // the records load, and the first save waits for the verdict: a damaged file is refused before
+  // anything is written, and the window does not wait for the check. A command that reads or changes a
+  // few records, and reports a failed save at once, checks the header.
+  enum class Check { WholeFile, WholeFileBeforeSaving, Header };
 
   // Opens the store at `path`, creating the file (not its folder) when missing. The error's message
   // names the file and says what is wrong, ready to show to the user. `vfs` names the SQLite VFS to
@@ -90,6 +94,9 @@ class WTStore {
 
   QString path_;
   sqlite3* db_ = nullptr;
+  // The whole-file check running beside the loading (true: damage found); consumed by the first save.
+  std::future<bool> damageCheck_;
+  bool damaged_ = false;
   sqlite3_stmt* begin_ = nullptr;
   sqlite3_stmt* commit_ = nullptr;
   sqlite3_stmt* rollback_ = nullptr;

@@ -465,17 +465,31 @@ const struct RefusedFile {
 };
 
 TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
+  enum Way { Writing, Reading, CheckingBesideTheLoading };
   for (const RefusedFile& refused : kRefusedFiles) {
-    for (bool readOnly : {false, true}) {
-      SCOPED_TRACE(std::string(refused.name) + (readOnly ? ", reading" : ", writing"));
+    for (Way way : {Writing, Reading, CheckingBesideTheLoading}) {
+      const bool readOnly = way == Reading;
+      SCOPED_TRACE(std::string(refused.name) + " " + std::to_string(way));
       removeFiles();
       refused.make(path());
       const QList<QByteArray> before = allBytes();
       ASSERT_FALSE(before[0].isEmpty());
-      auto store = readOnly ? WTStore::openReadOnly(path()) : WTStore::open(path());
-      ASSERT_FALSE(store.ok());
-      EXPECT_EQ(store.error().code, refused.code);
-      EXPECT_EQ(store.error().message, QString::fromUtf8(refused.message).arg(path()));
+      auto store = readOnly ? WTStore::openReadOnly(path())
+                   : way == Writing
+                       ? WTStore::open(path())
+                       : WTStore::open(path(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      if (store && way == CheckingBesideTheLoading) {
+        // Damage that loading does not meet is found by the check, at the latest by the first save.
+        const Result<void> saved = store.value()->save({record("x@WTNote", "WTNote")}, {});
+        ASSERT_FALSE(saved.ok());
+        EXPECT_EQ(saved.error().code, refused.code);
+        EXPECT_TRUE(saved.error().message.contains(path()));
+        store.value().reset();
+      } else {
+        ASSERT_FALSE(store.ok());
+        EXPECT_EQ(store.error().code, refused.code);
+        EXPECT_EQ(store.error().message, QString::fromUtf8(refused.message).arg(path()));
+      }
       QList<QByteArray> after = allBytes();
       if (readOnly) after.back() = before.back();  // a reader may leave the log's index behind
       EXPECT_EQ(after, before);
