@@ -11,18 +11,7 @@ set -euo pipefail
 cd "$(dirname "$0")/.."
 build=${1:-build-tests}
 runs=${2:-20}
-tessal=$build/Sources/app/tessal
-maker=$build/bench/tessal_make_report_store
-for program in "$tessal" "$maker"; do [ -x "$program" ] || { echo "no $program: build it first" >&2; exit 1; }; done
-command -v timew >/dev/null || { echo "timewarrior is not installed" >&2; exit 1; }
-
-work=$(mktemp -d "${TMPDIR:-/tmp}/tessal-timew.XXXXXX")
-trap 'rm -rf "$work"' EXIT
-mkdir -p "$work/data/Tessal2" "$work/config" "$work/runtime" "$work/timew"
-chmod 700 "$work/runtime"
-export XDG_DATA_HOME=$work/data XDG_CONFIG_HOME=$work/config XDG_RUNTIME_DIR=$work/runtime TIMEWARRIORDB=$work/timew
-unset DISPLAY WAYLAND_DISPLAY
-"$maker" "$work/data/Tessal2/Tessal.sqlite" "$work/timew"
+source bench/timew-store.sh "$build"
 
 # Both must give the same year: 20,000 entries of 20 minutes are 6,666 hours 40 minutes.
 "$tessal" report --client Northwind --mode 2 --out "$work/report.csv"
