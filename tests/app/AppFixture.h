@@ -8,12 +8,12 @@
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
-#include "WTItemsViewController.h"
 #include "WTListView.h"
+#include "WTObjectListModel.h"
+#include "WTItemsViewController.h"
 #include "WTMainWindowController.h"
 #include "WTNavigationController.h"
 #include "WTObjectContext.h"
-#include "WTObjectListModel.h"
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"
@@ -29,7 +29,6 @@
 #include <QFile>
 #include <QLineEdit>
 #include <QPointer>
-#include <QStringList>
 #include <QTemporaryDir>
 #include <QTest>
 
@@ -37,42 +36,32 @@
 
 class RecordingPresenter final : public WTAlertPresenter {
  public:
-  bool presentError(const QString& message) override {
-    errors << message;
-    return false;
-  }
-  bool confirmQuitAnyway() override {
-    ++questions;
-    return quitAnyway;
-  }
+  bool presentError(const QString& message) override { return errors << message, false; }
+  bool confirmQuitAnyway() override { return ++questions, quitAnyway; }
   bool confirmDeletion(const QString& question, const QString& detail) override {
     deletionQuestions << (detail.isEmpty() ? question : question + u' ' + detail);
     return deletes;
   }
-  QStringList errors;
+  QStringList errors, deletionQuestions;
   int questions = 0;
-  bool quitAnyway = false;
-  QStringList deletionQuestions;
-  bool deletes = true;
+  bool quitAnyway = false, deletes = true;
 };
 
 class AppTest : public ::testing::Test {
  protected:
   void SetUp() override {
     ASSERT_TRUE(home.isValid());
-    previousData = qgetenv("XDG_DATA_HOME");
     qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
     defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
     WTApplication::registerDefaults(*defaults);
   }
   void TearDown() override { qputenv("XDG_DATA_HOME", previousData); }
-
   std::unique_ptr<WTAppDelegate> makeDelegate() {
     return std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
   }
 
   QTemporaryDir home;
-  QByteArray previousData;
+  const QByteArray previousData = qgetenv("XDG_DATA_HOME");
   std::unique_ptr<UserDefaults> defaults;
   RecordingPresenter presenter;
 };

@@ -78,7 +78,7 @@ TEST_F(MatcherTest, ArgumentsSplitAtBlanksOutsideQuotes) {
 }
 
 TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
-  const QString text = QStringLiteral("ab {{ x }} cd {% y %} ef");
+  const QString text = "ab {{ x }} cd {% y %} ef";
   use(text);
   auto at = [&](std::uint64_t location, std::uint64_t length) {
     return matcher.firstMarkerWithinRange({location, length});
@@ -92,8 +92,8 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   EXPECT_FALSE(at(10, 10));
   EXPECT_FALSE(at(21, 3));
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
-  EXPECT_EQ(matcher.markerStart(), QStringLiteral("{%"));
-  EXPECT_EQ(matcher.filterDelimiter(), QStringLiteral("|"));
+  EXPECT_EQ(matcher.markerStart(), "{%");
+  EXPECT_EQ(matcher.filterDelimiter(), "|");
 }
 
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {
@@ -127,8 +127,8 @@ TEST(MatcherCharacterClasses, AreThoseOfTheRegularExpressions) {
   for (char32_t c = 0; c < 0x10000; ++c) {
     if (c >= 0xd800 && c <= 0xdfff) continue;
     const QString one{QChar(char16_t(c))};
-    const bool space = RXRegex::isMatchedByRegex(one, QStringLiteral("^\\s$"));
-    const bool dot = RXRegex::isMatchedByRegex(one, QStringLiteral("^.$"));
+    const bool space = RXRegex::isMatchedByRegex(one, "^\\s$");
+    const bool dot = RXRegex::isMatchedByRegex(one, "^.$");
     if (space != ICUTemplateMatcher::isPatternSpace(char16_t(c))) ++differences;
     if (dot == ICUTemplateMatcher::isPatternLineEnd(char16_t(c))) ++differences;
   }
