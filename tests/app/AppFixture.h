@@ -1,19 +1,18 @@
 #pragma once
 
-// What the application tests share: their own data folder (XDG_DATA_HOME) and settings file with the
-// application's defaults registered, and a presenter that records what the delegate would have said.
+// Application tests' own data folder and settings (defaults registered), and a recording presenter.
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
 #include "WTApplication.h"
 #include "WTClient.h"
 #include "WTClientsViewController.h"
-#include "WTListView.h"
-#include "WTObjectListModel.h"
 #include "WTItemsViewController.h"
+#include "WTListView.h"
 #include "WTMainWindowController.h"
 #include "WTNavigationController.h"
 #include "WTObjectContext.h"
+#include "WTObjectListModel.h"
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTProjectsViewController.h"

@@ -1,6 +1,5 @@
 #pragma once
-// One installation of Tessal for tests that run the real `tessal` executable as a user's shell would:
-// a separate process with its own data, settings and runtime folders and no display.
+// One installation of Tessal whose real `tessal` runs as a separate process: own folders, no display.
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -42,8 +41,7 @@ class Installation {
   void setSetting(const QString& key, const QString& value) {
     QSettings(path("config/Tessal/Tessal.conf"), QSettings::IniFormat).setValue(key, value);
   }
-  // The context over this installation's store (made when missing), or, `readOnly`, as a later run of
-  // `tessal` would read it.
+  // The context over the store (made when missing), or, `readOnly`, as a later run of `tessal` reads it.
   std::unique_ptr<WTObjectContext> openStore(bool readOnly = false) const {
     if (!readOnly) QDir().mkpath(QFileInfo(storePath()).path());
     auto context = std::make_unique<WTObjectContext>();
@@ -52,8 +50,7 @@ class Installation {
     return context;
   }
   std::unique_ptr<WTObjectContext> readStore() const { return openStore(true); }
-  // What a process of this installation runs with: its folders and, as on a server or over ssh, no display
-  // of any kind and no platform plugin chosen for it; `extra` added or replacing (an empty value removes).
+  // Its folders, no display (as over ssh); `extra` added or replacing (an empty value removes).
   QProcessEnvironment environment(const QMap<QString, QString>& extra = {}) const {
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
     environment.insert("XDG_DATA_HOME", path("data"));
@@ -85,8 +82,7 @@ class Installation {
   Outcome tessal(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
     return finish(*launch(arguments, extra));
   }
-  // Runs `tessal`: its exit code must be `code` and what it said (stdout on success, else stderr) hold
-  // `text`.
+  // Runs `tessal`: exit `code`, and stdout (on success, else stderr) holds `text`.
   Outcome expect(const QStringList& arguments, int code, const QString& text,
                  const QMap<QString, QString>& extra = {}) const {
     Outcome run = tessal(arguments, extra);

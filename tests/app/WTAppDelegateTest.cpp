@@ -86,8 +86,7 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   EXPECT_FALSE(QFile::exists(path + "-wal"));
 }
 
-// Changes are saved soon after they happen. A save with nothing to save touches nothing the user is typing
-// in; one with changes commits the edit in progress with them.
+// A save with nothing to save touches no editor; one with changes commits the edit in progress.
 TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenThereIsSomethingToSave) {
   auto delegate = makeDelegate();
   WTObjectContext* context = delegate->managedObjectContext();
@@ -112,8 +111,7 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenT
             QStringList({"Default Project", "another change", "autosaved", "typed, not yet committed"}));
 }
 
-// The sync manager is made with the context, journals what the delegate saves beside the store, asks
-// the delegate for the account, and stops when the application quits.
+// The context's sync manager journals every save, takes the account, and stops on quitting.
 TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) {
   defaults->setValue("WTSyncUser", "me@example.org");
   defaults->setValue("WTSyncPassword", "secret");
@@ -152,8 +150,7 @@ class AnsweringPresenter final : public WTTrackingAlertPresenter {
 
 }  // namespace
 
-// The questions and answers are the ticker's; here, that quitting asks them and the last save stores the
-// answer, and that a session that ends cannot wait for one.
+// Quitting asks the ticker's question and the last save stores the answer; a session's end cannot wait.
 TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRunning) {
   for (const bool sessionEnds : {false, true}) {
     QDir(home.filePath("data")).removeRecursively();
@@ -175,6 +172,7 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
   }
 }
 
+// Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.
 TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOneTheToolbarOffersTheList) {
   AnsweringPresenter asking;
   auto delegate = makeDelegate();
@@ -185,37 +183,26 @@ TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOne
   window.show();
   WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
   QCoreApplication::processEvents();
-
-  // No tray here (offscreen): the toolbar's button shows the running time and opens the tray's list.
   ASSERT_FALSE(statusBar.isShowingIcon());
   EXPECT_TRUE(window.runningTimeButton()->isVisible());
   window.runningTimeButton()->click();
   EXPECT_TRUE(statusBar.popup()->isVisible());
   EXPECT_EQ(statusBar.popup()->rowCount(), 2) << "the new task and the first run's default task";
   statusBar.popup()->close();
-
-  // A tray turns up: closing the window only hides it; nothing is asked and nothing quits.
   emit statusBar.trayAvailabilityChanged(true);
   QCoreApplication::processEvents();  // the toolbar lays its items out afresh
   EXPECT_FALSE(window.runningTimeButton()->isVisible());
   EXPECT_TRUE(window.close());
-  EXPECT_FALSE(window.isVisible());
-  EXPECT_TRUE(asking.titles.isEmpty());
+  EXPECT_TRUE(!window.isVisible() && asking.titles.isEmpty());
   emit statusBar.showMainWindowRequested();
   EXPECT_TRUE(window.isVisible());
-}
 
-TEST_F(WTAppDelegateTest, CtrlCommaOpensTheOnePreferencesWindowOverTheAccountsPassword) {
-  auto delegate = makeDelegate();
-  WTMainWindowController window(*delegate);
-  window.show();
-  QAction* preferences = window.findChild<QAction*>(QStringLiteral("preferences"));
+  QAction* preferences = window.findChild<QAction*>("preferences");
   EXPECT_EQ(preferences->shortcut(), QKeySequence(Qt::CTRL | Qt::Key_Comma));
   preferences->trigger();
-  WTPreferencesWindowController* opened = window.findChild<WTPreferencesWindowController*>();
+  auto* opened = window.findChild<WTPreferencesWindowController*>();
   ASSERT_TRUE(opened && opened->isVisible());
   opened->close();
   preferences->trigger();
-  EXPECT_EQ(window.findChildren<WTPreferencesWindowController*>().size(), 1);
-  EXPECT_TRUE(opened->isVisible());
+  EXPECT_TRUE(window.findChildren<WTPreferencesWindowController*>().size() == 1 && opened->isVisible());
 }

@@ -145,8 +145,7 @@ TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnThe
   reports.front()->close();
 }
 
-// Ctrl+N over a selected task whose timer runs, "Temp", Return, Del: only the new task goes, and the
-// Edit menu names each step.
+// Ctrl+N, "Temp", Return, Del over a running task: only the new task goes; the Edit menu names each step.
 TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeARunningTimerGoes) {
   open();
   WTObjectContext* context = delegate->managedObjectContext();
@@ -232,8 +231,7 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   exporter->reject();
 }
 
-// The custom range's registered defaults lose to stored values. The first window fits the screen however
-// it is scaled; later ones come back where the last one was.
+// Stored range values win over registered ones; windows fit the screen and come back where they were.
 TEST_F(WTMainWindowControllerTest, StoredRangeWinsAndTheWindowFitsTheScreenAndKeepsItsPlace) {
   const Date stored = Date::fromSeconds(1'000'000);
   defaults->setValue("WTCustomRangeEnd", QVariant::fromValue(stored));

@@ -1,5 +1,4 @@
-// `tessal start`, `stop`, `status`, `log`, `report` and `export` as a user's shell and key bindings run them:
-// the real executable over a real store file, on its own or while a desktop copy (offscreen) holds the store.
+// The real `tessal` commands over a real store file, alone or beside a desktop copy holding the store.
 #include "CommandLineInstallation.h"
 #include "WTSingleInstance.h"
 
@@ -33,8 +32,7 @@ QByteArray bytesOf(const QString& path) {
   return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
 }
 
-// Acme's Atlas and the client-less Hermes both have a "Design"; Atlas also has a task whose name holds
-// quotes and spaces. Nothing runs.
+// Acme's Atlas and client-less Hermes both have a "Design"; one name holds quotes. Nothing runs.
 class TrackCommand : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -55,7 +53,8 @@ class TrackCommand : public ::testing::Test {
   // "PROJECT/TASK" of each running entry, sorted, as the store file holds them now.
   QStringList running() const {
     QStringList result;
-    for (const WTTime* time : here.readStore()->fetch<WTTime>())
+    const std::unique_ptr<WTObjectContext> context = here.readStore();
+    for (const WTTime* time : context->fetch<WTTime>())
       if (time->running()) result << time->task()->project()->name() + "/" + time->task()->name();
     result.sort();
     return result;
@@ -105,7 +104,8 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
   EXPECT_EQ(here.out({"stop"}), "No timer is running\n");
   // `tessal` loads no GUI library, so it keeps a colour as the store's text: rewritten, the task keeps it.
   QStringList colors;
-  for (const WTTask* task : here.readStore()->fetch<WTTask>())
+  const std::unique_ptr<WTObjectContext> context = here.readStore();
+  for (const WTTask* task : context->fetch<WTTask>())
     if (!task->color().isNull()) colors << task->name() + " " + WTObject::colorText(task->color());
   EXPECT_EQ(colors, QStringList({"Design #80ff0000"}));
   // The entries wait in the sync journal, as the desktop copy's own changes do.
@@ -121,8 +121,7 @@ TEST_F(TrackCommand, StartingStopsTheOtherTimersWhenTheSettingSaysSo) {
       here.expect({"start", "Design", "--project", "Hermes"}, 0, "Stopped Hermes › Review  00:0");
   EXPECT_TRUE(run.out.endsWith("Started Hermes › Design\n"));
   EXPECT_EQ(running(), QStringList({"Hermes/Design"}));
-  // Each writer reads, decides and saves: two at once would both find the task idle and start it twice,
-  // or each stop only the timers it saw. One writer at a time makes the second see the first's change.
+  // Writers one at a time: two at once would both start the task or each stop only what it saw.
   for (int round = 0; round < 3; ++round) {
     std::unique_ptr<QProcess> runs[] = {here.launch({"start", "Review"}), here.launch({"start", "Review"}),
                                         here.launch({"start", kQuoted})};
@@ -190,8 +189,7 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
   EXPECT_FALSE(QFile::exists(here.path("r.doc")));
 }
 
-// Each run in turn over the same store: its exit code and what it says (stdout on success, else stderr).
-// Refusals of what cannot be (1) add nothing.
+// Each run in turn: exit code and what it says; refusals of what cannot be (1) add nothing.
 TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   // Review has 09:00–10:15 on 2026-03-03 (Berlin).
   const QDate today = QDateTime::currentDateTime().toTimeZone(QTimeZone("Europe/Berlin")).date();
@@ -226,8 +224,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
             "› Write\n");
   EXPECT_EQ(here.out({"list", "projects", "--client", "olymp"}, kBerlin), "Zeus\n");
   EXPECT_EQ(running(), QStringList({"Zeus/Write"}));
-  // Exactly the accepted entries were added: 45 minutes ending this minute, the noted call, two on 4 March
-  // and the running one.
+  // Exactly the accepted: 45 minutes ending now, the call, two on 4 March, the running one.
   const std::unique_ptr<WTObjectContext> context = here.readStore();
   EXPECT_EQ(context->fetch<WTTime>().size(), 6);
   EXPECT_EQ(context
@@ -270,8 +267,7 @@ TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   EXPECT_EQ(here.out({"list", "tasks", "--qualified"}),
             "Default Project › Default Task\nDefault Project › Design\n");
   EXPECT_EQ(here.tessal({"start", "Default Task"}).code, 0);
-  // An installation that syncs takes its projects from the account: a first project of its own would
-  // reach the account from every device set up.
+  // Syncing: projects come from the account, so no first project of its own.
   Installation syncing;
   syncing.setSetting("WTSyncUser", "shell@example.org");
   syncing.expect({"start", "Design", "--create"}, 1, "there is no project to make it in");
@@ -279,8 +275,7 @@ TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   EXPECT_EQ(syncing.out({"list", "projects"}), "Work\n");
 }
 
-// Two clients with a project name that differs only in case, a task name with quotes and a comma, and time
-// entries around the day 3 March 2026 in Berlin.
+// Two clients with project names differing in case, quotes and a comma, entries around 3 March in Berlin.
 class ReportCommand : public ::testing::Test {
  protected:
   void SetUp() override {

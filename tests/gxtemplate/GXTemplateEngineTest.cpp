@@ -65,9 +65,7 @@ class TemplateTest : public ::testing::Test {
   RecordingDelegate delegate;
 };
 
-// A marker handler that misbehaves on request, to drive the engine's error paths: "both" reports a block
-// both beginning and ending, "noend" starts a block without end markers, "jump" asks to resume past the
-// template's end. Each returns a value and sets a variable.
+// Misbehaves on request: "both" begins and ends, "noend" lacks end markers, "jump" resumes past the end.
 class ProbeMarkers : public GXTemplateMarker {
  public:
   explicit ProbeMarkers(QStringList names) : names_(std::move(names)) {}
@@ -93,8 +91,7 @@ using EngineRunTest = TemplateTest;
 using EngineErrorTest = TemplateTest;
 using EngineVariableTest = TemplateTest;
 
-// The golden table: each seed of the template fuzzer, rendered twice on one engine over the fuzzer's
-// variables, gives the output in tests/fuzz/golden, followed by the codes of the errors it reported.
+// Each fuzzer seed, rendered twice on one engine, gives its golden output and error codes.
 TEST(TemplateGolden, EverySeedRendersItsGoldenOutput) {
   UErrorCode status = U_ZERO_ERROR;
   icu::Locale::setDefault(icu::Locale("en_US"), status);
@@ -215,8 +212,7 @@ TEST(EngineWithoutMatcher, ReportsFatalErrorSevenAndGivesNone) {
   EXPECT_TRUE(delegate.events.isEmpty());  // no run took place, so none finished
 }
 
-// Each error with what the run made of the template: "output | codes | first message", the message marked
-// "(stop)" when it was not reported as continuing.
+// "output | codes | first message", the message marked "(stop)" unless reported as continuing.
 TEST_F(EngineErrorTest, ErrorsAreReportedWithTheirCodeMessageAndOutcome) {
   engine.loadMarker(std::make_shared<ProbeMarkers>(QStringList{"both", "noend", "jump"}));
   const QString ended = "reported that a non-existent block ended";
@@ -277,8 +273,7 @@ TEST_F(EngineVariableTest, RunVariablesShadowGlobalsWhichShadowBlockVariablesAnd
   engine.setObject("global", "x");
   engine.addEntriesFromDictionary({{"item", "global"}, {"only", "g"}});
   EXPECT_EQ(render("{{ x }}{{ only }}", {{"x", "run"}}), "rung");
-  // The loop variable lives in the block's frame, so the global of that name wins; the loop's next
-  // value then goes where "item" was found: into the globals.
+  // The block's loop variable loses to the global, whose value the loop then updates.
   EXPECT_EQ(render("{% for item in items %}{{ item }};{% /for %}", {{"items", QStringList{"a", "b", "c"}}}),
             "global;b;c;");
   EXPECT_EQ(engine.objectForKey("item"), QVariant("c"));
@@ -298,8 +293,7 @@ class Counter : public KeyValueCoding {
   mutable int readings_ = 0;
 };
 
-// A name read again is not looked up again until a variable may have changed: a value set, a loop going
-// round, a block with values of its own closing, a new run. Every reading after such a change is fresh.
+// A name is looked up again only after a variable may have changed (set, loop, block end, new run).
 TEST_F(EngineVariableTest, ANameIsReadAgainOnlyAfterAVariableMayHaveChanged) {
   const Counter counter;
   const QVariantMap vars{
@@ -336,8 +330,7 @@ TEST_F(EngineVariableTest, LookupAnswersWhereAValueLives) {
   EXPECT_EQ(engine.resolveVariable("client.name"), QVariant("Baz"));
 }
 
-// Loaded by class name, a filter set stays for later runs of its engine only; a name taken earlier stays
-// with its first handler, and a filter that gives no value writes nothing (and is no error).
+// Filters loaded by class name stay with their engine; a filter without a value writes nothing.
 TEST_F(EngineRunTest, LoadFindsClassesByNameAndAFilterWithoutAValueWritesNothing) {
   struct Shout : GXTemplateFilter {
     QStringList filters() const override { return {"shout", "uppercase", "nothing"}; }

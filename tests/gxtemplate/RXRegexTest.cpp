@@ -16,9 +16,7 @@ GXRange range(std::uint64_t location, std::uint64_t length) {
   return {location, length};
 }
 
-// Every match of `regex` in `text`, asking each time from where the last one ended (the way the template
-// matcher walks a template), so the cache continues its search instead of starting again; or, `fresh`,
-// each found by a search of its own on a new copy of the text (no continuation possible).
+// Every match, each search continuing from the last (as the matcher walks), or `fresh` on a new copy.
 QList<GXRange> walk(const QString& text, const QString& regex, bool fresh = false) {
   QList<GXRange> found;
   std::uint64_t from = 0;
@@ -42,8 +40,7 @@ std::string messageOf(Call&& call) {
   return "(nothing raised)";
 }
 
-// Searches within a range: a match running past the range, starting after it or before its location is
-// none; the largest length means "to the end" from the start only; ranges beyond the text raise.
+// Only a match wholly within the range counts; ranges beyond the text raise.
 TEST(RXRegexRanges, AMatchCountsOnlyWithinTheRangeAndRangesBeyondTheTextRaise) {
   const QString digits = "0123456789", letters = "abcdef";
   const struct {
@@ -179,8 +176,7 @@ TEST(RXRegexCache, CollidingPatternsEvictEachOtherAndStillWork) {
 }
 
 TEST(RXRegexCache, TextsThatDoNotOwnTheirCharactersAreCopied) {
-  // Short texts go to the fixed buffer, long ones to the heap buffer; texts of two slots alternate in the
-  // same buffer, so each search must see its own characters.
+  // Short and long texts of two slots share a buffer: each search must see its own characters.
   for (const qsizetype length : {qsizetype(40), qsizetype(5000)}) {
     std::vector<QChar> one(size_t(length), u'a');
     std::vector<QChar> two(size_t(length), u'b');

@@ -23,8 +23,7 @@ class DesktopBusTest : public PrivateBusTest<TrackingTest> {
   FakeScreenSaver screenSaver;
 };
 
-// Idle seconds come from Mutter first, then the screen saver; a service that errors or never answers
-// (costing the call's timeout, not the bus default) hands over to the next; the updater asks the bus.
+// Mutter first, then the screen saver; an erring or hung service costs its timeout and hands over.
 TEST_F(DesktopBusTest, IdleSecondsComeFromTheFirstServiceThatAnswers) {
   WTDBusIdleSource source(PrivateBus::instance().connect(), 100);
   auto asked = [&] { return QStringLiteral("%1 %2").arg(source.idleSeconds()).arg(source.lastSource()); };

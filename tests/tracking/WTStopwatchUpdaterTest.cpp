@@ -9,8 +9,7 @@ namespace {
 
 using Answer = WTTrackingAlertAnswer;
 
-// A tick totals the running entries, sets the badge and title and schedules the next; a tick with nothing
-// new keeps the badge. Each tick peeks, so totals move once per minute boundary.
+// Ticks total the running entries into badge and title, moving once per minute boundary.
 TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   WTTask* task = makeTask();
   WTTask* other = makeTask(nullptr, "Other");
@@ -38,8 +37,7 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   EXPECT_EQ(updater->badgeLabel(), "01:17");
 }
 
-// Changing the running set ticks at once, other changes do not; restarts of saved entries, deletion and
-// undo are each seen.
+// The running set follows starts, stops, restarts, deletion and undo; only its changes tick at once.
 TEST_F(TrackingTest, RunningSetFollowsStartsStopsRestartsDeletionAndUndo) {
   WTTask* task = makeTask();
   updater->start();
@@ -84,9 +82,7 @@ TEST_F(TrackingTest, RunningSetFollowsStartsStopsRestartsDeletionAndUndo) {
   EXPECT_EQ(runningNow(), QList<WTTime*>{undone});
 }
 
-// Whether a tick asks about idle time: only with the handling on, something running and the desktop's
-// idle seconds at the threshold (the minutes setting, five when zero or less). Answered "No", the entry
-// runs on with the idle time in it, and the next tick asks again.
+// Asks only when on, running and idle past the threshold (five minutes when zero or less); No asks again.
 struct IdleRow {
   std::optional<bool> shouldIdle;  // unset: the registered default, off
   int minutes;
@@ -200,9 +196,7 @@ TEST_F(TrackingTest, AnOpenIdleAlertIsNeverStackedAndTheTickerGoesOn) {
   EXPECT_EQ(presenter.shown.size(), 2u);
 }
 
-// Sleep stops the ticker and waking offers the time asleep as idle, once; a wake nobody announced is found
-// from a tick that comes far later than due (a busy machine's little lateness is no sleep), including an
-// immediate tick while a tick is pending.
+// Time asleep, announced or found from a very late tick, is offered as idle once.
 TEST_F(TrackingTest, SleepAndUnannouncedPausesOfferTheTimeAwayAsIdle) {
   turnIdleHandlingOn(5);
   WTTask* task = makeTask();
@@ -248,8 +242,7 @@ TEST_F(TrackingTest, SleepAndUnannouncedPausesOfferTheTimeAwayAsIdle) {
   EXPECT_EQ(presenter.shown.size(), 3u);
 }
 
-// Quitting asks (when something runs) and saves what the user chose; a session that ends asks nothing and
-// stores the timers running.
+// Quitting asks and saves the choice; a session's end asks nothing and stores the timers running.
 TEST_F(TrackingTest, QuitPromptAndSessionEndStoreTheTimersAsChosen) {
   countSaves();
   updater->start();
@@ -289,8 +282,7 @@ TEST_F(TrackingTest, QuitPromptAndSessionEndStoreTheTimersAsChosen) {
   EXPECT_TRUE(!stored()->running() && stored()->endDate() == std::optional<Date>(clockNow));
 }
 
-// The tray's list of tasks over the real model: five tasks, running first, then the latest tracked; it
-// follows the store while shown, and arranges afresh at the next look when not.
+// The tray's five tasks, running first, then latest tracked; announced while shown, else rearranged later.
 TEST_F(TrackingTest, TheListHoldsFiveTasksRunningFirstThenTheLatestTrackedAndFollowsTheStoreWhileShown) {
   makeTenTasks();
   WTRecentTasks top(context.get());
