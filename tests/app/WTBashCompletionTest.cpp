@@ -1,8 +1,6 @@
 // The bash completion the package installs, run by a real bash against the real `tessal` and store.
 #include "CommandLineInstallation.h"
 
-#include <gtest/gtest.h>
-
 #include <QStandardPaths>
 
 namespace {

@@ -5,11 +5,7 @@
 #include "SyncTestSupport.h"
 #include "WTSingleInstance.h"
 
-#include <gtest/gtest.h>
-
 #include <QSignalSpy>
-#include <QTemporaryDir>
-#include <QTest>
 
 #include <atomic>
 #include <thread>

@@ -2,8 +2,6 @@
 #include "CommandLineInstallation.h"
 #include "WTSingleInstance.h"
 
-#include <gtest/gtest.h>
-
 #include <QColor>
 #include <QElapsedTimer>
 #include <QJsonArray>

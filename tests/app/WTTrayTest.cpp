@@ -2,8 +2,6 @@
 #include "CommandLineInstallation.h"
 #include "PrivateXServer.h"
 
-#include <gtest/gtest.h>
-
 #include <QStandardPaths>
 #include <QTest>
 #include <QThread>

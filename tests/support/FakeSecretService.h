@@ -47,17 +47,11 @@ using Secrets = QMap<QDBusObjectPath, Secret>;
 
 class FakeSecretService final : public QDBusVirtualObject {
  public:
-  enum class Answer {
-    Never,   // takes every call and answers none
-    Refuse,  // answers every call with AccessDenied
-    Keyring  // works as a keyring does
-  };
-  enum class Prompt {
-    None,       // the default keyring exists: no prompt
-    Never,      // the prompt for a new default keyring is never answered
-    Dismissed,  // the user cancels it
-    Accepted    // the user chooses a password, after `promptDelayMs`
-  };
+  // Never takes calls and answers none; Refuse answers AccessDenied; Keyring works as a keyring does.
+  enum class Answer { Never, Refuse, Keyring };
+  // None: the default keyring exists; else the prompt to make it is never answered, dismissed or accepted
+  // (after `promptDelayMs`).
+  enum class Prompt { None, Never, Dismissed, Accepted };
   struct Behaviour {
     Answer answer = Answer::Keyring;
     Prompt prompt = Prompt::None;

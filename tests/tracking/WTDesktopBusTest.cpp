@@ -1,14 +1,10 @@
 #include "FakeDesktopServices.h"
 #include "PrivateBus.h"
 #include "TrackingFixture.h"
-#include "WTIdleSource.h"
 #include "WTLauncherEntry.h"
 #include "WTSleepMonitor.h"
-#include "WTTask.h"
-#include "WTTime.h"
 
 #include <QSignalSpy>
-#include <QThread>
 
 namespace {
 
