@@ -29,7 +29,8 @@ struct Outcome {
 
 class Installation {
  public:
-  Installation() {
+  // `defaults` joins the environment of every run (before a run's own `extra`).
+  explicit Installation(const QMap<QString, QString>& defaults = {}) : defaults_(defaults) {
     for (const char* sub : {"data", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
     // A runtime folder must be the user's alone, or Qt looks elsewhere.
     QFile::setPermissions(runtimeFolder(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
@@ -57,7 +58,9 @@ class Installation {
     environment.insert("XDG_CONFIG_HOME", path("config"));
     environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
     for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
-    for (auto [name, value] : extra.asKeyValueRange())
+    QMap<QString, QString> all = defaults_;
+    all.insert(extra);
+    for (auto [name, value] : all.asKeyValueRange())
       value.isEmpty() ? environment.remove(name) : environment.insert(name, value);
     return environment;
   }
@@ -102,6 +105,7 @@ class Installation {
   }
 
  private:
+  QMap<QString, QString> defaults_;
   QTemporaryDir home_;
 };
 

@@ -71,7 +71,7 @@ class TrackCommand : public ::testing::Test {
     return desktop;
   }
 
-  Installation here;
+  Installation here{kBerlin};
 };
 
 TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
@@ -216,11 +216,11 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"log", "--project", "nowhere"}, 1, "no project is named “nowhere”"},
       // clang-format on
   };
-  for (const auto& c : cases) here.expect(c.arguments, c.code, c.says, kBerlin);
-  EXPECT_EQ(here.out({"list", "tasks", "--qualified"}, kBerlin),
+  for (const auto& c : cases) here.expect(c.arguments, c.code, c.says);
+  EXPECT_EQ(here.out({"list", "tasks", "--qualified"}),
             "Atlas › Build \"it\" now\nAtlas › Design\nAtlas › Plan\nHermes › Design\nHermes › Review\nZeus "
             "› Write\n");
-  EXPECT_EQ(here.out({"list", "projects", "--client", "olymp"}, kBerlin), "Zeus\n");
+  EXPECT_EQ(here.out({"list", "projects", "--client", "olymp"}), "Zeus\n");
   EXPECT_EQ(running(), QStringList({"Zeus/Write"}));
   // Exactly the accepted: 45 minutes ending now, the call, two on 4 March, the running one.
   const std::unique_ptr<WTObjectContext> context = here.readStore();
@@ -250,7 +250,7 @@ TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
       {{"start", "hermes › design"}, "Started Hermes › Design\n"},
       // clang-format on
   };
-  for (const auto& [arguments, out] : cases) EXPECT_EQ(here.out(arguments, kBerlin), out) << out;
+  for (const auto& [arguments, out] : cases) EXPECT_EQ(here.out(arguments), out) << out;
   EXPECT_EQ(running(), QStringList({"Hermes/Design"}));
 }
 
@@ -293,12 +293,12 @@ class ReportCommand : public ::testing::Test {
     ASSERT_TRUE(context->save());
   }
 
-  Installation here;
+  Installation here{kBerlin};
   std::unique_ptr<WTObjectContext> context;  // stays open, as a desktop copy's would
 };
 
 TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
-  const Outcome html = here.expect({"report", "--client", "ACME", "--mode", "1"}, 0, "Beacon", kBerlin);
+  const Outcome html = here.expect({"report", "--client", "ACME", "--mode", "1"}, 0, "Beacon");
   EXPECT_EQ(html.err, "");
   EXPECT_TRUE(html.out.contains("260.00")) << "the grand total";  // 120 + 60 + 80
   EXPECT_FALSE(html.out.contains("Other"));
@@ -308,7 +308,7 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
   for (const QStringList& out : {QStringList{"--client", "acme", "--mode", "1", "--out", htmlFile},
                                  {"--client", "Acme", "--out", csvFile},
                                  {"--client", "Acme", "--mode", "3", "--out", pdfFile}})
-    EXPECT_EQ(here.expect(QStringList{"report"} + out, 0, "", kBerlin).out, "");
+    EXPECT_EQ(here.expect(QStringList{"report"} + out, 0, "").out, "");
   EXPECT_EQ(bytesOf(htmlFile), html.out.toUtf8());
   // Projects by name, tasks in their order; durations as the report writes them, money with two decimals.
   EXPECT_EQ(bytesOf(csvFile),
@@ -316,28 +316,26 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
             "final\",\"02:15\",\"180.00\"\n\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
   EXPECT_TRUE(bytesOf(pdfFile).startsWith("%PDF-"));
   EXPECT_FALSE(QFile::exists(pdfFile + ".part"));
-  here.expect({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, 1, "",
-              kBerlin);  // a trailing space is part of the name
-  here.expect({"report", "--project", "Beacon", "--mode", "2", "--out", csvFile}, 0, "", kBerlin);
+  here.expect({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, 1,
+              "");  // a trailing space counts
+  here.expect({"report", "--project", "Beacon", "--mode", "2", "--out", csvFile}, 0, "");
   EXPECT_EQ(bytesOf(csvFile), "\"Beacon\",\"Build\",\"2026-03-04\",\"01:00\",\"80.00\"\n");
 
   // 3 March covers its whole day, up to the entry that starts at 23:30, and not the next morning's.
-  const Outcome day = here.expect({"export", "--range", "2026-03-03..2026-03-03"}, 0, "", kBerlin);
+  const Outcome day = here.expect({"export", "--range", "2026-03-03..2026-03-03"}, 0, "");
   const QStringList lines = day.out.split('\n', Qt::SkipEmptyParts);
   ASSERT_EQ(lines.size(), 2) << day.out.toStdString();
   for (const QString& line : lines)
     EXPECT_TRUE(line.startsWith("\"Atlas\",\"Design \\\"v2\\\", final\",")) << line.toStdString();
-  EXPECT_EQ(here.tessal({"export"}, kBerlin).out.count('\n'), 3);
-  EXPECT_EQ(
-      here.expect({"export", "--range", "any", "--project", "beacon"}, 0, "\"Beacon\",\"Build\",", kBerlin)
-          .out.count('\n'),
-      1);
+  EXPECT_EQ(here.tessal({"export"}).out.count('\n'), 3);
+  EXPECT_EQ(here.expect({"export", "--range", "any", "--project", "beacon"}, 0, "\"Beacon\",\"Build\",")
+                .out.count('\n'),
+            1);
   const QString file = here.path("times.csv");
-  const Outcome written =
-      here.expect({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, 0, "", kBerlin);
+  const Outcome written = here.expect({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, 0, "");
   EXPECT_EQ(written.out + written.err, "");
   EXPECT_EQ(bytesOf(file), day.out.toUtf8());
-  here.expect({"export", "--range", "last-year", "--out", file}, 0, "", kBerlin);
+  here.expect({"export", "--range", "last-year", "--out", file}, 0, "");
   EXPECT_EQ(bytesOf(file), QByteArray());
 
   const QString pdftotext = QStandardPaths::findExecutable("pdftotext");
