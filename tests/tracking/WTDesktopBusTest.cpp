@@ -62,7 +62,7 @@ TEST_F(DesktopBusTest, IdleSecondsComeFromTheFirstServiceThatAnswers) {
 TEST_F(DesktopBusTest, LogindPrepareForSleepStopsTheTickerAndWakeTicksAtOnce) {
   // The test's bus plays the system bus; a test connection owns logind's name and sends its signal.
   QDBusConnection logind = PrivateBus::instance().connect();
-  ASSERT_TRUE(logind.registerService(QStringLiteral("org.freedesktop.login1")));
+  ASSERT_TRUE(logind.registerService("org.freedesktop.login1"));
   WTSleepMonitor monitor(PrivateBus::instance().connect());
   ASSERT_TRUE(monitor.isListening());
   updater->setSleepMonitor(&monitor);
@@ -72,11 +72,9 @@ TEST_F(DesktopBusTest, LogindPrepareForSleepStopsTheTickerAndWakeTicksAtOnce) {
   const int before = ticks;
 
   auto send = [&](QDBusConnection& from, bool start) {
-    QDBusMessage signal = QDBusMessage::createSignal(QStringLiteral("/org/freedesktop/login1"),
-                                                     QStringLiteral("org.freedesktop.login1.Manager"),
-                                                     QStringLiteral("PrepareForSleep"));
-    signal << start;
-    return from.send(signal);
+    return from.send(QDBusMessage::createSignal("/org/freedesktop/login1", "org.freedesktop.login1.Manager",
+                                                "PrepareForSleep")
+                     << start);
   };
 
   // The same signal from someone who is not logind is not believed.
@@ -96,7 +94,7 @@ TEST_F(DesktopBusTest, LogindPrepareForSleepStopsTheTickerAndWakeTicksAtOnce) {
   EXPECT_TRUE(updater->isTicking());
   EXPECT_EQ(presenter.shown.size(), 1u) << "the three hours asleep are offered";
 
-  EXPECT_FALSE(WTSleepMonitor(QDBusConnection(QStringLiteral("never-connected"))).isListening());
+  EXPECT_FALSE(WTSleepMonitor(QDBusConnection("never-connected")).isListening());
 }
 
 TEST_F(DesktopBusTest, LauncherEntryCarriesTheNumberOfRunningTimersAndIsSentOnlyWhenItChanges) {
