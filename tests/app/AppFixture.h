@@ -1,7 +1,6 @@
 #pragma once
 
-// What the application tests share: their own data folder (XDG_DATA_HOME) and settings file with the
-// application's defaults registered, and a presenter that records what the delegate would have said.
+// Application tests' own data folder and settings (defaults registered), and a recording presenter.
 #include "UserDefaults.h"
 #include "WTAlertPresenter.h"
 #include "WTAppDelegate.h"
@@ -29,7 +28,6 @@
 #include <QFile>
 #include <QLineEdit>
 #include <QPointer>
-#include <QStringList>
 #include <QTemporaryDir>
 #include <QTest>
 
@@ -37,42 +35,32 @@
 
 class RecordingPresenter final : public WTAlertPresenter {
  public:
-  bool presentError(const QString& message) override {
-    errors << message;
-    return false;
-  }
-  bool confirmQuitAnyway() override {
-    ++questions;
-    return quitAnyway;
-  }
+  bool presentError(const QString& message) override { return errors << message, false; }
+  bool confirmQuitAnyway() override { return ++questions, quitAnyway; }
   bool confirmDeletion(const QString& question, const QString& detail) override {
     deletionQuestions << (detail.isEmpty() ? question : question + u' ' + detail);
     return deletes;
   }
-  QStringList errors;
+  QStringList errors, deletionQuestions;
   int questions = 0;
-  bool quitAnyway = false;
-  QStringList deletionQuestions;
-  bool deletes = true;
+  bool quitAnyway = false, deletes = true;
 };
 
 class AppTest : public ::testing::Test {
  protected:
   void SetUp() override {
     ASSERT_TRUE(home.isValid());
-    previousData = qgetenv("XDG_DATA_HOME");
     qputenv("XDG_DATA_HOME", home.filePath("data").toUtf8());
     defaults = std::make_unique<UserDefaults>(home.filePath("settings.conf"));
     WTApplication::registerDefaults(*defaults);
   }
   void TearDown() override { qputenv("XDG_DATA_HOME", previousData); }
-
   std::unique_ptr<WTAppDelegate> makeDelegate() {
     return std::make_unique<WTAppDelegate>(defaults.get(), &presenter);
   }
 
   QTemporaryDir home;
-  QByteArray previousData;
+  const QByteArray previousData = qgetenv("XDG_DATA_HOME");
   std::unique_ptr<UserDefaults> defaults;
   RecordingPresenter presenter;
 };

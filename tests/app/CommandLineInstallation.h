@@ -1,6 +1,5 @@
 #pragma once
-// One installation of Tessal for tests that run the real `tessal` executable as a user's shell would:
-// a separate process with its own data, settings and runtime folders and no display.
+// One installation of Tessal whose real `tessal` runs as a separate process: own folders, no display.
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -28,41 +27,44 @@ struct Outcome {
   QString err;
 };
 
-// One installation: its own data, settings and runtime folders.
 class Installation {
  public:
-  Installation() {
+  // `defaults` joins the environment of every run (before a run's own `extra`).
+  explicit Installation(const QMap<QString, QString>& defaults = {}) : defaults_(defaults) {
     for (const char* sub : {"data", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
     // A runtime folder must be the user's alone, or Qt looks elsewhere.
     QFile::setPermissions(runtimeFolder(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
   }
-  QString storePath() const { return home_.filePath("data/Tessal2/Tessal.sqlite"); }
-  QString journalPath() const { return home_.filePath("data/Tessal2/Tessal.sync"); }
-  QString runtimeFolder() const { return home_.filePath("runtime"); }
+  QString path(const QString& name) const { return home_.filePath(name); }
+  QString storePath() const { return path("data/Tessal2/Tessal.sqlite"); }
+  QString journalPath() const { return path("data/Tessal2/Tessal.sync"); }
+  QString runtimeFolder() const { return path("runtime"); }
   void setSetting(const QString& key, const QString& value) {
-    QSettings settings(home_.filePath("config/Tessal/Tessal.conf"), QSettings::IniFormat);
-    settings.setValue(key, value);
+    QSettings(path("config/Tessal/Tessal.conf"), QSettings::IniFormat).setValue(key, value);
   }
-  // The context over this installation's store, made (with its folder) when missing.
-  std::unique_ptr<WTObjectContext> openStore() {
-    QDir().mkpath(QFileInfo(storePath()).path());
+  // The context over the store (made when missing), or, `readOnly`, as a later run of `tessal` reads it.
+  std::unique_ptr<WTObjectContext> openStore(bool readOnly = false) const {
+    if (!readOnly) QDir().mkpath(QFileInfo(storePath()).path());
     auto context = std::make_unique<WTObjectContext>();
-    auto store = WTStore::open(storePath());
-    EXPECT_TRUE(store);
-    if (store) {
-      EXPECT_TRUE(context->attachStore(std::move(store.value())));
-    }
-    return context;
-  }
-  // What the store file holds now, read as a later run of `tessal` would read it.
-  std::unique_ptr<WTObjectContext> readStore() const {
-    auto context = std::make_unique<WTObjectContext>();
-    auto store = WTStore::openReadOnly(storePath());
+    auto store = readOnly ? WTStore::openReadOnly(storePath()) : WTStore::open(storePath());
     EXPECT_TRUE(store && context->attachStore(std::move(store.value())));
     return context;
   }
-  // `tessal` with `arguments`, started but not waited for; `extra` adds to or replaces what the process
-  // inherits.
+  std::unique_ptr<WTObjectContext> readStore() const { return openStore(true); }
+  // Its folders, no display (as over ssh); `extra` added or replacing (an empty value removes).
+  QProcessEnvironment environment(const QMap<QString, QString>& extra = {}) const {
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    environment.insert("XDG_DATA_HOME", path("data"));
+    environment.insert("XDG_CONFIG_HOME", path("config"));
+    environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
+    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
+    QMap<QString, QString> all = defaults_;
+    all.insert(extra);
+    for (auto [name, value] : all.asKeyValueRange())
+      value.isEmpty() ? environment.remove(name) : environment.insert(name, value);
+    return environment;
+  }
+  // `tessal` with `arguments`, started but not waited for.
   std::unique_ptr<QProcess> launch(const QStringList& arguments,
                                    const QMap<QString, QString>& extra = {}) const {
     auto process = std::make_unique<QProcess>();
@@ -70,41 +72,20 @@ class Installation {
     process->start(QString::fromUtf8(TESSAL_EXE), arguments);
     return process;
   }
-  // What a process of this installation runs with: its folders, no display; `extra` added or replacing
-  // (an empty value removes).
-  QProcessEnvironment environment(const QMap<QString, QString>& extra = {}) const {
-    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert("XDG_DATA_HOME", home_.filePath("data"));
-    environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
-    environment.insert("XDG_RUNTIME_DIR", runtimeFolder());
-    // As on a server or over ssh: no display of any kind, and no platform plugin chosen for us.
-    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "QT_QPA_PLATFORM"}) environment.remove(name);
-    for (auto variable = extra.begin(); variable != extra.end(); ++variable) {
-      if (variable.value().isEmpty())
-        environment.remove(variable.key());
-      else
-        environment.insert(variable.key(), variable.value());
-    }
-    return environment;
-  }
-  // Runs `tessal` with `arguments` to its end.
-  Outcome tessal(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
-    return finish(*launch(arguments, extra));
-  }
   static Outcome finish(QProcess& process) {
-    Outcome run;
     if (!process.waitForFinished(60000)) {
       process.kill();
       process.waitForFinished();
-      return run;
+      return {};
     }
-    run.code = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
-    run.out = QString::fromUtf8(process.readAllStandardOutput());
-    run.err = QString::fromUtf8(process.readAllStandardError());
-    return run;
+    return {process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1,
+            QString::fromUtf8(process.readAllStandardOutput()),
+            QString::fromUtf8(process.readAllStandardError())};
   }
-  // Runs `tessal`: its exit code must be `code` and what it said (stdout on success, else stderr) hold
-  // `text`.
+  Outcome tessal(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
+    return finish(*launch(arguments, extra));
+  }
+  // Runs `tessal`: exit `code`, and stdout (on success, else stderr) holds `text`.
   Outcome expect(const QStringList& arguments, int code, const QString& text,
                  const QMap<QString, QString>& extra = {}) const {
     Outcome run = tessal(arguments, extra);
@@ -117,15 +98,14 @@ class Installation {
   std::string out(const QStringList& arguments, const QMap<QString, QString>& extra = {}) const {
     return tessal(arguments, extra).out.toStdString();
   }
-  QString path(const QString& name) const { return home_.filePath(name); }
   QString file(const QString& name, const QByteArray& contents) const {
-    QFile file(home_.filePath(name));
-    EXPECT_TRUE(file.open(QIODevice::WriteOnly));
-    file.write(contents);
+    QFile file(path(name));
+    EXPECT_TRUE(file.open(QIODevice::WriteOnly) && file.write(contents) == contents.size());
     return file.fileName();
   }
 
  private:
+  QMap<QString, QString> defaults_;
   QTemporaryDir home_;
 };
 
@@ -142,12 +122,11 @@ inline WTTask* task(WTObjectContext& context, WTProject* project, const QString&
   task->setProject(project);
   return task;
 }
-inline WTTime* addTime(WTObjectContext& context, WTTask* task, Date start, Date end) {
+inline void addTime(WTObjectContext& context, WTTask* task, Date start, Date end) {
   auto* time = WTTime::insertNewObject(&context);
   time->setTask(task);
   time->setStartDate(start);
   time->setEndDate(end);
-  return time;
 }
 
 }  // namespace commandtest

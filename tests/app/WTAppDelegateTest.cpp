@@ -10,7 +10,19 @@
 #include <QToolButton>
 
 // Each test gets its own data and settings folders.
-class WTAppDelegateTest : public AppTest {};
+class WTAppDelegateTest : public AppTest {
+ protected:
+  // The names of the projects a later start of the application finds, sorted.
+  QStringList storedProjectNames(std::unique_ptr<WTAppDelegate>& delegate) {
+    auto other = makeDelegate();
+    delegate.reset();
+    QStringList names;
+    for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
+      names << stored->name();
+    names.sort();
+    return names;
+  }
+};
 
 TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   {
@@ -23,8 +35,7 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
     WTMainWindowController window(*delegate);
     EXPECT_TRUE(QFile::exists(delegate->storePath()));
     const QList<WTProject*> projects = window.fetchProjects();
-    ASSERT_EQ(projects.size(), 1);
-    ASSERT_EQ(projects[0]->tasks().size(), 1);
+    ASSERT_TRUE(projects.size() == 1 && projects[0]->tasks().size() == 1);
     EXPECT_EQ(projects[0]->name() + " › " + projects[0]->tasks()[0]->name(),
               "Default Project › Default Task");
     // Opened before the window shows, the outline lists its task.
@@ -44,20 +55,19 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
 }
 
 TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
-  const QString folder = WTAppDelegate::applicationSupportFolder();
-  ASSERT_TRUE(QDir().mkpath(folder));
+  const QString path = WTAppDelegate::applicationSupportFolder() + "/Tessal.sqlite";
+  ASSERT_TRUE(QDir().mkpath(WTAppDelegate::applicationSupportFolder()));
   const QByteArray garbage = "these are somebody's notes, not a data file\n";
-  QFile file(folder + "/Tessal.sqlite");
+  QFile file(path);
   ASSERT_TRUE(file.open(QIODevice::WriteOnly) && file.write(garbage) == garbage.size());
   file.close();
   auto delegate = makeDelegate();
   WTMainWindowController window(*delegate);
   ASSERT_EQ(presenter.errors.size(), 1);
-  EXPECT_TRUE(presenter.errors[0].contains(folder + "/Tessal.sqlite")) << presenter.errors[0].toStdString();
+  EXPECT_TRUE(presenter.errors[0].contains(path)) << presenter.errors[0].toStdString();
   WTObjectContext* context = delegate->managedObjectContext();
   EXPECT_FALSE(context->hasStore());
   EXPECT_TRUE(window.fetchProjects().isEmpty());  // and nothing was made up in its place
-
   // The user carries on; saving cannot work, and says so only when quitting.
   WTClient::insertNewObject(context)->setName("typed anyway");
   delegate->saveAction();
@@ -71,31 +81,18 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   EXPECT_TRUE(context->hasChanges());  // still in memory
   presenter.quitAnyway = true;
   EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
-
   ASSERT_TRUE(file.open(QIODevice::ReadOnly));
   EXPECT_EQ(file.readAll(), garbage);
-  EXPECT_FALSE(QFile::exists(folder + "/Tessal.sqlite-wal"));
+  EXPECT_FALSE(QFile::exists(path + "-wal"));
 }
 
-TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAfterTheyHappen) {
+// A save with nothing to save touches no editor; one with changes commits the edit in progress.
+TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenThereIsSomethingToSave) {
   auto delegate = makeDelegate();
   WTObjectContext* context = delegate->managedObjectContext();
-  auto* project = WTProject::insertNewObject(context);
-  project->setName("autosaved");
+  WTProject::insertNewObject(context)->setName("autosaved");
   EXPECT_TRUE(context->hasChanges());
   EXPECT_TRUE(QTest::qWaitFor([&] { return !context->hasChanges(); }, 5000));
-
-  auto other = makeDelegate();
-  delegate.reset();
-  EXPECT_EQ(WTProject::fetchByPredicate({}, other->managedObjectContext()).size(), 2)
-      << "and the first project";
-}
-
-// A save with nothing to save touches nothing the user is typing in; one with changes commits the edit in
-// progress with them.
-TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressOnlyWhenThereIsSomethingToSave) {
-  auto delegate = makeDelegate();
-  WTObjectContext* context = delegate->managedObjectContext();
   WTProject* project = WTProject::insertNewObject(context);
   ASSERT_TRUE(delegate->saveChanges());
   int commits = 0;
@@ -110,17 +107,11 @@ TEST_F(WTAppDelegateTest, SavingCommitsTheEditInProgressOnlyWhenThereIsSomething
   ASSERT_TRUE(delegate->saveChanges());
   EXPECT_EQ(commits, 1);
   EXPECT_FALSE(context->hasChanges());
-  auto other = makeDelegate();
-  delegate.reset();
-  QStringList names;
-  for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
-    names << stored->name();
-  names.sort();
-  EXPECT_EQ(names, QStringList({"Default Project", "another change", "typed, not yet committed"}));
+  EXPECT_EQ(storedProjectNames(delegate),
+            QStringList({"Default Project", "another change", "autosaved", "typed, not yet committed"}));
 }
 
-// The sync manager is made with the context, journals what the delegate saves beside the store, asks
-// the delegate for the account, and stops when the application quits.
+// The context's sync manager journals every save, takes the account, and stops on quitting.
 TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) {
   defaults->setValue("WTSyncUser", "me@example.org");
   defaults->setValue("WTSyncPassword", "secret");
@@ -132,71 +123,55 @@ TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerThatJournalsEverySave) 
   EXPECT_TRUE(sync->managedObjectContext() == context && sync->syncEnabled());
   EXPECT_EQ(sync->trackFilePath(), delegate->syncJournalPath());
   EXPECT_EQ(sync->syncNetwork()->user() + " " + sync->syncNetwork()->password(), "me@example.org secret");
-
   auto* project = WTProject::insertNewObject(context);
   project->setName("journaled");
   ASSERT_TRUE(delegate->saveChanges());
   ASSERT_NE(sync->syncTrack(), nullptr);
   EXPECT_EQ(sync->syncTrack()->entry(RZSyncTrack::Section::Inserted, project->uuid()).value("name"),
             "journaled");
-  QFile journal(delegate->syncJournalPath());
-  ASSERT_TRUE(journal.open(QIODevice::ReadOnly));
-  EXPECT_TRUE(journal.readAll().contains(project->uuid().toUtf8()));
-
   delegate->applicationWillTerminate();
   EXPECT_FALSE(sync->syncEnabled());
 }
 
 namespace {
 
-// Answers the ticker's questions with one button and counts them.
+// Answers the ticker's questions with its default button and keeps their titles.
 class AnsweringPresenter final : public WTTrackingAlertPresenter {
  public:
-  explicit AnsweringPresenter(WTTrackingAlertAnswer answer) : answer_(answer) {}
   WTTrackingAlertAnswer runAlert(const WTTrackingAlert& alert) override {
     titles << alert.messageText;
-    return answer_;
+    return WTTrackingAlertAnswer::Default;
   }
   QStringList titles;
-
- private:
-  WTTrackingAlertAnswer answer_;
 };
-
-// Whether the one time entry of the store file runs, as a later start of the application would find it.
-std::optional<bool> storedEntryRuns(const QString& path) {
-  auto store = WTStore::openReadOnly(path);
-  if (!store) return std::nullopt;
-  WTObjectContext context;
-  if (!context.attachStore(std::move(store.value()))) return std::nullopt;
-  const QList<WTTime*> times = context.fetch<WTTime>();
-  if (times.size() != 1) return std::nullopt;
-  return times.first()->running();
-}
 
 }  // namespace
 
+// Quitting asks the ticker's question and the last save stores the answer; a session's end cannot wait.
 TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRunning) {
-  // The questions and answers are the ticker's; here, that quitting asks them and the last save stores
-  // the answer, and that a session that ends cannot wait for one.
   for (const bool sessionEnds : {false, true}) {
     QDir(home.filePath("data")).removeRecursively();
-    AnsweringPresenter asking(WTTrackingAlertAnswer::Default);
+    AnsweringPresenter asking;
     auto delegate = makeDelegate();
     delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
     WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
-    if (sessionEnds) {
+    if (sessionEnds)
       delegate->sessionWillEnd();
-    } else {
+    else
       EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
-    }
     EXPECT_EQ(asking.titles, sessionEnds ? QStringList() : QStringList{"Running Timer"});
-    EXPECT_EQ(storedEntryRuns(delegate->storePath()), sessionEnds);
+    // The one time entry of the store file, as a later start of the application would find it.
+    auto store = WTStore::openReadOnly(delegate->storePath());
+    WTObjectContext stored;
+    ASSERT_TRUE(store && stored.attachStore(std::move(store.value())));
+    ASSERT_EQ(stored.fetch<WTTime>().size(), 1);
+    EXPECT_EQ(stored.fetch<WTTime>().first()->running(), sessionEnds);
   }
 }
 
+// Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.
 TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOneTheToolbarOffersTheList) {
-  AnsweringPresenter asking(WTTrackingAlertAnswer::Default);
+  AnsweringPresenter asking;
   auto delegate = makeDelegate();
   WTMainWindowController window(*delegate);
   WTStopwatchUpdater* updater = delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
@@ -205,37 +180,26 @@ TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOne
   window.show();
   WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
   QCoreApplication::processEvents();
-
-  // No tray here (offscreen): the toolbar's button shows the running time and opens the tray's list.
   ASSERT_FALSE(statusBar.isShowingIcon());
   EXPECT_TRUE(window.runningTimeButton()->isVisible());
   window.runningTimeButton()->click();
   EXPECT_TRUE(statusBar.popup()->isVisible());
   EXPECT_EQ(statusBar.popup()->rowCount(), 2) << "the new task and the first run's default task";
   statusBar.popup()->close();
-
-  // A tray turns up: closing the window only hides it; nothing is asked and nothing quits.
   emit statusBar.trayAvailabilityChanged(true);
   QCoreApplication::processEvents();  // the toolbar lays its items out afresh
   EXPECT_FALSE(window.runningTimeButton()->isVisible());
   EXPECT_TRUE(window.close());
-  EXPECT_FALSE(window.isVisible());
-  EXPECT_TRUE(asking.titles.isEmpty());
+  EXPECT_TRUE(!window.isVisible() && asking.titles.isEmpty());
   emit statusBar.showMainWindowRequested();
   EXPECT_TRUE(window.isVisible());
-}
 
-TEST_F(WTAppDelegateTest, CtrlCommaOpensTheOnePreferencesWindowOverTheAccountsPassword) {
-  auto delegate = makeDelegate();
-  WTMainWindowController window(*delegate);
-  window.show();
-  QAction* preferences = window.findChild<QAction*>(QStringLiteral("preferences"));
+  QAction* preferences = window.findChild<QAction*>("preferences");
   EXPECT_EQ(preferences->shortcut(), QKeySequence(Qt::CTRL | Qt::Key_Comma));
   preferences->trigger();
-  WTPreferencesWindowController* opened = window.findChild<WTPreferencesWindowController*>();
+  auto* opened = window.findChild<WTPreferencesWindowController*>();
   ASSERT_TRUE(opened && opened->isVisible());
   opened->close();
   preferences->trigger();
-  EXPECT_EQ(window.findChildren<WTPreferencesWindowController*>().size(), 1);
-  EXPECT_TRUE(opened->isVisible());
+  EXPECT_TRUE(window.findChildren<WTPreferencesWindowController*>().size() == 1 && opened->isVisible());
 }

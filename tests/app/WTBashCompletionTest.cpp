@@ -1,8 +1,6 @@
 // The bash completion the package installs, run by a real bash against the real `tessal` and store.
 #include "CommandLineInstallation.h"
 
-#include <gtest/gtest.h>
-
 #include <QStandardPaths>
 
 namespace {
@@ -21,24 +19,7 @@ class BashCompletion : public ::testing::Test {
     ASSERT_TRUE(QFile::link(QString::fromUtf8(TESSAL_EXE), here.path("bin/tessal")));
   }
 
-  void makeStore() {
-    std::unique_ptr<WTObjectContext> context = here.openStore();
-    auto* acme = WTClient::insertNewObject(context.get());
-    acme->setName("Acme Corp");
-    auto* other = WTClient::insertNewObject(context.get());
-    other->setName("Other");
-    WTProject* atlas = project(*context, "Atlas", acme);
-    WTProject* beacon = project(*context, "Beacon", other);
-    task(*context, atlas, "Build \"it\" now");
-    task(*context, atlas, "Design");
-    task(*context, beacon, "Build pipeline");
-    task(*context, beacon, "Fix: it's late");
-    ASSERT_TRUE(context->save());
-  }
-
-  // What completing the typed `line` offers, sorted: bash hands it over cut into `words` (also at '=' and
-  // ':', quotes kept), and `replaced`, the end of the last word readline puts the completion in place of
-  // (after a quote still open, without the quote).
+  // What completing `line` offers, sorted; `words` as bash cuts them, `replaced` the part readline replaces.
   QStringList completeAsBash(const QString& line, const QStringList& words, const QString& replaced) const {
     QProcess bash;
     QProcessEnvironment environment = here.environment();
@@ -65,11 +46,25 @@ class BashCompletion : public ::testing::Test {
 
 }  // namespace
 
-// Commands, options and values; names quoted so the shell reads them back, narrowed by the options already
-// typed and matched in any case. Readline puts a completion in place of its own part of the word only
-// (after an open quote, after "--option=" or after a colon): what it puts there must finish the word.
+// Names come quoted, narrowed, case-blind, finishing the word readline replaces; none without a store.
 TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
-  makeStore();
+  EXPECT_EQ(completeAsBash("tessal start ", {"start", ""}, "") +
+                completeAsBash("tessal report --project ", {"report", "--project", ""}, ""),
+            QStringList());
+  EXPECT_FALSE(QFileInfo::exists(here.storePath()));
+  std::unique_ptr<WTObjectContext> context = here.openStore();
+  auto* acme = WTClient::insertNewObject(context.get());
+  acme->setName("Acme Corp");
+  auto* other = WTClient::insertNewObject(context.get());
+  other->setName("Other");
+  for (const auto& [project, client, first, second] :
+       {std::tuple{"Atlas", acme, "Build \"it\" now", "Design"},
+        {"Beacon", other, "Build pipeline", "Fix: it's late"}}) {
+    WTProject* made = commandtest::project(*context, project, client);
+    task(*context, made, first);
+    task(*context, made, second);
+  }
+  ASSERT_TRUE(context->save());
   const struct {
     QStringList words;
     QStringList offered;
@@ -102,13 +97,10 @@ TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
       // "Fix:" stays on the line as typed; tessal reads it in any case.
       {{"start", "Fix", ":"}, {"\\ it\\'s\\ late"}, "tessal start Fix:", ""},
       {{"start", "fix", ":"}, {"\\ it\\'s\\ late"}, "tessal start fix:", ""},
-      {{"start", "--project", "=", "beacon", "B"}, {"Build\\ pipeline"},
-       "tessal start --project=beacon B", "B"},
-      {{"report", "--client", "=", "Other", "--project", "="}, {"Beacon"},
-       "tessal report --client=Other --project=", ""},
+      {{"start", "--project", "=", "beacon", "B"}, {"Build\\ pipeline"}, "tessal start --project=beacon B", "B"},
+      {{"report", "--client", "=", "Other", "--project", "="}, {"Beacon"}, "tessal report --client=Other --project=", ""},
       {{"start", "\"bu"}, {"Build \\\"it\\\" now", "Build pipeline"}, "tessal start \"bu", "bu"},
-      {{"export", "--range", "=", "this-"}, {"this-month", "this-week", "this-year"},
-       "tessal export --range=this-", "this-"},
+      {{"export", "--range", "=", "this-"}, {"this-month", "this-week", "this-year"}, "tessal export --range=this-", "this-"},
       // clang-format on
   };
   for (const auto& c : cases) {
@@ -117,11 +109,4 @@ TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
               c.offered)
         << line.toStdString();
   }
-}
-
-TEST_F(BashCompletion, WithoutAStoreOffersNoNamesAndSaysNothing) {
-  EXPECT_EQ(completeAsBash("tessal start ", {"start", ""}, "") +
-                completeAsBash("tessal report --project ", {"report", "--project", ""}, ""),
-            QStringList());
-  EXPECT_FALSE(QFileInfo::exists(here.storePath()));
 }

@@ -1,16 +1,11 @@
-// The `tessal` executable's window-less commands, run as a user's shell would run them: a separate
-// process with its own data and settings folders; and the socket that keeps one desktop copy.
+// `tessal`'s window-less commands as a shell runs them, and the socket that keeps one desktop copy.
 #include "CommandLineInstallation.h"
 #include "FakeSecretService.h"
 #include "PrivateBus.h"
 #include "SyncTestSupport.h"
 #include "WTSingleInstance.h"
 
-#include <gtest/gtest.h>
-
 #include <QSignalSpy>
-#include <QTemporaryDir>
-#include <QTest>
 
 #include <atomic>
 #include <thread>
@@ -19,8 +14,7 @@ namespace {
 
 using namespace commandtest;
 
-// `tessal template` as a report author runs it: JSON variables in, the engine's text with the report filters
-// on stdout, its errors on stderr in the order reported; a refusal is one line naming the cause.
+// `tessal template`: JSON variables in, text out, errors in order on stderr; a refusal is one line.
 TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
   Installation here;
   const QString templ =
@@ -40,50 +34,39 @@ TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
             "error 3: \"items.1.note\" is not a valid variable\nerror 2: \"bogus\" is not a valid marker\n"
             "error 6: Finished processing template, but 1 block was left open (for).\n");
 
-  const QString x = here.file("x.txt", "x");
-  const QString bad[] = {here.file("bad1.json", "{\"a\": }"), here.file("bad2.json", "[1, 2]"),
-                         here.file("bad3.json", "")};
-  const QString usage = QStringLiteral("usage: tessal template");
-  // 2 for what the user typed wrong, 1 when the template gave no result.
-  const struct {
-    QStringList arguments;
-    int code;
-    QString says;
-  } cases[] = {
-      {{here.path("missing.txt")}, 2, here.path("missing.txt")},
-      {{x, "--vars", bad[0]}, 2, bad[0]},
-      {{x, "--vars", bad[1]}, 2, bad[1]},
-      {{x, "--vars", bad[2]}, 2, bad[2]},
-      {{x, "--vars", here.path("none.json")}, 2, here.path("none.json")},
-      {{here.file("latin1.txt",
-                  "Gr\xfc\xdf"
-                  "e")},
-       1,
-       "latin1.txt"},
-      {{here.path("")}, 1, here.path("")},  // a folder is no text
-      {{}, 2, usage},
-      {{x, x}, 2, usage},
-      {{x, "--vars"}, 2, usage},
-      {{"--verbose", x}, 2, usage},
+  const QString x = here.file("x.txt", "x"), usage = "usage: tessal template";
+  const QString bad[] = {here.file("bad1.json", "{\"a\": }"),
+                         here.file("bad2.json", "[1, 2]"),
+                         here.file("bad3.json", ""),
+                         here.path("none.json"),
+                         here.path("missing.txt"),
+                         here.file("latin1.txt",
+                                   "Gr\xfc\xdf"
+                                   "e"),
+                         here.path("")};
+  // 2 for what the user typed wrong, 1 when the template gave no result (a folder is no text).
+  const QString t = "template";
+  const std::tuple<QStringList, int, QString> cases[] = {
+      // clang-format off
+      {{t, bad[4]}, 2, bad[4]}, {{t, x, "--vars", bad[0]}, 2, bad[0]}, {{t, x, "--vars", bad[1]}, 2, bad[1]},
+      {{t, x, "--vars", bad[2]}, 2, bad[2]}, {{t, x, "--vars", bad[3]}, 2, bad[3]}, {{t, bad[5]}, 1, "latin1.txt"},
+      {{t, bad[6]}, 1, bad[6]}, {{t}, 2, usage}, {{t, x, x}, 2, usage}, {{t, x, "--vars"}, 2, usage},
+      {{t, "--verbose", x}, 2, usage},
+      // Neither a command nor a Qt option: refused with a usage line before anything needs a display.
+      {{"frobnicate"}, 2, "usage: tessal"}, {{"--nope"}, 2, "usage: tessal"}, {{"-session"}, 2, "usage: tessal"},
+      // clang-format on
   };
-  for (const auto& c : cases) {
-    const Outcome refused = here.expect(QStringList{"template"} + c.arguments, c.code, c.says);
-    EXPECT_EQ(refused.out + QString::number(refused.err.count(u'\n')), "1") << refused.err.toStdString();
+  for (const auto& [arguments, code, says] : cases) {
+    const Outcome refused = here.expect(arguments, code, says);
+    const qsizetype lines = arguments[0] == t ? refused.err.count(u'\n') : 1;  // a usage text may be longer
+    EXPECT_EQ(refused.out + QString::number(lines), "1") << refused.err.toStdString();
   }
   EXPECT_EQ(here.out({"template", "--vars", here.file("v.json", "{}"), x}), "x");
-}
-
-TEST(WTCommandLine, HelpAndBadArgumentsNeedNoDisplay) {
-  Installation here;
-  for (const char* flag : {"--help", "-h"}) {
+  for (const char* flag : {"--help", "-h"})
     for (const char* line :
          {"tessal template TEMPLATE_FILE", "tessal sync", "tessal add TASK (DURATION | START-END)"})
       here.expect({flag}, 0, line);
-  }
   EXPECT_EQ(here.tessal({"--version"}).code, 0);
-  // Neither a command nor a Qt option: refused with a usage line before anything needs a display.
-  for (const QStringList& bad : {QStringList{"frobnicate"}, QStringList{"--nope"}, QStringList{"-session"}})
-    EXPECT_EQ(here.expect(bad, 2, "usage: tessal").out, "");
   EXPECT_FALSE(QFile::exists(here.storePath()));
 }
 
@@ -95,12 +78,9 @@ TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
   EXPECT_FALSE(QFile::exists(here.storePath()));  // the running copy's store is not opened twice
 }
 
-// A first start of the desktop copy with a password an earlier version left in the settings file, and a
-// keyring whose default collection does not exist yet: its prompt is never answered. The window and the
-// store come first, and the keyring is asked only for an account.
+// A keyring whose prompt is never answered must not hold up the desktop's start.
 using fakesecrets::FakeSecretService;
 
-// A keyring on the private bus.
 class WTCommandLineKeyring : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -121,19 +101,15 @@ TEST_F(WTCommandLineKeyring, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksI
     const int callsBefore = keyring.calls();
     std::unique_ptr<QProcess> desktop =
         here.launch({}, {{"QT_QPA_PLATFORM", "offscreen"}, {"DBUS_SESSION_BUS_ADDRESS", address}});
-    // The store is made once the window shows. The keyring would hold a start that waited for it for
-    // as long as it waits itself (half a minute and more).
+    // The store is made once the window shows, not after the keyring's half minute.
     EXPECT_TRUE(synctest::waitUntil([&] { return QFile::exists(here.storePath()); }, 10000))
         << desktop->readAllStandardError().toStdString();
     const WTSingleInstance probe(here.runtimeFolder() + "/tessal.socket");
     EXPECT_TRUE(synctest::waitUntil([&] { return probe.notifyRunningInstance(1000, false); }, 10000));
-    if (account) {
-      EXPECT_TRUE(synctest::waitUntil([&] { return keyring.calls() > callsBefore; }, 10000))
-          << "the move is tried";
-    } else {
-      QTest::qWait(500);
-      EXPECT_EQ(keyring.calls(), callsBefore) << "no account: the keyring is left alone";
-    }
+    if (!account) QTest::qWait(500);
+    EXPECT_EQ(synctest::waitUntil([&] { return keyring.calls() > callsBefore; }, account ? 10000 : 0),
+              account)
+        << "the move is tried for an account only";
     desktop->kill();
     desktop->waitForFinished();
     QFile settings(here.path("config/Tessal/Tessal.conf"));
@@ -142,94 +118,62 @@ TEST_F(WTCommandLineKeyring, TheDesktopStartsWithoutWaitingForTheKeyringAndAsksI
   }
 }
 
-// `tessal sync` says once where its password came from. Without a session bus the settings file is the
-// store, and nothing else is said; a keyring that does not answer costs a few seconds and is named.
+// `tessal sync` says once where its password came from, and never hangs on a keyring.
 TEST_F(WTCommandLineKeyring, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring) {
   keyring.setBehaviour({FakeSecretService::Answer::Never});
-  struct Row {
-    const char* name;
-    QString bus;  // empty: none at all
-    QString password;
-    QString said;
-    QString server = {};  // empty: none set
-  };
-  const Row rows[] = {
-      {"no session bus", {}, "a password", "Using the password in the settings file ("},
-      {"a keyring that never answers",
-       address,
+  const QString fromFile = "Using the password in the settings file (";
+  const std::tuple<QString, QString, QString, QString> rows[] = {
+      // bus (empty: none), password, what is said, server (empty: none set)
+      {{}, "a password", fromFile, {}},
+      {address,
        {},
-       "The secret service gave no password (The secret service did not answer within 5 seconds); the "
-       "settings "
-       "file ("},
-      // The password is read once for the whole exchange, even one that fails at once.
-      {"a server that refuses",
-       {},
-       "a password",
-       "Using the password in the settings file (",
-       "http://127.0.0.1:1"},
+       "The secret service gave no password (The secret service did not answer within 5 seconds); "
+       "the settings file (",
+       {}},
+      {{}, "a password", fromFile, "http://127.0.0.1:1"},
   };
-  for (const Row& row : rows) {
-    SCOPED_TRACE(row.name);
+  for (const auto& [bus, password, said, server] : rows) {
+    SCOPED_TRACE(said.toStdString() + server.toStdString());
     Installation here;
     here.setSetting("WTSyncUser", "ann@example.org");
-    if (!row.password.isEmpty()) here.setSetting("WTSyncPassword", row.password);
-    if (!row.server.isEmpty()) here.setSetting("WTSyncServer", row.server);
-    // An empty address is no bus at all.
-    const Outcome run =
-        here.expect({"sync", "--timeout", "5"}, 1, row.said, {{"DBUS_SESSION_BUS_ADDRESS", row.bus}});
-    EXPECT_EQ(run.err.count(row.said), 1) << "said once";
+    if (!password.isEmpty()) here.setSetting("WTSyncPassword", password);
+    if (!server.isEmpty()) here.setSetting("WTSyncServer", server);
+    const Outcome run = here.expect({"sync", "--timeout", "5"}, 1, said, {{"DBUS_SESSION_BUS_ADDRESS", bus}});
+    EXPECT_EQ(run.err.count(said), 1) << "said once";
     EXPECT_FALSE(run.err.contains("No secret service") || run.err.contains("D-Bus")) << run.err.toStdString();
   }
 }
 
-TEST(WTSingleInstanceTest, ASecondCopyBringsTheFirstForwardAndLeaves) {
+// A busy copy keeps its socket (a takeover would open its store twice); a dead copy's socket is taken.
+TEST(WTSingleInstanceTest, OneCopyKeepsTheSocketWhileItLives) {
   QTemporaryDir dir;
   const QString path = dir.filePath("tessal.socket");
-  WTSingleInstance first(path);
-  ASSERT_TRUE(first.start());
-  EXPECT_TRUE(first.isListening());
-  QSignalSpy reopened(&first, &WTSingleInstance::reopenRequested);
-
-  // The second copy runs elsewhere (its own thread here) while the first keeps serving events.
-  auto startSecondCopy = [&](bool bringForward) {
-    std::atomic<int> started{-1};
-    std::thread second([&] {
-      WTSingleInstance copy(path);
-      started = copy.start(bringForward) ? 1 : 0;
-    });
-    const bool finished = QTest::qWaitFor([&] { return started != -1; }, 5000);
-    second.join();
-    EXPECT_TRUE(finished);
-    return started.load();
-  };
-  EXPECT_EQ(startSecondCopy(true), 0);
-  EXPECT_EQ(reopened.count(), 1);
-  // A command-line run only learns that a copy is running; the window stays where it is.
-  EXPECT_EQ(startSecondCopy(false), 0);
-  EXPECT_EQ(reopened.count(), 1);
-}
-
-// A copy too busy to answer (its event loop held up by a long save) keeps its store: a second copy
-// that took over its socket would open the same store twice.
-TEST(WTSingleInstanceTest, ACopyThatIsTooBusyToAnswerStillCounts) {
-  QTemporaryDir dir;
-  const QString path = dir.filePath("tessal.socket");
-  WTSingleInstance busy(path);
-  ASSERT_TRUE(busy.start());
-  WTSingleInstance second(path);  // asks from this thread, so the first cannot answer meanwhile
-  EXPECT_FALSE(second.start(false) || second.isListening());
-  EXPECT_TRUE(busy.isListening() && QFile::exists(path));
-}
-
-TEST(WTSingleInstanceTest, ASocketLeftByACopyThatDiedIsTakenOver) {
-  QTemporaryDir dir;
-  const QString path = dir.filePath("tessal.socket");
+  {
+    WTSingleInstance first(path);
+    ASSERT_TRUE(first.start() && first.isListening());
+    QSignalSpy reopened(&first, &WTSingleInstance::reopenRequested);
+    // The second copy runs elsewhere (its own thread here) while the first keeps serving events.
+    auto startSecondCopy = [&](bool bringForward) {
+      std::atomic<int> started{-1};
+      std::thread second([&] { started = WTSingleInstance(path).start(bringForward) ? 1 : 0; });
+      EXPECT_TRUE(QTest::qWaitFor([&] { return started != -1; }, 5000));
+      second.join();
+      return started.load();
+    };
+    EXPECT_EQ(startSecondCopy(true), 0);
+    EXPECT_EQ(reopened.count(), 1);
+    EXPECT_EQ(startSecondCopy(false), 0);
+    EXPECT_EQ(reopened.count(), 1);
+    WTSingleInstance second(path);  // asks from this thread, so the first cannot answer meanwhile
+    EXPECT_FALSE(second.start(false) || second.isListening());
+    EXPECT_TRUE(first.isListening() && QFile::exists(path));
+  }
+  QFile::remove(path);
   ASSERT_TRUE(QFile(path).open(QIODevice::WriteOnly));
   WTSingleInstance instance(path);
   EXPECT_TRUE(instance.start() && instance.isListening());
   // Nobody else listens: asking a copy to come forward reaches nobody.
-  WTSingleInstance other(dir.filePath("other.socket"));
-  EXPECT_FALSE(other.notifyRunningInstance(200));
+  EXPECT_FALSE(WTSingleInstance(dir.filePath("other.socket")).notifyRunningInstance(200));
 }
 
 }  // namespace

@@ -24,8 +24,8 @@ class WTMainWindowControllerTest : public WindowTest {
   QAction* item(const char* identifier) { return window->toolbarItem(identifier); }
   bool validate(const char* identifier) { return window->validateToolbarItem(item(identifier)); }
   void select(WTProject* project) { window->projectsViewController()->selectObject(project); }
-  // A second project, `archived` or not, listed; the first one, the default project, is returned.
-  WTProject* addProject(const QString& name, bool archived = false) {
+  // A second project, `archived` or not, listed and returned; the first one is `first`.
+  WTProject* addProject(const QString& name, bool archived, WTProject** first) {
     auto* added = WTProject::insertNewObject(delegate->managedObjectContext());
     added->setName(name);
     added->setArchived(archived);
@@ -33,7 +33,8 @@ class WTMainWindowControllerTest : public WindowTest {
     delegate->managedObjectContext()->processPendingChanges();
     window->projectsViewController()->arrayController()->rearrangeObjects();
     const QList<WTProject*> all = window->fetchProjects();
-    return all.value(0) == added ? all.value(1) : all.value(0);
+    *first = all.value(0) == added ? all.value(1) : all.value(0);
+    return added;
   }
 };
 
@@ -42,9 +43,8 @@ TEST_F(WTMainWindowControllerTest, AStoreWithAnyProjectEvenArchivedIsNotFilled) 
     // A store made before: only a store made just now gets a first project.
     ASSERT_TRUE(QDir().mkpath(WTAppDelegate::applicationSupportFolder()));
     auto store = WTStore::open(WTAppDelegate::storePath());
-    ASSERT_TRUE(store);
     WTObjectContext context;
-    ASSERT_TRUE(context.attachStore(std::move(store.value())));
+    ASSERT_TRUE(store && context.attachStore(std::move(store.value())));
     auto* project = WTProject::insertNewObject(&context);
     project->setName("Old");
     project->setArchived(true);
@@ -70,7 +70,6 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   window->showProjects();
   EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
   EXPECT_EQ(window->currentNavigationController(), window->projectsNavigationController());
-
   ASSERT_TRUE(openOutline(window->fetchProjects()[0]));
   window->showClients();
   EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
@@ -86,18 +85,15 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
 
 TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsOfferReports) {
   open();
-  WTProject* active = addProject("Archived", true);
-  WTProject* archived =
-      window->fetchProjects().value(0) == active ? window->fetchProjects()[1] : window->fetchProjects()[0];
-
-  EXPECT_TRUE(validate("archive"));
-  EXPECT_EQ(item("archive")->text(), "Archive");  // nothing selected
+  WTProject* active = nullptr;
+  WTProject* archived = addProject("Archived", true, &active);
+  // "validated label" of the archive item: with nothing selected, then each project.
+  auto label = [&] { return QStringLiteral("%1 %2").arg(validate("archive")).arg(item("archive")->text()); };
+  EXPECT_EQ(label(), "1 Archive");
   select(archived);
-  EXPECT_TRUE(validate("archive"));
-  EXPECT_EQ(item("archive")->text(), "Unarchive");
+  EXPECT_EQ(label(), "1 Unarchive");
   select(active);
-  validate("archive");
-  EXPECT_EQ(item("archive")->text(), "Archive");
+  EXPECT_EQ(label(), "1 Archive");
   // The command goes to the list, on the selection; the label follows once validated.
   select(archived);
   window->toggleArchive();
@@ -105,18 +101,14 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsO
   QCoreApplication::processEvents();
   EXPECT_EQ(item("archive")->text(), "Archive");
   EXPECT_TRUE(item("archive")->isEnabled());
-
   for (const char* identifier : {"report", "projects", "clients", "add", "remove"})
     EXPECT_TRUE(validate(identifier)) << identifier;
   EXPECT_FALSE(validate("toggleTimer"));  // no task to time in the lists
-
   // With the outline on top the label follows the project itself.
   ASSERT_TRUE(openOutline(active));
   active->setArchived(true);
-  EXPECT_TRUE(validate("archive"));
-  EXPECT_EQ(item("archive")->text(), "Unarchive");
-  EXPECT_TRUE(validate("toggleTimer"));
-  EXPECT_TRUE(validate("back"));
+  EXPECT_EQ(label(), "1 Unarchive");
+  EXPECT_TRUE(validate("toggleTimer") && validate("back"));
 }
 
 TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnTheStore) {
@@ -129,7 +121,6 @@ TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnThe
   EXPECT_TRUE(window->projectsViewController()->tableView()->isEditing());
   window->projectsViewController()->tableView()->endEditing();
   context->processPendingChanges();
-
   action("undo")->trigger();
   context->processPendingChanges();
   EXPECT_EQ(window->fetchProjects().size(), before);
@@ -138,26 +129,23 @@ TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnThe
 
   window->showClients();
   item("add")->trigger();
-  EXPECT_EQ(context->fetch<WTClient>().size(), 1);
+  ASSERT_EQ(context->fetch<WTClient>().size(), 1);
   // A client's report covers exactly its projects, in a window of its own.
   auto* client = context->fetch<WTClient>().front();
   auto* project = WTProject::insertNewObject(context);
-  project->setName("Client work");
   project->setClient(client);
   window->clientsViewController()->selectObject(client);
   item("report")->trigger();
   QList<WTReportWindowController*> reports;
-  for (QWidget* widget : QApplication::topLevelWidgets()) {
+  for (QWidget* widget : QApplication::topLevelWidgets())
     if (auto* report = qobject_cast<WTReportWindowController*>(widget)) reports.append(report);
-  }
   ASSERT_EQ(reports.size(), 1);
   EXPECT_TRUE(reports.front()->isVisible());
   EXPECT_EQ(reports.front()->projects(), QList<WTProject*>{project});
   reports.front()->close();
 }
 
-// Ctrl+N over a selected task whose timer runs, "Temp", Return, Del: only the new task goes, and the
-// Edit menu names each step.
+// Ctrl+N, "Temp", Return, Del over a running task: only the new task goes; the Edit menu names each step.
 TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeARunningTimerGoes) {
   open();
   WTObjectContext* context = delegate->managedObjectContext();
@@ -173,7 +161,8 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
       objects << items->treeController()->objectAt(index);
     return objects;
   };
-  outline->setCurrentIndex(items->treeController()->indexOfObject(task));
+  auto rowOf = [&](WTTask* of) { return items->treeController()->indexOfObject(of); };
+  outline->setCurrentIndex(rowOf(task));
   window->activateWindow();
   ASSERT_TRUE(QTest::qWaitForWindowActive(window.get()));
   outline->setFocus();
@@ -196,22 +185,19 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
         .toStdString();
   };
   EXPECT_EQ(undo->text(), "&Undo Typing");
-
   QTest::keyClick(outline, Qt::Key_Delete);  // an empty task goes without a question
   context->processPendingChanges();
   EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
   EXPECT_TRUE(task->running());
-  EXPECT_TRUE(said().starts_with("&Undo Delete “Temp” / ")) << said();
-  EXPECT_TRUE(said().ends_with(" / ")) << "nothing asked: " << said();
+  EXPECT_TRUE(said().starts_with("&Undo Delete “Temp” / ") && said().ends_with(" / ")) << said();
   undo->trigger();
   context->processPendingChanges();
   EXPECT_EQ(project->tasks().size(), 2);
   EXPECT_EQ(said(), "&Undo Typing / &Redo Delete “Temp” / ");
 
   // Renaming with Return also leaves the renamed row selected alone.
-  outline->selectionModel()->select(items->treeController()->indexOfObject(task),
-                                    QItemSelectionModel::Select | QItemSelectionModel::Rows);
-  outline->selectionModel()->setCurrentIndex(items->treeController()->indexOfObject(temp),
+  outline->selectionModel()->select(rowOf(task), QItemSelectionModel::Select | QItemSelectionModel::Rows);
+  outline->selectionModel()->setCurrentIndex(rowOf(temp),
                                              QItemSelectionModel::Select | QItemSelectionModel::Rows);
   QTest::keyClick(outline, Qt::Key_Return);
   EXPECT_TRUE(outline->isEditing());
@@ -220,26 +206,23 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
 
   // The task with the running timer: asked first, and kept when the answer is no.
   presenter.deletes = false;
-  outline->selectionModel()->setCurrentIndex(items->treeController()->indexOfObject(task),
+  outline->selectionModel()->setCurrentIndex(rowOf(task),
                                              QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
   QTest::keyClick(outline, Qt::Key_Delete);
   EXPECT_EQ(presenter.deletionQuestions.join(" | "),
             "Delete “Default Task” and its 1 item? A timer is running in it.");
-  EXPECT_TRUE(project->tasks().contains(task));
-  EXPECT_TRUE(task->running());
+  EXPECT_TRUE(project->tasks().contains(task) && task->running());
 }
 
 TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   open();
-  WTProject* first = addProject("Other");
-  WTProject* other =
-      window->fetchProjects().value(0) == first ? window->fetchProjects()[1] : window->fetchProjects()[0];
+  WTProject* first = nullptr;
+  WTProject* other = addProject("Other", false, &first);
   EXPECT_EQ(window->selectedProject(), nullptr);
   select(other);
   EXPECT_EQ(window->selectedProject(), other);
   ASSERT_TRUE(openOutline(first));
   EXPECT_EQ(window->selectedProject(), first);
-
   ASSERT_NE(action("export"), nullptr);
   WTExportController* exporter = window->exportData();
   EXPECT_TRUE(exporter->isVisible());
@@ -248,27 +231,19 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   exporter->reject();
 }
 
-TEST_F(WTMainWindowControllerTest, CustomRangeDefaultsAreRegisteredAndStoredValuesWin) {
+// Stored range values win over registered ones; windows fit the screen and come back where they were.
+TEST_F(WTMainWindowControllerTest, StoredRangeWinsAndTheWindowFitsTheScreenAndKeepsItsPlace) {
   const Date stored = Date::fromSeconds(1'000'000);
   defaults->setValue("WTCustomRangeEnd", QVariant::fromValue(stored));
   open();
   EXPECT_LT(defaults->dateForKey("WTCustomRangeBegin").value_or(Date::now()), Date::now());
   EXPECT_EQ(defaults->dateForKey("WTCustomRangeEnd"), stored);
-  window->saveLastSelectedProject(3);
-  EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 3);
-}
-
-// The first window fits the screen however it is scaled; later ones come back where the last one was.
-TEST_F(WTMainWindowControllerTest, TheWindowFitsTheScreenAndKeepsItsPlace) {
-  open();
-  const QRect available = window->screen()->availableGeometry();
-  EXPECT_TRUE(available.contains(window->geometry()))
+  EXPECT_TRUE(window->screen()->availableGeometry().contains(window->geometry()))
       << window->geometry().width() << "x" << window->geometry().height();
   window->resize(700, 480);
   ASSERT_TRUE(QTest::qWaitFor([&] { return window->size() == QSize(700, 480); }));
   EXPECT_TRUE(window->close());
   window.reset();
-
   open();
   EXPECT_EQ(window->size(), QSize(700, 480));
 }

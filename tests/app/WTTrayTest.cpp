@@ -1,11 +1,6 @@
-// Tessal's tray icon in a real tray: an X server (Xvfb), a tray host (trayer) and the real desktop copy,
-// driven as a user would, with the pointer and the keyboard.
+// The tray icon in a real tray (Xvfb, trayer), the real desktop copy driven by pointer and keyboard.
 #include "CommandLineInstallation.h"
 #include "PrivateXServer.h"
-#include "WTTask.h"
-#include "WTTime.h"
-
-#include <gtest/gtest.h>
 
 #include <QStandardPaths>
 #include <QTest>
@@ -22,9 +17,8 @@ struct Geometry {
   int x = 0, y = 0, width = 0, height = 0;
 };
 
-// Polls `probe` every 50 ms for up to `ms`.
-bool waitFor(const std::function<bool()>& probe, int ms = 20000) {
-  return QTest::qWaitFor(probe, ms);
+bool iconSized(const Geometry& g) {
+  return g.width <= 64 && g.height <= 64;
 }
 
 class TrayTest : public ::testing::Test {
@@ -35,14 +29,10 @@ class TrayTest : public ::testing::Test {
     ASSERT_TRUE(x.running()) << "Xvfb did not start";
   }
   void TearDown() override {
-    if (tessal) {
-      tessal->kill();
-      tessal->waitForFinished();
+    for (QProcess* process : {tessal.get(), &tray}) {
+      if (process) process->kill(), process->waitForFinished();
     }
-    tray.kill();
-    tray.waitForFinished();
   }
-
   void startTray() {
     tray.setProcessEnvironment(x.environment());
     tray.start("trayer", {"--edge", "top", "--align", "right", "--widthtype", "request", "--height", "28"});
@@ -61,27 +51,29 @@ class TrayTest : public ::testing::Test {
   std::string tessalState() const {
     QFile log(here.path("tessal.log"));
     const QString said = log.open(QIODevice::ReadOnly) ? QString::fromUtf8(log.readAll()) : QString();
-    return (tessal->state() == QProcess::Running
-                ? QStringLiteral("Tessal runs; it said: ")
-                : QStringLiteral("Tessal ended (%1); it said: ").arg(tessal->exitCode()))
-        .append(said)
+    return QStringLiteral("Tessal %1; it said: %2")
+        .arg(tessal->state() == QProcess::Running ? "runs" : "ended", said)
         .toStdString();
   }
-  QString xdotool(const QStringList& arguments) const { return x.xdotool(arguments); }
-  // The first visible window of the desktop copy whose name matches `pattern` and that `fits`.
-  std::optional<Geometry> window(
-      const QString& pattern,
-      const std::function<bool(const Geometry&)>& fits = [](const Geometry&) { return true; }) const {
-    const QString ids = xdotool(
-        {"search", "--onlyvisible", "--pid", QString::number(tessal->processId()), "--name", pattern});
-    for (const QString& id : ids.split('\n', Qt::SkipEmptyParts)) {
-      QMap<QString, int> shell;  // "X=…", "Y=…", "WIDTH=…", "HEIGHT=…", one a line
-      for (const QString& line : xdotool({"getwindowgeometry", "--shell", id}).split('\n'))
-        shell[line.section('=', 0, 0)] = line.section('=', 1).toInt();
-      const Geometry geometry{shell["X"], shell["Y"], shell["WIDTH"], shell["HEIGHT"]};
-      if (fits(geometry)) return geometry;
-    }
-    return std::nullopt;
+  // The first visible window of the copy matching `pattern` that `fits`, waited for up to `ms`.
+  std::optional<Geometry> window(const QString& pattern, const std::function<bool(const Geometry&)>& fits,
+                                 int ms = 20000) const {
+    std::optional<Geometry> found;
+    (void)QTest::qWaitFor(
+        [&] {
+          const QString ids = x.xdotool(
+              {"search", "--onlyvisible", "--pid", QString::number(tessal->processId()), "--name", pattern});
+          for (const QString& id : ids.split('\n', Qt::SkipEmptyParts)) {
+            QMap<QString, int> shell;  // "X=…", "Y=…", "WIDTH=…", "HEIGHT=…", one a line
+            for (const QString& line : x.xdotool({"getwindowgeometry", "--shell", id}).split('\n'))
+              shell[line.section('=', 0, 0)] = line.section('=', 1).toInt();
+            const Geometry geometry{shell["X"], shell["Y"], shell["WIDTH"], shell["HEIGHT"]};
+            if (fits(geometry)) return found = geometry, true;
+          }
+          return false;
+        },
+        ms);
+    return found;
   }
 
   Installation here;
@@ -105,45 +97,33 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
   ASSERT_NO_FATAL_FAILURE(startTray());
   QThread::msleep(300);  // the tray claims its selection before Tessal looks for one
   ASSERT_NO_FATAL_FAILURE(launchTessal());
-
-  // The icon is a small window of Tessal's inside the tray's strip at the top right.
-  std::optional<Geometry> icon;
-  // (The main window is called Tessal too, until the first tick adds the running time.)
-  auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
-  ASSERT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); }))
-      << "no icon in the tray; " << tessalState();
+  // The icon: small, in the tray's strip at the top right (the main window is called Tessal too).
+  const std::optional<Geometry> icon = window("^Tessal$", iconSized);
+  ASSERT_TRUE(icon) << "no icon in the tray; " << tessalState();
   EXPECT_LE(icon->y + icon->height, 28);
   EXPECT_GE(icon->x, 1280 - 28 * 2);
-
   // A click opens the list below the icon, inside the screen.
-  xdotool({"mousemove", QString::number(icon->x + icon->width / 2),
-           QString::number(icon->y + icon->height / 2), "click", "1"});
-  std::optional<Geometry> list;
-  ASSERT_TRUE(waitFor([&] { return (list = window("Recent Tasks")).has_value(); }))
-      << "the list did not open";
+  x.xdotool({"mousemove", QString::number(icon->x + icon->width / 2),
+             QString::number(icon->y + icon->height / 2), "click", "1"});
+  const std::optional<Geometry> list = window("Recent Tasks", [](const Geometry&) { return true; });
+  ASSERT_TRUE(list) << "the list did not open";
   EXPECT_GE(list->y, icon->y + icon->height - 1);
   EXPECT_LE(list->x + list->width, 1280);
   EXPECT_GE(list->height, 5 * 24) << "five rows";
-
-  // The running task is the first row and its button has the focus: Space stops it, and the desktop copy
-  // saves that within a second.
-  xdotool({"key", "space"});
-  EXPECT_TRUE(waitFor([&] { return here.tessal({"status"}).code == 1; }, 5000)) << "the timer still runs";
+  // The running task's button has the focus: Space stops it, and the copy saves that.
+  x.xdotool({"key", "space"});
+  EXPECT_TRUE(QTest::qWaitFor([&] { return here.tessal({"status"}).code == 1; }, 5000))
+      << "the timer still runs";
 }
 
 TEST_F(TrayTest, ATrayThatAppearsLaterGetsTheIconAtTheNextTick) {
   // No store yet: the desktop copy makes it, with the first project's task.
   ASSERT_NO_FATAL_FAILURE(launchTessal());
-  auto iconSized = [](const Geometry& g) { return g.width <= 64 && g.height <= 64; };
-  ASSERT_TRUE(waitFor([&] {
-    return window("^Tessal", [](const Geometry& g) { return g.width > 64; }).has_value();
-  })) << "the main window did not open; "
-      << tessalState();
-  EXPECT_FALSE(window("^Tessal$", iconSized).has_value());
-
+  ASSERT_TRUE(window("^Tessal", [](const Geometry& g) { return g.width > 64; }))
+      << "the main window did not open; " << tessalState();
+  EXPECT_FALSE(window("^Tessal$", iconSized, 0));
   // As when a desktop's tray extension loads after the applications of the session.
   ASSERT_NO_FATAL_FAILURE(startTray());
-  std::optional<Geometry> icon;
-  EXPECT_TRUE(waitFor([&] { return (icon = window("^Tessal$", iconSized)).has_value(); }, 12000))
+  EXPECT_TRUE(window("^Tessal$", iconSized, 12000))
       << "no icon within two ticks of the tray's arrival; " << tessalState();
 }

@@ -1,5 +1,4 @@
-// Saves happen while the user types: the autosave, every sync reply, quitting. Whatever saves must leave
-// the open editor, its text, cursor and selection, and the keyboard focus exactly as they were.
+// Saves (autosave, sync replies, quitting) leave the open editor, its text, selection and the focus alone.
 #include "AppFixture.h"
 #include "SyncTestSupport.h"
 
@@ -20,13 +19,11 @@ class WTTypingAcrossSavesTest : public WindowTest {
     WTProject::insertNewObject(delegate->managedObjectContext())->setName("merged elsewhere");
     return delegate->saveChanges();
   }
-  // The editor is still open (a closed one is hidden, then deleted), has the focus and holds `text`, with
-  // `selected` selected and the cursor at `cursor`.
+  // Still open and focused, holding `text` with `selected` selected and the cursor at `cursor`.
   static void expectUntouched(const QPointer<QLineEdit>& editor, const QString& text, const QString& selected,
                               int cursor) {
     ASSERT_TRUE(editor);
-    EXPECT_EQ(QApplication::focusWidget(), editor.data());
-    EXPECT_TRUE(editor->isVisible());
+    EXPECT_TRUE(QApplication::focusWidget() == editor.data() && editor->isVisible());
     EXPECT_EQ(QStringLiteral("%1 [%2] @%3")
                   .arg(editor->text(), editor->selectedText())
                   .arg(editor->cursorPosition()),
@@ -47,33 +44,8 @@ class WTTypingAcrossSavesTest : public WindowTest {
   }
 };
 
-TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChanges) {
-  open();
-  QPointer<QLineEdit> editor = newClientEditor();
-  ASSERT_TRUE(editor);
-  QTest::keyClicks(editor, "Alpha");
-  // Nothing else changed since the insertion was saved: the save must not even look at the editor.
-  ASSERT_TRUE(delegate->managedObjectContext()->save());
-  ASSERT_TRUE(delegate->saveChanges());
-  expectUntouched(editor, "Alpha", "", 5);
-
-  // With something to save, the typed text is saved too, and the editor stays as the user left it.
-  QTest::keyClicks(editor, "Beta");
-  editor->setSelection(5, 3);  // "Bet", cursor after it
-  ASSERT_TRUE(saveWithOtherChanges());
-  expectUntouched(editor, "AlphaBeta", "Bet", 8);
-  EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
-  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBeta"}));
-
-  editor->end(false);
-  QTest::keyClicks(editor, "Gamma");
-  commit(editor);
-  ASSERT_TRUE(delegate->saveChanges());
-  EXPECT_EQ(storedClientNames(), QStringList({"AlphaBetaGamma"}));
-}
-
-// Committing the name re-sorts the list: the edited row moves under its open editor.
-TEST_F(WTTypingAcrossSavesTest, AnEditorFollowsItsRowWhenTheCommittedNameReordersTheList) {
+// A save without changes ignores the editor; with changes it saves the text, and the row moves under it.
+TEST_F(WTTypingAcrossSavesTest, AnOpenCellEditorSurvivesSavesWithAndWithoutChangesAndFollowsItsRow) {
   open();
   WTClient::insertNewObject(delegate->managedObjectContext())->setName("Mia");
   ASSERT_TRUE(delegate->managedObjectContext()->save());
@@ -83,23 +55,30 @@ TEST_F(WTTypingAcrossSavesTest, AnEditorFollowsItsRowWhenTheCommittedNameReorder
   ASSERT_TRUE(view);
   ASSERT_EQ(view->indexAt(editor->geometry().center()).row(), 0);  // an empty name sorts first
   QTest::keyClicks(editor, "Zed");
+  ASSERT_TRUE(delegate->managedObjectContext()->save());
+  ASSERT_TRUE(delegate->saveChanges());
+  expectUntouched(editor, "Zed", "", 3);
+  QTest::keyClicks(editor, "Beta");
+  editor->setSelection(3, 3);  // "Bet", cursor after it
   ASSERT_TRUE(saveWithOtherChanges());
   QCoreApplication::processEvents();  // the list re-sorts on its next turn
   QCoreApplication::processEvents();
-  expectUntouched(editor, "Zed", "", 3);
+  expectUntouched(editor, "ZedBeta", "Bet", 6);
   EXPECT_EQ(view->indexAt(editor->geometry().center()).row(), 1);
-  QTest::keyClicks(editor, "ta");
+  EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
+  EXPECT_EQ(storedClientNames(), QStringList({"Mia", "ZedBeta"}));
+  editor->end(false);
+  QTest::keyClicks(editor, "Gamma");
   commit(editor);
   ASSERT_TRUE(delegate->saveChanges());
-  EXPECT_EQ(storedClientNames(), QStringList({"Mia", "Zedta"}));
+  EXPECT_EQ(storedClientNames(), QStringList({"Mia", "ZedBetaGamma"}));
 }
 
 // In a project's outline: the rate field with the focus, then a new task's name editor.
 TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorAcrossASave) {
   open();
   WTProject* project = window->fetchProjects().value(0);
-  ASSERT_TRUE(project);
-  WTItemsViewController* items = openOutline(project);
+  WTItemsViewController* items = project ? openOutline(project) : nullptr;
   ASSERT_TRUE(items);
   QPointer<QLineEdit> rate = items->rateField();
   rate->setFocus();
@@ -110,7 +89,6 @@ TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorA
   expectUntouched(rate, "125", "", 1);
   ASSERT_TRUE(project->storedRate());
   EXPECT_EQ(project->storedRate()->toString(), "125");
-
   items->addObject();  // a new task, its name editor open
   QPointer<QLineEdit> editor = qobject_cast<QLineEdit*>(QApplication::focusWidget());
   ASSERT_TRUE(editor && items->outlineView()->isAncestorOf(editor));
@@ -119,66 +97,53 @@ TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorA
   editor->setSelection(6, -3);  // "loy", cursor before it
   ASSERT_TRUE(saveWithOtherChanges());
   expectUntouched(editor, "Deploy", "loy", 3);
-  QStringList names;
   auto other = makeDelegate();
+  QStringList names;
   for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
     for (WTTask* task : stored->tasks()) names << task->name();
   EXPECT_TRUE(names.contains("Deploy")) << names.join(", ").toStdString();
 }
 
-// Undo and Redo take back typing where it was typed, and records with the keyboard focus kept where it was.
-TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditor) {
+// Undo stays in the editor or keeps the focus, never reviving replaced text; quitting saves the edit.
+TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditorAndUndoOfARecordLeavesTheFocus) {
   open();
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
   ASSERT_TRUE(delegate->managedObjectContext()->save());
   QTest::keyClicks(editor, "Alpha");
-  action("undo")->trigger();
+  QAction* undo = action("undo");
+  undo->trigger();
   expectUntouched(editor, "", "", 0);
   EXPECT_EQ(WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size(), 1);
   action("redo")->trigger();
   expectUntouched(editor, "Alpha", "", 5);
-
-  // Quitting is the one save that stores an edit in progress even when nothing else changed.
-  EXPECT_TRUE(window->close());
-  EXPECT_EQ(storedClientNames(), QStringList({"Alpha"}));
-}
-
-TEST_F(WTTypingAcrossSavesTest, UndoOfARecordLeavesTheKeyboardFocusWhereItWas) {
-  open();
-  QAction* undo = action("undo");
-  QPointer<QLineEdit> editor = newClientEditor();
-  ASSERT_TRUE(editor);
-  QTest::keyClicks(editor, "Alpha");
   commit(editor);
   QCoreApplication::processEvents();  // the name's undo group ends with this turn
   auto* list = qobject_cast<QAbstractItemView*>(QApplication::focusWidget());
-  ASSERT_TRUE(list);
   WTClient* client = WTClient::fetchByPredicate({}, delegate->managedObjectContext()).value(0);
-  ASSERT_TRUE(client);
-  ASSERT_EQ(client->name(), "Alpha");
+  ASSERT_TRUE(list && client && client->name() == "Alpha");
   undo->trigger();
   EXPECT_EQ(client->name(), "");
   EXPECT_EQ(QApplication::focusWidget(), list);
-
-  // An editor opened on the row, nothing typed: undoing (or redoing) the row's name must not leave the
-  // editor showing (and on Return storing) the name the undo replaced.
   client->setName("Beta");
   QCoreApplication::processEvents();
   for (QAction* step : {undo, action("redo")}) {
     list->edit(list->currentIndex());
     QPointer<QLineEdit> untouched = qobject_cast<QLineEdit*>(QApplication::focusWidget());
-    ASSERT_TRUE(untouched);
-    ASSERT_EQ(untouched->text(), client->name());
+    ASSERT_TRUE(untouched && untouched->text() == client->name());
     step->trigger();
     EXPECT_EQ(client->name(), step == undo ? "" : "Beta");
     EXPECT_TRUE(!untouched || !untouched->isVisible());
     EXPECT_EQ(QApplication::focusWidget(), list);
   }
+  editor = newClientEditor();
+  ASSERT_TRUE(editor && delegate->managedObjectContext()->save());  // nothing else to save when quitting
+  QTest::keyClicks(editor, "Gamma");
+  EXPECT_TRUE(window->close());
+  EXPECT_EQ(storedClientNames(), QStringList({"Beta", "Gamma"}));
 }
 
-// The real path of the report: a "head" reply that changes another record is merged and saved while the
-// user types a new client's name.
+// A merged "head" reply changing other records while the user types a new client's name.
 TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   synctest::LoopbackHttpServer server;
   qint64 iteration = 1;
@@ -186,13 +151,10 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   server.handler = [&](const synctest::HttpRequest& request) {
     const QVariantMap body = request.json();
     QVariantMap reply{{"action", body.value("action")}, {"iteration", ++iteration}};
-    if (body.value("action") == "head") {
-      reply.insert("result",
-                   pendingChange.isEmpty()
-                       ? QVariantMap{{"i", QVariantMap{}}, {"u", QVariantMap{}}, {"x", QVariantList{}}}
-                       : pendingChange);
-      pendingChange.clear();
-    }
+    const QVariantMap nothing{{"i", QVariantMap{}}, {"u", QVariantMap{}}, {"x", QVariantList{}}};
+    if (body.value("action") == "head")
+      reply.insert("result", pendingChange.isEmpty() ? nothing : pendingChange);
+    if (body.value("action") == "head") pendingChange.clear();
     return synctest::LoopbackHttpServer::json(reply);
   };
   defaults->setValue("WTSyncServer", server.address());
@@ -205,27 +167,24 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   ASSERT_TRUE(sync);
   sync->setIntervals({50, 50, 50});
   sync->rescheduleTimer(0);
-
   QPointer<QLineEdit> editor = newClientEditor();
   ASSERT_TRUE(editor);
   QTest::keyClicks(editor, "Alpha");
   // Let the autosave store the new client and a few polls pass, as the user pauses.
   const qsizetype seen = server.requests.size();
   ASSERT_TRUE(synctest::waitUntil([&] { return server.requests.size() >= seen + 3; }));
-
-  const QString projectId = window->fetchProjects().value(0)->uuid();
   // Another record renamed, and a client that joins the list being edited.
   pendingChange = QVariantMap{
       {"i", QVariantMap{{"AA@WTClient", QVariantMap{{"name", "Aaron"}, {"uuid", "AA@WTClient"}}}}},
-      {"u", QVariantMap{{projectId, QVariantMap{{"name", "Renamed on the laptop"}}}}},
+      {"u", QVariantMap{{window->fetchProjects().value(0)->uuid(),
+                         QVariantMap{{"name", "Renamed on the laptop"}}}}},
       {"x", QVariantList{}}};
-  ASSERT_TRUE(synctest::waitUntil(
-      [&] { return window->fetchProjects().value(0)->name() == "Renamed on the laptop"; }));
-  ASSERT_TRUE(synctest::waitUntil(
-      [&] { return WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size() == 2; }));
+  ASSERT_TRUE(synctest::waitUntil([&] {
+    return window->fetchProjects().value(0)->name() == "Renamed on the laptop" &&
+           WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size() == 2;
+  }));
   QTest::qWait(50);  // the list takes the new row on its next turn
   ASSERT_TRUE(synctest::waitUntil([&] { return !delegate->managedObjectContext()->hasChanges(); }));
-
   expectUntouched(editor, "Alpha", "", 5);  // nothing selected, or the next key would replace what was typed
   QTest::keyClicks(editor, "BetaGamma");
   commit(editor);

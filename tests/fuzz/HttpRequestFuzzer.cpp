@@ -1,17 +1,4 @@
-// libFuzzer target: feeds arbitrary bytes to the sync server's request parsing, the way a stranger's
-// connection reaches it. The first byte says how long the pieces of a delivery are, the second how
-// long a header line may be (the seeds in tests/fuzz/http-corpus start with both); the rest is
-// delivered whole, byte by byte and in those pieces. Checks that nothing crashes, hangs or trips a
-// sanitizer, that no request exceeds the caps, that only the known refusals come out, and that the
-// split changes nothing: the same requests or refusal as when every byte arrives at once.
-//
-// Build and run from the repository (clang 14 from Debian; the tests are left out of this configuration):
-//   cmake -S . -B build-http-fuzz -G Ninja -DCMAKE_BUILD_TYPE=Debug -DCMAKE_CXX_COMPILER=clang++-14 \
-//         -DTESSAL_BUILD_FUZZERS=ON -DTESSAL_BUILD_TESTS=OFF
-//   ninja -C build-http-fuzz http_request_fuzzer
-//   mkdir -p /tmp/http-corpus
-//   build-http-fuzz/server/http_request_fuzzer -max_total_time=300 -timeout=10 -rss_limit_mb=2048 \
-//     -dict=tests/fuzz/http.dict /tmp/http-corpus tests/fuzz/http-corpus
+// libFuzzer target over the sync server's request parsing, delivered in pieces (see README.md).
 #include "HttpRequestParser.h"
 
 #include <cstddef>

@@ -1,14 +1,4 @@
-// libFuzzer target: feeds arbitrary bytes to the sync client's reply parsing, the way a server's answer
-// reaches it: JSON into values, values into a protocol reply. Checks that nothing crashes, hangs or trips
-// a sanitizer, and that whatever parses writes back to text that parses to the same value.
-//
-// Build and run from /work/main (clang 14 from Debian; the tests are left out of this configuration):
-//   cmake -S . -B build-sync-fuzz -G Ninja -DCMAKE_BUILD_TYPE=Debug -DCMAKE_CXX_COMPILER=clang++-14 \
-//         -DTESSAL_BUILD_FUZZERS=ON -DTESSAL_BUILD_TESTS=OFF
-//   ninja -C build-sync-fuzz sync_reply_fuzzer
-//   mkdir -p /tmp/sync-corpus
-//   build-sync-fuzz/Sources/sync/sync_reply_fuzzer -max_total_time=600 -timeout=10 -rss_limit_mb=2048 \
-//     -dict=tests/fuzz/sync.dict /tmp/sync-corpus tests/fuzz/sync-corpus
+// libFuzzer target over the sync client's reply parsing, checking a round trip (see README.md).
 #include "RZSyncJSON.h"
 #include "RZSyncReply.h"
 

@@ -1,6 +1,5 @@
 #pragma once
-// What the template fuzzer renders its inputs over, shared with the golden table of gxtemplate_tests:
-// every seed in tests/fuzz/corpus is a row of that table, its expected output in tests/fuzz/golden.
+// The template fuzzer's set-up, shared with the golden table (tests/fuzz/corpus -> tests/fuzz/golden).
 #include "Date.h"
 #include "Decimal.h"
 #include "GXTemplateEngine.h"
@@ -33,46 +32,22 @@ inline QVariant utc(int year, int month, int day, int hour, int minute) {
 
 inline QVariantMap variables() {
   static const Record record;
-  return {{"i", 42},
-          {"big", qlonglong(1) << 40},
-          {"flag", true},
-          {"amount", decimal("12.30")},
-          {"money", decimal("7.9")},
-          {"ratio", 0.1},
-          {"when", utc(2024, 1, 1, 0, 0)},
-          {"d", utc(2024, 3, 31, 22, 30)},
-          {"q", QDateTime(QDate(2024, 12, 24), QTime(8, 0), Qt::UTC)},
-          {"pair", QVariantList{1, QStringLiteral("two words")}},
-          {"map", QVariantMap{{"k", QStringLiteral("v")}}},
-          {"m", QVariantMap{{"b", 2}, {"a", 1}}},
+  // clang-format off
+  return {{"i", 42}, {"big", qlonglong(1) << 40}, {"flag", true}, {"amount", decimal("12.30")}, {"money", decimal("7.9")},
+          {"ratio", 0.1}, {"when", utc(2024, 1, 1, 0, 0)}, {"d", utc(2024, 3, 31, 22, 30)},
+          {"q", QDateTime(QDate(2024, 12, 24), QTime(8, 0), Qt::UTC)}, {"pair", QVariantList{1, QStringLiteral("two words")}},
+          {"map", QVariantMap{{"k", QStringLiteral("v")}}}, {"m", QVariantMap{{"b", 2}, {"a", 1}}},
           {"letters", QStringList{"a", "b", "c"}},
           {"rows", QVariantList{QVariantMap{{"name", "first"}}, QVariantMap{{"name", "second"}}}},
-          {"nested", QVariantList{QVariantList{1, 2}, QVariantList{3}}},
-          {"client", KeyPath::variantFromObject(&record)},
-          {"account", QVariantMap{{"name", QStringLiteral("Bar")}}},
-          {"title", QStringLiteral("A")},
-          {"item", QStringLiteral("ROOT")},
-          {"list", QVariantList{1, 2, 3}},
-          {"names", QStringList{"a", "b"}},
-          {"holes", QVariantList{1, QVariant(), 3}},
-          {"none", QVariantList{}},
-          {"outer", QStringList{"x", "y"}},
-          {"inner", QStringList{"1", "2"}},
-          {"n", 2},
-          {"x", 5},
-          {"y", QStringLiteral("5")},
-          {"name", QStringLiteral("abc")},
-          {"kind", QStringLiteral("time")},
-          {"word", QStringLiteral("abc")},
-          {"text", QStringLiteral("no")},
-          {"empty", QString()},
-          {"one", 1},
-          {"zero", 0},
-          {"dzero", QVariant::fromValue(Decimal())},
-          {"dhalf", decimal("0.5")},
-          {"fzero", 0.0},
-          {"up", QStringLiteral("Straße")},
-          {"low", QStringLiteral("ÀB c")}};
+          {"nested", QVariantList{QVariantList{1, 2}, QVariantList{3}}}, {"client", KeyPath::variantFromObject(&record)},
+          {"account", QVariantMap{{"name", QStringLiteral("Bar")}}}, {"title", QStringLiteral("A")},
+          {"item", QStringLiteral("ROOT")}, {"list", QVariantList{1, 2, 3}}, {"names", QStringList{"a", "b"}},
+          {"holes", QVariantList{1, QVariant(), 3}}, {"none", QVariantList{}}, {"outer", QStringList{"x", "y"}},
+          {"inner", QStringList{"1", "2"}}, {"n", 2}, {"x", 5}, {"y", QStringLiteral("5")}, {"name", QStringLiteral("abc")},
+          {"kind", QStringLiteral("time")}, {"word", QStringLiteral("abc")}, {"text", QStringLiteral("no")},
+          {"empty", QString()}, {"one", 1}, {"zero", 0}, {"dzero", QVariant::fromValue(Decimal())},
+          {"dhalf", decimal("0.5")}, {"fzero", 0.0}, {"up", QStringLiteral("Straße")}, {"low", QStringLiteral("ÀB c")}};
+  // clang-format on
 }
 
 struct Delimiters {
@@ -91,9 +66,7 @@ inline constexpr Delimiters kDelimiters[] = {{"{%", "%}", "{{", "}}", "|"},
                                              {"{%", "%}", "[[", "]]", "!"}};
 inline constexpr std::size_t kDelimiterSets = sizeof(kDelimiters) / sizeof(kDelimiters[0]);
 
-// Sets `engine` up for one input and gives the template text: a first byte below the number of
-// delimiter sets picks one; otherwise it is template text under the defaults. Runaway loops end at the
-// limits instead of running for minutes.
+// Sets `engine` up: a first byte below kDelimiterSets picks the delimiters; runaway loops hit the limits.
 inline QString prepare(GXTemplateEngine& engine, const char* data, std::size_t size) {
   std::size_t choice = 0;
   if (size > 0 && static_cast<unsigned char>(data[0]) < kDelimiterSets) {

@@ -6,8 +6,7 @@
 
 namespace {
 
-// A matcher over an engine whose template is `text` (the engine's run sets it; here a run over the text
-// with no matcher does, and reports nothing without a delegate).
+// A matcher over an engine whose template a run without a matcher set.
 class MatcherTest : public ::testing::Test {
  protected:
   MatcherTest() : matcher(&engine) {}
@@ -29,20 +28,16 @@ class MatcherTest : public ::testing::Test {
 // Each match as "type name [args] filter [filter args]", with "-" for an absent name or filter.
 TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
   const std::pair<const char*, const char*> cases[] = {
-      {"{{ client.name }}", "expression client.name [] - []"},
-      {"{% for item in items %}", "marker for [item,in,items] - []"},
+      // clang-format off
+      {"{{ client.name }}", "expression client.name [] - []"}, {"{% for item in items %}", "marker for [item,in,items] - []"},
       {"{{ d | date_format: \"%d.%m.%Y\" }}", "expression d [] date_format [%d.%m.%Y]"},
-      {"{{d|date_format:'yyyy MM'}}", "expression d [] date_format [yyyy MM]"},
-      {"{% if a == 'x y' %}", "marker if [a,==,x y] - []"},
-      {"{% set x '' 5 %}", "marker set [x] - []"},
-      {"{% cycle \"a \\\" b\" 'c' %}", "marker cycle [a \\\" b,c] - []"},
-      {"{{ a | b | c }}", "expression a [] b [|,c]"},
-      {"{{ a | f: x: y }}", "expression a [] f [x:,y]"},
-      {"{{ a | '' x }}", "expression a [] - []"},
-      {"{%  %}", "marker - [] - []"},
-      {"{{}}", "expression - [] - []"},
+      {"{{d|date_format:'yyyy MM'}}", "expression d [] date_format [yyyy MM]"}, {"{% if a == 'x y' %}", "marker if [a,==,x y] - []"},
+      {"{% set x '' 5 %}", "marker set [x] - []"}, {"{% cycle \"a \\\" b\" 'c' %}", "marker cycle [a \\\" b,c] - []"},
+      {"{{ a | b | c }}", "expression a [] b [|,c]"}, {"{{ a | f: x: y }}", "expression a [] f [x:,y]"},
+      {"{{ a | '' x }}", "expression a [] - []"}, {"{%  %}", "marker - [] - []"}, {"{{}}", "expression - [] - []"},
       {"{% '' | upper %}", "marker - [] upper []"},
       {"{%\tnow\n%}", "marker now [] - []"},  // blanks around the body may include a line end
+      // clang-format on
   };
   for (const auto& [text, expected] : cases) {
     const std::shared_ptr<const GXTemplateMatch> m = first(QString::fromUtf8(text));
@@ -57,28 +52,19 @@ TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
 }
 
 TEST_F(MatcherTest, ArgumentsSplitAtBlanksOutsideQuotes) {
-  struct Case {
-    const char* text;
-    QStringList arguments;
-  };
-  const Case cases[] = {
-      {"a  b\tc", {"a", "b", "c"}},
-      {"\"x y\" 'z w' v", {"x y", "z w", "v"}},
+  const std::pair<const char*, QStringList> cases[] = {
+      // clang-format off
+      {"a  b\tc", {"a", "b", "c"}}, {"\"x y\" 'z w' v", {"x y", "z w", "v"}},
       {"'it\\'s' \"say \\\"hi\\\"\"", {"it\\'s", "say \\\"hi\\\""}},  // escapes are kept as written
       {"a \"\" b", {"a"}},  // an empty quoted argument ends the split
-      {"'' a", {}},
-      {"\"unclosed x", {"\"unclosed", "x"}},
-      {"mixed\"quote\"s", {"mixed\"quote\"s"}},
-      {"", {}},
-      {"   ", {}},
+      {"'' a", {}}, {"\"unclosed x", {"\"unclosed", "x"}}, {"mixed\"quote\"s", {"mixed\"quote\"s"}}, {"", {}}, {"   ", {}},
+      // clang-format on
   };
-  for (const Case& c : cases) {
-    EXPECT_EQ(matcher.argumentsFromString(QString::fromUtf8(c.text)), c.arguments) << c.text;
-  }
+  for (const auto& [text, arguments] : cases) EXPECT_EQ(matcher.argumentsFromString(text), arguments) << text;
 }
 
 TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
-  const QString text = QStringLiteral("ab {{ x }} cd {% y %} ef");
+  const QString text = "ab {{ x }} cd {% y %} ef";
   use(text);
   auto at = [&](std::uint64_t location, std::uint64_t length) {
     return matcher.firstMarkerWithinRange({location, length});
@@ -92,13 +78,12 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   EXPECT_FALSE(at(10, 10));
   EXPECT_FALSE(at(21, 3));
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
-  EXPECT_EQ(matcher.markerStart(), QStringLiteral("{%"));
-  EXPECT_EQ(matcher.filterDelimiter(), QStringLiteral("|"));
+  EXPECT_EQ(matcher.markerStart(), "{%");
+  EXPECT_EQ(matcher.filterDelimiter(), "|");
 }
 
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {
-  // The matcher starts its search where a match can begin; over random texts made of the pattern's own
-  // pieces, every position must give exactly what the plain search from that position gives.
+  // From every position, the matcher finds what the plain search from there finds.
   // clang-format off
   const QStringList pieces{"{{", "}}", "{%", "%}", "|", " ", "\t", "\n", "\r\n", "x", "ab", ":", "\"", "'",
                            "\\", QChar(0x2028), QChar(0x0085), QChar(0x00a0), "{", "%"};
@@ -127,8 +112,8 @@ TEST(MatcherCharacterClasses, AreThoseOfTheRegularExpressions) {
   for (char32_t c = 0; c < 0x10000; ++c) {
     if (c >= 0xd800 && c <= 0xdfff) continue;
     const QString one{QChar(char16_t(c))};
-    const bool space = RXRegex::isMatchedByRegex(one, QStringLiteral("^\\s$"));
-    const bool dot = RXRegex::isMatchedByRegex(one, QStringLiteral("^.$"));
+    const bool space = RXRegex::isMatchedByRegex(one, "^\\s$");
+    const bool dot = RXRegex::isMatchedByRegex(one, "^.$");
     if (space != ICUTemplateMatcher::isPatternSpace(char16_t(c))) ++differences;
     if (dot == ICUTemplateMatcher::isPatternLineEnd(char16_t(c))) ++differences;
   }

@@ -16,9 +16,7 @@ GXRange range(std::uint64_t location, std::uint64_t length) {
   return {location, length};
 }
 
-// Every match of `regex` in `text`, asking each time from where the last one ended (the way the template
-// matcher walks a template), so the cache continues its search instead of starting again; or, `fresh`,
-// each found by a search of its own on a new copy of the text (no continuation possible).
+// Every match, each search continuing from the last (as the matcher walks), or `fresh` on a new copy.
 QList<GXRange> walk(const QString& text, const QString& regex, bool fresh = false) {
   QList<GXRange> found;
   std::uint64_t from = 0;
@@ -42,44 +40,36 @@ std::string messageOf(Call&& call) {
   return "(nothing raised)";
 }
 
-TEST(RXRegexRanges, WholeStringIsTheLargestUnsignedLength) {
-  const QString text = QStringLiteral("0123456789");
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("9")), range(9, 1));
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("[0-9]+"), RXRegex::kWholeString), range(0, 10));
-  // From a later location the same length reaches past the end.
-  EXPECT_EQ(messageOf<RXRegex::RangeException>(
-                [&] { RXRegex::rangeOfRegex(text, QStringLiteral("9"), range(5, kGXMaxLength)); }),
-            "The search range exceeds the strings bounds.");
-}
-
-TEST(RXRegexRanges, RangesBeyondTheStringRaise) {
-  const QString text = QStringLiteral("0123456789");
-  for (const GXRange bad :
-       {range(11, 0), range(0, 11), range(10, 1), range(kGXNotFound, 0), range(3, kGXMaxLength - 1)}) {
-    EXPECT_THROW(RXRegex::rangeOfRegex(text, QStringLiteral("1"), bad), RXRegex::RangeException)
+// Only a match wholly within the range counts; ranges beyond the text raise.
+TEST(RXRegexRanges, AMatchCountsOnlyWithinTheRangeAndRangesBeyondTheTextRaise) {
+  const QString digits = "0123456789", letters = "abcdef";
+  const struct {
+    const QString& text;
+    const char* regex;
+    GXRange within, found;
+  } cases[] = {
+      // clang-format off
+      {digits, "9", RXRegex::kWholeString, range(9, 1)},  {digits, "[0-9]+", RXRegex::kWholeString, range(0, 10)},
+      {digits, "$", range(10, 0), range(10, 0)},
+      // Greedy "c\w*" is "cdef"; "cd" would fit in (0, 4) but is not what the search finds.
+      {letters, "c\\w*", range(0, 4), kNone},             {letters, "c\\w*", range(0, 6), range(2, 4)},
+      {letters, "e", range(0, 3), kNone},                 {letters, "a", range(1, 5), kNone},
+      // clang-format on
+  };
+  for (const auto& c : cases)
+    EXPECT_EQ(RXRegex::rangeOfRegex(c.text, QString::fromUtf8(c.regex), c.within), c.found) << c.regex;
+  EXPECT_FALSE(RXRegex::isMatchedByRegex(letters, "f", 0, range(0, 5), nullptr));
+  EXPECT_TRUE(RXRegex::isMatchedByRegex(letters, "f"));
+  for (const GXRange bad : {range(11, 0), range(0, 11), range(10, 1), range(kGXNotFound, 0),
+                            range(3, kGXMaxLength - 1), range(5, kGXMaxLength)}) {
+    EXPECT_EQ(messageOf<RXRegex::RangeException>([&] { RXRegex::rangeOfRegex(digits, "1", bad); }),
+              "The search range exceeds the strings bounds.")
         << bad.location << "," << bad.length;
   }
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("$"), range(10, 0)), range(10, 0));
-}
-
-TEST(RXRegexRanges, AMatchRunningPastTheRangeCountsAsNone) {
-  const QString text = QStringLiteral("abcdef");
-  // Greedy "c\w*" is "cdef"; "cd" would fit in (0, 4) but is not what the search finds.
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("c\\w*"), range(0, 4)), kNone);
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("c\\w*"), range(0, 6)), range(2, 4));
-  // A match starting after the range is none as well; one before its location is never seen.
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("e"), range(0, 3)), kNone);
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("a"), range(1, 5)), kNone);
-  EXPECT_FALSE(RXRegex::isMatchedByRegex(text, QStringLiteral("f"), 0, range(0, 5), nullptr));
-  EXPECT_TRUE(RXRegex::isMatchedByRegex(text, QStringLiteral("f")));
 }
 
 TEST(RXRegexRanges, ContinuedSearchesFindWhatFreshSearchesFind) {
-  struct Case {
-    const char* text;
-    const char* regex;
-  };
-  const Case cases[] = {
+  const std::pair<const char*, const char*> cases[] = {
       {"a1b22c333d", "\\d+"},
       {"abc", "x*"},                 // empty matches everywhere, ends included
       {"aaa", "a|"},                 // alternating non-empty and empty matches
@@ -87,46 +77,35 @@ TEST(RXRegexRanges, ContinuedSearchesFindWhatFreshSearchesFind) {
       {"ab\ncd\nef", "(?m)^\\w"},    // anchors depend on what precedes the start
       {"caterpillar", "(?<=a)\\w"},  // look-behind sees text before the range
   };
-  for (const Case& c : cases) {
-    const QString text = QString::fromUtf8(c.text);
-    const QString regex = QString::fromUtf8(c.regex);
-    EXPECT_EQ(walk(text, regex), walk(text, regex, true)) << c.text << " / " << c.regex;
-  }
-  EXPECT_EQ(walk(QStringLiteral("a1b22c333d"), QStringLiteral("\\d+")),
-            (QList<GXRange>{range(1, 1), range(3, 2), range(6, 3)}));
+  for (const auto& [text, regex] : cases)
+    EXPECT_EQ(walk(text, regex), walk(text, regex, true)) << text << " / " << regex;
+  EXPECT_EQ(walk("a1b22c333d", "\\d+"), (QList<GXRange>{range(1, 1), range(3, 2), range(6, 3)}));
 }
 
-TEST(RXRegexCaptures, CapturesAndTheirBounds) {
-  const QString text = QStringLiteral("key = value");
-  const QString regex = QStringLiteral("(\\w+)\\s*=\\s*(\\w+)(;)?");
+TEST(RXRegexCaptures, CapturesAndTheirBoundsAndANullPatternRaises) {
+  const QString text = "key = value";
+  const QString regex = "(\\w+)\\s*=\\s*(\\w+)(;)?";
   EXPECT_EQ(RXRegex::captureCountForRegex(regex), 3);
   EXPECT_EQ(RXRegex::rangeOfRegex(text, regex, 1), range(0, 3));
-  EXPECT_EQ(RXRegex::stringByMatching(text, regex, 2), QStringLiteral("value"));
+  EXPECT_EQ(RXRegex::stringByMatching(text, regex, 2), "value");
   EXPECT_EQ(RXRegex::stringByMatching(text, regex), text);
   // A group that took no part in the match: no range, no text.
   EXPECT_EQ(RXRegex::rangeOfRegex(text, regex, 3), kNone);
   EXPECT_TRUE(RXRegex::stringByMatching(text, regex, 3).isNull());
-  for (int bad : {-1, 4}) {
+  for (int bad : {-1, 4})
     EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>([&] { RXRegex::rangeOfRegex(text, regex, bad); }),
               "The capture argument is not valid.");
-  }
-  EXPECT_TRUE(RXRegex::stringByMatching(text, QStringLiteral("nope")).isNull());
-  // An empty match is text found, not nothing.
-  const QString empty = RXRegex::stringByMatching(text, QStringLiteral("x*"));
-  EXPECT_FALSE(empty.isNull());
-  EXPECT_TRUE(empty.isEmpty());
-}
-
-TEST(RXRegexCaptures, NullPatternRaises) {
-  const char* expected = "The regular expression argument is NULL.";
-  EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>(
-                [] { RXRegex::rangeOfRegex(QStringLiteral("a"), QString()); }),
-            expected);
+  EXPECT_TRUE(RXRegex::stringByMatching(text, "nope").isNull());
+  // An empty match is text found, not nothing; the empty pattern is a pattern.
+  const QString empty = RXRegex::stringByMatching(text, "x*");
+  EXPECT_TRUE(!empty.isNull() && empty.isEmpty());
+  EXPECT_EQ(RXRegex::rangeOfRegex("abc", ""), range(0, 0));
+  EXPECT_EQ(RXRegex::captureCountForRegex(""), 0);
+  const char* null = "The regular expression argument is NULL.";
+  EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>([] { RXRegex::rangeOfRegex("a", QString()); }),
+            null);
   EXPECT_EQ(messageOf<RXRegex::InvalidArgumentException>([] { RXRegex::captureCountForRegex(QString()); }),
-            expected);
-  // The empty pattern is a pattern: it matches the empty string.
-  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("")), range(0, 0));
-  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("")), 0);
+            null);
 }
 
 // The error's whole user info, one "key=value" a line, in its order.
@@ -138,10 +117,8 @@ std::string describe(const RXRegex::Error& error) {
 
 TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
   RXRegex::Error error;
-  error.domain = QStringLiteral("stale");
-  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("ab("), 0, RXRegex::kWholeString, 0,
-                                  &error),
-            kNone);
+  error.domain = "stale";
+  EXPECT_EQ(RXRegex::rangeOfRegex("abc", "ab(", 0, RXRegex::kWholeString, 0, &error), kNone);
   EXPECT_EQ(
       describe(error),
       "RXICURegexErrorDomain 66310\nNSLocalizedDescription=There was an error compiling the regular "
@@ -149,57 +126,57 @@ TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
       "3: ab(<<HERE>>\nRXICURegexRegex=ab(\nRXICURegexRegexOptions=0\nRXICURegexLine=1\nRXICURegexOffset=3"
       "\nRXICURegexPreContext=ab(\nRXICURegexPostContext=\nRXICURegexErrorName=U_REGEX_MISMATCHED_PAREN");
   EXPECT_EQ(error.value("RXICURegexOffset").toInt(), 3) << "looked up by its key";
-  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("ab(")), -1);
+  EXPECT_EQ(RXRegex::captureCountForRegex("ab("), -1);
   // Without an out-parameter the search just finds nothing; a later good search clears the error.
-  EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("ab(")), kNone);
-  EXPECT_EQ(
-      RXRegex::rangeOfRegex(QStringLiteral("abc"), QStringLiteral("b"), 0, RXRegex::kWholeString, 0, &error),
-      range(1, 1));
+  EXPECT_EQ(RXRegex::rangeOfRegex("abc", "ab("), kNone);
+  EXPECT_EQ(RXRegex::rangeOfRegex("abc", "b", 0, RXRegex::kWholeString, 0, &error), range(1, 1));
   EXPECT_TRUE(error.isNull());
 
   // An error without a line ends after the options.
-  EXPECT_EQ(RXRegex::captureCountForRegex(QStringLiteral("flagged"), 0x80000000u, &error), -1);
+  EXPECT_EQ(RXRegex::captureCountForRegex("flagged", 0x80000000u, &error), -1);
   EXPECT_EQ(describe(error),
             "RXICURegexErrorDomain 66315\nNSLocalizedDescription=There was an error compiling the regular "
             "expression.\nNSLocalizedFailureReason=The error U_REGEX_INVALID_FLAG occured.\nRXICURegexRegex="
             "flagged\nRXICURegexRegexOptions=2147483648");
 }
 
-TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgain) {
-  const QString regex = QStringLiteral("re(us)ed");
-  RXRegex::rangeOfRegex(QStringLiteral("reused"), regex);
+// A pattern used again is not compiled again; a text changed after a search is searched anew.
+TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgainAndChangedTextsAreSearchedAnew) {
+  const QString regex = "re(us)ed";
+  RXRegex::rangeOfRegex("reused", regex);
   const std::uint64_t before = RXRegex::compileCount();
-  for (int i = 0; i < 100; ++i) {
+  for (int i = 0; i < 100; ++i)
     EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("a reused text %1").arg(i), regex, 1), range(4, 2));
-  }
   EXPECT_EQ(RXRegex::compileCount(), before);
+  QString text = "one two three";
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, "t\\w+"), range(4, 3));
+  text.replace(4, 3, "TWO");
+  EXPECT_EQ(RXRegex::rangeOfRegex(text, "t\\w+"), range(8, 5));
 }
 
 TEST(RXRegexCache, CollidingPatternsEvictEachOtherAndStillWork) {
-  const QString first = QStringLiteral("first[0-9]");
-  RXRegex::rangeOfRegex(QStringLiteral("first1"), first);
+  const QString first = "first[0-9]";
+  RXRegex::rangeOfRegex("first1", first);
   // Find a pattern whose slot is first's: using first again after it costs a compilation.
   QString colliding;
   for (int i = 0; i < 500 && colliding.isNull(); ++i) {
     const QString candidate = QStringLiteral("other%1").arg(i);
-    RXRegex::rangeOfRegex(QStringLiteral("x"), candidate);
+    RXRegex::rangeOfRegex("x", candidate);
     const std::uint64_t before = RXRegex::compileCount();
-    RXRegex::rangeOfRegex(QStringLiteral("first2"), first);
+    RXRegex::rangeOfRegex("first2", first);
     if (RXRegex::compileCount() != before) colliding = candidate;
   }
   ASSERT_FALSE(colliding.isNull()) << "23 slots: some pattern among 500 must share a slot";
   for (int round = 0; round < 3; ++round) {
     const std::uint64_t before = RXRegex::compileCount();
-    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("an ") + colliding, colliding),
-              range(3, colliding.size()));
-    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("xx first7"), first), range(3, 6));
+    EXPECT_EQ(RXRegex::rangeOfRegex("an " + colliding, colliding), range(3, colliding.size()));
+    EXPECT_EQ(RXRegex::rangeOfRegex("xx first7", first), range(3, 6));
     EXPECT_EQ(RXRegex::compileCount(), before + 2);
   }
 }
 
 TEST(RXRegexCache, TextsThatDoNotOwnTheirCharactersAreCopied) {
-  // Short texts go to the fixed buffer, long ones to the heap buffer; texts of two slots alternate in the
-  // same buffer, so each search must see its own characters.
+  // Short and long texts of two slots share a buffer: each search must see its own characters.
   for (const qsizetype length : {qsizetype(40), qsizetype(5000)}) {
     std::vector<QChar> one(size_t(length), u'a');
     std::vector<QChar> two(size_t(length), u'b');
@@ -208,26 +185,17 @@ TEST(RXRegexCache, TextsThatDoNotOwnTheirCharactersAreCopied) {
     const QString rawOne = QString::fromRawData(one.data(), length);
     const QString rawTwo = QString::fromRawData(two.data(), length);
     for (int round = 0; round < 3; ++round) {
-      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("X")), range(length - 3, 1)) << length;
-      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, QStringLiteral("Y")), range(length - 7, 1)) << length;
-      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, QStringLiteral("X")), kNone) << length;
-      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("Y")), kNone) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, "X"), range(length - 3, 1)) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, "Y"), range(length - 7, 1)) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, "X"), kNone) << length;
+      EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, "Y"), kNone) << length;
     }
     // The same characters changed in place under the same pointer and length: forgotten by clearing.
     one[size_t(length - 3)] = u'a';
     one[0] = u'X';
     RXRegex::clearStringCache();
-    EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, QStringLiteral("X")), range(0, 1)) << length;
+    EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, "X"), range(0, 1)) << length;
   }
-}
-
-TEST(RXRegexCache, ATextChangedAfterASearchIsSearchedAnew) {
-  QString text = QStringLiteral("one two three");
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(4, 3));
-  text.replace(4, 3, QStringLiteral("TWO"));
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(8, 5));
-  RXRegex::clearStringCache();
-  EXPECT_EQ(RXRegex::rangeOfRegex(text, QStringLiteral("t\\w+")), range(8, 5));
 }
 
 TEST(RXRegexConcurrency, ThreadsSearchingAtOnceGetTheirOwnResults) {

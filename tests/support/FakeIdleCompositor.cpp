@@ -1,7 +1,4 @@
-// A Wayland compositor of the least kind for the idle tests: it offers a seat and, unless started with
-// --no-idle-notify, the ext-idle-notify protocol. It reads commands from stdin ("idle", "resume",
-// "quit") and tells stdout what clients asked ("notification TIMEOUT_MS"). The socket is named by the
-// first argument, in $XDG_RUNTIME_DIR. Prints "ready" once clients may connect.
+// A least Wayland compositor: a seat, ext-idle-notify unless --no-idle-notify; commands on stdin.
 #include "ext-idle-notify-v1-server-protocol.h"
 
 #include <wayland-server.h>
@@ -22,14 +19,8 @@ std::string pending;
 void destroyResource(wl_client*, wl_resource* resource) {
   wl_resource_destroy(resource);
 }
-
 void forgetNotification(wl_resource* resource) {
-  for (auto it = notifications.begin(); it != notifications.end(); ++it) {
-    if (*it == resource) {
-      notifications.erase(it);
-      break;
-    }
-  }
+  std::erase(notifications, resource);
 }
 
 const struct ext_idle_notification_v1_interface notificationImplementation = {destroyResource};
@@ -72,10 +63,10 @@ int readCommands(int fd, uint32_t, void*) {
   pending.append(buffer, size_t(count));
   for (size_t end; (end = pending.find('\n')) != std::string::npos; pending.erase(0, end + 1)) {
     const std::string command = pending.substr(0, end);
-    for (wl_resource* notification : notifications) {
-      if (command == "idle") ext_idle_notification_v1_send_idled(notification);
-      if (command == "resume") ext_idle_notification_v1_send_resumed(notification);
-    }
+    for (wl_resource* notification : notifications)
+      if (command == "idle" || command == "resume")
+        (command == "idle" ? ext_idle_notification_v1_send_idled
+                           : ext_idle_notification_v1_send_resumed)(notification);
     if (command == "quit") wl_display_terminate(display);
   }
   wl_display_flush_clients(display);

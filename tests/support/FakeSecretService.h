@@ -1,10 +1,5 @@
 #pragma once
-// A Secret Service (org.freedesktop.secrets) of the least kind on a private session bus, for testing the
-// real keychain client (QtKeychain over libsecret) against keyrings that misbehave: one that never
-// answers, one that refuses, and one whose default keyring does not exist yet and prompts for it, the
-// prompt being dismissed, never answered or answered late. Secrets travel in the "plain" session.
-// QtDBus hands the calls over on a thread of its own, and the service answers prompts from another, so a
-// client may wait for it on the main thread.
+// A least Secret Service on a private bus, answering from its own thread, misbehaving on request.
 #include "PrivateBus.h"
 
 #include <QDBusArgument>
@@ -31,18 +26,15 @@ struct Secret {
   QString contentType;
 };
 
-inline QDBusArgument& operator<<(QDBusArgument& argument, const Secret& secret) {
-  argument.beginStructure();
-  argument << secret.session << secret.parameters << secret.value << secret.contentType;
-  argument.endStructure();
-  return argument;
+inline QDBusArgument& operator<<(QDBusArgument& a, const Secret& s) {
+  a.beginStructure();
+  a << s.session << s.parameters << s.value << s.contentType;
+  return a.endStructure(), a;
 }
-
-inline const QDBusArgument& operator>>(const QDBusArgument& argument, Secret& secret) {
-  argument.beginStructure();
-  argument >> secret.session >> secret.parameters >> secret.value >> secret.contentType;
-  argument.endStructure();
-  return argument;
+inline const QDBusArgument& operator>>(const QDBusArgument& a, Secret& s) {
+  a.beginStructure();
+  a >> s.session >> s.parameters >> s.value >> s.contentType;
+  return a.endStructure(), a;
 }
 
 }  // namespace fakesecrets
@@ -55,17 +47,11 @@ using Secrets = QMap<QDBusObjectPath, Secret>;
 
 class FakeSecretService final : public QDBusVirtualObject {
  public:
-  enum class Answer {
-    Never,   // takes every call and answers none
-    Refuse,  // answers every call with AccessDenied
-    Keyring  // works as a keyring does
-  };
-  enum class Prompt {
-    None,       // the default keyring exists: no prompt
-    Never,      // the prompt for a new default keyring is never answered
-    Dismissed,  // the user cancels it
-    Accepted    // the user chooses a password, after `promptDelayMs`
-  };
+  // Never takes calls and answers none; Refuse answers AccessDenied; Keyring works as a keyring does.
+  enum class Answer { Never, Refuse, Keyring };
+  // None: the default keyring exists; else the prompt to make it is never answered, dismissed or accepted
+  // (after `promptDelayMs`).
+  enum class Prompt { None, Never, Dismissed, Accepted };
   struct Behaviour {
     Answer answer = Answer::Keyring;
     Prompt prompt = Prompt::None;
@@ -82,12 +68,10 @@ class FakeSecretService final : public QDBusVirtualObject {
   ~FakeSecretService() override {
     thread_.quit();
     thread_.wait();
-    if (registered_) {
-      QDBusConnection connection = QDBusConnection(name_);
-      connection.unregisterObject(QString::fromLatin1(kRoot), QDBusConnection::UnregisterTree);
-      connection.unregisterService(QStringLiteral("org.freedesktop.secrets"));
-      QDBusConnection::disconnectFromBus(name_);
-    }
+    if (!registered_) return;
+    QDBusConnection(name_).unregisterObject(QString::fromLatin1(kRoot), QDBusConnection::UnregisterTree);
+    QDBusConnection(name_).unregisterService("org.freedesktop.secrets");
+    QDBusConnection::disconnectFromBus(name_);
   }
 
   // Connects to `address` and takes the service's name; false when that fails.
@@ -122,58 +106,46 @@ class FakeSecretService final : public QDBusVirtualObject {
     QMutexLocker lock(&mutex_);
     const QString member = message.member();
     auto reply = [&](const QList<QVariant>& arguments) {
-      connection.send(message.createReply(arguments));
-      return true;
+      return connection.send(message.createReply(arguments)), true;
     };
     auto fail = [&](const QString& name, const QString& text) {
-      connection.send(message.createErrorReply(name, text));
-      return true;
+      return connection.send(message.createErrorReply("org.freedesktop.DBus.Error." + name, text)), true;
     };
+    auto path = [](const QString& sub) {
+      return QVariant::fromValue(QDBusObjectPath(QString::fromLatin1(kRoot) + sub));
+    };
+    const QVariant noPath = QVariant::fromValue(QDBusObjectPath("/"));
     if (behaviour_.answer == Answer::Never) return true;
-    if (behaviour_.answer == Answer::Refuse)
-      return fail(QStringLiteral("org.freedesktop.DBus.Error.AccessDenied"), QStringLiteral("Refused"));
+    if (behaviour_.answer == Answer::Refuse) return fail("AccessDenied", "Refused");
 
-    const QString path = message.path();
-    if (member == QLatin1String("GetAll")) {
-      const QList<QDBusObjectPath> collections;
-      return reply({QVariantMap{{QStringLiteral("Collections"), QVariant::fromValue(collections)}}});
+    const QVariant first = message.arguments().value(0);
+    if (member == "GetAll")
+      return reply({QVariantMap{{"Collections", QVariant::fromValue(QList<QDBusObjectPath>())}}});
+    if (member == "OpenSession") {
+      if (first.toString() != "plain") return fail("NotSupported", "plain only");
+      return reply({QVariant::fromValue(QDBusVariant(QString())), path("/session/1")});
     }
-    if (member == QLatin1String("OpenSession")) {
-      if (message.arguments().value(0).toString() != QLatin1String("plain"))
-        return fail(QStringLiteral("org.freedesktop.DBus.Error.NotSupported"), QStringLiteral("plain only"));
-      return reply({QVariant::fromValue(QDBusVariant(QString())),
-                    QVariant::fromValue(QDBusObjectPath(QString::fromLatin1(kRoot) + "/session/1"))});
-    }
-    if (member == QLatin1String("CreateItem")) {
-      if (!keyringExists_)
-        return fail(QStringLiteral("org.freedesktop.DBus.Error.UnknownMethod"),
-                    QStringLiteral("Object does not exist at path %1").arg(path));
-      const QVariantMap properties = qdbus_cast<QVariantMap>(message.arguments().value(0));
+    if (member == "CreateItem") {
+      if (!keyringExists_) return fail("UnknownMethod", "Object does not exist at path " + message.path());
       const auto attributes = qdbus_cast<QMap<QString, QString>>(
-          properties.value(QStringLiteral("org.freedesktop.Secret.Item.Attributes")));
-      const Secret secret = qdbus_cast<Secret>(message.arguments().value(1));
-      const QString key = safe(attributes.value(QStringLiteral("user")));
-      secrets_.insert(key, secret.value);
-      return reply({QVariant::fromValue(itemPath(key)), QVariant::fromValue(QDBusObjectPath("/"))});
+          qdbus_cast<QVariantMap>(first).value("org.freedesktop.Secret.Item.Attributes"));
+      const QString key = safe(attributes.value("user"));
+      secrets_.insert(key, qdbus_cast<Secret>(message.arguments().value(1)).value);
+      return reply({QVariant::fromValue(itemPath(key)), noPath});
     }
-    if (member == QLatin1String("CreateCollection")) {
-      return reply({QVariant::fromValue(QDBusObjectPath("/")),
-                    QVariant::fromValue(QDBusObjectPath(QString::fromLatin1(kRoot) + "/prompt/p1"))});
-    }
-    if (member == QLatin1String("Prompt")) {
+    if (member == "CreateCollection") return reply({noPath, path("/prompt/p1")});
+    if (member == "Prompt") {
       reply({});
       const Prompt prompt = behaviour_.prompt;
       QDBusConnection bus = connection;
-      auto complete = [this, bus, path, prompt]() mutable {
+      auto complete = [this, bus, path = message.path(), prompt]() mutable {
         const bool accepted = prompt == Prompt::Accepted;
         if (accepted) {
           QMutexLocker lock(&mutex_);
           keyringExists_ = true;
         }
-        QDBusMessage signal = QDBusMessage::createSignal(
-            path, QStringLiteral("org.freedesktop.Secret.Prompt"), QStringLiteral("Completed"));
-        const QString collection =
-            accepted ? QString::fromLatin1(kRoot) + "/collection/login" : QStringLiteral("/");
+        QDBusMessage signal = QDBusMessage::createSignal(path, "org.freedesktop.Secret.Prompt", "Completed");
+        const QString collection = accepted ? QString::fromLatin1(kRoot) + "/collection/login" : "/";
         signal << !accepted
                << QVariant::fromValue(QDBusVariant(QVariant::fromValue(QDBusObjectPath(collection))));
         bus.send(signal);
@@ -185,30 +157,24 @@ class FakeSecretService final : public QDBusVirtualObject {
                                   [this, delay, complete] { QTimer::singleShot(delay, this, complete); });
       return true;
     }
-    if (member == QLatin1String("SearchItems")) {
-      const auto attributes = qdbus_cast<QMap<QString, QString>>(message.arguments().value(0));
-      const QString key = safe(attributes.value(QStringLiteral("user")));
+    if (member == "SearchItems") {
+      const QString key = safe(qdbus_cast<QMap<QString, QString>>(first).value("user"));
       QList<QDBusObjectPath> found;
       if (keyringExists_ && secrets_.contains(key)) found.append(itemPath(key));
       return reply({QVariant::fromValue(found), QVariant::fromValue(QList<QDBusObjectPath>())});
     }
-    if (member == QLatin1String("GetSecrets")) {
+    if (member == "GetSecrets") {
       Secrets found;
-      for (const QDBusObjectPath& item : qdbus_cast<QList<QDBusObjectPath>>(message.arguments().value(0))) {
+      for (const QDBusObjectPath& item : qdbus_cast<QList<QDBusObjectPath>>(first)) {
         const QString key = item.path().section(u'/', -1);
         if (secrets_.contains(key))
-          found.insert(item, {QDBusObjectPath(QString::fromLatin1(kRoot) + "/session/1"),
-                              {},
-                              secrets_.value(key),
-                              QStringLiteral("text/plain")});
+          found.insert(item,
+                       {path("/session/1").value<QDBusObjectPath>(), {}, secrets_.value(key), "text/plain"});
       }
       return reply({QVariant::fromValue(found)});
     }
-    if (member == QLatin1String("Delete")) {
-      secrets_.remove(path.section(u'/', -1));
-      return reply({QVariant::fromValue(QDBusObjectPath("/"))});
-    }
-    return fail(QStringLiteral("org.freedesktop.DBus.Error.UnknownMethod"), member);
+    if (member == "Delete") return secrets_.remove(message.path().section(u'/', -1)), reply({noPath});
+    return fail("UnknownMethod", member);
   }
 
  private:

@@ -1,8 +1,6 @@
 #pragma once
 
-// Collects the log lines written while it lives (and still lets them through to the previous handler,
-// debug lines excepted). Given logging rules ("tessal.sync.debug=true"), it turns those categories on
-// for its life; without, it sees what a user's stderr would.
+// Collects log lines while it lives; given rules ("tessal.sync.debug=true"), turns those categories on.
 #include <QLoggingCategory>
 #include <QString>
 #include <QStringList>

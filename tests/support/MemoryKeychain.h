@@ -1,8 +1,6 @@
 #pragma once
 
-// A keychain in memory for tests: what the secret service would hold, and a switch that makes it
-// behave like a desktop without one (every call answers Unavailable, as WTQtKeychain does then). It
-// answers before the call returns.
+// A keychain in memory that answers at once; `available` false answers Unavailable, as without a service.
 #include "WTKeychain.h"
 
 #include <QMap>
@@ -30,8 +28,7 @@ class MemoryKeychain final : public WTKeychain {
 
   bool available = true;
   QMap<QString, QString> entries;
-  int reads = 0;
-  int writes = 0;
+  int reads = 0, writes = 0;
 };
 
 // A keychain a test keeps looking at after a store has taken it over.

@@ -14,8 +14,7 @@
 
 #include <functional>
 
-// A private bus daemon for the binary: no test touches the developer's session or system bus. It has no
-// activation directories, so a name nobody owns stays unanswered instead of starting a real service.
+// A bus daemon of the binary's own, without activation: a name nobody owns stays unanswered.
 class PrivateBus {
  public:
   static PrivateBus& instance() {
@@ -25,9 +24,8 @@ class PrivateBus {
   QString address() const { return address_; }
   // A new connection of its own to the private bus.
   QDBusConnection connect() {
-    const QString name = QStringLiteral("tracking-test-%1").arg(QUuid::createUuid().toString(QUuid::Id128));
-    names_.append(name);
-    return QDBusConnection::connectToBus(address_, name);
+    names_.append("tracking-test-" + QUuid::createUuid().toString(QUuid::Id128));
+    return QDBusConnection::connectToBus(address_, names_.last());
   }
   void disconnectAll() {
     for (const QString& name : std::as_const(names_)) QDBusConnection::disconnectFromBus(name);
@@ -36,23 +34,18 @@ class PrivateBus {
 
  private:
   PrivateBus() {
-    const QString config = dir_.filePath(QStringLiteral("bus.conf"));
-    QFile file(config);
-    if (file.open(QIODevice::WriteOnly)) {
-      file.write(
+    QFile config(dir_.filePath("bus.conf"));
+    if (config.open(QIODevice::WriteOnly))
+      config.write(
           QStringLiteral("<busconfig><type>session</type><listen>unix:dir=%1</listen>"
                          "<policy context=\"default\"><allow send_destination=\"*\" eavesdrop=\"true\"/>"
                          "<allow eavesdrop=\"true\"/><allow own=\"*\"/></policy></busconfig>")
               .arg(dir_.path())
               .toUtf8());
-      file.close();
-    }
-    daemon_.start(QStringLiteral("dbus-daemon"),
-                  {QStringLiteral("--config-file=") + config, QStringLiteral("--nofork"),
-                   QStringLiteral("--print-address")});
-    if (daemon_.waitForStarted(5000) && daemon_.waitForReadyRead(5000)) {
+    config.close();
+    daemon_.start("dbus-daemon", {"--config-file=" + config.fileName(), "--nofork", "--print-address"});
+    if (daemon_.waitForStarted(5000) && daemon_.waitForReadyRead(5000))
       address_ = QString::fromUtf8(daemon_.readLine()).trimmed();
-    }
   }
   ~PrivateBus() {
     disconnectAll();
@@ -76,8 +69,7 @@ inline bool waitForBus(const std::function<bool()>& done, int ms = 3000) {
   return done();
 }
 
-// A test over the private bus, with a thread that serves the test's own services so that a caller
-// blocking on a reply is still answered. `Base` is the suite's own fixture.
+// A test over the private bus, serving its services from a thread of their own. `Base`: the fixture.
 template <class Base>
 class PrivateBusTest : public Base {
  protected:

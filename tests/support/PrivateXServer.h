@@ -6,21 +6,17 @@
 #include <QString>
 #include <QStringList>
 
-// Xvfb chooses a free display number itself and tells it on its output (-displayfd), so tests that run
-// side by side never guess the same number, nor connect to a server another test is about to stop.
+// Xvfb picks a free display itself (-displayfd), so tests side by side never share one.
 class PrivateXServer {
  public:
   explicit PrivateXServer(const QString& screen = QStringLiteral("1280x800x24")) {
     if (QStandardPaths::findExecutable(QStringLiteral("Xvfb")).isEmpty()) return;
-    server_.start(QStringLiteral("Xvfb"),
-                  {QStringLiteral("-displayfd"), QStringLiteral("1"), QStringLiteral("-screen"),
-                   QStringLiteral("0"), screen, QStringLiteral("-nolisten"), QStringLiteral("tcp")});
+    server_.start("Xvfb", {"-displayfd", "1", "-screen", "0", screen, "-nolisten", "tcp"});
     if (!server_.waitForStarted(5000)) return;
     // The number is written once the server listens.
     QByteArray said;
     while (!said.contains('\n') && server_.waitForReadyRead(15000)) said += server_.readAllStandardOutput();
-    const QString number = QString::fromLatin1(said).trimmed();
-    if (!number.isEmpty()) display_ = QStringLiteral(":") + number;
+    if (!said.trimmed().isEmpty()) display_ = ":" + QString::fromLatin1(said).trimmed();
   }
   ~PrivateXServer() {
     server_.kill();
@@ -34,14 +30,14 @@ class PrivateXServer {
   // The caller's environment with DISPLAY set to this server.
   QProcessEnvironment environment() const {
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert(QStringLiteral("DISPLAY"), display_);
+    environment.insert("DISPLAY", display_);
     return environment;
   }
   // Runs xdotool on this display; what it printed, or an empty string when it failed or hung.
   QString xdotool(const QStringList& arguments) const {
     QProcess process;
     process.setProcessEnvironment(environment());
-    process.start(QStringLiteral("xdotool"), arguments);
+    process.start("xdotool", arguments);
     if (!process.waitForFinished(10000)) {
       process.kill();
       process.waitForFinished();

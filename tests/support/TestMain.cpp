@@ -26,8 +26,7 @@ int main(int argc, char** argv) {
   setenv("XDG_RUNTIME_DIR", (root + "/runtime").constData(), 1);
   setenv("XDG_CACHE_HOME", (root + "/cache").constData(), 1);
   if (!getenv("QT_QPA_PLATFORM")) setenv("QT_QPA_PLATFORM", "offscreen", 1);
-  // A session bus nobody listens on: an unset address lets D-Bus and GLib look for the developer's own
-  // bus (and its keyring) through the display. Tests that need a bus start one and point here at it.
+  // A bus nobody listens on: an unset address would find the developer's own bus and keyring.
   setenv("DBUS_SESSION_BUS_ADDRESS", ("unix:path=" + root + "/runtime/no-bus").constData(), 1);
   ::testing::InitGoogleTest(&argc, argv);
   TestApplication app(argc, argv);

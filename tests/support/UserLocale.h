@@ -1,8 +1,6 @@
 #pragma once
 
-// The user's locale while it lives, set the way the environment sets it for the application: ICU's
-// default (what money and dates are written and read in) and Qt's together. "C" is what ICU makes of
-// LANG=C and C.UTF-8: en_US_POSIX.
+// The user's locale while it lives, ICU's and Qt's together; "C" is ICU's en_US_POSIX.
 #include <QLocale>
 
 #include <unicode/locid.h>

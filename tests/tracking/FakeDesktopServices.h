@@ -13,8 +13,7 @@
 // How a fake desktop service answers a call.
 enum class FakeMode { Answer, Error, Silent };
 
-// Mutter's idle monitor as GNOME serves it; answers from its own thread so that a caller blocking on
-// the reply is still answered.
+// Mutter's idle monitor as GNOME serves it.
 class FakeMutterIdleMonitor : public QObject, protected QDBusContext {
   Q_OBJECT
   Q_CLASSINFO("D-Bus Interface", "org.gnome.Mutter.IdleMonitor")

@@ -25,16 +25,14 @@ class ScriptedPresenter final : public WTTrackingAlertPresenter {
   WTTrackingAlertAnswer runAlert(const WTTrackingAlert& alert) override {
     shown.push_back(alert);
     if (whileOpen) whileOpen();
-    if (answers.empty()) return WTTrackingAlertAnswer::Default;
-    const WTTrackingAlertAnswer answer = answers.front();
-    answers.pop_front();
+    const WTTrackingAlertAnswer answer = answers.empty() ? WTTrackingAlertAnswer::Default : answers.front();
+    if (!answers.empty()) answers.pop_front();
     return answer;
   }
   // The `index`th alert shown: "title | text | default button | alternate button".
   std::string said(size_t index) const {
-    if (index >= shown.size()) return "(not shown)";
-    const WTTrackingAlert& alert = shown[index];
-    return QStringList{alert.messageText, alert.informativeText, alert.defaultButton, alert.alternateButton}
+    const WTTrackingAlert& a = shown.at(index);
+    return QStringList{a.messageText, a.informativeText, a.defaultButton, a.alternateButton}
         .join(" | ")
         .toStdString();
   }
@@ -47,10 +45,7 @@ class ScriptedPresenter final : public WTTrackingAlertPresenter {
 // The system's idle seconds as the test sets them.
 class SetIdleSource final : public WTIdleSource {
  public:
-  qint64 idleSeconds() override {
-    ++asked;
-    return seconds;
-  }
+  qint64 idleSeconds() override { return ++asked, seconds; }
   qint64 seconds = 0;
   int asked = 0;
 };
@@ -63,24 +58,20 @@ class TrackingTest : public ModelTest {
     setNow(berlin(2026, 3, 2, 12, 0, 30));
     makeUpdater();
   }
-
   void TearDown() override {
     updater.reset();
     ModelTest::TearDown();
   }
-
   void makeUpdater() {
     updater.reset();
     updater = std::make_unique<WTStopwatchUpdater>(context.get(), defaults.get(), &idle, &presenter);
     QObject::connect(updater.get(), &WTStopwatchUpdater::stopwatchDidUpdate,
                      [this](WTStopwatchUpdater*) { ++ticks; });
   }
-
   // Lets queued work (the context's end of turn, the updater's reaction) run.
   static void settle() {
     for (int i = 0; i < 3; ++i) QCoreApplication::processEvents();
   }
-
   // The updater's running set once the turn's queued work has run.
   QList<WTTime*> runningNow() {
     settle();
@@ -94,38 +85,26 @@ class TrackingTest : public ModelTest {
         .arg(updater->badgeLabel(), updater->isTicking() ? "ticking" : "stopped")
         .toStdString();
   }
-
   void advance(double seconds) { clockNow = clockNow.addingSeconds(seconds); }
-
   void turnIdleHandlingOn(int minutes) {
-    defaults->setValue(QStringLiteral("WTShouldIdle"), true);
-    defaults->setValue(QStringLiteral("WTIdleTime"), minutes);
+    defaults->setValue("WTShouldIdle", true);
+    defaults->setValue("WTIdleTime", minutes);
   }
-
   WTTime* startTimer(WTTask* task, Date start) {
     auto* time = makeItem<WTTime>(task, start);
     time->setRunning(true);
     return time;
   }
-
   QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
-  // The entry of the store's context with `uuid`, if any.
-  WTTime* stored(const QString& uuid) const { return static_cast<WTTime*>(context->objectWithUUID(uuid)); }
-
   // The updater's saves go to the store file, counted in `saves`.
   void countSaves() {
-    updater->setSaveCallback([this] {
-      ++saves;
-      return context->save().ok();
-    });
+    updater->setSaveCallback([this] { return ++saves, context->save().ok(); });
   }
-
   // Ten tasks "T0".."T9"; Tn's last entry ended n hours after 1 March, so T9 ended last. T1 and T4 run.
   void makeTenTasks() {
     for (int n = 0; n < 10; ++n) {
-      WTTask* task = makeTask(nullptr, QStringLiteral("T%1").arg(n));
-      makeTime(task, berlin(2026, 3, 1, n), berlin(2026, 3, 1, n, 30));
-      tasks.append(task);
+      tasks.append(makeTask(nullptr, QStringLiteral("T%1").arg(n)));
+      makeTime(tasks.last(), berlin(2026, 3, 1, n), berlin(2026, 3, 1, n, 30));
     }
     startTimer(tasks[1], berlin(2026, 3, 2, 11));
     startTimer(tasks[4], berlin(2026, 3, 2, 11, 30));
@@ -135,7 +114,6 @@ class TrackingTest : public ModelTest {
   SetIdleSource idle;
   ScriptedPresenter presenter;
   std::unique_ptr<WTStopwatchUpdater> updater;
-  int ticks = 0;
-  int saves = 0;
+  int ticks = 0, saves = 0;
   QList<WTTask*> tasks;  // made by makeTenTasks()
 };
