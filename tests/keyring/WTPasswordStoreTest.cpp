@@ -169,7 +169,8 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
                 action == "keep" ? WTPasswordStore::FilePassword::Keep : WTPasswordStore::FilePassword{});
       }
     }
-    const QString password = store->password(), inFile = defaults->stringForKey(kInFile);
+    const QString password = store->password(), inFile = defaults->stringForKey(kInFile),
+                  inKeychain = keychain.entries.value(kKey);
     EXPECT_EQ(fileBytes().contains("horse"), inFile == kPassword);
     EXPECT_EQ(store->keychainError().isEmpty(), kept.count() == 0);
     EXPECT_EQ(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile), kept.count() > 0);
@@ -185,12 +186,11 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
     EXPECT_EQ(next->password(), password) << "after a restart";
     EXPECT_EQ(keptAgain.count(), 0) << "after a restart";
     const QString where[] = {"N", "K", "S"};
-    EXPECT_EQ(
-        QStringList({where[int(store->location())], token(password), token(keychain.entries.value(kKey)),
-                     token(inFile), QString::number(reads), QString::number(writes),
-                     QString::number(kept.count()), QString::number(keychain.writes - writes)})
-            .join(' '),
-        row.after);
+    EXPECT_EQ(QStringList({where[int(store->location())], token(password), token(inKeychain), token(inFile),
+                           QString::number(reads), QString::number(writes), QString::number(kept.count()),
+                           QString::number(keychain.writes - writes)})
+                  .join(' '),
+              row.after);
   }
 }
 
