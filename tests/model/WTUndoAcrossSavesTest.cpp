@@ -19,29 +19,26 @@ QMap<QString, WTStoreRecord> rowsOf(const QString& path) {
 
 class UndoAcrossSaves : public ModelTest {
  protected:
-  void endTurn() { context->processPendingChanges(); }
-  void save() {
+  // Ends the turn and autosaves, after the user's Ctrl+Z (-1), Ctrl+Shift+Z (1) or own change (0).
+  void save(int undo = 0) {
+    if (undo) undo < 0 ? context->undoManager().undo() : context->undoManager().redo();
+    context->processPendingChanges();
     const Result<void> saved = context->save();
     ASSERT_TRUE(saved.ok()) << saved.error().message.toStdString();
   }
-  // What the user's Ctrl+Z (Ctrl+Shift+Z) and the autosave after it do.
-  void undoAndSave() {
-    context->undoManager().undo();
-    endTurn();
-    save();
-  }
-  void redoAndSave() {
-    context->undoManager().redo();
-    endTurn();
-    save();
-  }
-  // The journal's calls for `uuid` since the last look: their kinds, with the name where they carry one.
-  std::vector<QString> journaled(const QString& uuid) {
-    std::vector<QString> kinds;
-    for (const auto& call : journal.callsFor(uuid))
-      kinds.push_back(call.kind + (call.values.contains("name") ? " " + call.values["name"].toString() : ""));
+  // The journal's calls since the last look, for each of `uuids` (joined by "+"): their kinds, with the
+  // name where they carry one and `names` asks for it.
+  QString journaled(const QStringList& uuids, bool names = true) {
+    QStringList each;
+    for (const QString& uuid : uuids) {
+      QStringList kinds;
+      for (const auto& call : journal.callsFor(uuid))
+        kinds.append(call.kind +
+                     (names && call.values.contains("name") ? " " + call.values["name"].toString() : ""));
+      each.append(kinds.join('+'));
+    }
     journal.calls.clear();
-    return kinds;
+    return each.join(", ");
   }
 };
 
@@ -53,8 +50,8 @@ class WTUndoAcrossSavesTest : public UndoAcrossSaves, public ::testing::WithPara
     WTObject* back = context->objectWithUUID(uuid);
     EXPECT_NE(back, nullptr);
     if (!back || GetParam() == WTEntity::Client || GetParam() == WTEntity::Project) return {};
-    const QString key = GetParam() == WTEntity::Task ? QStringLiteral("project") : QStringLiteral("task");
-    auto* owner = static_cast<WTObject*>(KeyPath::objectFromVariant(back->valueForKey(key)));
+    auto* owner = static_cast<WTObject*>(
+        KeyPath::objectFromVariant(back->valueForKey(GetParam() == WTEntity::Task ? "project" : "task")));
     return owner ? owner->uuid() : QString();
   }
 };
@@ -66,44 +63,39 @@ TEST_P(WTUndoAcrossSavesTest, EachUndoneOrRedoneStepReachesStoreAndJournal) {
   WTObject* owner = nullptr;
   if (entity == WTEntity::Task) owner = WTProject::insertNewObject(context.get());
   if (WTEntities::isItem(entity)) owner = makeTask(WTProject::insertNewObject(context.get()));
-  endTurn();
+  context->processPendingChanges();
   WTObject* record = context->insertNewObject(entity);
   record->setName(QStringLiteral("the record"));
   if (owner)
     record->setValue(entity == WTEntity::Task ? "project" : "task", KeyPath::variantFromObject(owner));
-  endTurn();
   const QString uuid = record->uuid(), ownerUuid = owner ? owner->uuid() : QString();
   save();
   const WTStoreRecord saved = rowsOf(storePath()).value(uuid);
   ASSERT_EQ(saved.uuid, uuid);
   record->setName(QStringLiteral("renamed"));
-  endTurn();
   save();
   journal.calls.clear();
 
-  undoAndSave();
-  EXPECT_EQ(journaled(uuid), std::vector<QString>{"update the record"});
+  save(-1);
+  EXPECT_EQ(journaled({uuid}), "update the record");
   EXPECT_EQ(rowsOf(storePath()).value(uuid), saved);
-
-  undoAndSave();  // the insertion: a deletion of its identity
+  save(-1);  // the insertion: a deletion of its identity
   EXPECT_EQ(record->uuid(), uuid);
-  EXPECT_EQ(journaled(uuid), std::vector<QString>{"delete"});
+  EXPECT_EQ(journaled({uuid}), "delete");
   const auto rows = rowsOf(storePath());
   EXPECT_FALSE(rows.contains(uuid) || rows.contains(QString()));
-
-  redoAndSave();  // an insertion under the same identity with its values
-  EXPECT_EQ(journaled(uuid), std::vector<QString>{"insert the record"});
+  save(1);  // an insertion under the same identity with its values
+  EXPECT_EQ(journaled({uuid}), "insert the record");
   EXPECT_EQ(rowsOf(storePath()).value(uuid), saved);
   EXPECT_EQ(storedOwnerOf(uuid), ownerUuid);  // reopens the context
   EXPECT_EQ(context->objectWithUUID(uuid)->name(), "the record");
 
   context->deleteObject(context->objectWithUUID(uuid));
-  endTurn();
   save();
-  EXPECT_EQ(journaled(uuid), std::vector<QString>{"delete"});
+  EXPECT_EQ(journaled({uuid}), "delete");
   EXPECT_FALSE(rowsOf(storePath()).contains(uuid));
-  undoAndSave();
-  EXPECT_EQ(journaled(uuid), std::vector<QString>{"insert the record"});
+  save(-1);
+  EXPECT_EQ(journaled({uuid}), "insert the record");
   EXPECT_EQ(rowsOf(storePath()).value(uuid), saved);
   EXPECT_EQ(storedOwnerOf(uuid), ownerUuid);
 }
@@ -115,14 +107,6 @@ INSTANTIATE_TEST_SUITE_P(EveryEntity, WTUndoAcrossSavesTest,
                            return WTEntities::name(info.param).toStdString();
                          });
 
-void expectJournaledOnceEach(const RecordingJournal& journal, const QStringList& uuids, const QString& kind) {
-  for (const QString& uuid : uuids) {
-    const auto calls = journal.callsFor(uuid);
-    ASSERT_EQ(calls.size(), 1u) << uuid.toStdString();
-    EXPECT_EQ(calls[0].kind, kind) << uuid.toStdString();
-  }
-}
-
 // A whole project with its tasks and items, undone and redone after its save, and deleted with them
 // (a client's deletion only unlinks its projects): each record reaches file and journal, and undoing the
 // deletion brings back every record with its order and links. Both survive a restart.
@@ -131,51 +115,50 @@ TEST_F(UndoAcrossSaves, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecor
   auto* project = WTProject::insertNewObject(context.get());
   project->setClient(client);
   WTTask* first = makeTask(project, QStringLiteral("first"));
-  WTTask* second = makeTask(project, QStringLiteral("second"));
+  makeTask(project, QStringLiteral("second"));
   QStringList items;
   for (WTEntity entity : WTEntities::kAll) {
     if (!WTEntities::isItem(entity)) continue;
     WTObject* item = context->insertNewObject(entity);
-    item->setName(WTEntities::name(entity));
     static_cast<WTItem*>(item)->setTask(first);
     items.append(item->uuid());
   }
-  const QStringList cascaded = QStringList{project->uuid(), first->uuid(), second->uuid()} + items;
+  const QStringList cascaded =
+      QStringList{project->uuid(), first->uuid(), project->tasks()[1]->uuid()} + items;
   const QString clientUuid = client->uuid(), projectUuid = project->uuid();
-  endTurn();
+  // Each record of `uuids` journaled once, as `kind`.
+  const auto once = [&](const QStringList& uuids, const QString& kind) {
+    return QStringList(uuids.size(), kind).join(", ");
+  };
   save();
   const QMap<QString, WTStoreRecord> before = rowsOf(storePath());
   journal.calls.clear();
-  undoAndSave();
-  expectJournaledOnceEach(journal, cascaded + QStringList{clientUuid}, "delete");
+  save(-1);
+  EXPECT_EQ(journaled(cascaded + QStringList{clientUuid}),
+            once(cascaded + QStringList{clientUuid}, "delete"));
   EXPECT_TRUE(rowsOf(storePath()).isEmpty());
-  journal.calls.clear();
-  redoAndSave();
-  expectJournaledOnceEach(journal, cascaded, "insert");
+  save(1);
+  EXPECT_EQ(journaled(cascaded, false), once(cascaded, "insert"));
   EXPECT_EQ(rowsOf(storePath()), before);
-  journal.calls.clear();
 
   context->deleteObject(project);
-  endTurn();
+  context->processPendingChanges();
   EXPECT_TRUE(context->fetch<WTTask>().isEmpty());
   save();
-  expectJournaledOnceEach(journal, cascaded, "delete");
+  EXPECT_EQ(journaled(cascaded, false), once(cascaded, "delete"));
   EXPECT_EQ(rowsOf(storePath()).keys(), QStringList{clientUuid});
-  journal.calls.clear();
-  undoAndSave();
+  save(-1);
   EXPECT_EQ(rowsOf(storePath()), before);
-  expectJournaledOnceEach(journal, cascaded, "insert");
   EXPECT_EQ(KeyPath::objectFromVariant(journal.callsFor(projectUuid)[0].values.value("client")), client);
   EXPECT_EQ(KeyPath::objectFromVariant(journal.callsFor(first->uuid())[0].values.value("project")), project);
-  journal.calls.clear();
+  EXPECT_EQ(journaled(cascaded, false), once(cascaded, "insert"));
 
   context->deleteObject(client);
   EXPECT_EQ(project->client(), nullptr);
-  endTurn();
   save();
-  ASSERT_TRUE(rowsOf(storePath()).contains(projectUuid));
   EXPECT_TRUE(rowsOf(storePath()).value(projectUuid).clientUuid.isEmpty());
-  undoAndSave();
+  ASSERT_TRUE(rowsOf(storePath()).contains(projectUuid));
+  save(-1);
   EXPECT_EQ(rowsOf(storePath()), before);
   const auto projectCalls = journal.callsFor(projectUuid);
   ASSERT_FALSE(projectCalls.empty());
