@@ -29,7 +29,6 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
   EXPECT_EQ(task->itemContainerForItem(makeItem<WTNote>(task, berlin(2026, 1, 1))),
             nullptr);  // not rebuilt yet
   EXPECT_TRUE(makeTask()->children().empty());
-
   // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
   WTTask* spring = makeTask();
   makeTime(spring, berlin(2026, 3, 29, 0, 30), berlin(2026, 3, 29, 0, 45));
@@ -79,18 +78,14 @@ TEST_F(WTItemContainerTest, IdentityFindsTheSameDayGroupAgainButNeverPending) {
   makeItem<WTNote>(task, berlin(2026, 4, 2, 9));
   const auto children = task->children();
   ASSERT_EQ(children.size(), 2u);
-
   const QVariantMap dayId = children[1]->uuid();
-  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId));
-  EXPECT_FALSE(WTItemContainer::isValidUUID(QStringLiteral("x")));
+  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId) && !WTItemContainer::isValidUUID(QStringLiteral("x")));
   auto again = WTItemContainer::objectWithUUID(dayId, context.get());
   ASSERT_NE(again, nullptr);
-  EXPECT_NE(again, children[1]);  // rebuilt
-  EXPECT_TRUE(again->isEqual(*children[1]));
+  EXPECT_TRUE(again != children[1] && again->isEqual(*children[1]));  // rebuilt
   EXPECT_EQ(WTItemContainer::objectWithUUID(children[0]->uuid(), context.get()), nullptr);
-  EXPECT_EQ(WTItemContainer::objectWithUUID(QVariantMap{{"date", QVariant::fromValue(berlin(2026, 4, 2))}},
-                                            context.get()),
-            nullptr);
+  const QVariantMap withoutTask{{"date", QVariant::fromValue(berlin(2026, 4, 2))}};
+  EXPECT_EQ(WTItemContainer::objectWithUUID(withoutTask, context.get()), nullptr);
 }
 
 TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
@@ -130,11 +125,10 @@ TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
 
   const auto months = WTItemContainer::containersByKeyPath("startDate.beginOfMonth", QList<WTTask*>{a, b});
   ASSERT_EQ(months.size(), 2u);
-  // February: the expense, not the note.
-  EXPECT_EQ(QList({months[0]->items().size(), months[1]->items().size(), qsizetype(months[1]->duration())}),
-            QList<qsizetype>({1, 2, 90}));
-  // A group's date is its last item's start, not the month start.
-  EXPECT_EQ(months[1]->date(), berlin(2026, 1, 15, 9));
-  EXPECT_EQ(months[1]->task(), a);
-  EXPECT_EQ(a->dailyItems().size(), 1u);
+  // February: the expense, not the note. A group's date is its last item's start, not the month start.
+  EXPECT_EQ(QList({months[0]->items().size(), months[1]->items().size(), qsizetype(months[1]->duration()),
+                   qsizetype(a->dailyItems().size())}),
+            QList<qsizetype>({1, 2, 90, 1}));
+  EXPECT_EQ(std::pair(months[1]->date(), months[1]->task()),
+            std::pair(std::optional(berlin(2026, 1, 15, 9)), a));
 }
