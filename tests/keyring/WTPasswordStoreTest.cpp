@@ -46,9 +46,9 @@ Result<QString> readNow(WTKeychain& keychain) {
 }
 
 // The password read, or the error in its place.
-QString textOf(const Result<QString>& read) {
-  return read.ok() ? read.value() : QStringLiteral("error: ") + read.error().message;
-}
+const auto textOf = [](const Result<QString>& read) {
+  return read.ok() ? read.value() : "error: " + read.error().message;
+};
 
 Location storeNow(WTPasswordStore& store, const QString& password) {
   std::optional<Location> where;
@@ -57,9 +57,9 @@ Location storeNow(WTPasswordStore& store, const QString& password) {
   return where.value_or(Location::None);
 }
 
-std::unique_ptr<WTQtKeychain> realKeychain(int timeoutMs) {
-  return std::make_unique<WTQtKeychain>(QStringLiteral("Tessal test"), timeoutMs);
-}
+const auto realKeychain = [](int timeoutMs) {
+  return std::make_unique<WTQtKeychain>("Tessal test", timeoutMs);
+};
 
 void loadNow(WTPasswordStore& store, WTPasswordStore::FilePassword filePassword = {}) {
   bool done = false;
@@ -194,9 +194,7 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
   }
 }
 
-// The real adapter where there is no session bus (a server, an SSH login): nothing is asked, so
-// neither D-Bus nor GLib tries to start a bus through a display, and the settings file is where the
-// password lives, silently.
+// Without a session bus (a server, SSH) nothing may start one through a display; the file is used silently.
 TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFileIsUsedSilently) {
   for (const QByteArray& address : {"unix:path=" + QFile::encodeName(dir.path()) + "/no-bus", QByteArray()}) {
     SCOPED_TRACE(address.toStdString());
@@ -212,14 +210,12 @@ TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFi
     QSignalSpy kept(&store, &WTPasswordStore::keptInSettingsFile);
     EXPECT_EQ(storeNow(store, kPassword), Location::SettingsFile);
     EXPECT_EQ(fileMode(), 0600);
-    EXPECT_EQ(kept.count(), 0);
-    EXPECT_TRUE(store.keychainError().isEmpty());
-    EXPECT_FALSE(defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile));
+    EXPECT_TRUE(kept.isEmpty() && store.keychainError().isEmpty() &&
+                !defaults->hasStoredValue(SettingsKeys::kSyncPasswordKeptInFile));
   }
 }
 
-// The real adapter against keyrings that misbehave, on a bus of this process's own. A row whose job
-// the service never ends holds up every later job of QtKeychain in the process, so those rows come last.
+// A job the service never ends holds up every later job of QtKeychain in the process: such rows come last.
 TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsUpTheStore) {
   using fakesecrets::FakeSecretService;
   using Answer = FakeSecretService::Answer;
@@ -250,10 +246,9 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
     EXPECT_EQ(store.password(), kPassword);
     waitUntil([&] { return done; });
     const bool inFile = where == Location::SettingsFile;
-    EXPECT_EQ(store.location(), where);
-    EXPECT_EQ(store.password(), kPassword);
-    EXPECT_EQ(fileBytes().contains("horse"), inFile);
-    EXPECT_EQ(kept.count(), inFile ? 1 : 0);
+    EXPECT_EQ(
+        std::tuple(store.location(), store.password(), fileBytes().contains("horse"), int(kept.count())),
+        std::tuple(where, kPassword, inFile, inFile ? 1 : 0));
     EXPECT_TRUE(inFile ? fileMode() == 0600 : service.secret(kKey) == kPassword.toUtf8());
     if (behaviour.prompt == Prompt::Accepted && inFile) {
       // The late answer still lands in the keyring; the store has moved on, and the file keeps its copy.
@@ -264,9 +259,8 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   }
 }
 
-// A real keyring: gnome-keyring on a session bus of its own, made for this test and gone after it. The
-// test runs itself again inside that session (the test main keeps every test off the session bus, so
-// the child is handed the address under another name).
+// gnome-keyring on a session bus of its own; the test runs itself again inside it, handed the bus by another
+// name.
 TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
   const QByteArray childBus = qgetenv("TESSAL_TEST_KEYRING_BUS");
   if (childBus.isEmpty()) {
@@ -277,23 +271,22 @@ TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
     QProcess child;
     child.setProcessChannelMode(QProcess::MergedChannels);
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    // The keyring's files go to this test's folder.
-    environment.insert(QStringLiteral("XDG_DATA_HOME"), dir.filePath(QStringLiteral("keyring-data")));
-    environment.remove(QStringLiteral("DISPLAY"));
-    environment.remove(QStringLiteral("WAYLAND_DISPLAY"));
+    environment.insert("XDG_DATA_HOME", dir.filePath("keyring-data"));  // the keyring's files
+    for (const char* display : {"DISPLAY", "WAYLAND_DISPLAY"}) environment.remove(display);
     child.setProcessEnvironment(environment);
-    const QString script = QStringLiteral(
-        "printf %s throwaway | gnome-keyring-daemon --unlock --components=secrets >/dev/null || exit 3\n"
-        "TESSAL_TEST_KEYRING_BUS=\"$DBUS_SESSION_BUS_ADDRESS\" exec \"$0\" "
-        "--gtest_filter=WTPasswordStoreTest.APasswordMakesARoundTripThroughARealKeyring");
-    child.start(runSession, {QStringLiteral("--"), QStringLiteral("sh"), QStringLiteral("-c"), script,
-                             QCoreApplication::applicationFilePath()});
+    child.start(
+        runSession,
+        {"--", "sh", "-c",
+         "printf %s throwaway | gnome-keyring-daemon --unlock --components=secrets >/dev/null || exit 3\n"
+         "TESSAL_TEST_KEYRING_BUS=\"$DBUS_SESSION_BUS_ADDRESS\" exec \"$0\" "
+         "--gtest_filter=WTPasswordStoreTest.APasswordMakesARoundTripThroughARealKeyring",
+         QCoreApplication::applicationFilePath()});
     ASSERT_TRUE(child.waitForFinished(60000));
     const QString output = QString::fromLocal8Bit(child.readAll());
-    ASSERT_EQ(child.exitCode(), 0) << output.toStdString();
     // The child really ran the round trip, not a skip.
-    EXPECT_TRUE(output.contains(QStringLiteral("[  PASSED  ] 1 test"))) << output.toStdString();
-    EXPECT_FALSE(output.contains(QStringLiteral("SKIPPED"))) << output.toStdString();
+    EXPECT_TRUE(child.exitCode() == 0 && output.contains("[  PASSED  ] 1 test") &&
+                !output.contains("SKIPPED"))
+        << output.toStdString();
     return;
   }
 
@@ -313,8 +306,7 @@ TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
 
   WTPasswordStore store(defaults.get(), realKeychain(20000));
   loadNow(store);
-  EXPECT_EQ(store.password(), kPassword);
-  EXPECT_EQ(store.location(), Location::Keychain);
+  EXPECT_EQ(std::pair(store.password(), store.location()), std::pair(kPassword, Location::Keychain));
   EXPECT_EQ(storeNow(store, QStringLiteral("battery staple")), Location::Keychain);
   EXPECT_FALSE(fileBytes().contains("staple"));
   EXPECT_EQ(textOf(readNow(secrets)), QStringLiteral("battery staple"));

@@ -11,6 +11,7 @@
 #include <map>
 #include <memory>
 #include <random>
+#include <ranges>
 #include <thread>
 
 #include <signal.h>
@@ -19,9 +20,8 @@
 
 namespace {
 
-// A SQLite VFS over the default one that, once armed (through `state`), fails the N-th write or sync of any
-// file (database, log or journal) with an I/O error, and with `persistent` every later one too, in the manner
-// of SQLite's own fault tests. Its files are the default VFS's files with those two calls replaced.
+// The default SQLite VFS, except that once armed it fails the N-th write or sync of any file with an I/O
+// error (and with `persistent` every later one too), in the manner of SQLite's own fault tests.
 namespace FaultInjectingVfs {
 enum class Operation { Write, Sync };
 struct {
@@ -32,8 +32,7 @@ struct {
 } state;
 sqlite3_vfs* base = nullptr;
 sqlite3_vfs vfs;
-// The default VFS's sets of calls (one for databases, one for their logs and journals), each with its copy
-// whose write and sync may fail.
+// The default VFS's sets of file calls, each with its copy whose write and sync may fail.
 std::pair<const sqlite3_io_methods*, sqlite3_io_methods> wrapped[4];
 const sqlite3_io_methods* baseOf(sqlite3_file* f) {
   for (const auto& [original, copy] : wrapped)
@@ -108,13 +107,12 @@ void expectSameRecords(const Records& actual, const Records& expected) {
 // Records are written with designated fields; those left out stay empty on purpose.
 #pragma GCC diagnostic ignored "-Wmissing-field-initializers"
 
-WTStoreRecord record(const QString& uuid, const QString& entity, const QString& task = {}) {
-  return {.uuid = uuid, .entity = entity, .taskUuid = task};
+WTStoreRecord record(const QString& uuid, const QString& entity, const QString& task = {},
+                     const QString& name = {}) {
+  return {.uuid = uuid, .entity = entity, .name = name, .taskUuid = task};
 }
 
-// One record of every entity, every field used somewhere, with the awkward values a store must keep:
-// a positive exponent, 38 digits, a NUL inside, dates before 1970, zero minutes (not none) and minutes
-// beyond a double's exact integers; an entity this version does not know is kept as it is.
+// Every entity and field, with awkward values: 38 digits, a NUL, dates before 1970, minutes beyond a double.
 Records sampleRecords() {
   Records records;
   // clang-format off
@@ -144,11 +142,9 @@ Records sampleRecords() {
   return records;
 }
 
-std::vector<WTStoreRecord> values(const Records& records) {
-  std::vector<WTStoreRecord> list;
-  for (const auto& entry : records) list.push_back(entry.second);
-  return list;
-}
+const auto values = [](const Records& r) {
+  return std::vector(std::views::values(r).begin(), std::views::values(r).end());
+};
 
 Records loadAll(WTStore& store, WTStore::Records which = WTStore::Records::All,
                 const QStringList& tasks = {}) {
@@ -178,7 +174,6 @@ class RawDatabase {
   void exec(const char* sql) {
     EXPECT_EQ(sqlite3_exec(db_, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
   }
-  // The first column of the first row.
   QString text(const char* sql) {
     sqlite3_stmt* statement = nullptr;
     EXPECT_EQ(sqlite3_prepare_v2(db_, sql, -1, &statement, nullptr), SQLITE_OK) << sql;
@@ -209,14 +204,12 @@ class WTStoreTest : public ::testing::Test {
     return store.ok() ? std::move(store.value()) : nullptr;
   }
 
-  // A store file holding `records`, closed again.
   void makeStore(const Records& records) {
     auto store = open();
     ASSERT_TRUE(store);
     ASSERT_TRUE(store->save(values(records), {}).ok());
   }
 
-  // The bytes of the file, its log and its journal; whether the log's index exists.
   QList<QByteArray> allBytes() const {
     QList<QByteArray> bytes;
     for (const char* suffix : {"", "-wal", "-journal"})
@@ -228,7 +221,6 @@ class WTStoreTest : public ::testing::Test {
     for (const char* suffix : {"", "-wal", "-shm", "-journal"})
       QFile::remove(path() + QLatin1StringView(suffix));
   }
-  // A refusal of the kind `code` whose message names the file.
   template <class T>
   void expectError(const Result<T>& result, int code) {
     ASSERT_FALSE(result.ok());
@@ -239,8 +231,7 @@ class WTStoreTest : public ::testing::Test {
   QTemporaryDir dir;
 };
 
-// Cleared fields must come back as none, not as their old values; an amount in the file that is not a
-// number fails the load.
+// Cleared fields come back as none, not as their old values; an amount that is not a number fails the load.
 TEST_F(WTStoreTest, EveryFieldSurvivesSavesThatReplaceWholeRecordsAndDelete) {
   Records records = sampleRecords();
   makeStore(records);
@@ -264,8 +255,8 @@ TEST_F(WTStoreTest, EveryFieldSurvivesSavesThatReplaceWholeRecordsAndDelete) {
   expectError(store->loadAll([](WTStoreRecord&&) {}), WTStore::ReadFailed);
 }
 
-// A new file is a current store in WAL mode, its folder is never made; a reader never makes a missing
-// file, and reads an empty one (made but never written) as empty and leaves it so; a writer makes it a store.
+// Nothing makes a missing folder, a reader no missing file; an empty file reads as empty and only a writer
+// changes it.
 TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
@@ -311,9 +302,7 @@ TEST_F(WTStoreTest, ASaveThatFailsHalfwayWritesNothing) {
   EXPECT_TRUE(store->save({good}, {}).ok());
 }
 
-// A version one file reads back, unchanged by a reader; only a writer migrates it. Commands that only read
-// (reports, exports) open the store beside a running application: a reader sees what the writer saved,
-// even still in its log, and cannot change it.
+// Reports open the store beside the running application: readers see what it saved and change nothing.
 TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSaved) {
   RawDatabase(path()).exec(
       "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
@@ -356,7 +345,6 @@ TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWrite
   EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
 }
 
-// Partial loads read every owner, and of the items only the running entries or those of the named tasks.
 TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
   Records records = sampleRecords();
   (records["R@WTTime"] = record("R@WTTime", "WTTime", "T1@WTTask")).running = true;
@@ -393,10 +381,9 @@ TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
 enum class Damage { Truncated, NoisyPages, GarbledLastPage };
 void damagedStore(const QString& path, Damage damage) {
   std::vector<WTStoreRecord> records;
-  for (int i = 0; i < 3000; ++i) {
-    records.push_back(record(QStringLiteral("item-%1@WTNote").arg(i), "WTNote"));
-    records.back().name = QStringLiteral("A note of some length, number %1").arg(i);
-  }
+  for (int i = 0; i < 3000; ++i)
+    records.push_back(
+        record(QStringLiteral("item-%1@WTNote").arg(i), "WTNote", {}, QStringLiteral("A note %1").arg(i)));
   ASSERT_TRUE(WTStore::open(path).value()->save(records, {}).ok());
   QByteArray bytes = fileBytes(path);
   std::mt19937 random(7);
@@ -464,21 +451,17 @@ TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
   }
 }
 
-// Whatever write or sync fails (once, or every one from the N-th on; N raised until the operation gets
-// through), a first open or a save that fails names the file, leaves no part of itself behind, and leaves a
-// file that opens again; after a failed save the same store still saves.
+// Whatever write or sync fails, a failed first open or save leaves nothing of itself and a usable store.
 TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) {
   const char* vfs = FaultInjectingVfs::name();
   ASSERT_TRUE(vfs);
   const Records committed = sampleRecords();
-  // The save under test changes, adds and deletes; enough rows to span several pages.
+  // The save under test changes, adds and deletes, on several pages.
   Records changed = committed;
   std::vector<WTStoreRecord> writes;
-  for (int i = 0; i < 200; ++i) {
-    writes.push_back(record(QStringLiteral("new-%1@WTTime").arg(i), "WTTime"));
-    writes.back().name = QStringLiteral("entry %1 ").arg(i).repeated(10);
-    writes.back().startDate = Date::fromSeconds(i);
-  }
+  for (int i = 0; i < 200; ++i)
+    writes.push_back(record(QStringLiteral("new-%1@WTTime").arg(i), "WTTime", {},
+                            QStringLiteral("entry %1 ").arg(i).repeated(10)));
   writes.push_back(committed.at("T1@WTTask"));
   writes.back().name = QStringLiteral("Renamed");
   for (const WTStoreRecord& r : writes) changed[r.uuid] = r;
@@ -490,10 +473,10 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
     const Records before = opening ? Records{} : committed;
     Records withProbe = before;
     withProbe[probe.uuid] = probe;
-    for (const auto& [operation, persistent] : {std::pair{Operation::Write, false},
-                                                {Operation::Write, true},
-                                                {Operation::Sync, false},
-                                                {Operation::Sync, true}}) {
+    // clang-format off
+    for (const auto& [operation, persistent] :
+         {std::pair{Operation::Write, false}, {Operation::Write, true}, {Operation::Sync, false}, {Operation::Sync, true}}) {
+      // clang-format on
       SCOPED_TRACE(testing::Message() << (opening ? "open" : "save") << ", sync "
                                       << (operation == Operation::Sync) << ", persistent " << persistent);
       int failures = 0;
@@ -543,9 +526,7 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
   }
 }
 
-// A process killed at random moments while it saves: the file still holds every save the process had seen
-// complete, and each save whole or not at all. Save k adds its items, deletes the extra item of save k - 1,
-// adds its own extra item and sets the counter to k, in one transaction.
+// Save k adds its items, deletes the extra item of save k - 1, adds its own and sets the counter to k.
 constexpr int kRecordsPerSave = 10;
 const QString kCounter = QStringLiteral("counter@WTTask");
 
@@ -556,10 +537,9 @@ QString itemUuid(int save, int index) {
 
 std::vector<WTStoreRecord> recordsOfSave(int save) {
   std::vector<WTStoreRecord> records;
-  for (int i = 0; i <= kRecordsPerSave; ++i) {
-    records.push_back(record(itemUuid(save, i), "WTNote", kCounter));
-    records.back().name = QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3);
-  }
+  for (int i = 0; i <= kRecordsPerSave; ++i)
+    records.push_back(record(itemUuid(save, i), "WTNote", kCounter,
+                             QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3)));
   records.push_back(record(kCounter, "WTTask"));
   records.back().position = save;
   return records;
@@ -604,10 +584,9 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
     ASSERT_TRUE(records.contains(kCounter));
     const int last = records.at(kCounter).position;
-    // Every reported save is there; at most the one in flight got in without being reported.
     ASSERT_GE(last, reported);
     ASSERT_LE(last, reported + 1);
-    // Each save whole: all items of every save up to the counter, none beyond, one extra item.
+    // Every reported save is there, at most the one in flight besides, each whole.
     ASSERT_EQ(records.size(), std::size_t(last) * kRecordsPerSave + 2);
     for (int k = 1; k <= last; ++k)
       for (int i = 0; i < kRecordsPerSave; ++i)
