@@ -101,9 +101,7 @@ TEST_P(DecimalVectorTest, AgreesWithPythonsDecimalModule) {
 INSTANTIATE_TEST_SUITE_P(Decimal, DecimalVectorTest,
                          ::testing::Values("add", "sub", "mul", "div", "parse", "cmp"));
 
-// Rounding of long numbers, arithmetic and comparison are checked against Python above; these are the
-// forms people and files write, and their plain text. Below the smallest exponent the digits round away,
-// half away from zero; a zero just takes the limit.
+// The forms people and files write; below the smallest exponent digits round away, half away from zero.
 TEST(DecimalTest, ParsesNumbersAsWrittenAndKeepsTheirExponent) {
   // clang-format off
   const std::tuple<const char*, const char*, int> cases[] = {
@@ -179,7 +177,6 @@ TEST(DecimalTest, ConvertsToDoubleAndTruncatesToInteger) {
 }
 
 // Doubles take the shortest text that reads back; variants of numbers and numeric text read as written.
-// Decimals live in variants: equal by value, ordered, written as their text.
 TEST(DecimalTest, FromDoubleAndVariants) {
   const qlonglong min = std::numeric_limits<qlonglong>::min();
   const qulonglong max = std::numeric_limits<qulonglong>::max();

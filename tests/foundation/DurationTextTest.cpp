@@ -23,8 +23,7 @@ TEST(DurationText, MinutesAsHoursAndMinutes) {
     EXPECT_EQ(DurationText::stringWithMinutes(minutes), text) << minutes;
 }
 
-// Scripts read durations leniently; what a person types is never read as another length: anything but
-// whole numbers in the user's locale is refused (-1) rather than cut, dropped or read in another locale.
+// Scripts read leniently; typed text is whole numbers in the user's locale or refused (-1), never cut.
 TEST(DurationText, DurationsAreReadLenientlyOrStrictlyInTheUsersLocale) {
   // "1:00:00" is days, hours, minutes; of more pieces the leftmost is ignored.
   // clang-format off

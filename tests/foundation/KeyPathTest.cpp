@@ -41,9 +41,9 @@ class Records {
   std::deque<Record> records_;
 };
 
-QVariant eval(const QVariant& root, const char* path) {
+const auto eval = [](const QVariant& root, const char* path) {
   return KeyPath::valueForKeyPath(root, QString::fromLatin1(path));
-}
+};
 
 // Paths run through maps, hashes and records; those nothing answers are null.
 TEST(KeyPathTest, NestedPathsThroughMapsHashesAndRecords) {
@@ -143,8 +143,7 @@ TEST(KeyPathTest, OperatorsEvaluateTheRestOfThePathOnEachElement) {
   EXPECT_EQ(eval(QVariantMap{{"a", 1}, {"b", 2}}, "@count"), QVariant(qlonglong(2)));
 }
 
-// Mixed number types compare by value and keep their own type in the result; the first of equal extremes
-// wins.
+// Mixed number types compare by value and keep their type; the first of equal extremes wins.
 TEST(KeyPathTest, MaxAndMinReturnTheElementItself) {
   Records records;
   const QVariantList numbers{3, decVar("3.5"), QVariant(), 2.75, qlonglong(-1), decVar("3.50")};
@@ -186,10 +185,7 @@ TEST(KeyPathTest, CompareValuesAcrossTypes) {
   EXPECT_LT(KeyPath::compareValues(QString("apple"), QString("Banana"), true), 0);
 }
 
-// The names of sorted records, in order.
-QStringList names(const QVariantList& values) {
-  return eval(values, "name").toStringList();
-}
+const auto names = [](const QVariantList& sorted) { return eval(sorted, "name").toStringList(); };
 
 TEST(KeyPathTest, SortIsStableAndFollowsDescriptorsInTurn) {
   Records records;

@@ -69,8 +69,7 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
   }
 }
 
-// Money typed in each locale people use here (C, en_US, de_DE, fr_FR, de_CH): the amount read, "x" for
-// refused with a reason, "_" for blank, no amount.
+// Readings in C, en_US, de_DE, fr_FR, de_CH: the amount, "x" refused with a reason, "_" blank.
 TEST(MoneyFormat, TypedAmountsAreReadStrictlyInTheUsersLocale) {
   // clang-format off
   const std::pair<const char*, const char*> rows[] = {

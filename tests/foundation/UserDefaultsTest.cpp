@@ -9,9 +9,7 @@
 
 namespace {
 
-Decimal dec(const char* text) {
-  return *Decimal::fromString(QString::fromLatin1(text));
-}
+const auto dec = [](const char* text) { return *Decimal::fromString(QString::fromLatin1(text)); };
 
 // A read value as text, with its type where that is what matters: "Decimal 12.30", "Date 42.5".
 QString described(const QVariant& value) {
@@ -60,8 +58,7 @@ TEST_F(UserDefaultsTest, StoredValuesOverrideRegisteredDefaultsUntilRemovedAndAr
   EXPECT_EQ(announced, QStringList({"WTIdleTime", "WTIdleTime", "wtInvoiceUnit", "wtInvoiceUnit"}));
 }
 
-// Decimals keep their places and dates their fractions, text that looks like a marker stays text; plain
-// numbers and booleans read back as the file's text, the same before and after reloading.
+// Decimals keep places, dates fractions; plain numbers and booleans read back as the file's text.
 TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
   const std::pair<const char*, QVariant> written[] = {
       {"WTDefaultRate", QVariant::fromValue(dec("12.30"))},
@@ -97,8 +94,7 @@ TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
   }
 }
 
-// Typed reads of text written by hand, and of registered values: as a boolean, an integer, a decimal,
-// a date and a string.
+// Text written by hand and registered values, read as boolean, integer, decimal, date and string.
 TEST_F(UserDefaultsTest, TypedReads) {
   QFile file(path());
   ASSERT_TRUE(file.open(QIODevice::WriteOnly));

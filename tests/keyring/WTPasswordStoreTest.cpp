@@ -108,9 +108,8 @@ class WTPasswordStoreTest : public ::testing::Test {
   MemoryKeychain keychain;
 };
 
-// Where the password ends up from each state of account, keychain and settings file, after storing or
-// loading it; and what the next start, with a working keychain, makes of that. A file password kept after
-// the keychain failed is never offered to the keychain again: the keyring would prompt at every start.
+// A file password kept after the keychain failed is never offered again: the keyring would prompt at each
+// start.
 TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
   // Before: an account (y/n), the keychain's and the file's password ("x" is the password, "-" none), kept in
   // the file after a failure, a file others may read, the keychain available. Actions: store x, store an
@@ -259,8 +258,7 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   }
 }
 
-// gnome-keyring on a session bus of its own; the test runs itself again inside it, handed the bus by another
-// name.
+// gnome-keyring on a bus of its own: the test runs itself again in that session.
 TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
   const QByteArray childBus = qgetenv("TESSAL_TEST_KEYRING_BUS");
   if (childBus.isEmpty()) {

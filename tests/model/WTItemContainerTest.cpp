@@ -39,8 +39,7 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
             std::pair(qsizetype(2), std::optional(berlin(2026, 3, 29))));
 }
 
-// Days and months are grouped by their dates, items without a date in one group after every day; any
-// other key groups by its values in their general order, greatest first.
+// Undated items group after every day; other keys group by their values, greatest first.
 TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirValues) {
   WTTask* task = makeTask();
   WTTime* second = makeTime(task, berlin(2026, 4, 2, 9), berlin(2026, 4, 2, 10));

@@ -25,8 +25,7 @@ TEST_F(WTMovesTest, DraggedTasksGoInTurnToThePlaceBetweenRows) {
   }
 }
 
-// A day of another task: that task, that day; "Pending" takes a to-do, opened again, and nothing else; the
-// task itself: the item keeps its date.
+// Onto a day: that task and day; onto "Pending": to-dos only, opened again; onto the task: dates kept.
 TEST_F(WTMovesTest, ATaskAdoptsItemsOntoADayOntoPendingOrKeepingTheirDates) {
   WTTask* design = makeTask(nullptr, "design");
   WTTask* build = makeTask(nullptr, "build");
@@ -43,8 +42,7 @@ TEST_F(WTMovesTest, ATaskAdoptsItemsOntoADayOntoPendingOrKeepingTheirDates) {
   EXPECT_EQ(where(note), std::pair(QString("design"), std::optional(berlin(2024, 3, 12, 9))));
 }
 
-// A completed to-do is dated then, even when completed again; opened again, or completed by the stored
-// flag alone (as sync and undo put it back), it keeps that date.
+// Completing dates a to-do once; reopening it or the stored flag alone (sync, undo) keeps that date.
 TEST_F(WTMovesTest, ACompletedToDoIsDatedThenAndOpenedAgainKeepsThatDate) {
   auto* todo = makeItem<WTToDo>(makeTask(), berlin(2024, 3, 1));
   setNow(berlin(2024, 3, 14, 16, 30));

@@ -6,17 +6,17 @@
 
 class WTObjectContextTest : public ModelTest {};
 
-// Identities name their entity; forced, an identity naming a concrete entity makes its record, nothing else
-// does. Fetches by entity name take the entity's descendants, sorted and filtered.
+// Forced, only an identity naming a concrete entity makes a record; fetches take an entity's descendants.
 TEST_F(WTObjectContextTest, IdentitiesAndFetchesByEntityName) {
   WTTask* task = makeTask();
   auto* time = makeItem<WTTime>(task, berlin(2026, 1, 1, 9));
   makeItem<WTNote>(task, berlin(2026, 1, 1));
-  EXPECT_TRUE(time->uuid().endsWith(QStringLiteral("@WTTime")) &&
-              task->uuid().endsWith(QStringLiteral("@WTTask")));
-  EXPECT_EQ(WTTime::objectWithUUID(time->uuid(), context.get()), time);
-  EXPECT_EQ(context->objectWithUUID(time->uuid()), time);
-  EXPECT_EQ(WTTask::objectWithUUID(time->uuid(), context.get()), nullptr);  // only its own entity
+  EXPECT_TRUE(time->uuid().endsWith("@WTTime") && task->uuid().endsWith("@WTTask"));
+  // A lookup by entity finds only its own entity's records.
+  EXPECT_EQ(
+      std::tuple(WTTime::objectWithUUID(time->uuid(), context.get()), context->objectWithUUID(time->uuid()),
+                 WTTask::objectWithUUID(time->uuid(), context.get())),
+      std::tuple(time, static_cast<WTObject*>(time), nullptr));
   const qsizetype before = context->count();
   for (const QVariant& refused :
        {QVariant(42), QVariant(), QVariant("ABC@WTNothing"), QVariant("ABC@WTItem")})
@@ -25,9 +25,8 @@ TEST_F(WTObjectContextTest, IdentitiesAndFetchesByEntityName) {
   EXPECT_EQ(context->count(), before);
   WTObject* made = context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true);
   ASSERT_NE(made, nullptr);
-  EXPECT_EQ(made->entity(), WTEntity::Flat);
-  EXPECT_EQ(made->uuid(), QStringLiteral("X-1@Y@WTFlat"));
-  EXPECT_EQ(context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true), made);
+  EXPECT_TRUE(made->entity() == WTEntity::Flat && made->uuid() == "X-1@Y@WTFlat" &&
+              context->objectWithUUID(QStringLiteral("X-1@Y@WTFlat"), true) == made);
 
   auto* b = WTProject::insertNewObject(context.get());
   auto* a = WTProject::insertNewObject(context.get());
@@ -136,7 +135,6 @@ TEST_F(WTObjectContextTest, UndoStepsAreTurnsAndKeepTheirNames) {
   WTTask* task = makeTask(nullptr, "before");
   context->processPendingChanges();
   EXPECT_EQ(undo.undoActionName(), "");  // nobody named it
-
   task->toggleTimer();
   context->processPendingChanges();
   EXPECT_EQ(undo.undoActionName(), "Start Timer");
@@ -173,14 +171,11 @@ TEST_F(WTObjectContextTest, UndoStepsAreTurnsAndKeepTheirNames) {
   EXPECT_EQ(changed.count(), 3);
   // A new change drops what could be redone, and says so.
   task->setNotes("n");
-  EXPECT_FALSE(undo.canRedo());
-  EXPECT_EQ(state().last(), "");
-  EXPECT_EQ(changed.count(), 4);
+  EXPECT_TRUE(!undo.canRedo() && state().last().isEmpty() && changed.count() == 4);
 
   // Undoing the first turn forgets the record it made; nothing is left to save.
   while (undo.canUndo()) undo.undo();
-  EXPECT_EQ(context->count(), 0);
-  EXPECT_FALSE(context->hasChanges());
+  EXPECT_TRUE(context->count() == 0 && !context->hasChanges());
 }
 
 TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
@@ -195,22 +190,18 @@ TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
 
   context->deleteObject(task);
   context->processPendingChanges();
-  EXPECT_EQ(project->duration(), 0);
-  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+  EXPECT_TRUE(project->duration() == 0 && context->fetch<WTTime>().isEmpty());
   context->undoManager().undo();
-  EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
-  EXPECT_EQ(project->duration(), 40);
-  EXPECT_EQ(project->cost(), dec("40"));
-  EXPECT_EQ(context->objectWithUUID(task->uuid()), task);
-  // The undone delete must not reach the file or the journal.
-  journal.calls.clear();
+  EXPECT_EQ(std::tuple(project->tasks(), project->duration(), project->cost(),
+                       context->objectWithUUID(task->uuid())),
+            std::tuple(QList<WTTask*>{task}, 40, dec("40"), static_cast<WTObject*>(task)));
+  journal.calls.clear();  // the undone delete must not reach the file or the journal
   saveAndReopen();
   EXPECT_EQ(context->fetch<WTTime>().size(), 2);
   for (const auto& call : journal.calls) EXPECT_NE(call.kind, "delete");
 }
 
-// A list that follows the store learns of a change only here: a record changed in one turn and again in
-// a later one, with no save between them, must be announced both times, and once per turn.
+// Lists follow the store through these announcements: a record changed in two turns is announced twice.
 TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItOnce) {
   QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
   WTTask* task = makeTask();
@@ -235,19 +226,16 @@ TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItOnce) {
 TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   WTTask* task = makeTask();
   auto* expense = makeItem<WTExpense>(task, berlin(2026, 1, 1));
-  EXPECT_TRUE(expense->setValue("expense", QStringLiteral("7.10")));
-  EXPECT_FALSE(expense->setValue("expense", QStringLiteral("seven")));
-  EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")));
-  EXPECT_FALSE(expense->setValue("cost", 3));
-  EXPECT_FALSE(expense->setValue("task", QStringLiteral("not a record")));
-  EXPECT_EQ(expense->task(), task);
+  EXPECT_EQ(QList<bool>({expense->setValue("expense", QStringLiteral("7.10")),
+                         expense->setValue("expense", QStringLiteral("seven")), expense->setValue("cost", 3),
+                         expense->setValue("task", QStringLiteral("not a record"))}),
+            QList<bool>({true, false, false, false}));
+  EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")) && expense->task() == task);
   EXPECT_TRUE(expense->setValue("task", QVariant()));
-  EXPECT_EQ(expense->task(), nullptr);
-  EXPECT_TRUE(task->items().isEmpty());
+  EXPECT_TRUE(expense->task() == nullptr && task->items().isEmpty());
 }
 
-// Deleting an item of an opened store first, before anything looked it up, must still remove its row; the
-// sync may take over an identity that was deleted here since the last save, and that record is kept.
+// An item deleted before any lookup still leaves the file; an identity deleted and made again is kept.
 TEST_F(WTObjectContextTest, DeletionsAndIdentitiesMadeAgain) {
   WTTask* task = makeTask();
   const QString noteId = makeItem<WTNote>(task, berlin(2026, 1, 1))->uuid();

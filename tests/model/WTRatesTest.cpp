@@ -6,8 +6,7 @@
 
 class WTRatesTest : public ModelTest {};
 
-// Rates are inherited downward; a broken chain has its own literal at each level until the user sets a
-// default rate, and a project under a client never reads the default itself: the client answers.
+// A broken chain has a literal at each level until a default rate is set; a client answers for its projects.
 TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
   const std::tuple<bool, const char*, const char*, const char*, QVariant, QStringList> rows[] = {
       // linked, rates of client, project and task, the default rate; inherited rates of task, project, client
@@ -36,9 +35,7 @@ TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
   }
 }
 
-// Each kind of item costs by its own rule in full precision (an item's own stored rate never counts), sums
-// run up from items to clients adding exact costs, and a report's memo of task totals holds while it lives,
-// nested ones included, and not a moment longer.
+// Costs in full precision (an item's own rate never counts); a report's totals memo lives no longer than it.
 TEST_F(WTRatesTest, ItemCostsAndSumsUpToClients) {
   auto* client = WTClient::insertNewObject(context.get());
   auto* projectA = WTProject::insertNewObject(context.get());
@@ -110,9 +107,7 @@ TEST_F(WTRatesTest, TimeEntriesCountMinuteBoundariesCrossed) {
     EXPECT_EQ(makeTime(task, start, end)->duration(), minutes) << start.secondsSince1970();
 }
 
-// Whatever changes a total below a client, its observers from the entry up to the client hear of it,
-// and only of what changed: the header of a project once showed an old total after an entry's start was
-// moved or a rate was undone.
+// A project's header once showed an old total after an entry's start was moved or a rate was undone.
 TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
   // A flat fee of 30 minutes, an entry from 12:00 to 12:30 and an expense without amount, at the client's
   // 100.

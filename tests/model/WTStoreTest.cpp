@@ -20,8 +20,8 @@
 
 namespace {
 
-// The default SQLite VFS, except that once armed it fails the N-th write or sync of any file with an I/O
-// error (and with `persistent` every later one too), in the manner of SQLite's own fault tests.
+// The default SQLite VFS, but once armed it fails the N-th write or sync (with `persistent`, every later
+// one).
 namespace FaultInjectingVfs {
 enum class Operation { Write, Sync };
 struct {
@@ -84,9 +84,7 @@ const char* name() {
 
 using Records = std::map<QString, WTStoreRecord>;
 
-std::optional<Decimal> decimal(const char16_t* text) {
-  return Decimal::fromString(QStringView(text));
-}
+const auto decimal = [](const char16_t* text) { return Decimal::fromString(QStringView(text)); };
 
 // Compares whole records, decimals also by representation (12.30 is not 12.3), strings also by null-ness.
 void expectSameRecords(const Records& actual, const Records& expected) {

@@ -52,8 +52,7 @@ TEST_F(WTTimerTest, StoppingKeepsAnEndDateThatIsAlreadySetAndUndoRestarts) {
   EXPECT_GE(running.count, 2);
 }
 
-// A new entry lasts nothing until told otherwise; moved to another day, an entry keeps its time of day
-// (to the minute) and its length (to the second); a note keeps its whole time.
+// A new entry lasts nothing; moved to another day an entry keeps its time of day and length, a note its time.
 TEST_F(WTTimerTest, NewEntriesAndEntriesMovedToAnotherDay) {
   WTTask* task = makeTask();
   setNow(berlin(2026, 7, 1, 9, 15, 20));
@@ -83,8 +82,7 @@ TEST_F(WTTimerTest, NewEntriesAndEntriesMovedToAnotherDay) {
   EXPECT_EQ(note->startDate(), berlin(2026, 8, 1, 23, 59, 59));
 }
 
-// A running entry grows with the clock; peek tells the entry's, the project's and its day group's
-// observers only when the minute count moved.
+// Peek tells the entry's, project's and day group's observers only when the minute count moved.
 TEST_F(WTTimerTest, ARunningEntryGrowsWithTheClockAndPeekTellsOnlyWhenTheMinuteMoved) {
   auto* project = WTProject::insertNewObject(context.get());
   WTTask* task = makeTask(project);

@@ -1,5 +1,4 @@
-// Undo and redo after the autosave already wrote the change: the store file and the change journal
-// must follow exactly as they follow the user's own delete and insert, across restarts, for every entity.
+// Undo and redo after the autosave: file and journal follow as they follow the user's own changes.
 #include "ModelFixture.h"
 
 #include <algorithm>
@@ -56,8 +55,7 @@ class WTUndoAcrossSavesTest : public UndoAcrossSaves, public ::testing::WithPara
   }
 };
 
-// Insert, rename, undo both, redo, delete, undo: each step's autosave writes the file and the journal as
-// the user's own change would, and the identity never changes.
+// Insert, rename, undo both, redo, delete, undo: each autosave as the user's own change; one identity.
 TEST_P(WTUndoAcrossSavesTest, EachUndoneOrRedoneStepReachesStoreAndJournal) {
   const WTEntity entity = GetParam();
   WTObject* owner = nullptr;
@@ -107,9 +105,7 @@ INSTANTIATE_TEST_SUITE_P(EveryEntity, WTUndoAcrossSavesTest,
                            return WTEntities::name(info.param).toStdString();
                          });
 
-// A whole project with its tasks and items, undone and redone after its save, and deleted with them
-// (a client's deletion only unlinks its projects): each record reaches file and journal, and undoing the
-// deletion brings back every record with its order and links. Both survive a restart.
+// A project deleted with its tasks and items (a client's deletion only unlinks it) comes back whole.
 TEST_F(UndoAcrossSaves, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecordAndLink) {
   auto* client = WTClient::insertNewObject(context.get());
   auto* project = WTProject::insertNewObject(context.get());
@@ -162,23 +158,21 @@ TEST_F(UndoAcrossSaves, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecor
   EXPECT_EQ(rowsOf(storePath()), before);
   const auto projectCalls = journal.callsFor(projectUuid);
   ASSERT_FALSE(projectCalls.empty());
-  EXPECT_EQ(projectCalls.back().kind, "update");
-  EXPECT_EQ(KeyPath::objectFromVariant(projectCalls.back().values.value("client")), client);
+  EXPECT_EQ(std::pair(projectCalls.back().kind,
+                      KeyPath::objectFromVariant(projectCalls.back().values.value("client"))),
+            std::pair(QString("update"), static_cast<KeyValueCoding*>(client)));
 
   openContext();
   auto* back = WTProject::objectWithUUID(projectUuid, context.get());
   ASSERT_TRUE(back && back->client() && back->tasks().size() == 2);
   EXPECT_EQ(back->client()->uuid() + back->tasks()[0]->name() + back->tasks()[1]->name(),
             clientUuid + "firstsecond");
-  QStringList itemsBack;
-  for (WTItem* item : back->tasks()[0]->items()) itemsBack.append(item->uuid());
-  std::sort(itemsBack.begin(), itemsBack.end());
-  std::sort(items.begin(), items.end());
-  EXPECT_EQ(itemsBack, items);
+  QSet<QString> itemsBack;
+  for (WTItem* item : back->tasks()[0]->items()) itemsBack.insert(item->uuid());
+  EXPECT_EQ(itemsBack, QSet<QString>(items.begin(), items.end()));
 }
 
-// A record that lost its identity is refused loudly by the save: nothing reaches the file or the
-// journal, the change stays pending, and the save goes through once the record has an identity again.
+// A record that lost its identity is refused loudly; the save goes through once it has one again.
 TEST_F(UndoAcrossSaves, ARecordWithoutIdentityIsNeverSavedOrJournaled) {
   auto* flat = WTFlat::insertNewObject(context.get());
   const QString uuid = flat->uuid();
@@ -187,9 +181,7 @@ TEST_F(UndoAcrossSaves, ARecordWithoutIdentityIsNeverSavedOrJournaled) {
   const Result<void> refused = context->save();
   ASSERT_FALSE(refused.ok());
   EXPECT_TRUE(refused.error().message.contains("WTFlat")) << refused.error().message.toStdString();
-  EXPECT_TRUE(journal.calls.empty());
-  EXPECT_TRUE(rowsOf(storePath()).isEmpty());
-  EXPECT_TRUE(context->hasChanges());
+  EXPECT_TRUE(journal.calls.empty() && rowsOf(storePath()).isEmpty() && context->hasChanges());
   flat->setUuid(uuid);
   ASSERT_TRUE(context->save().ok());
   EXPECT_TRUE(rowsOf(storePath()).contains(uuid));

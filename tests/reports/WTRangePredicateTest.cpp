@@ -40,10 +40,7 @@ class RangePredicateTest : public ModelTest {
 
 }  // namespace
 
-// Which presets take an entry (today, yesterday, this/last week, this/last month, this/last year): each
-// range includes both of its bounds, so a week's first instant lies in both weeks; weeks begin on Sunday,
-// here the night clocks went forward in Berlin; and the same instant may be 2024 in New York but 2025 in
-// Berlin.
+// Ranges include both bounds; weeks begin on Sunday; an instant may be 2024 in New York, 2025 in Berlin.
 TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
   // clang-format off
   const std::tuple<const char*, Wall, std::vector<std::pair<Wall, const char*>>> cases[] = {
@@ -66,8 +63,7 @@ TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
   }
 }
 
-// A custom range covers its end day whole; "any date" takes items without a date too; missing custom dates
-// and unknown tags give no predicate at all.
+// A custom range covers its end day; "any date" takes undated items; incomplete tags give no predicate.
 TEST_F(RangePredicateTest, CustomRangesAndAnyDate) {
   setNow(berlin(2024, 4, 2, 12));
   const Date march3 = berlin(2024, 3, 3, 15, 20);
