@@ -69,25 +69,6 @@ TEST(KeyPathTest, NestedPathsThroughMapsHashesAndRecords) {
     EXPECT_FALSE(eval(root, path).isValid()) << path;
 }
 
-TEST(KeyPathTest, PlainKeysMapOverListsKeepingNulls) {
-  Records records;
-  const QVariantList tasks{records.make({{"name", "Design"}}), records.make({}),
-                           QVariantMap{{"name", "Build"}}, QVariant(12)};
-  const QVariant names = eval(tasks, "name");
-  ASSERT_EQ(names.typeId(), QMetaType::QVariantList);
-  EXPECT_EQ(names.toList(), QVariantList({QString("Design"), QVariant(), QString("Build"), QVariant()}));
-
-  // Lists of lists map element-wise at every level.
-  const QVariantList nested{QVariantList{QVariantMap{{"a", 1}}, QVariantMap{{"a", 2}}}, QVariantList{}};
-  EXPECT_EQ(eval(nested, "a"), QVariant(QVariantList{QVariantList{1, 2}, QVariantList{}}));
-
-  // A string list answers no keys but still has a count and extremes.
-  const QStringList words{"pear", "apple", "fig"};
-  EXPECT_EQ(eval(QVariant(words), "length"), QVariant(QVariantList{QVariant(), QVariant(), QVariant()}));
-  EXPECT_EQ(eval(QVariant(words), "@count"), QVariant(qlonglong(3)));
-  EXPECT_EQ(eval(QVariant(words), "@min").toString(), "apple");
-}
-
 // Decimal sums are compared including their exponent.
 TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
   const qlonglong big = std::numeric_limits<qlonglong>::max();
@@ -121,7 +102,9 @@ TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
   }
 }
 
-TEST(KeyPathTest, OperatorsEvaluateTheRestOfThePathOnEachElement) {
+// Plain keys map over lists, nested ones too, keeping nulls; operators evaluate the rest of the path on each
+// element; a string list answers no keys but has a count and extremes; nulls count, maps count their keys.
+TEST(KeyPathTest, ListsAndOperators) {
   Records records;
   const QVariantList items{records.make({{"duration", 90}, {"cost", decVar("120")}}),
                            records.make({{"duration", 30}, {"cost", decVar("37.5")}}),
@@ -129,18 +112,23 @@ TEST(KeyPathTest, OperatorsEvaluateTheRestOfThePathOnEachElement) {
   const QVariant task = records.make({{"items", items}});
   const QVariantList tasks{task, records.make({{"items", QVariantList{}}})};
   const QVariant project = records.make({{"tasks", tasks}});
-
-  EXPECT_EQ(eval(task, "items.@sum.duration"), QVariant(qlonglong(120)));
+  const QVariantList named{records.make({{"name", "Design"}}), records.make({}),
+                           QVariantMap{{"name", "Build"}}, 12};
+  const QVariantList nested{QVariantList{QVariantMap{{"a", 1}}, QVariantMap{{"a", 2}}}, QVariantList{}};
+  const QVariant words = QStringList{"pear", "apple", "fig"};
+  // clang-format off
+  const std::tuple<QVariant, const char*, QVariant> cases[] = {
+      {named, "name", QVariantList{QString("Design"), {}, QString("Build"), {}}},
+      {nested, "a", QVariantList{QVariantList{1, 2}, QVariantList{}}},
+      {words, "length", QVariantList{{}, {}, {}}}, {words, "@count", qlonglong(3)}, {words, "@min", QString("apple")},
+      {task, "items.@sum.duration", qlonglong(120)}, {items, "@sum.duration", qlonglong(120)},
+      {project, "tasks.@sum.duration", qlonglong(0)},  // these tasks answer no duration
+      {project, "tasks.items.@count", qlonglong(2)},  // a list of two lists
+      {tasks, "@max.items.@count", qlonglong(3)}, {tasks, "@sum.items.@sum.duration", qlonglong(120)},
+      {QVariantList{1, QVariant(), 3}, "@count", qlonglong(3)}, {QVariantMap{{"a", 1}, {"b", 2}}, "@count", qlonglong(2)}};
+  // clang-format on
+  for (const auto& [root, path, expected] : cases) EXPECT_EQ(eval(root, path), expected) << path;
   EXPECT_TRUE(eval(task, "items.@sum.cost").value<Decimal>().isIdenticalTo(dec("169.80")));
-  EXPECT_EQ(eval(items, "@sum.duration"), QVariant(qlonglong(120)));
-  // These tasks answer no duration, and a sum of nothing is the integer 0.
-  EXPECT_EQ(eval(project, "tasks.@sum.duration"), QVariant(qlonglong(0)));
-  EXPECT_EQ(eval(project, "tasks.items.@count"), QVariant(qlonglong(2)));  // a list of two lists
-  EXPECT_EQ(eval(tasks, "@max.items.@count"), QVariant(qlonglong(3)));
-  EXPECT_EQ(eval(tasks, "@sum.items.@sum.duration"), QVariant(qlonglong(120)));
-  // Nulls are elements too; maps count their keys.
-  EXPECT_EQ(eval(QVariantList{1, QVariant(), 3}, "@count"), QVariant(qlonglong(3)));
-  EXPECT_EQ(eval(QVariantMap{{"a", 1}, {"b", 2}}, "@count"), QVariant(qlonglong(2)));
 }
 
 // Mixed number types compare by value and keep their type; the first of equal extremes wins.
