@@ -300,8 +300,7 @@ TEST_F(RZDateTest, ZoneChangesAndSundayWeeks) {
   EXPECT_EQ(RZDate::tomorrow(t), utc(2024, 5, 15, 4));
   for (const char* id : {"Not/AZone", "", "Europe/Atlantis", "Etc/Unknown"}) {
     EXPECT_FALSE(RZDate::setDefaultTimeZone(QString::fromLatin1(id))) << id;
-    EXPECT_EQ(defaultZoneId(), "America/New_York") << id;
-    EXPECT_EQ(RZDate::midnight(t), utc(2024, 5, 14, 4)) << id;
+    EXPECT_TRUE(defaultZoneId() == "America/New_York" && RZDate::midnight(t) == utc(2024, 5, 14, 4)) << id;
   }
   setLocale("de_DE");
   setZone("Europe/Berlin");  // the calendar is made afresh under de_DE
