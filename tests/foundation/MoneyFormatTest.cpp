@@ -55,8 +55,7 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
       SCOPED_TRACE(std::string(name) + ' ' + amount.toStdString());
       const QString written = MoneyFormat::format(*decimal, locale);
       EXPECT_EQ(written, byIcu(decimal->toString(), locale));
-      // What is shown reads back as the amount shown (to the cent), and an editor's exact text as the
-      // amount itself, with its places as written.
+      // What is shown reads back to the cent; an editor's exact text as the amount with its places.
       const std::optional<Decimal> cents =
           Decimal::fromString(byIcu(decimal->toString(), icu::Locale("en_US_POSIX")).remove(u','));
       EXPECT_EQ(MoneyFormat::parse(written, locale).value, cents) << written.toStdString();
@@ -98,7 +97,6 @@ TEST(MoneyFormat, TypedAmountsAreReadStrictlyInTheUsersLocale) {
     }
     EXPECT_EQ(read.join(' '), expected) << '"' << typed << '"';
   }
-  // The reason says how to type the amount instead.
   const UserLocale user("en_US");
   EXPECT_EQ(
       MoneyFormat::parse("75,5").refusal.toStdString(),

@@ -104,14 +104,12 @@ TEST_P(RZDateInZone, TakingFieldsFromAnotherDateAndFromComponents) {
       RZDate::dateByTakingComponents(at({2024, 1, 31, 10}), RZDate::Year | RZDate::Month, at({2023, 2, 10})),
       at({2023, 3, 3, 10}));
 
-  // Only the named fields are copied; the others are left alone.
   RZDate::DateComponents c;
   c.minute = 7;
   RZDate::assignFlags(at({2024, 5, 14, 14, 30, 15}), RZDate::Year | RZDate::Hour | RZDate::Weekday, c);
   const int unset = RZDate::DateComponents::kUnset;
   EXPECT_EQ(std::vector<int>({c.year, c.month, c.day, c.hour, c.minute, c.second}),
             std::vector<int>({2024, unset, unset, 14, 7, unset}));
-  // Components roll over and unset ones are filled.
   EXPECT_EQ(RZDate::dateFromComponents({2024, 2, 30, 25, 0, 0}), at({2024, 3, 2, 1}));
   EXPECT_EQ(RZDate::dateFromComponents({2024, 13, 0, 0, 0, 0}), at({2024, 12, 31}));
   EXPECT_EQ(RZDate::dateFromComponents({.year = 2024, .hour = 9}), at({2024, 1, 1, 9}));
@@ -161,7 +159,6 @@ TEST_P(RZDateInZone, DaysAndRangesAgreeWithTheZone) {
           {RZDate::rangeForLastYear, {start(year.addYears(-1)), start(year)}}};
       // clang-format on
       for (const auto& [range, expected] : ranges) ASSERT_EQ(range(), expected) << at;
-      // Days compare by their local day, and so does today.
       const Date lastOfYesterday = start(day).addingSeconds(-0.5), tomorrow = start(day, 1);
       ASSERT_TRUE(RZDate::isEarlierThen(lastOfYesterday, t) && RZDate::isEarlierThen(t, tomorrow)) << at;
       ASSERT_FALSE(RZDate::isEarlierThen(start(day), t) || RZDate::isEarlierThen(t, start(day))) << at;
@@ -252,7 +249,6 @@ TEST_F(RZDateTest, NumericPatternsAreWrittenAsTheFormatterWritesThem) {
       }
     }
   }
-  // A pattern first used under a locale with its own digits.
   setLocale("ar_EG");
   setZone("UTC");
   EXPECT_EQ(

@@ -91,12 +91,10 @@ class WTPasswordStoreTest : public ::testing::Test {
     QFile file(settingsPath());
     return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
   }
-  // The file's permission bits as the kernel has them, or -1 when there is no file.
   int fileMode() const {
     struct stat info {};
     return ::stat(QFile::encodeName(settingsPath()).constData(), &info) ? -1 : int(info.st_mode & 07777);
   }
-  // The settings hold a sync account and the password, not marked as kept in the file after a failure.
   void accountWithPasswordInFile() {
     defaults->setValue(kUser, QStringLiteral("ann@example.org"));
     defaults->removeValue(SettingsKeys::kSyncPasswordKeptInFile);
@@ -111,11 +109,9 @@ class WTPasswordStoreTest : public ::testing::Test {
 // A file password kept after the keychain failed is never offered again: the keyring would prompt at each
 // start.
 TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
-  // Before: an account (y/n), the keychain's and the file's password ("x" is the password, "-" none), kept in
-  // the file after a failure, a file others may read, the keychain available. Actions: store x, store an
-  // empty one ("clear"), remove it, load it, or "keep" it where it is (a command). After: the location
-  // (Keychain, SettingsFile, None), the password, the keychain's and the file's, the keychain's reads and
-  // writes, the times it was kept in the file, and the keychain's writes at the next start.
+  // Before: account (y/n), keychain's and file's password (x, -), kept in file, file open to others,
+  // keychain up. After: location, password, keychain's, file's, keychain reads and writes, times kept in
+  // the file, and keychain writes at the next start.
   // clang-format off
   const struct { const char *name, *before, *actions, *after; } rows[] = {
       {"a working keychain takes it", "y - - n n y", "store", "K x x - 0 1 0 0"},
@@ -289,7 +285,6 @@ TEST_F(WTPasswordStoreTest, APasswordMakesARoundTripThroughARealKeyring) {
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 20000);
   EXPECT_EQ(readNow(secrets).error().code, WTKeychain::EntryNotFound);
 
-  // Through the store: into the keyring, never into the file, and read back by a store of its own.
   accountWithPasswordInFile();
   {
     WTPasswordStore store(defaults.get(), realKeychain(20000));

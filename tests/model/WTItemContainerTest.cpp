@@ -51,7 +51,6 @@ TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirVal
   WTTime* laterFirst = makeTime(task, berlin(2026, 4, 1, 15), berlin(2026, 4, 1, 16));
   const QList<WTItem*> items{second, undatedFee, first, undatedExpense, laterFirst};
 
-  // The items of each group, newest first.
   const auto itemsOf = [](const auto& groups) {
     QList<QList<WTItem*>> result;
     for (const auto& group : groups) result.append(group->items());
@@ -94,7 +93,6 @@ TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
   WTItemContainer group({first}, first->startDate(), task);
   EXPECT_FALSE(group.isObserving());
   QStringList heard;
-  // Whether the group announced a new duration when `item` got `minutes`.
   const auto heardChanging = [&](WTTime* item, int minutes) {
     heard.clear();
     item->setDuration(minutes);

@@ -12,7 +12,6 @@ TEST_F(WTObjectContextTest, IdentitiesAndFetchesByEntityName) {
   auto* time = makeItem<WTTime>(task, berlin(2026, 1, 1, 9));
   makeItem<WTNote>(task, berlin(2026, 1, 1));
   EXPECT_TRUE(time->uuid().endsWith("@WTTime") && task->uuid().endsWith("@WTTask"));
-  // A lookup by entity finds only its own entity's records.
   EXPECT_EQ(
       std::tuple(WTTime::objectWithUUID(time->uuid(), context.get()), context->objectWithUUID(time->uuid()),
                  WTTask::objectWithUUID(time->uuid(), context.get())),
@@ -55,7 +54,6 @@ TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
             QStringList({"insert", "renamed before saving"}));
   EXPECT_EQ(KeyPath::objectFromVariant(inserted[0].values.value("project")), project);
   EXPECT_TRUE(inserted[0].values.contains("uuid"));
-  // The project's ordered tasks travel as an ordered relationship.
   const auto projectCalls = journal.callsFor(project->uuid());
   ASSERT_EQ(projectCalls.size(), 1u);
   EXPECT_EQ(projectCalls[0].values.value("tasks").value<WTOrderedRelationship>().objects,
@@ -169,11 +167,9 @@ TEST_F(WTObjectContextTest, UndoStepsAreTurnsAndKeepTheirNames) {
   undo.redo();
   EXPECT_EQ(state(), QStringList({"after", "-", "90", "Rename", "Typing"}));
   EXPECT_EQ(changed.count(), 3);
-  // A new change drops what could be redone, and says so.
   task->setNotes("n");
   EXPECT_TRUE(!undo.canRedo() && state().last().isEmpty() && changed.count() == 4);
 
-  // Undoing the first turn forgets the record it made; nothing is left to save.
   while (undo.canUndo()) undo.undo();
   EXPECT_TRUE(context->count() == 0 && !context->hasChanges());
 }
@@ -205,8 +201,7 @@ TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
 TEST_F(WTObjectContextTest, EachTurnAnnouncesWhatChangedInItOnce) {
   QSignalSpy spy(context.get(), &WTObjectContext::objectsDidChange);
   WTTask* task = makeTask();
-  // Renames the task (unless null) and ends the turn; the announcements so far, and the last one's
-  // inserted (0) or changed (1) records.
+  // Renames (unless null), ends the turn: announcements so far, the last one's inserted (0) or changed (1)
   const auto turn = [&](const char* name, int which) {
     if (name) task->setName(name);
     QCoreApplication::processEvents();

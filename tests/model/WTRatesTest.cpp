@@ -109,15 +109,13 @@ TEST_F(WTRatesTest, TimeEntriesCountMinuteBoundariesCrossed) {
 
 // A project's header once showed an old total after an entry's start was moved or a rate was undone.
 TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
-  // A flat fee of 30 minutes, an entry from 12:00 to 12:30 and an expense without amount, at the client's
-  // 100.
+  // A 30 minutes' fee, an entry 12:00 to 12:30 and an expense without amount, at the client's 100.
   // clang-format off
   struct Records { WTClient* client; WTProject* project; WTTask *task, *other; WTFlat* flat; WTTime* time; WTExpense* expense; };
   const auto undo = [this](Records&) { context->undoManager().undo(); };
   const auto startEarlier = [](Records& r) { r.time->setStartDate(r.time->startDate()->addingSeconds(-900)); };
   const char* const allTotals = "client.cost project.cost task.cost client.duration project.duration task.duration";
-  // Each row: what is done first, the change, the record.key announcements made (!: never made), and the
-  // client's duration, the task's duration and the client's cost afterwards.
+  // Rows: first, change, record.key announcements (!: never made), client and task minutes, client cost.
   struct Case { const char* name; std::function<void(Records&)> prepare, change; const char *announced, *after; };
   const Case cases[] = {
       {"flat fee minutes", {}, [](Records& r) { r.flat->setMinutes(45); }, allTotals, "75 75 125"},

@@ -442,7 +442,6 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
   const char* vfs = FaultInjectingVfs::name();
   ASSERT_TRUE(vfs);
   const Records committed = sampleRecords();
-  // The save under test changes, adds and deletes, on several pages.
   Records changed = committed;
   std::vector<WTStoreRecord> writes;
   for (int i = 0; i < 200; ++i)
@@ -572,7 +571,6 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     const int last = records.at(kCounter).position;
     ASSERT_GE(last, reported);
     ASSERT_LE(last, reported + 1);
-    // Every reported save is there, at most the one in flight besides, each whole.
     ASSERT_EQ(records.size(), std::size_t(last) * kRecordsPerSave + 2);
     for (int k = 1; k <= last; ++k)
       for (int i = 0; i < kRecordsPerSave; ++i)

@@ -14,7 +14,6 @@ TEST_F(WTTimerTest, StartingATimerLeavesOthersRunningUnlessAskedToStopThem) {
   WTTime* first = a->toggleTimer();
   ASSERT_NE(first, nullptr);
   EXPECT_TRUE(first->running() && !first->endDate() && first->task() == a && !a->maxTimeEndDate());
-  // The button and the table follow the running state.
   EXPECT_GE(image.count, 1);
   for (int i = 0; i < 3; ++i)
     EXPECT_NE(QStringList({a->timerButtonImage(), a->tableImage(), a->buttonTitle()})[i], idle[i]);

@@ -25,8 +25,7 @@ class UndoAcrossSaves : public ModelTest {
     const Result<void> saved = context->save();
     ASSERT_TRUE(saved.ok()) << saved.error().message.toStdString();
   }
-  // The journal's calls since the last look, for each of `uuids` (joined by "+"): their kinds, with the
-  // name where they carry one and `names` asks for it.
+  // Each of `uuids`' journal calls since the last look ("+"-joined kinds, with names if `names`).
   QString journaled(const QStringList& uuids, bool names = true) {
     QStringList each;
     for (const QString& uuid : uuids) {
@@ -43,7 +42,6 @@ class UndoAcrossSaves : public ModelTest {
 
 class WTUndoAcrossSavesTest : public UndoAcrossSaves, public ::testing::WithParamInterface<WTEntity> {
  protected:
-  // The uuid of the record's owner, as a fresh context reads it from the file; empty for none.
   QString storedOwnerOf(const QString& uuid) {
     openContext();
     WTObject* back = context->objectWithUUID(uuid);
@@ -122,7 +120,6 @@ TEST_F(UndoAcrossSaves, UndoingSavedChangesOfAProjectReachesTheStoreForEachRecor
   const QStringList cascaded =
       QStringList{project->uuid(), first->uuid(), project->tasks()[1]->uuid()} + items;
   const QString clientUuid = client->uuid(), projectUuid = project->uuid();
-  // Each record of `uuids` journaled once, as `kind`.
   const auto once = [&](const QStringList& uuids, const QString& kind) {
     return QStringList(uuids.size(), kind).join(", ");
   };

@@ -21,7 +21,6 @@ class RangePredicateTest : public ModelTest {
  protected:
   WTTime* entryAt(Date start) { return makeTime(task, start, start.addingSeconds(600)); }
 
-  // Which of the eight preset tags accept `item`, as a string of 0/1 in tag order.
   static std::string presets(const WTItem* item) {
     std::string result;
     for (int tag = WTRangePredicate::Today; tag <= WTRangePredicate::LastYear; ++tag) {

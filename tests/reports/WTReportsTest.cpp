@@ -102,12 +102,10 @@ TEST_F(ReportTest, TasksAnswerTheirItemListsAndGroupTotalsPerMode) {
   EXPECT_EQ(at(design, "valuableItems.name").toStringList(),
             QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
   EXPECT_EQ(Decimal::fromVariant(at(design, "dailyItems.@sum.cost")), dec("1414.5"));
-  // The outline's groups: the open to-do's "Pending" group first.
   const QVariantList children = at(design, "children").toList();
   ASSERT_EQ(children.size(), 5);
   EXPECT_FALSE(KeyPath::valueForKeyPath(children[0], u"date").isValid());
   EXPECT_TRUE(groups(children).starts_with("1/0/0 ")) << groups(children);
-  // The period of the valuable items: the later note and open to-do do not extend it.
   EXPECT_EQ(
       QVariantList({at(design, "firstItemDate"), at(design, "lastItemDate"),
                     at(makeTask(web, QStringLiteral("Empty")), "firstItemDate")}),
@@ -122,8 +120,7 @@ TEST_F(ReportTest, TasksAnswerTheirItemListsAndGroupTotalsPerMode) {
   EXPECT_EQ(groups(generator.filteredItemsForTask(design, 2)), "1/0/1234.5 2/120/120.0 1/60/60");
   EXPECT_EQ(groups(generator.filteredItemsForTask(design, 3)), "3/120/1354.5 1/60/60");
   EXPECT_EQ(at(design, "monthlyItems").toList().size(), 2);
-  // Day lines name their items once, or count them: two entries on 3 March; the open to-do and the note
-  // have no value and are no day's items.
+  // Day lines name their items once (the note and open to-do have no value) or count them.
   generator.setMode(2);
   const WTReport report = generator.renderText(QStringLiteral(
       "{% for project in projects %}{% for task in project.tasks %}{% for day in task.dailyItems %}"
@@ -178,7 +175,6 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
                 "\"Web \\\"Site\\\"\",\"Design\",\"60\",\"Kick \\\"off\\\"\",\"3/3/24\",\"3/3/24\",\"90\"\n"
                 "\"Web \\\"Site\\\"\",\"Design\",\"60\",\"Review\",\"3/3/24\",\"3/3/24\",\"30\"\n"));
 
-  // One project and a range: only its entries of 3 March.
   const Result<WTItemPredicate> day =
       WTRangePredicate::predicateForRangeWord(QStringLiteral("2024-03-03..2024-03-03"));
   ASSERT_TRUE(day.ok());
@@ -213,7 +209,6 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
       for (const WTReportTemplateError& error : report.errors)
         ADD_FAILURE() << error.message.toStdString() << " at line " << error.line;
       const QString& html = report.html;
-      // Subtotals, headings, totals, tables closed, and whether items are listed.
       EXPECT_EQ(
           QList({html.count("class=\"subtotal\""), html.count("<h2>"), html.count("class=\"total\""),
                  html.count("<table") - html.count("</table>"), qsizetype(html.contains("class=\"item\""))}),
@@ -221,8 +216,7 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
               {chosen.size(), chosen.size(), 1, 0, mode > 0 && chosen.size() > 0 && chosen != QList{empty}}))
           << html.toStdString();
       if (chosen.size() < 3) continue;
-      // 90 + 30 + 60 minutes at 60/h and the 1,234.50 expense; 120 + 45 + 15 minutes at 100/h. The period
-      // runs from the oldest item with a value to the newest.
+      // 90 + 30 + 60 min at 60/h + 1,234.50; 120 + 45 + 15 min at 100/h; valued items set the period.
       for (const char* text : {"1,714.50", "1,414.50", "06:00", "<h1>Smith &amp; &lt;Co&gt;</h1>",
                                "Period: 10 February 2024 – 20 March 2024", "Report date: 20 March 2024"})
         EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
