@@ -47,15 +47,14 @@ std::vector<Vector> loadVectors(const std::string& op) {
   QFile file(QStringLiteral(TESSAL_TEST_DATA_DIR "/decimal_vectors.tsv"));
   EXPECT_TRUE(file.open(QIODevice::ReadOnly | QIODevice::Text)) << file.fileName().toStdString();
   std::vector<Vector> vectors;
-  int line = 0;
-  while (!file.atEnd()) {
+  for (int line = 1; !file.atEnd(); ++line) {
     const QByteArray text = file.readLine().trimmed();
-    ++line;
     if (text.isEmpty() || text.startsWith('#')) continue;
-    std::vector<std::string> f;
-    for (const QByteArray& field : text.split('\t')) f.push_back(field.toStdString());
-    EXPECT_EQ(f.size(), 5u) << "line " << line;
-    if (f.size() == 5 && f[0] == op) vectors.push_back({line, f[0], f[1], f[2], f[3], f[4]});
+    const QList<QByteArray> f = text.split('\t');
+    EXPECT_EQ(f.size(), 5) << "line " << line;
+    if (f.size() == 5 && f[0].toStdString() == op)
+      vectors.push_back(
+          {line, op, f[1].toStdString(), f[2].toStdString(), f[3].toStdString(), f[4].toStdString()});
   }
   return vectors;
 }
@@ -102,35 +101,27 @@ TEST_P(DecimalVectorTest, AgreesWithPythonsDecimalModule) {
 INSTANTIATE_TEST_SUITE_P(Decimal, DecimalVectorTest,
                          ::testing::Values("add", "sub", "mul", "div", "parse", "cmp"));
 
-// Rounding of long numbers, arithmetic and comparison are checked against Python above; these are the
-// forms people and files write, and their plain text.
+// The forms people and files write; below the smallest exponent digits round away, half away from zero.
 TEST(DecimalTest, ParsesNumbersAsWrittenAndKeepsTheirExponent) {
   // clang-format off
-  const struct {
-    const char* text;
-    const char* plain;
-    int exponent;
-  } cases[] = {
+  const std::tuple<const char*, const char*, int> cases[] = {
       {"80", "80", 0}, {"-12.30", "-12.30", -2}, {"1e3", "1000", 3}, {"1E-5", "0.00001", -5},
       {".5", "0.5", -1}, {"5.", "5", 0}, {" 5 ", "5", 0}, {"\t42\n", "42", 0}, {"+7", "7", 0},
       {"-.5", "-0.5", -1}, {"1e+3", "1000", 3}, {"0.00", "0.00", -2}, {"-0", "0", 0}, {"007.50", "7.50", -2},
       {"12.5e-1", "1.25", -2}, {"0e5", "0", 5}, {"-0.00", "0.00", -2}, {"123.456E+1", "1234.56", -2},
-      {"5E-38", "0.00000000000000000000000000000000000005", -38}};
+      {"5E-38", "0.00000000000000000000000000000000000005", -38}, {"1E-999999", nullptr, -999999},
+      {"1e-1000037", nullptr, -1000036}, {"0e-99999999999999999999", nullptr, -1000036},
+      {"9.9999999999999999999999999999999999999E+999999", nullptr, 999962}};
   // clang-format on
-  for (const auto& c : cases) {
-    const std::optional<Decimal> value = Decimal::fromString(QString::fromUtf8(c.text));
-    ASSERT_TRUE(value.has_value()) << c.text;
-    EXPECT_EQ(value->toString(), QString::fromUtf8(c.plain)) << c.text;
-    EXPECT_EQ(value->exponent(), c.exponent) << c.text;
+  for (const auto& [text, plain, exponent] : cases) {
+    const std::optional<Decimal> value = Decimal::fromString(QString::fromUtf8(text));
+    ASSERT_TRUE(value.has_value()) << text;
+    EXPECT_EQ(std::pair(plain ? value->toString() : QString(), value->exponent()),
+              std::pair(QString::fromUtf8(plain), exponent))
+        << text;
   }
   EXPECT_EQ(Decimal(std::numeric_limits<std::int64_t>::min()).toString(), "-9223372036854775808");
-  // Below the smallest exponent the digits round away, half away from zero; a zero just takes the limit.
-  EXPECT_EQ(dec("1E-999999").exponent(), -999999);
-  EXPECT_TRUE(dec("1e-1000037").isZero());
-  EXPECT_EQ(dec("1e-1000037").exponent(), -1000036);
-  EXPECT_FALSE(dec("5e-1000037").isZero());
-  EXPECT_EQ(dec("0e-99999999999999999999").exponent(), -1000036);
-  EXPECT_EQ(dec("9.9999999999999999999999999999999999999E+999999").exponent(), 999962);
+  EXPECT_TRUE(dec("1e-1000037").isZero() && !dec("5e-1000037").isZero());
   // clang-format off
   for (const char* text : {"", "   ", "abc", "1.2.3", "--1", "+-1", "1e", "1e+", "e5", ".", "-", "+", "NaN",
                            "nan", "Infinity", "inf", "-Infinity", "1 000", "1,5", "0x10", "1e5.5", "1_000",
@@ -144,29 +135,24 @@ TEST(DecimalTest, ComparesValuesAcrossScalesAndSigns) {
   EXPECT_EQ(dec("-0"), Decimal());
   EXPECT_TRUE(dec("-0.00").isIdenticalTo(dec("0.00")));
   EXPECT_NE(dec("12.3"), dec("12.300000000000000000000000000000000001"));
-  const char* ascending[] = {"-1.1E+38",  "-1E+3",
-                             "-999.99",   "-12.31",
-                             "-12.3",     "-0.001",
-                             "0",         "1E-999999",
-                             "1E-40",     "0.01",
-                             "0.1",       "12.3",
-                             "12.300001", "99.999999999999999999999999999999999999",
-                             "100",       "1E+38",
-                             "1.1E+38"};
+  // clang-format off
+  const char* ascending[] = {"-1.1E+38", "-1E+3", "-999.99", "-12.31", "-12.3", "-0.001", "0", "1E-999999", "1E-40",
+                             "0.01", "0.1", "12.3", "12.300001", "99.999999999999999999999999999999999999", "100",
+                             "1E+38", "1.1E+38"};
+  // clang-format on
   const int count = int(std::size(ascending));
   for (int i = 0; i < count; ++i)
     for (int j = 0; j < count; ++j)
       EXPECT_EQ(dec(ascending[i]) <=> dec(ascending[j]), i <=> j) << ascending[i] << " vs " << ascending[j];
 }
 
+// Results beyond the largest value saturate, the other end fades to zero; negation makes no negative zero.
 TEST(DecimalTest, ResultsBeyondTheLargestValueSaturateAndNegationMakesNoNegativeZero) {
-  const Decimal largest = dec("9.9999999999999999999999999999999999999E+999999");
-  EXPECT_TRUE((largest + largest).isIdenticalTo(largest));
-  EXPECT_TRUE((-largest * Decimal(10)).isIdenticalTo(-largest));
-  EXPECT_TRUE(Decimal::divide(largest, dec("0.1")).value().isIdenticalTo(largest));
-  const Decimal tiny = dec("1E-999999");  // the other end fades to zero
-  EXPECT_TRUE((tiny * tiny).isZero());
-  EXPECT_EQ((tiny * tiny).exponent(), -1000036);
+  const Decimal largest = dec("9.9999999999999999999999999999999999999E+999999"), tiny = dec("1E-999999");
+  for (const Decimal& result :
+       {largest + largest, -(-largest * Decimal(10)), Decimal::divide(largest, dec("0.1")).value()})
+    EXPECT_TRUE(result.isIdenticalTo(largest)) << result.toString().toStdString();
+  EXPECT_TRUE((tiny * tiny).isIdenticalTo(dec("0E-1000036")));
   EXPECT_TRUE((-dec("12.30")).isIdenticalTo(dec("-12.30")));
   EXPECT_FALSE((-dec("-12.30")).isNegative());
   EXPECT_EQ((-dec("0.00")).toString(), QStringLiteral("0.00"));
@@ -191,7 +177,7 @@ TEST(DecimalTest, ConvertsToDoubleAndTruncatesToInteger) {
 }
 
 // Doubles take the shortest text that reads back; variants of numbers and numeric text read as written.
-TEST(DecimalTest, FromDoubleAndFromVariant) {
+TEST(DecimalTest, FromDoubleAndVariants) {
   const qlonglong min = std::numeric_limits<qlonglong>::min();
   const qulonglong max = std::numeric_limits<qulonglong>::max();
   // clang-format off
@@ -206,26 +192,21 @@ TEST(DecimalTest, FromDoubleAndFromVariant) {
     const std::optional<Decimal> value = Decimal::fromVariant(variant);
     ASSERT_TRUE(value.has_value()) << plain;
     EXPECT_EQ(value->toString(), QString::fromLatin1(plain));
-    if (variant.typeId() == QMetaType::Double) {
-      EXPECT_EQ(Decimal::fromDouble(variant.toDouble()), value) << plain;
-    }
+    EXPECT_TRUE(variant.typeId() != QMetaType::Double || Decimal::fromDouble(variant.toDouble()) == value)
+        << plain;
   }
   EXPECT_EQ(Decimal::fromDouble(5e-324)->exponent(), -324);
   for (double none : {std::nan(""), HUGE_VAL, -HUGE_VAL}) EXPECT_FALSE(Decimal::fromDouble(none).has_value());
   for (const QVariant& none : {QVariant(), QVariant(QStringLiteral("abc")), QVariant(QString()),
                                QVariant(QDate(2026, 3, 2)), QVariant(std::nan(""))})
     EXPECT_FALSE(Decimal::fromVariant(none).has_value()) << none.toString().toStdString();
-}
 
-TEST(DecimalTest, LivesInQVariants) {
   const QVariant a = QVariant::fromValue(dec("12.30"));
   EXPECT_EQ(a.value<Decimal>().exponent(), -2);
   EXPECT_EQ(a, QVariant::fromValue(dec("12.3")));
-  EXPECT_NE(a, QVariant::fromValue(dec("12.31")));
   EXPECT_EQ(QVariant::compare(a, QVariant::fromValue(dec("12.31"))), QPartialOrdering::Less);
   EXPECT_NE(a, QVariant(12.3));  // different types are never equal, and comparing them is safe
-  EXPECT_EQ(a.toString(), QStringLiteral("12.30"));
-  EXPECT_EQ(a.toDouble(), 12.3);
+  EXPECT_EQ(std::pair(a.toString(), a.toDouble()), std::pair(QStringLiteral("12.30"), 12.3));
   EXPECT_EQ(QMetaType::fromName("Decimal"), QMetaType::fromType<Decimal>());
   QString text;
   QDebug(&text) << dec("-0.5");

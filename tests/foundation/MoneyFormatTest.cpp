@@ -16,7 +16,8 @@ namespace {
 // What ICU's own formatter writes for "#,##0.00", half away from zero, in `locale`.
 QString byIcu(const QString& plain, const icu::Locale& locale) {
   UErrorCode status = U_ZERO_ERROR;
-  icu::DecimalFormat format(icu::UnicodeString(u"#,##0.00"), icu::DecimalFormatSymbols(locale, status), status);
+  icu::DecimalFormat format(icu::UnicodeString(u"#,##0.00"), icu::DecimalFormatSymbols(locale, status),
+                            status);
   format.setRoundingMode(icu::DecimalFormat::kRoundHalfUp);
   const QByteArray digits = plain.toLatin1();
   icu::UnicodeString text;
@@ -29,10 +30,11 @@ QString byIcu(const QString& plain, const icu::Locale& locale) {
 // character: ties and carries at the second place, grouping (also where a locale groups only from five
 // digits), locales with other signs, other digits or another minus, and negative amounts.
 TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
-  std::vector<QString> amounts = {"0",        "0.004",       "0.005",         "0.125",     "0.1249999",
-                                  "9.995",    "999.995",     "999999.999",    "1234",      "12345.675",
-                                  "1000",     "100000.5",    "1234567890123.455", "7E+3", "-0.001",
-                                  "-1234.565", "-9.995",      "0.00000000001", "1.2"};
+  // clang-format off
+  std::vector<QString> amounts = {"0", "0.004", "0.005", "0.125", "0.1249999", "9.995", "999.995", "999999.999", "1234",
+                                  "12345.675", "1000", "100000.5", "1234567890123.455", "7E+3", "-0.001", "-1234.565",
+                                  "-9.995", "0.00000000001", "1.2"};
+  // clang-format on
   std::mt19937_64 random(3);
   for (int i = 0; i < 300; ++i) {
     const long long coefficient = std::uniform_int_distribution<long long>(0, 99999999999LL)(random);
@@ -50,84 +52,51 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
     for (const QString& amount : amounts) {
       const std::optional<Decimal> decimal = Decimal::fromString(amount);
       ASSERT_TRUE(decimal) << amount.toStdString();
+      SCOPED_TRACE(std::string(name) + ' ' + amount.toStdString());
       const QString written = MoneyFormat::format(*decimal, locale);
-      EXPECT_EQ(written, byIcu(decimal->toString(), locale)) << name << ' ' << amount.toStdString();
-      // What is shown reads back as the amount shown (to the cent), and an editor's exact text as the
-      // amount itself, with its places as written.
+      EXPECT_EQ(written, byIcu(decimal->toString(), locale));
+      // What is shown reads back to the cent; an editor's exact text as the amount with its places.
       const std::optional<Decimal> cents =
           Decimal::fromString(byIcu(decimal->toString(), icu::Locale("en_US_POSIX")).remove(u','));
-      EXPECT_EQ(MoneyFormat::parse(written, locale).value, cents) << name << ' ' << written.toStdString();
+      EXPECT_EQ(MoneyFormat::parse(written, locale).value, cents) << written.toStdString();
       const TypedNumber::Reading exact =
           TypedNumber::read(TypedNumber::editableText(*decimal, locale), locale);
-      ASSERT_TRUE(exact.value) << name << ' ' << amount.toStdString();
-      EXPECT_EQ(*exact.value, *decimal) << name << ' ' << amount.toStdString();
-      EXPECT_EQ(exact.value->exponent(), std::min(decimal->exponent(), 0))
-          << name << ' ' << amount.toStdString();
+      ASSERT_TRUE(exact.value);
+      EXPECT_TRUE(*exact.value == *decimal && exact.value->exponent() == std::min(decimal->exponent(), 0))
+          << exact.value->toString().toStdString();
     }
   }
 }
 
-// Money typed in each locale people use here. "x": refused with a reason; "": blank, no amount.
+// Readings in C, en_US, de_DE, fr_FR, de_CH: the amount, "x" refused with a reason, "_" blank.
 TEST(MoneyFormat, TypedAmountsAreReadStrictlyInTheUsersLocale) {
-  struct Row {
-    const char* typed;
-    std::array<const char*, std::size(UserLocale::kNames)> read;  // C, en_US, de_DE, fr_FR, de_CH
-  };
-  const Row rows[] = {
-      {"75,5", {"x", "x", "75.5", "75.5", "x"}},
-      {"75.5", {"75.5", "75.5", "x", "x", "75.5"}},
-      {"12,50", {"x", "x", "12.50", "12.50", "x"}},
-      {"1,250.00", {"1250", "1250", "x", "x", "x"}},
-      {"1.250,00", {"x", "x", "1250", "x", "x"}},
-      {"1\u202F250,00", {"x", "x", "x", "1250", "x"}},
-      {"1\u00A0250,00", {"x", "x", "x", "1250", "x"}},
-      {"1 250,00", {"x", "x", "x", "1250", "x"}},
-      {"1\u2019250.50", {"x", "x", "x", "x", "1250.5"}},
-      {"1'250.50", {"x", "x", "x", "x", "1250.5"}},
-      {"1,000", {"1000", "1000", "1", "1", "x"}},
-      {"1.000", {"1", "1", "1000", "x", "1"}},
-      {"1,2345", {"x", "x", "1.2345", "1.2345", "x"}},
-      {"12,34,567", {"x", "x", "x", "x", "x"}},
-      {"1.234.567,5", {"x", "x", "1234567.5", "x", "x"}},
-      {"1,234.5,6", {"x", "x", "x", "x", "x"}},
-      {"1,,000", {"x", "x", "x", "x", "x"}},
-      {",100", {"x", "x", "0.1", "0.1", "x"}},
-      {".5", {"0.5", "0.5", "x", "x", "0.5"}},
-      {"-12.5", {"-12.5", "-12.5", "x", "x", "-12.5"}},
-      {"\u22125", {"-5", "-5", "-5", "-5", "-5"}},
-      {" 80 ", {"80", "80", "80", "80", "80"}},
-      {"  ", {"", "", "", "", ""}},
-      {"$80", {"80", "80", "x", "x", "x"}},
-      {"80 \u20AC", {"x", "x", "80", "80", "x"}},
-      {"CHF 1\u2019250.50", {"x", "x", "x", "x", "1250.5"}},
-      {"\u20AC", {"x", "x", "x", "x", "x"}},
-      {"abc", {"x", "x", "x", "x", "x"}},
-      {"12abc", {"x", "x", "x", "x", "x"}},
-      {"1e3", {"x", "x", "x", "x", "x"}},
-      {"-", {"x", "x", "x", "x", "x"}},
-      {"+5", {"x", "x", "x", "x", "x"}},
+  // clang-format off
+  const std::pair<const char*, const char*> rows[] = {
+      {"75,5", "x x 75.5 75.5 x"}, {"75.5", "75.5 75.5 x x 75.5"}, {"12,50", "x x 12.5 12.5 x"},
+      {"1,250.00", "1250 1250 x x x"}, {"1.250,00", "x x 1250 x x"}, {"1\u202F250,00", "x x x 1250 x"},
+      {"1\u00A0250,00", "x x x 1250 x"}, {"1 250,00", "x x x 1250 x"}, {"1\u2019250.50", "x x x x 1250.5"},
+      {"1'250.50", "x x x x 1250.5"}, {"1,000", "1000 1000 1 1 x"}, {"1.000", "1 1 1000 x 1"},
+      {"1,2345", "x x 1.2345 1.2345 x"}, {"12,34,567", "x x x x x"}, {"1.234.567,5", "x x 1234567.5 x x"},
+      {"1,234.5,6", "x x x x x"}, {"1,,000", "x x x x x"}, {",100", "x x 0.1 0.1 x"}, {".5", "0.5 0.5 x x 0.5"},
+      {"-12.5", "-12.5 -12.5 x x -12.5"}, {"\u22125", "-5 -5 -5 -5 -5"}, {" 80 ", "80 80 80 80 80"},
+      {"  ", "_ _ _ _ _"}, {"$80", "80 80 x x x"}, {"80 \u20AC", "x x 80 80 x"},
+      {"CHF 1\u2019250.50", "x x x x 1250.5"}, {"\u20AC", "x x x x x"}, {"abc", "x x x x x"},
+      {"12abc", "x x x x x"}, {"1e3", "x x x x x"}, {"-", "x x x x x"}, {"+5", "x x x x x"},
       // One digit more than a Decimal keeps would be rounded away.
-      {"1234567890123456789012345678901234567.89", {"x", "x", "x", "x", "x"}},
-  };
-  for (const Row& row : rows) {
-    for (std::size_t at = 0; at < std::size(UserLocale::kNames); ++at) {
-      const UserLocale user(UserLocale::kNames[at]);
-      const QString typed = QString::fromUtf8(row.typed);
-      const std::string where = std::string(UserLocale::kNames[at]) + " \"" + row.typed + '"';
-      const TypedNumber::Reading reading = MoneyFormat::parse(typed);
-      const std::string expected = row.read[at];
-      if (expected == "x") {
-        EXPECT_FALSE(reading.taken()) << where;
-        EXPECT_FALSE(reading.value) << where;
-      } else {
-        EXPECT_TRUE(reading.taken()) << where << ": " << reading.refusal.toStdString();
-        EXPECT_EQ(reading.value,
-                  expected.empty() ? std::nullopt : Decimal::fromString(QString::fromStdString(expected)))
-            << where;
-      }
+      {"1234567890123456789012345678901234567.89", "x x x x x"}};
+  // clang-format on
+  for (const auto& [typed, expected] : rows) {
+    QStringList read;
+    for (const char* name : UserLocale::kNames) {
+      const UserLocale user(name);
+      const TypedNumber::Reading reading = MoneyFormat::parse(QString::fromUtf8(typed));
+      EXPECT_EQ(reading.taken(), reading.refusal.isEmpty()) << name << " \"" << typed << '"';
+      read << (!reading.taken() ? (reading.value ? "?" : "x")
+               : reading.value  ? QString::number(reading.value->toDouble(), 'g', 15)
+                                : "_");
     }
+    EXPECT_EQ(read.join(' '), expected) << '"' << typed << '"';
   }
-  // The reason says how to type the amount instead.
   const UserLocale user("en_US");
   EXPECT_EQ(
       MoneyFormat::parse("75,5").refusal.toStdString(),

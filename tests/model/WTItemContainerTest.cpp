@@ -29,7 +29,6 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
   EXPECT_EQ(task->itemContainerForItem(makeItem<WTNote>(task, berlin(2026, 1, 1))),
             nullptr);  // not rebuilt yet
   EXPECT_TRUE(makeTask()->children().empty());
-
   // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
   WTTask* spring = makeTask();
   makeTime(spring, berlin(2026, 3, 29, 0, 30), berlin(2026, 3, 29, 0, 45));
@@ -40,8 +39,7 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
             std::pair(qsizetype(2), std::optional(berlin(2026, 3, 29))));
 }
 
-// Days and months are grouped by their dates, items without a date in one group after every day; any
-// other key groups by its values in their general order, greatest first.
+// Undated items group after every day; other keys group by their values, greatest first.
 TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirValues) {
   WTTask* task = makeTask();
   WTTime* second = makeTime(task, berlin(2026, 4, 2, 9), berlin(2026, 4, 2, 10));
@@ -53,7 +51,6 @@ TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirVal
   WTTime* laterFirst = makeTime(task, berlin(2026, 4, 1, 15), berlin(2026, 4, 1, 16));
   const QList<WTItem*> items{second, undatedFee, first, undatedExpense, laterFirst};
 
-  // The items of each group, newest first.
   const auto itemsOf = [](const auto& groups) {
     QList<QList<WTItem*>> result;
     for (const auto& group : groups) result.append(group->items());
@@ -79,18 +76,14 @@ TEST_F(WTItemContainerTest, IdentityFindsTheSameDayGroupAgainButNeverPending) {
   makeItem<WTNote>(task, berlin(2026, 4, 2, 9));
   const auto children = task->children();
   ASSERT_EQ(children.size(), 2u);
-
   const QVariantMap dayId = children[1]->uuid();
-  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId));
-  EXPECT_FALSE(WTItemContainer::isValidUUID(QStringLiteral("x")));
+  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId) && !WTItemContainer::isValidUUID(QStringLiteral("x")));
   auto again = WTItemContainer::objectWithUUID(dayId, context.get());
   ASSERT_NE(again, nullptr);
-  EXPECT_NE(again, children[1]);  // rebuilt
-  EXPECT_TRUE(again->isEqual(*children[1]));
+  EXPECT_TRUE(again != children[1] && again->isEqual(*children[1]));  // rebuilt
   EXPECT_EQ(WTItemContainer::objectWithUUID(children[0]->uuid(), context.get()), nullptr);
-  EXPECT_EQ(WTItemContainer::objectWithUUID(QVariantMap{{"date", QVariant::fromValue(berlin(2026, 4, 2))}},
-                                            context.get()),
-            nullptr);
+  const QVariantMap withoutTask{{"date", QVariant::fromValue(berlin(2026, 4, 2))}};
+  EXPECT_EQ(WTItemContainer::objectWithUUID(withoutTask, context.get()), nullptr);
 }
 
 TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
@@ -100,7 +93,6 @@ TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
   WTItemContainer group({first}, first->startDate(), task);
   EXPECT_FALSE(group.isObserving());
   QStringList heard;
-  // Whether the group announced a new duration when `item` got `minutes`.
   const auto heardChanging = [&](WTTime* item, int minutes) {
     heard.clear();
     item->setDuration(minutes);
@@ -130,11 +122,10 @@ TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
 
   const auto months = WTItemContainer::containersByKeyPath("startDate.beginOfMonth", QList<WTTask*>{a, b});
   ASSERT_EQ(months.size(), 2u);
-  // February: the expense, not the note.
-  EXPECT_EQ(QList({months[0]->items().size(), months[1]->items().size(), qsizetype(months[1]->duration())}),
-            QList<qsizetype>({1, 2, 90}));
-  // A group's date is its last item's start, not the month start.
-  EXPECT_EQ(months[1]->date(), berlin(2026, 1, 15, 9));
-  EXPECT_EQ(months[1]->task(), a);
-  EXPECT_EQ(a->dailyItems().size(), 1u);
+  // February: the expense, not the note. A group's date is its last item's start, not the month start.
+  EXPECT_EQ(QList({months[0]->items().size(), months[1]->items().size(), qsizetype(months[1]->duration()),
+                   qsizetype(a->dailyItems().size())}),
+            QList<qsizetype>({1, 2, 90, 1}));
+  EXPECT_EQ(std::pair(months[1]->date(), months[1]->task()),
+            std::pair(std::optional(berlin(2026, 1, 15, 9)), a));
 }

@@ -11,6 +11,7 @@
 #include <map>
 #include <memory>
 #include <random>
+#include <ranges>
 #include <thread>
 
 #include <signal.h>
@@ -19,9 +20,8 @@
 
 namespace {
 
-// A SQLite VFS over the default one that, once armed (through `state`), fails the N-th write or sync of any
-// file (database, log or journal) with an I/O error, and with `persistent` every later one too, in the manner
-// of SQLite's own fault tests. Its files are the default VFS's files with those two calls replaced.
+// The default SQLite VFS, but once armed it fails the N-th write or sync (with `persistent`, every later
+// one).
 namespace FaultInjectingVfs {
 enum class Operation { Write, Sync };
 struct {
@@ -32,22 +32,16 @@ struct {
 } state;
 sqlite3_vfs* base = nullptr;
 sqlite3_vfs vfs;
-// The default VFS's sets of calls (one for databases, one for their logs and journals), each with its copy
-// whose write and sync may fail.
-struct Wrapped {
-  const sqlite3_io_methods* base = nullptr;
-  sqlite3_io_methods methods;
-} wrapped[4];
-
+// The default VFS's sets of file calls, each with its copy whose write and sync may fail.
+std::pair<const sqlite3_io_methods*, sqlite3_io_methods> wrapped[4];
 const sqlite3_io_methods* baseOf(sqlite3_file* f) {
-  for (const Wrapped& w : wrapped)
-    if (&w.methods == f->pMethods) return w.base;
+  for (const auto& [original, copy] : wrapped)
+    if (&copy == f->pMethods) return original;
   return nullptr;
 }
 bool shouldFail(Operation kind) {
   if (!state.armed || state.kind != kind) return false;
-  if (state.fired) return state.persistent;
-  return state.fired = --state.remaining <= 0;
+  return state.fired ? state.persistent : (state.fired = --state.remaining <= 0);
 }
 int xWrite(sqlite3_file* f, const void* buffer, int amount, sqlite3_int64 offset) {
   return shouldFail(Operation::Write) ? SQLITE_IOERR_WRITE : baseOf(f)->xWrite(f, buffer, amount, offset);
@@ -58,15 +52,15 @@ int xSync(sqlite3_file* f, int flags) {
 int xOpen(sqlite3_vfs*, sqlite3_filename name, sqlite3_file* file, int flags, int* outFlags) {
   const int code = base->xOpen(base, name, file, flags, outFlags);
   if (code != SQLITE_OK || !file->pMethods) return code;
-  for (Wrapped& w : wrapped) {
-    if (!w.base) {
-      w.base = file->pMethods;
-      w.methods = *w.base;
-      w.methods.xWrite = xWrite;
-      w.methods.xSync = xSync;
+  for (auto& [original, copy] : wrapped) {
+    if (!original) {
+      original = file->pMethods;
+      copy = *original;
+      copy.xWrite = xWrite;
+      copy.xSync = xSync;
     }
-    if (w.base == file->pMethods) {
-      file->pMethods = &w.methods;
+    if (original == file->pMethods) {
+      file->pMethods = &copy;
       return SQLITE_OK;
     }
   }
@@ -90,50 +84,33 @@ const char* name() {
 
 using Records = std::map<QString, WTStoreRecord>;
 
-std::optional<Decimal> decimal(const char16_t* text) {
-  return Decimal::fromString(QStringView(text));
-}
+const auto decimal = [](const char16_t* text) { return Decimal::fromString(QStringView(text)); };
 
 // Compares whole records, decimals also by representation (12.30 is not 12.3), strings also by null-ness.
 void expectSameRecords(const Records& actual, const Records& expected) {
   ASSERT_EQ(actual.size(), expected.size());
   for (const auto& [uuid, want] : expected) {
-    const auto found = actual.find(uuid);
-    ASSERT_NE(found, actual.end()) << uuid.toStdString();
-    const WTStoreRecord& got = found->second;
-    EXPECT_TRUE(got == want) << uuid.toStdString();
-    for (auto field : {&WTStoreRecord::rate, &WTStoreRecord::budget, &WTStoreRecord::expense}) {
-      ASSERT_EQ((got.*field).has_value(), (want.*field).has_value()) << uuid.toStdString();
-      if (want.*field) {
-        EXPECT_TRUE((got.*field)->isIdenticalTo(*(want.*field))) << uuid.toStdString();
-      }
-    }
+    SCOPED_TRACE(uuid.toStdString());
+    ASSERT_TRUE(actual.contains(uuid));
+    const WTStoreRecord& got = actual.at(uuid);
+    EXPECT_TRUE(got == want);
+    for (auto field : {&WTStoreRecord::rate, &WTStoreRecord::budget, &WTStoreRecord::expense})
+      EXPECT_TRUE(want.*field ? got.*field && (got.*field)->isIdenticalTo(*(want.*field)) : !(got.*field));
     for (auto field : {&WTStoreRecord::name, &WTStoreRecord::notes, &WTStoreRecord::color,
                        &WTStoreRecord::addressBookUID, &WTStoreRecord::clientUuid, &WTStoreRecord::taskUuid})
-      EXPECT_EQ((got.*field).isNull(), (want.*field).isNull()) << uuid.toStdString();
+      EXPECT_EQ((got.*field).isNull(), (want.*field).isNull());
   }
-}
-
-WTStoreRecord record(const QString& uuid, const QString& entity, const QString& task = {}) {
-  WTStoreRecord r;
-  r.uuid = uuid;
-  r.entity = entity;
-  r.taskUuid = task;
-  return r;
-}
-
-bool isOwner(const WTStoreRecord& r) {
-  return r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask";
 }
 
 // Records are written with designated fields; those left out stay empty on purpose.
 #pragma GCC diagnostic ignored "-Wmissing-field-initializers"
 
-const QString kEmpty = QString(QLatin1StringView(""));  // empty, not none
+WTStoreRecord record(const QString& uuid, const QString& entity, const QString& task = {},
+                     const QString& name = {}) {
+  return {.uuid = uuid, .entity = entity, .name = name, .taskUuid = task};
+}
 
-// One record of every entity, every field used somewhere, with the awkward values a store must keep:
-// a positive exponent, 38 digits, a NUL inside, dates before 1970, zero minutes (not none) and minutes
-// beyond a double's exact integers; an entity this version does not know is kept as it is.
+// Every entity and field, with awkward values: 38 digits, a NUL, dates before 1970, minutes beyond a double.
 Records sampleRecords() {
   Records records;
   // clang-format off
@@ -141,9 +118,9 @@ Records sampleRecords() {
            WTStoreRecord{.uuid = "C1@WTClient", .entity = "WTClient", .name = "Müller & Söhne ☕ 日本",
                          .notes = "line one\nline two\ttab, \"quoted\"", .rate = decimal(u"85.50"),
                          .color = "#80ff0000", .archived = true, .addressBookUID = "AB-1:ABPerson",
-                         .totalsUID = kEmpty},
-           {.uuid = "P1@WTProject", .entity = "WTProject", .name = kEmpty, .rate = decimal(u"1E+3"),
-            .clientUuid = "C1@WTClient"},
+                         .totalsUID = QString(QLatin1StringView(""))},
+           {.uuid = "P1@WTProject", .entity = "WTProject", .name = QString(QLatin1StringView("")),
+            .rate = decimal(u"1E+3"), .clientUuid = "C1@WTClient"},
            {.uuid = "T1@WTTask", .entity = "WTTask", .name = "Design", .rate = decimal(u"0.00"),
             .projectUuid = "P1@WTProject", .position = 3,
             .budget = decimal(u"12345678901234567890123456789012345678")},
@@ -154,8 +131,7 @@ Records sampleRecords() {
             .startDate = Date::fromSeconds(-86400.5), .minutes = 0},
            {.uuid = "I3@WTExpense", .entity = "WTExpense", .rate = decimal(u"0.0000000000000000000001"),
             .taskUuid = "T1@WTTask", .startDate = Date::fromSeconds(0), .expense = decimal(u"-12.30")},
-           {.uuid = "I4@WTNote", .entity = "WTNote", .notes = QString(20000, QChar(u'é')),
-            .taskUuid = "T1@WTTask"},
+           {.uuid = "I4@WTNote", .entity = "WTNote", .notes = QString(20000, QChar(u'é')), .taskUuid = "T1@WTTask"},
            {.uuid = "I5@WTToDo", .entity = "WTToDo", .name = "Call back", .position = -1,
             .minutes = 9007199254740993LL, .completed = true},
            {.uuid = "X1@WTFuture", .entity = "WTFuture"}})
@@ -164,11 +140,9 @@ Records sampleRecords() {
   return records;
 }
 
-std::vector<WTStoreRecord> values(const Records& records) {
-  std::vector<WTStoreRecord> list;
-  for (const auto& entry : records) list.push_back(entry.second);
-  return list;
-}
+const auto values = [](const Records& r) {
+  return std::vector(std::views::values(r).begin(), std::views::values(r).end());
+};
 
 Records loadAll(WTStore& store, WTStore::Records which = WTStore::Records::All,
                 const QStringList& tasks = {}) {
@@ -193,32 +167,30 @@ void writeFile(const QString& path, const QByteArray& bytes) {
 // Plain sqlite3 on a file, as another program would see it.
 class RawDatabase {
  public:
-  explicit RawDatabase(const QString& path) {
-    EXPECT_EQ(sqlite3_open(QFile::encodeName(path).constData(), &db_), SQLITE_OK);
-  }
+  explicit RawDatabase(const QString& path) { sqlite3_open(QFile::encodeName(path).constData(), &db_); }
   ~RawDatabase() { sqlite3_close(db_); }
   void exec(const char* sql) {
-    char* message = nullptr;
-    EXPECT_EQ(sqlite3_exec(db_, sql, nullptr, nullptr, &message), SQLITE_OK)
-        << (message ? message : "") << sql;
-    sqlite3_free(message);
+    EXPECT_EQ(sqlite3_exec(db_, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
   }
   QString text(const char* sql) {
     sqlite3_stmt* statement = nullptr;
-    QString result;
     EXPECT_EQ(sqlite3_prepare_v2(db_, sql, -1, &statement, nullptr), SQLITE_OK) << sql;
+    QString result;
     if (sqlite3_step(statement) == SQLITE_ROW)
-      result = QString::fromUtf8(reinterpret_cast<const char*>(sqlite3_column_text(statement, 0)));
+      result = QString::fromUtf8((const char*)sqlite3_column_text(statement, 0));
     sqlite3_finalize(statement);
     return result;
   }
-  sqlite3* handle() const { return db_; }
-
- private:
   sqlite3* db_ = nullptr;
 };
 
-const char* const kSuffixes[] = {"", "-wal", "-shm", "-journal"};
+// The version, the journal mode, the records and the indexes of a store file.
+QStringList shape(const QString& path) {
+  RawDatabase raw(path);
+  return {raw.text("PRAGMA user_version"), raw.text("PRAGMA journal_mode"),
+          raw.text("SELECT count(*) FROM records"),
+          raw.text("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name LIKE 'records_%'")};
+}
 
 class WTStoreTest : public ::testing::Test {
  protected:
@@ -230,14 +202,12 @@ class WTStoreTest : public ::testing::Test {
     return store.ok() ? std::move(store.value()) : nullptr;
   }
 
-  // A store file holding `records`, closed again.
   void makeStore(const Records& records) {
     auto store = open();
     ASSERT_TRUE(store);
     ASSERT_TRUE(store->save(values(records), {}).ok());
   }
 
-  // The bytes of the file, its log and its journal; whether the log's index exists.
   QList<QByteArray> allBytes() const {
     QList<QByteArray> bytes;
     for (const char* suffix : {"", "-wal", "-journal"})
@@ -246,22 +216,35 @@ class WTStoreTest : public ::testing::Test {
     return bytes;
   }
   void removeFiles() const {
-    for (const char* suffix : kSuffixes) QFile::remove(path() + QLatin1StringView(suffix));
+    for (const char* suffix : {"", "-wal", "-shm", "-journal"})
+      QFile::remove(path() + QLatin1StringView(suffix));
+  }
+  template <class T>
+  void expectError(const Result<T>& result, int code) {
+    ASSERT_FALSE(result.ok());
+    EXPECT_EQ(result.error().code, code);
+    EXPECT_TRUE(result.error().message.contains(path())) << result.error().message.toStdString();
   }
 
   QTemporaryDir dir;
 };
 
+// Cleared fields come back as none, not as their old values; an amount that is not a number fails the load.
 TEST_F(WTStoreTest, EveryFieldSurvivesSavesThatReplaceWholeRecordsAndDelete) {
   Records records = sampleRecords();
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
   expectSameRecords(loadAll(*store), records);
-
-  // Cleared fields must come back as none, not as their old values.
-  WTStoreRecord cleared = record("C1@WTClient", "WTClient");
-  cleared.name = QStringLiteral("Renamed");
+  // A row needs its identity: a save holding a row or a deletion without one writes nothing of itself.
+  const WTStoreRecord good = record("good@WTNote", "WTNote");
+  for (const auto& [writes, deletes] :
+       {std::pair{std::vector{good, record({}, "WTNote")}, QStringList{"I1@WTTime"}},
+        std::pair{std::vector{good}, QStringList{QString()}}}) {
+    expectError(store->save(writes, deletes), WTStore::WriteFailed);
+    expectSameRecords(loadAll(*store), records);
+  }
+  WTStoreRecord cleared = record("C1@WTClient", "WTClient", {}, "Renamed");
   const WTStoreRecord added = record("I9@WTNote", "WTNote", "T1@WTTask");
   ASSERT_TRUE(store->save({cleared, added}, {"I3@WTExpense", "never@WTTime"}).ok());
   records[cleared.uuid] = cleared;
@@ -272,45 +255,41 @@ TEST_F(WTStoreTest, EveryFieldSurvivesSavesThatReplaceWholeRecordsAndDelete) {
   ASSERT_TRUE(store = open());
   expectSameRecords(loadAll(*store), records);
   EXPECT_TRUE(store->save({}, {}).ok());
+  RawDatabase(path()).exec("UPDATE records SET budget = '12,50' WHERE uuid = 'T1@WTTask'");
+  expectError(store->loadAll([](WTStoreRecord&&) {}), WTStore::ReadFailed);
 }
 
-TEST_F(WTStoreTest, ANewFileIsACurrentStoreInWalModeButItsFolderIsNeverMade) {
+// Nothing makes a missing folder, a reader no missing file; an empty file reads as empty and only a writer
+// changes it.
+TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
     EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
-  RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA user_version"), "3");
-  EXPECT_EQ(raw.text("PRAGMA journal_mode"), "wal");
-  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), "0");
-
+  EXPECT_EQ(shape(path()), QStringList({"3", "wal", "0", "3"}));
   const QString folder = dir.filePath(QStringLiteral("Tessal2"));
-  auto store = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
-  ASSERT_FALSE(store.ok());
-  EXPECT_EQ(store.error().code, WTStore::OpenFailed);
-  EXPECT_TRUE(store.error().message.contains(folder)) << store.error().message.toStdString();
-  EXPECT_FALSE(QFileInfo::exists(folder));
-}
+  auto inMissingFolder = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
+  ASSERT_FALSE(inMissingFolder.ok());
+  EXPECT_TRUE(inMissingFolder.error().code == WTStore::OpenFailed &&
+              inMissingFolder.error().message.contains(folder) && !QFileInfo::exists(folder));
 
-// A row needs its identity: a save holding a row or a deletion without one writes nothing of itself.
-TEST_F(WTStoreTest, ASaveThatFailsHalfwayWritesNothing) {
-  const Records records = sampleRecords();
-  makeStore(records);
+  removeFiles();
+  expectError(WTStore::openReadOnly(path()), WTStore::OpenFailed);
+  EXPECT_FALSE(QFileInfo::exists(path()));
+  writeFile(path(), QByteArray());
+  auto empty = WTStore::openReadOnly(path());
+  ASSERT_TRUE(empty) << empty.error().message.toStdString();
+  EXPECT_TRUE(loadAll(*empty.value()).empty());
+  EXPECT_FALSE(empty.value()->save({record("x@WTNote", "WTNote")}, {}).ok());
+  empty.value().reset();
+  EXPECT_TRUE(fileBytes(path()).isEmpty());
   auto store = open();
   ASSERT_TRUE(store);
-  const WTStoreRecord good = record("good@WTNote", "WTNote");
-  for (const auto& [writes, deletes] :
-       {std::pair{std::vector{good, record({}, "WTNote")}, QStringList{"I1@WTTime"}},
-        std::pair{std::vector{good}, QStringList{QString()}}}) {
-    const Result<void> saved = store->save(writes, deletes);
-    ASSERT_FALSE(saved.ok());
-    EXPECT_EQ(saved.error().code, WTStore::WriteFailed);
-    EXPECT_TRUE(saved.error().message.contains(path())) << saved.error().message.toStdString();
-    expectSameRecords(loadAll(*store), records);
-  }
-  EXPECT_TRUE(store->save({good}, {}).ok());
+  EXPECT_TRUE(store->path() == path() && loadAll(*store).empty());
+  EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
 }
 
-TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBackAndIsMigratedOnlyByAWriter) {
+// Reports open the store beside the running application: readers see what it saved and change nothing.
+TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSaved) {
   RawDatabase(path()).exec(
       "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
       " rate TEXT, color TEXT, archived INTEGER NOT NULL DEFAULT 0, addressBookUID TEXT, totalsUID TEXT,"
@@ -323,14 +302,13 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBackAndIsMigratedOnlyByAWrit
       "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
       " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
   // clang-format off
-  const Records expected = {
+  Records expected = {
       {"C@WTClient", {.uuid = "C@WTClient", .entity = "WTClient", .name = "Acme", .rate = decimal(u"80.00"),
                       .color = "#ff112233", .archived = true}},
       {"F@WTFlat", {.uuid = "F@WTFlat", .entity = "WTFlat", .taskUuid = "T@WTTask",
                     .startDate = Date::fromSeconds(1700000000.5), .minutes = 90, .expense = decimal(u"-0.10"),
                     .completed = true}}};
   // clang-format on
-
   const QByteArray before = fileBytes(path());
   {
     auto reader = WTStore::openReadOnly(path());
@@ -338,25 +316,24 @@ TEST_F(WTStoreTest, AVersionOneFileWrittenBySqlReadsBackAndIsMigratedOnlyByAWrit
     expectSameRecords(loadAll(*reader.value()), expected);
   }
   EXPECT_EQ(fileBytes(path()), before);
+  auto writer = open();
+  ASSERT_TRUE(writer);
+  expectSameRecords(loadAll(*writer), expected);
+  const WTStoreRecord added = record("N@WTNote", "WTNote", "C@WTClient");
+  ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
+  expected[added.uuid] = added;
+  EXPECT_EQ(shape(path()), QStringList({"3", "wal", "3", "3"}));
 
-  auto store = open();
-  ASSERT_TRUE(store);
-  expectSameRecords(loadAll(*store), expected);
-  ASSERT_TRUE(store->save({record("N@WTNote", "WTNote")}, {}).ok());
-  store.reset();
-  RawDatabase raw(path());
-  EXPECT_EQ(raw.text("PRAGMA journal_mode"), "wal");
-  EXPECT_EQ(raw.text("PRAGMA user_version"), "3");
-  EXPECT_EQ(raw.text("SELECT count(*) FROM records"), "3");
-  EXPECT_EQ(raw.text("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name LIKE 'records_%'"),
-            "3");
+  auto reader = WTStore::openReadOnly(path());
+  ASSERT_TRUE(reader) << reader.error().message.toStdString();
+  expectSameRecords(loadAll(*reader.value()), expected);
+  expectError(reader.value()->save({record("x@WTNote", "WTNote")}, {}), WTStore::WriteFailed);
+  EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
 }
 
-// Partial loads read every owner, and of the items only the running entries or those of the named tasks.
 TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
   Records records = sampleRecords();
-  WTStoreRecord& running = records["R@WTTime"] = record("R@WTTime", "WTTime", "T1@WTTask");
-  running.running = true;
+  (records["R@WTTime"] = record("R@WTTime", "WTTime", "T1@WTTask")).running = true;
   // Tasks whose uuids hold what JSON must escape still find their items.
   const QString quoted = QStringLiteral("T\"quoted\\@WTTask");
   for (const QString& task : {quoted, QStringLiteral("T9@WTTask")}) {
@@ -367,40 +344,41 @@ TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
   auto store = open();
   ASSERT_TRUE(store);
   using Pick = std::function<bool(const WTStoreRecord&)>;
-  const struct {
-    WTStore::Records which;
-    QStringList tasks;
-    Pick item;
-  } cases[] = {
-      // clang-format off
-      {WTStore::Records::Timers, {"T1@WTTask"}, [](const WTStoreRecord& r) { return r.running; }},
-      {WTStore::Records::ItemsOfTasks, {"T1@WTTask", quoted},
-       [&](const WTStoreRecord& r) { return r.taskUuid == u"T1@WTTask" || r.taskUuid == quoted; }},
-      // The statement is used again: the next load's tasks replace the last one's.
-      {WTStore::Records::ItemsOfTasks, {}, [](const WTStoreRecord&) { return false; }},
-      {WTStore::Records::ItemsOfTasks, {quoted},
-       [&](const WTStoreRecord& r) { return r.taskUuid == quoted; }},
-      // clang-format on
+  const auto ofTasks = [](QStringList tasks) -> Pick {
+    return [=](auto& r) { return tasks.contains(r.taskUuid); };
   };
-  for (const auto& c : cases) {
+  // The statement is used again: the next load's tasks replace the last one's.
+  const std::tuple<WTStore::Records, QStringList, Pick> cases[] = {
+      {WTStore::Records::Timers, {"T1@WTTask"}, [](const WTStoreRecord& r) { return r.running; }},
+      {WTStore::Records::ItemsOfTasks, {"T1@WTTask", quoted}, ofTasks({"T1@WTTask", quoted})},
+      {WTStore::Records::ItemsOfTasks, {}, ofTasks({})},
+      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})}};
+  for (const auto& [which, tasks, item] : cases) {
     Records expected;
-    for (const auto& [uuid, stored] : records)
-      if (isOwner(stored) || c.item(stored)) expected[uuid] = stored;
+    for (const auto& [uuid, r] : records)
+      if (r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask" || item(r))
+        expected[uuid] = r;
     ASSERT_LT(expected.size(), records.size());
-    expectSameRecords(loadAll(*store, c.which, c.tasks), expected);
+    expectSameRecords(loadAll(*store, which, tasks), expected);
   }
 }
 
-// A real store with enough rows for several levels of pages.
-void makeLargeStore(const QString& path) {
+// A real store with enough rows for several levels of pages, damaged.
+enum class Damage { Truncated, NoisyPages, GarbledLastPage };
+void damagedStore(const QString& path, Damage damage) {
   std::vector<WTStoreRecord> records;
-  for (int i = 0; i < 3000; ++i) {
-    records.push_back(record(QStringLiteral("item-%1@WTNote").arg(i), "WTNote"));
-    records.back().name = QStringLiteral("A note of some length, number %1").arg(i);
-  }
-  auto store = WTStore::open(path);
-  ASSERT_TRUE(store.ok());
-  ASSERT_TRUE(store.value()->save(records, {}).ok());
+  for (int i = 0; i < 3000; ++i)
+    records.push_back(
+        record(QStringLiteral("item-%1@WTNote").arg(i), "WTNote", {}, QStringLiteral("A note %1").arg(i)));
+  ASSERT_TRUE(WTStore::open(path).value()->save(records, {}).ok());
+  QByteArray bytes = fileBytes(path);
+  std::mt19937 random(7);
+  if (damage == Damage::Truncated) bytes.truncate(bytes.size() / 2);
+  // Every page but the first (the header and schema) gets noise in its middle.
+  for (qsizetype page = 4096; damage == Damage::NoisyPages && page < bytes.size(); page += 4096)
+    for (int i = 1000; i < 1200; ++i) bytes[page + i] = char(random());
+  if (damage == Damage::GarbledLastPage) bytes.replace(bytes.size() - 4096, 4096, QByteArray(4096, 0x5a));
+  writeFile(path, bytes);
 }
 
 void newerVersion(const QString& path, bool wal) {
@@ -412,83 +390,57 @@ void newerVersion(const QString& path, bool wal) {
       "PRAGMA application_id = 1416852332; PRAGMA user_version = 99;");
 }
 
-const char kNotAStore[] = "The file “%1” is not a Tessal data file and cannot be opened.";
-const char kNewer[] = "The data file “%1” was written by a newer version of Tessal and cannot be opened.";
-const char kDamaged[] = "The data file “%1” is damaged and cannot be opened.";
-
 // Files that must be refused by writers and readers alike, and left exactly as they were, log included.
-const struct RefusedFile {
-  const char* name;
-  std::function<void(const QString& path)> make;
-  int code;
-  const char* message;  // %1 is the path
-} kRefusedFiles[] = {
-    // clang-format off
-    {"a text file", [](const QString& p) { writeFile(p, QByteArray("Not a database.\n").repeated(300)); },
-     WTStore::NotAStore, kNotAStore},
-    {"another program's database", [](const QString& p) { RawDatabase(p).exec("CREATE TABLE songs (t)"); },
-     WTStore::NotAStore, kNotAStore},
-    {"another program's database with a version",
-     [](const QString& p) { RawDatabase(p).exec("CREATE TABLE records (uuid); PRAGMA user_version = 1;"); },
-     WTStore::NotAStore, kNotAStore},
-    {"a newer version", [](const QString& p) { newerVersion(p, false); }, WTStore::NewerVersion, kNewer},
-    {"a newer version in WAL mode", [](const QString& p) { newerVersion(p, true); }, WTStore::NewerVersion,
-     kNewer},
-    {"a newer version only its log knows about", [](const QString& p) {
-       RawDatabase raw(p);
-       raw.exec("CREATE TABLE records (uuid TEXT PRIMARY KEY); PRAGMA application_id = 1416852332;"
-                "PRAGMA user_version = 1; PRAGMA journal_mode = WAL;");
-       // The newer version's changes are still in the log when it stops.
-       raw.exec("PRAGMA user_version = 99; INSERT INTO records VALUES ('a@WTClient')");
-       ASSERT_EQ(sqlite3_db_config(raw.handle(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr), SQLITE_OK);
-     }, WTStore::NewerVersion, kNewer},
-    {"a truncated store", [](const QString& p) {
-       makeLargeStore(p);
-       writeFile(p, fileBytes(p).left(fileBytes(p).size() / 2));
-     }, WTStore::Damaged, kDamaged},
-    {"a store with garbled pages", [](const QString& p) {
-       makeLargeStore(p);
-       QByteArray bytes = fileBytes(p);
-       std::mt19937 random(7);
-       // Every page but the first (the header and schema) gets noise in its middle.
-       for (qsizetype page = 4096; page < bytes.size(); page += 4096)
-         for (int i = 1000; i < 1200; ++i) bytes[page + i] = char(random());
-       writeFile(p, bytes);
-     }, WTStore::Damaged, kDamaged},
-    {"a store whose last page is garbled", [](const QString& p) {
-       makeLargeStore(p);
-       QByteArray bytes = fileBytes(p);
-       for (qsizetype i = bytes.size() - 4096; i < bytes.size(); ++i) bytes[i] = char(0x5a);
-       writeFile(p, bytes);
-     }, WTStore::Damaged, kDamaged},
-    // clang-format on
-};
-
 TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
+  const std::map<int, const char*> messages = {
+      {WTStore::NotAStore, "The file “%1” is not a Tessal data file and cannot be opened."},
+      {WTStore::NewerVersion,
+       "The data file “%1” was written by a newer version of Tessal and cannot be opened."},
+      {WTStore::Damaged, "The data file “%1” is damaged and cannot be opened."}};
+  using Make = std::function<void(const QString& path)>;
+  const std::tuple<const char*, Make, int> files[] = {
+      // clang-format off
+      {"a text file", [](auto& p) { writeFile(p, QByteArray("Not a database.\n").repeated(300)); }, WTStore::NotAStore},
+      {"another program's database", [](auto& p) { RawDatabase(p).exec("CREATE TABLE songs (t)"); }, WTStore::NotAStore},
+      {"another program's database with a version",
+       [](auto& p) { RawDatabase(p).exec("CREATE TABLE records (uuid); PRAGMA user_version = 1;"); }, WTStore::NotAStore},
+      {"a newer version", [](auto& p) { newerVersion(p, false); }, WTStore::NewerVersion},
+      {"a newer version in WAL mode", [](auto& p) { newerVersion(p, true); }, WTStore::NewerVersion},
+      {"a newer version only its log knows about", [](auto& p) {
+         RawDatabase raw(p);
+         raw.exec("CREATE TABLE records (uuid TEXT PRIMARY KEY); PRAGMA application_id = 1416852332;"
+                  "PRAGMA user_version = 1; PRAGMA journal_mode = WAL;");
+         // The newer version's changes are still in the log when it stops.
+         raw.exec("PRAGMA user_version = 99; INSERT INTO records VALUES ('a@WTClient')");
+         ASSERT_EQ(sqlite3_db_config(raw.db_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr), SQLITE_OK);
+       }, WTStore::NewerVersion},
+      {"a truncated store", [](auto& p) { damagedStore(p, Damage::Truncated); }, WTStore::Damaged},
+      {"a store with garbled pages", [](auto& p) { damagedStore(p, Damage::NoisyPages); }, WTStore::Damaged},
+      {"a store whose last page is garbled", [](auto& p) { damagedStore(p, Damage::GarbledLastPage); }, WTStore::Damaged},
+      // clang-format on
+  };
   enum Way { Writing, Reading, CheckingBesideTheLoading };
-  for (const RefusedFile& refused : kRefusedFiles) {
+  for (const auto& [name, make, code] : files) {
     for (Way way : {Writing, Reading, CheckingBesideTheLoading}) {
       const bool readOnly = way == Reading;
-      SCOPED_TRACE(std::string(refused.name) + " " + std::to_string(way));
+      SCOPED_TRACE(std::string(name) + " " + std::to_string(way));
       removeFiles();
-      refused.make(path());
+      make(path());
       const QList<QByteArray> before = allBytes();
       ASSERT_FALSE(before[0].isEmpty());
-      auto store = readOnly ? WTStore::openReadOnly(path())
-                   : way == Writing
-                       ? WTStore::open(path())
-                       : WTStore::open(path(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      auto store = readOnly          ? WTStore::openReadOnly(path())
+                   : way == Writing ? WTStore::open(path())
+                                    : WTStore::open(path(), nullptr, WTStore::Check::WholeFileBeforeSaving);
       if (store && way == CheckingBesideTheLoading) {
         // Damage that loading does not meet is found by the check, at the latest by the first save.
         const Result<void> saved = store.value()->save({record("x@WTNote", "WTNote")}, {});
         ASSERT_FALSE(saved.ok());
-        EXPECT_EQ(saved.error().code, refused.code);
-        EXPECT_TRUE(saved.error().message.contains(path()));
+        EXPECT_EQ(saved.error().code, code);
         store.value().reset();
       } else {
         ASSERT_FALSE(store.ok());
-        EXPECT_EQ(store.error().code, refused.code);
-        EXPECT_EQ(store.error().message, QString::fromUtf8(refused.message).arg(path()));
+        EXPECT_EQ(store.error().code, code);
+        EXPECT_EQ(store.error().message, QString::fromUtf8(messages.at(code)).arg(path()));
       }
       QList<QByteArray> after = allBytes();
       if (readOnly) after.back() = before.back();  // a reader may leave the log's index behind
@@ -497,101 +449,33 @@ TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
   }
 }
 
-// An empty file (made but never written) is a store without records: a writer makes it one, a reader
-// reads it as empty and leaves it so; a missing file is never made by a reader.
-TEST_F(WTStoreTest, EmptyAndMissingFiles) {
-  auto missing = WTStore::openReadOnly(path());
-  ASSERT_FALSE(missing.ok());
-  EXPECT_EQ(missing.error().code, WTStore::OpenFailed);
-  EXPECT_TRUE(missing.error().message.contains(path()));
-  EXPECT_FALSE(QFileInfo::exists(path()));
-
-  writeFile(path(), QByteArray());
-  auto empty = WTStore::openReadOnly(path());
-  ASSERT_TRUE(empty) << empty.error().message.toStdString();
-  EXPECT_TRUE(loadAll(*empty.value()).empty());
-  EXPECT_FALSE(empty.value()->save({record("x@WTNote", "WTNote")}, {}).ok());
-  empty.value().reset();
-  EXPECT_TRUE(fileBytes(path()).isEmpty());
-
-  auto store = open();
-  ASSERT_TRUE(store);
-  EXPECT_EQ(store->path(), path());
-  EXPECT_TRUE(loadAll(*store).empty());
-  EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
-}
-
-TEST_F(WTStoreTest, AnAmountThatIsNotANumberFailsTheLoad) {
-  makeStore(sampleRecords());
-  RawDatabase(path()).exec("UPDATE records SET budget = '12,50' WHERE uuid = 'T1@WTTask'");
-  auto store = open();
-  ASSERT_TRUE(store);
-  const Result<void> loaded = store->loadAll([](WTStoreRecord&&) {});
-  ASSERT_FALSE(loaded.ok());
-  EXPECT_EQ(loaded.error().code, WTStore::ReadFailed);
-  EXPECT_TRUE(loaded.error().message.contains(path()));
-}
-
-// Commands that only read (reports, exports) open the store beside a running application that writes it.
-TEST_F(WTStoreTest, AReaderSeesWhatAWriterSavedAndCannotChangeIt) {
-  const Records records = sampleRecords();
-  makeStore(records);
-  auto writer = open();
-  ASSERT_TRUE(writer);
-  const WTStoreRecord added = record("late@WTNote", "WTNote", "T1@WTTask");
-  ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
-
-  auto reader = WTStore::openReadOnly(path());
-  ASSERT_TRUE(reader) << reader.error().message.toStdString();
-  Records expected = records;
-  expected[added.uuid] = added;
-  expectSameRecords(loadAll(*reader.value()), expected);
-  const Result<void> refused = reader.value()->save({record("x@WTNote", "WTNote")}, {});
-  ASSERT_FALSE(refused.ok());
-  EXPECT_EQ(refused.error().code, WTStore::WriteFailed);
-  EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
-}
-
-// ---- Fault loops: fail the N-th write or sync, raise N until the operation gets through.
-
-const struct FaultKind {
-  FaultInjectingVfs::Operation operation;
-  bool persistent;
-  const char* name;
-} kFaultKinds[] = {
-    {FaultInjectingVfs::Operation::Write, false, "one failed write"},
-    {FaultInjectingVfs::Operation::Write, true, "every write from the N-th on"},
-    {FaultInjectingVfs::Operation::Sync, false, "one failed sync"},
-    {FaultInjectingVfs::Operation::Sync, true, "every sync from the N-th on"},
-};
-
-// Whatever write or sync fails, a first open or a save that fails names the file, leaves no part of
-// itself behind, and leaves a file that opens again; after a failed save the same store still saves.
+// Whatever write or sync fails, a failed first open or save leaves nothing of itself and a usable store.
 TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) {
   const char* vfs = FaultInjectingVfs::name();
   ASSERT_TRUE(vfs);
   const Records committed = sampleRecords();
-  // The save under test changes, adds and deletes; enough rows to span several pages.
   Records changed = committed;
   std::vector<WTStoreRecord> writes;
-  for (int i = 0; i < 200; ++i) {
-    writes.push_back(record(QStringLiteral("new-%1@WTTime").arg(i), "WTTime"));
-    writes.back().name = QStringLiteral("entry %1 ").arg(i).repeated(10);
-    writes.back().startDate = Date::fromSeconds(i);
-  }
+  for (int i = 0; i < 200; ++i)
+    writes.push_back(record(QStringLiteral("new-%1@WTTime").arg(i), "WTTime", {},
+                            QStringLiteral("entry %1 ").arg(i).repeated(10)));
   writes.push_back(committed.at("T1@WTTask"));
   writes.back().name = QStringLiteral("Renamed");
   for (const WTStoreRecord& r : writes) changed[r.uuid] = r;
   const QStringList deletes = {"I1@WTTime", "C1@WTClient"};
   for (const QString& uuid : deletes) changed.erase(uuid);
   const WTStoreRecord probe = record("probe@WTNote", "WTNote");
-
+  using Operation = FaultInjectingVfs::Operation;
   for (bool opening : {true, false}) {
     const Records before = opening ? Records{} : committed;
     Records withProbe = before;
     withProbe[probe.uuid] = probe;
-    for (const FaultKind& kind : kFaultKinds) {
-      SCOPED_TRACE(std::string(opening ? "open, " : "save, ") + kind.name);
+    // clang-format off
+    for (const auto& [operation, persistent] :
+         {std::pair{Operation::Write, false}, {Operation::Write, true}, {Operation::Sync, false}, {Operation::Sync, true}}) {
+      // clang-format on
+      SCOPED_TRACE(testing::Message() << (opening ? "open" : "save") << ", sync "
+                                      << (operation == Operation::Sync) << ", persistent " << persistent);
       int failures = 0;
       for (int n = 1;; ++n) {
         SCOPED_TRACE(n);
@@ -602,15 +486,11 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
           makeStore(committed);
           ASSERT_TRUE(store = open(vfs));
         }
-        FaultInjectingVfs::state = {true, kind.operation, n, kind.persistent, false};
+        FaultInjectingVfs::state = {true, operation, n, persistent, false};
         std::optional<Error> error;
         if (opening) {
           auto opened = WTStore::open(path(), vfs);
-          if (opened) {
-            store = std::move(opened.value());
-          } else {
-            error = opened.error();
-          }
+          opened ? void(store = std::move(opened.value())) : void(error = opened.error());
         } else if (const Result<void> saved = store->save(writes, deletes); !saved) {
           error = saved.error();
         }
@@ -633,7 +513,6 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
         }
         expectSameRecords(loadAll(*store), before);
         ASSERT_TRUE(store->save({probe}, {}).ok());
-        expectSameRecords(loadAll(*store), withProbe);
         store.reset();
         EXPECT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
         ASSERT_TRUE(store = open());
@@ -644,10 +523,7 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
   }
 }
 
-// ---- A process killed at random moments while it saves: the file still holds every save the process
-// had seen complete, and each save whole or not at all.
-
-constexpr int kRounds = 50;
+// Save k adds its items, deletes the extra item of save k - 1, adds its own and sets the counter to k.
 constexpr int kRecordsPerSave = 10;
 const QString kCounter = QStringLiteral("counter@WTTask");
 
@@ -656,40 +532,24 @@ QString itemUuid(int save, int index) {
                                  : QStringLiteral("extra-%1@WTNote").arg(save);
 }
 
-// Save k adds its items, deletes the extra item of save k - 1, adds its own extra item and sets the counter
-// to k: one transaction, so either all of it shows or none.
 std::vector<WTStoreRecord> recordsOfSave(int save) {
   std::vector<WTStoreRecord> records;
-  for (int i = 0; i <= kRecordsPerSave; ++i) {
-    records.push_back(record(itemUuid(save, i), "WTNote", kCounter));
-    records.back().name = QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3);
-  }
+  for (int i = 0; i <= kRecordsPerSave; ++i)
+    records.push_back(record(itemUuid(save, i), "WTNote", kCounter,
+                             QStringLiteral("Save %1, item %2. ").arg(save).arg(i).repeated(3)));
   records.push_back(record(kCounter, "WTTask"));
   records.back().position = save;
   return records;
 }
 
-// The child: saves from `first` on until killed, reporting each completed save's number on `pipe`.
-[[noreturn]] void saveUntilKilled(const QString& path, int first, int pipe) {
-  auto store = WTStore::open(path);
-  if (!store) _exit(2);
-  for (int save = first;; ++save) {
-    if (!store.value()->save(recordsOfSave(save), {itemUuid(save - 1, kRecordsPerSave)})) _exit(3);
-    if (write(pipe, &save, sizeof save) != sizeof save) _exit(4);
-  }
-}
-
 TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
-  {
-    // Save 0: the counter and the first extra item, no items.
-    std::vector<WTStoreRecord> initial = recordsOfSave(0);
-    initial.erase(initial.begin(), initial.begin() + kRecordsPerSave);
-    makeStore(Records{{initial[0].uuid, initial[0]}, {initial[1].uuid, initial[1]}});
-  }
+  const std::vector<WTStoreRecord> initial = recordsOfSave(0);  // the counter and the first extra item
+  makeStore(Records{{initial[kRecordsPerSave].uuid, initial[kRecordsPerSave]}, {kCounter, initial.back()}});
   const unsigned seed = std::random_device()();
   SCOPED_TRACE(testing::Message() << "seed " << seed);
   std::mt19937 random(seed);
   std::uniform_int_distribution<int> delayMs(2, 50);
+  constexpr int kRounds = 50;
   int committed = 0;  // the last save found in the file
   for (int round = 0; round < kRounds; ++round) {
     SCOPED_TRACE(testing::Message() << "round " << round);
@@ -697,9 +557,14 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     ASSERT_EQ(pipe(fds), 0);
     const pid_t child = fork();
     ASSERT_GE(child, 0);
-    if (child == 0) {
+    if (child == 0) {  // saves until killed, reporting each completed save's number
       close(fds[0]);
-      saveUntilKilled(path(), committed + 1, fds[1]);
+      auto store = WTStore::open(path());
+      if (!store) _exit(2);
+      for (int save = committed + 1;; ++save) {
+        if (!store.value()->save(recordsOfSave(save), {itemUuid(save - 1, kRecordsPerSave)})) _exit(3);
+        if (write(fds[1], &save, sizeof save) != sizeof save) _exit(4);
+      }
     }
     close(fds[1]);
     std::this_thread::sleep_for(std::chrono::milliseconds(delayMs(random)));
@@ -716,10 +581,8 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
     ASSERT_TRUE(records.contains(kCounter));
     const int last = records.at(kCounter).position;
-    // Every reported save is there; at most the one in flight got in without being reported.
     ASSERT_GE(last, reported);
     ASSERT_LE(last, reported + 1);
-    // Each save whole: all items of every save up to the counter, none beyond, one extra item.
     ASSERT_EQ(records.size(), std::size_t(last) * kRecordsPerSave + 2);
     for (int k = 1; k <= last; ++k)
       for (int i = 0; i < kRecordsPerSave; ++i)

@@ -10,21 +10,15 @@ TEST_F(WTTimerTest, StartingATimerLeavesOthersRunningUnlessAskedToStopThem) {
   WTTask* b = makeTask();
   EXPECT_FALSE(a->running());  // no entries at all
   KeyCounter image(*context, a, "timerButtonImage");
-  const QString idle[] = {a->timerButtonImage(), a->tableImage(), a->buttonTitle()};
+  const QStringList idle{a->timerButtonImage(), a->tableImage(), a->buttonTitle()};
   WTTime* first = a->toggleTimer();
   ASSERT_NE(first, nullptr);
-  EXPECT_TRUE(first->running());
-  EXPECT_FALSE(first->endDate().has_value());
-  EXPECT_EQ(first->task(), a);
-  // The button and the table follow the running state.
+  EXPECT_TRUE(first->running() && !first->endDate() && first->task() == a && !a->maxTimeEndDate());
   EXPECT_GE(image.count, 1);
-  const QString running[] = {a->timerButtonImage(), a->tableImage(), a->buttonTitle()};
-  for (int i = 0; i < 3; ++i) EXPECT_NE(running[i], idle[i]) << i;
-  EXPECT_EQ(a->maxTimeEndDate(), std::nullopt);
+  for (int i = 0; i < 3; ++i)
+    EXPECT_NE(QStringList({a->timerButtonImage(), a->tableImage(), a->buttonTitle()})[i], idle[i]);
   WTTime* second = b->toggleTimer();
-  EXPECT_TRUE(a->running());
-  EXPECT_TRUE(b->running());
-
+  EXPECT_TRUE(a->running() && b->running());
   defaults->setValue("WTStopsOtherTimes", true);
   WTTask* c = makeTask();
   WTTime* third = c->toggleTimer();
@@ -33,19 +27,18 @@ TEST_F(WTTimerTest, StartingATimerLeavesOthersRunningUnlessAskedToStopThem) {
   EXPECT_TRUE(!c->running() && third->endDate());
 }
 
+// Stopping keeps an end that idle handling already set; undoing a stop restarts.
 TEST_F(WTTimerTest, StoppingKeepsAnEndDateThatIsAlreadySetAndUndoRestarts) {
   WTTask* task = makeTask();
   setNow(berlin(2026, 7, 1, 12));
   WTTime* time = task->toggleTimer();
-  // Idle handling may have set the end already.
   time->setRunning(false);
   EXPECT_EQ(time->endDate(), berlin(2026, 7, 1, 12));
   time->setRunning(true);
-  const Date setEnd = berlin(2026, 7, 1, 12, 40);
-  time->setEndDate(setEnd);
+  time->setEndDate(berlin(2026, 7, 1, 12, 40));
   clockNow = berlin(2026, 7, 1, 13);
   time->setRunning(false);
-  EXPECT_EQ(time->endDate(), setEnd);
+  EXPECT_EQ(time->endDate(), berlin(2026, 7, 1, 12, 40));
 
   WTTask* other = makeTask();
   WTTime* restarted = other->toggleTimer();
@@ -58,40 +51,37 @@ TEST_F(WTTimerTest, StoppingKeepsAnEndDateThatIsAlreadySetAndUndoRestarts) {
   EXPECT_GE(running.count, 2);
 }
 
-TEST_F(WTTimerTest, ANewEntryLastsNothingUntilToldOtherwise) {
+// A new entry lasts nothing; moved to another day an entry keeps its time of day and length, a note its time.
+TEST_F(WTTimerTest, NewEntriesAndEntriesMovedToAnotherDay) {
   WTTask* task = makeTask();
   setNow(berlin(2026, 7, 1, 9, 15, 20));
   auto* time = WTTime::insertNewObject(context.get());
   time->setTask(task);
-  EXPECT_EQ(std::pair(time->startDate(), time->endDate()),
-            std::pair(std::optional(clockNow), std::optional(clockNow)));
-  EXPECT_EQ(time->duration(), 0);
-  EXPECT_EQ(time->title(), "09:15");
+  const auto span = [](const WTTime* item) { return std::pair(item->startDate(), item->endDate()); };
+  EXPECT_EQ(span(time), std::pair(std::optional(clockNow), std::optional(clockNow)));
+  EXPECT_EQ(std::pair(time->duration(), time->title()), std::pair(0, QString("09:15")));
   time->setDuration(90);
   EXPECT_EQ(time->endDate(), berlin(2026, 7, 1, 10, 45, 20));
   time->setDuration(0);
   EXPECT_EQ(time->endDate(), time->startDate());
-}
 
-TEST_F(WTTimerTest, MovingAnEntryToAnotherDayKeepsTimeOfDayAndLength) {
-  WTTask* task = makeTask();
-  WTTime* time = makeTime(task, berlin(2026, 7, 1, 9, 15, 40), berlin(2026, 7, 1, 10, 45, 40));
-  const auto span = [](const WTTime* item) { return std::pair(item->startDate(), item->endDate()); };
-  time->setDate(berlin(2026, 7, 9, 17, 3, 3));
-  EXPECT_EQ(span(time),
-            std::pair(std::optional(berlin(2026, 7, 9, 9, 15)), std::optional(berlin(2026, 7, 9, 10, 45))));
-  // The length keeps its seconds even though the new start has none.
-  WTTime* odd = makeTime(task, berlin(2026, 7, 1, 9, 0, 10), berlin(2026, 7, 1, 9, 30, 55));
-  odd->setDate(berlin(2026, 10, 30));
-  EXPECT_EQ(span(odd), std::pair(std::optional(berlin(2026, 10, 30, 9)),
-                                 std::optional(berlin(2026, 10, 30, 9, 30, 45))));
+  const std::tuple<Date, Date, Date, Date, Date> moves[] = {
+      // start, end, new date, new start, new end
+      {berlin(2026, 7, 1, 9, 15, 40), berlin(2026, 7, 1, 10, 45, 40), berlin(2026, 7, 9, 17, 3, 3),
+       berlin(2026, 7, 9, 9, 15), berlin(2026, 7, 9, 10, 45)},
+      {berlin(2026, 7, 1, 9, 0, 10), berlin(2026, 7, 1, 9, 30, 55), berlin(2026, 10, 30),
+       berlin(2026, 10, 30, 9), berlin(2026, 10, 30, 9, 30, 45)}};
+  for (const auto& [start, end, date, newStart, newEnd] : moves) {
+    WTTime* moved = makeTime(task, start, end);
+    moved->setDate(date);
+    EXPECT_EQ(span(moved), std::pair(std::optional(newStart), std::optional(newEnd)));
+  }
   auto* note = makeItem<WTNote>(task, berlin(2026, 7, 1, 9, 0, 10));
   note->setDate(berlin(2026, 8, 1, 23, 59, 59));
   EXPECT_EQ(note->startDate(), berlin(2026, 8, 1, 23, 59, 59));
 }
 
-// A running entry grows with the clock; peek tells the entry's, the project's and its day group's
-// observers only when the minute count moved.
+// Peek tells the entry's, project's and day group's observers only when the minute count moved.
 TEST_F(WTTimerTest, ARunningEntryGrowsWithTheClockAndPeekTellsOnlyWhenTheMinuteMoved) {
   auto* project = WTProject::insertNewObject(context.get());
   WTTask* task = makeTask(project);
@@ -105,13 +95,11 @@ TEST_F(WTTimerTest, ARunningEntryGrowsWithTheClockAndPeekTellsOnlyWhenTheMinuteM
   KeyCounter entry(*context, time, "duration"), projectDuration(*context, project, "duration");
   clockNow = berlin(2026, 7, 1, 9, 0, 59);
   EXPECT_FALSE(time->peek());
-  EXPECT_EQ(time->duration(), 0);
-  EXPECT_EQ(entry.count + projectDuration.count + group.count(), 0);
+  EXPECT_EQ(time->duration() + entry.count + projectDuration.count + group.count(), 0);
   clockNow = berlin(2026, 7, 1, 9, 1, 0);
   EXPECT_EQ(QList({time->duration(), task->duration(), task->runningDuration()}), QList({1, 1, 1}));
   EXPECT_TRUE(time->peek());
-  EXPECT_TRUE(entry.count >= 1 && projectDuration.count >= 1);
-  EXPECT_EQ(time->lastDuration(), 1);
+  EXPECT_TRUE(entry.count >= 1 && projectDuration.count >= 1 && time->lastDuration() == 1);
   QStringList keys;
   for (const auto& args : group) keys << args[0].toString();
   EXPECT_TRUE(keys.contains("duration") && keys.contains("cost")) << keys.join(' ').toStdString();

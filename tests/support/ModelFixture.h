@@ -21,6 +21,7 @@
 #include <QTemporaryDir>
 #include <QTimeZone>
 
+#include <algorithm>
 #include <memory>
 #include <vector>
 
@@ -46,9 +47,8 @@ class RecordingJournal final : public WTChangeJournal {
   }
   std::vector<Call> callsFor(const QString& uuid) const {
     std::vector<Call> result;
-    for (const Call& call : calls) {
-      if (call.uuid == uuid) result.push_back(call);
-    }
+    std::copy_if(calls.begin(), calls.end(), std::back_inserter(result),
+                 [&](const Call& c) { return c.uuid == uuid; });
     return result;
   }
   std::vector<Call> calls;
@@ -60,7 +60,6 @@ class ModelTest : public ::testing::Test {
  protected:
   void SetUp() override {
     ASSERT_TRUE(dir.isValid());
-    previousZone = QString::fromUtf8(QTimeZone::systemTimeZoneId());
     ASSERT_TRUE(RZDate::setDefaultTimeZone(QStringLiteral("Europe/Berlin")));
     defaults = std::make_unique<UserDefaults>(dir.filePath(QStringLiteral("settings.conf")));
     openContext();
@@ -73,7 +72,7 @@ class ModelTest : public ::testing::Test {
   }
 
   void openContext() {
-    context.reset();
+    context.reset();  // the old context goes before the new one opens the file
     context = std::make_unique<WTObjectContext>(defaults.get());
     WTObjectContext::setDefaultContext(context.get());
     auto store = WTStore::open(storePath());
@@ -124,7 +123,6 @@ class ModelTest : public ::testing::Test {
   }
 
   QTemporaryDir dir;
-  QString previousZone;
   std::unique_ptr<UserDefaults> defaults;
   std::unique_ptr<WTObjectContext> context;
   RecordingJournal journal;
@@ -138,9 +136,9 @@ inline Decimal dec(const char* text) {
 // Counts announcements of one key of one record.
 class KeyCounter {
  public:
-  KeyCounter(WTObjectContext& context, const WTObject* object, const QString& key) : context_(context) {
-    id_ = context.addObserver(object, key, [this](WTObject*, const QString&) { ++count; });
-  }
+  KeyCounter(WTObjectContext& context, const WTObject* object, const QString& key)
+      : context_(context),
+        id_(context.addObserver(object, key, [this](WTObject*, const QString&) { ++count; })) {}
   ~KeyCounter() { context_.removeObserver(id_); }
   int count = 0;
 
