@@ -18,24 +18,12 @@
 #include <QToolTip>
 
 #include <memory>
-#include <ostream>
-
-// Failures show texts as text.
-inline void PrintTo(const QString& text, std::ostream* os) {
-  *os << '"' << text.toStdString() << '"';
-}
 
 // The first of a menu's entries whose title starts with `title`, or nothing.
 inline QAction* actionTitled(const QMenu* menu, const QString& title) {
   for (QAction* action : menu->actions())
     if (action->text().startsWith(title)) return action;
   return nullptr;
-}
-// A menu's titles, a separator's empty.
-inline QStringList titlesOf(const QMenu* menu) {
-  QStringList titles;
-  for (const QAction* action : menu->actions()) titles << action->text();
-  return titles;
 }
 // Types into a field as a user does, over what it held, then presses Return if asked.
 inline void type(QLineEdit* field, const QString& text, bool andReturn = false) {
@@ -89,10 +77,9 @@ struct ShownOutline {
   QModelIndex rowOf(const WTObject* object) { return controller.treeController()->indexOfObject(object); }
   // The middle of one part of a record's row, in the outline's viewport.
   QPoint centreOf(const WTObject* object, WTTableCellView::Part part) {
-    const QModelIndex index = rowOf(object);
-    const QRect visual = outline()->visualRect(index);
+    const QRect visual = outline()->visualRect(rowOf(object));
     const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    return controller.cellViewPrototypeForIndex(index).partRect(part, row).center().toPoint();
+    return controller.cellViewPrototypeForIndex(rowOf(object)).partRect(part, row).center().toPoint();
   }
   // The tip shown over a point of the viewport, or nothing.
   QString tipAt(QPoint point) {
@@ -104,9 +91,10 @@ struct ShownOutline {
   }
   // The one line editor open in the outline once closed ones are gone, else nothing.
   QLineEdit* openEditor() {
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-    QApplication::processEvents();
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    for (int i = 0; i < 2; ++i) {
+      QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+      QApplication::processEvents();
+    }
     const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
     return editors.size() == 1 ? editors.first() : nullptr;
   }
@@ -139,20 +127,17 @@ class UiTest : public ModelTest {
     ModelTest::SetUp();
     setNow(at(2024, 3, 14, 10, 0));
   }
-
   static Date at(int year, int month, int day, int hour = 12, int minute = 0) {
     return berlin(year, month, day, hour, minute);
   }
-  WTProject* makeProject(const QString& name) {
-    auto* project = WTProject::insertNewObject(context.get());
-    project->setName(name);
-    return project;
+  template <class T>
+  T* named(const QString& name) {
+    auto* object = T::insertNewObject(context.get());
+    object->setName(name);
+    return object;
   }
-  WTClient* makeClient(const QString& name) {
-    auto* client = WTClient::insertNewObject(context.get());
-    client->setName(name);
-    return client;
-  }
+  WTProject* makeProject(const QString& name) { return named<WTProject>(name); }
+  WTClient* makeClient(const QString& name) { return named<WTClient>(name); }
   using ModelTest::makeItem;
   // A named item; a time entry lasts half an hour.
   template <class T>
@@ -162,6 +147,13 @@ class UiTest : public ModelTest {
     if constexpr (std::is_same_v<T, WTTime>) item->setEndDate(date.addingSeconds(30 * 60));
     return item;
   }
+  // An entry's start and end on its day, "HH:mm-HH:mm".
+  static QString span(const WTTime* item) {
+    auto time = [](std::optional<Date> date) {
+      return date ? RZDate::stringWithPattern(*date, "HH:mm") : "none";
+    };
+    return time(item->startDate()) + '-' + time(item->endDate());
+  }
   // Ends the event-loop turn, as the application does after every event.
   void endTurn() {
     context->processPendingChanges();
@@ -169,15 +161,25 @@ class UiTest : public ModelTest {
   }
 };
 
-// A project "Website" with the tasks Design and Build, shown in its outline, the outline's model under
-// Qt's model checker.
-class OutlineTest : public UiTest {
+// A project "Website" with the tasks Design and Build.
+class WebsiteTest : public UiTest {
  protected:
   void SetUp() override {
     UiTest::SetUp();
     project = makeProject("Website");
     design = makeTask(project, "Design");
     build = makeTask(project, "Build");
+  }
+  WTProject* project = nullptr;
+  WTTask* design = nullptr;
+  WTTask* build = nullptr;
+};
+
+// The Website shown in its outline, the outline's model under Qt's model checker.
+class OutlineTest : public WebsiteTest {
+ protected:
+  void SetUp() override {
+    WebsiteTest::SetUp();
     shown = std::make_unique<ShownOutline>(context.get(), project);
     controller = &shown->controller;
     tester = std::make_unique<QAbstractItemModelTester>(
@@ -188,14 +190,10 @@ class OutlineTest : public UiTest {
     shown.reset();
     UiTest::TearDown();
   }
-
   WTOutlineView* outline() { return controller->outlineView(); }
   WTItemsModel* model() { return controller->treeController(); }
   QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
 
-  WTProject* project = nullptr;
-  WTTask* design = nullptr;
-  WTTask* build = nullptr;
   std::unique_ptr<ShownOutline> shown;
   WTItemsViewController* controller = nullptr;
   std::unique_ptr<QAbstractItemModelTester> tester;
