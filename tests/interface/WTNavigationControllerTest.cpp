@@ -17,68 +17,51 @@ class Page : public WTViewController {
   QString name_;
 };
 
-// A stack in a host window, with a root page and a detail page to push.
-struct WTNavigationControllerTest : ::testing::Test {
-  WTNavigationControllerTest() {
-    window.stack = &stack;
-    window.setCentralWidget(stack.view());
-    window.resize(400, 300);
-  }
-  QList<QWidget*> visibleViews() {
-    QList<QWidget*> result;
-    for (QWidget* child : stack.view()->findChildren<QWidget*>(Qt::FindDirectChildrenOnly))
-      if (child->isVisible()) result << child;
-    return result;
-  }
+// A push onto an empty stack shows at once; another slides in from the right and a pop back from the left,
+// the view shown always filling the stack. A push from a page waits for the next turn; outside a host
+// window nothing happens.
+TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   TestHostWindow window;
   WTNavigationController stack;
   Page root{"root"}, detail{"detail"};
-};
-
-TEST_F(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
+  window.stack = &stack;
+  window.setCentralWidget(stack.view());
+  window.resize(400, 300);
   window.show();
   ASSERT_TRUE(QTest::qWaitForWindowExposed(&window));
+  auto shown = [&] {
+    QList<QWidget*> views;
+    for (QWidget* child : stack.view()->findChildren<QWidget*>(Qt::FindDirectChildrenOnly))
+      if (child->isVisible()) views << child;
+    EXPECT_EQ(views.value(0)->geometry(), stack.view()->rect());
+    return views;
+  };
   stack.pushViewController(&root);
-  EXPECT_FALSE(stack.isAnimating());  // onto an empty stack: at once
-  EXPECT_EQ(root.displayed, 1);
-  EXPECT_EQ(visibleViews(), QList<QWidget*>{root.view()});
-  EXPECT_EQ(root.view()->geometry(), stack.view()->rect());
-
-  stack.pushViewController(&detail);
-  EXPECT_TRUE(stack.isAnimating());
-  EXPECT_EQ(detail.displayed, 1);
-  EXPECT_EQ(stack.viewControllers(), (QList<WTViewController*>{&root, &detail}));
-  QTest::qWait(60);
-  EXPECT_GT(detail.view()->x(), 0);  // mid-slide the new view comes from the right
-  ASSERT_TRUE(QTest::qWaitFor([&] { return !stack.isAnimating(); }, 2000));
-  EXPECT_EQ(visibleViews(), QList<QWidget*>{detail.view()});
-  EXPECT_EQ(detail.view()->geometry(), stack.view()->rect());
-
-  stack.popViewController();
-  EXPECT_TRUE(stack.isAnimating());
-  QTest::qWait(60);
-  EXPECT_LT(root.view()->x(), 0);  // back in from the left
-  stack.finishAnimation();
-  EXPECT_EQ(visibleViews(), QList<QWidget*>{root.view()});
-  EXPECT_EQ(root.displayed, 1);  // a pop does not announce a display
-  stack.popViewController();     // the root stays
-  EXPECT_EQ(stack.viewControllers(), QList<WTViewController*>{&root});
-  // Resizing keeps the one view filling the stack.
-  window.resize(500, 350);
-  QTest::qWait(10);
-  EXPECT_EQ(root.view()->geometry(), stack.view()->rect());
-}
-
-TEST_F(WTNavigationControllerTest, APushFromAControllerWaitsForTheNextTurn) {
-  stack.pushViewController(&root);
-  window.show();
+  EXPECT_FALSE(stack.isAnimating());
+  EXPECT_EQ(shown(), QList<QWidget*>{root.view()});
   root.pushViewController(&detail);
   EXPECT_EQ(stack.viewControllers().size(), 1);
   QCoreApplication::processEvents();
-  EXPECT_EQ(stack.viewControllers().size(), 2);
+  EXPECT_EQ(stack.viewControllers(), (QList<WTViewController*>{&root, &detail}));
+  EXPECT_TRUE(stack.isAnimating());
+  EXPECT_EQ(root.displayed + detail.displayed, 2);
+  QTest::qWait(60);
+  EXPECT_GT(detail.view()->x(), 0);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return !stack.isAnimating(); }, 2000));
+  EXPECT_EQ(shown(), QList<QWidget*>{detail.view()});
   detail.popViewController();
-  EXPECT_EQ(stack.viewControllers().size(), 1);
-  // Outside a host window nothing happens.
+  EXPECT_TRUE(stack.isAnimating());
+  QTest::qWait(60);
+  EXPECT_LT(root.view()->x(), 0);
+  stack.finishAnimation();
+  EXPECT_EQ(shown(), QList<QWidget*>{root.view()});
+  EXPECT_EQ(root.displayed, 1);  // a pop does not announce a display
+  stack.popViewController();     // the root stays
+  EXPECT_EQ(stack.viewControllers(), QList<WTViewController*>{&root});
+  window.resize(500, 350);
+  QTest::qWait(10);
+  EXPECT_EQ(shown(), QList<QWidget*>{root.view()});
+
   Page lonely("lonely"), other("other");
   lonely.view();
   lonely.pushViewController(&other);
