@@ -221,26 +221,6 @@ TEST_F(WTItemsModelTest, ADropMovesTheDraggedRecordsToTheRowItLandsOn) {
   EXPECT_EQ(dropped.count(), 3);
 }
 
-// A fresh model over the same records (as after a relaunch) finds the same rows by their identity.
-TEST_F(WTItemsModelTest, RowsAreFoundAgainByTheirPersistentIdentity) {
-  auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
-  auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11, 9));
-  model->setProject(project);
-  WTItemsModel other(context.get());
-  other.setProject(project);
-  for (const QModelIndex& row : {model->indexOfObject(design), model->indexOfObject(time),
-                                 model->indexOfContainerOfItem(todo), model->indexOfContainerOfItem(time)}) {
-    const QString identity = model->persistentIdentity(row);
-    const QModelIndex found = other.indexForPersistentIdentity(identity);
-    ASSERT_TRUE(row.isValid() && found.isValid()) << identity.toStdString();
-    EXPECT_EQ(other.persistentIdentity(found), identity);
-    EXPECT_EQ(found.data(WTItemsModel::NameRole), row.data(WTItemsModel::NameRole));
-  }
-  EXPECT_FALSE(other.indexForPersistentIdentity(design->uuid() + "|12345").isValid());
-  EXPECT_FALSE(other.indexForPersistentIdentity("nobody@WTTask").isValid());
-  EXPECT_FALSE(other.indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
-}
-
 // Each edit lands in its record's key, or is refused and changes nothing.
 TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
   auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11, 9));

@@ -159,7 +159,8 @@ TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksIt
   EXPECT_EQ(flat->notes(), "kept");
 }
 
-// Open rows are remembered per project, and found again by a new controller (as after a relaunch).
+// Open rows are remembered per project, and found again by their identity in a new controller (as after
+// a relaunch).
 TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 10));
   makeItem<WTToDo>(build, "todo", at(2024, 3, 11));
@@ -167,6 +168,7 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   outline()->expand(rowOf(design));
   outline()->expand(model()->indexOfContainerOfItem(note));
   EXPECT_EQ(controller->autosaveName(), project->uuid());
+  const QString noteIdentity = model()->persistentIdentity(rowOf(note));
   WTProject* other = makeProject("Other");
   makeTask(other, "Alone");
   controller->setProject(other);
@@ -181,6 +183,10 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   WTItemsModel* tree = again.treeController();
   EXPECT_TRUE(open(tree->indexOfObject(design)) && open(tree->indexOfContainerOfItem(note)));
   EXPECT_FALSE(open(tree->indexOfObject(build)));
+  EXPECT_EQ(tree->indexForPersistentIdentity(noteIdentity), tree->indexOfObject(note));
+  for (const QString& identity : {design->uuid() + "|12345", QString("nobody@WTTask")})
+    EXPECT_FALSE(tree->indexForPersistentIdentity(identity).isValid()) << identity.toStdString();
+  EXPECT_FALSE(tree->indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
 }
 
 // The window's commands act on the project and the selection. What undo brings back is opened and

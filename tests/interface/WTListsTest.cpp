@@ -1,6 +1,5 @@
 #include "UiFixture.h"
 #include "WTClient.h"
-#include "WTClientsViewController.h"
 #include "WTDeletion.h"
 #include "WTListView.h"
 #include "WTObjectListModel.h"
@@ -253,11 +252,22 @@ TEST_F(WTListControllerTest, RemoveAsksWhenItemsGo) {
 }
 
 // Opening a project pushes its outline on the next turn, after the click, and reuses it for the next.
-TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {
+// The client chooser offers the clients not archived and sets the project's. Opening a project pushes its
+// outline on the next turn, after the click, and reuses it for the next.
+TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   auto* first = makeProject("First");
   makeTask(first, "Only task");
   auto* second = makeProject("Second");
+  auto* acme = makeClient("ACME");
+  makeClient("Gone")->setArchived(true);
   endTurn();
+  std::unique_ptr<QMenu> menu(projects->clientMenu(second));
+  QStringList titles;
+  for (const QAction* action : menu->actions()) titles << action->text();
+  EXPECT_EQ(titles, (QStringList{"No Client", "", "ACME", "", "Edit Clients…"}));
+  actionTitled(menu.get(), "ACME")->trigger();
+  EXPECT_EQ(second->client(), acme);
+
   WTNavigationController& stack = shown->stack;
   projects->openProject(first);
   EXPECT_EQ(stack.viewControllers().size(), 1);
@@ -271,28 +281,6 @@ TEST_F(WTListControllerTest, OpeningAProjectPushesItsOutlineAndReusesIt) {
   EXPECT_TRUE(projects->itemsViewController() == items && items->project() == second);
   projects->openClients();
   EXPECT_EQ(shown->window.clientsShown, 1);
-}
-
-// The client chooser offers the clients not archived; a client is added and named in its list.
-TEST_F(WTListControllerTest, TheClientChooserSetsTheProjectsClientAndClientsAreAdded) {
-  auto* project = makeProject("Site");
-  auto* acme = makeClient("ACME");
-  makeClient("Gone")->setArchived(true);
-  endTurn();
-  std::unique_ptr<QMenu> menu(projects->clientMenu(project));
-  QStringList titles;
-  for (const QAction* action : menu->actions()) titles << action->text();
-  EXPECT_EQ(titles, (QStringList{"No Client", "", "ACME", "", "Edit Clients…"}));
-  actionTitled(menu.get(), "ACME")->trigger();
-  EXPECT_EQ(project->client(), acme);
-  WTClientsViewController clients(context.get());
-  clients.view()->resize(600, 400);
-  clients.view()->show();
-  clients.addObject();
-  EXPECT_EQ(context->fetch<WTClient>().size(), 3);
-  EXPECT_TRUE(clients.tableView()->isEditing());
-  EXPECT_TRUE(clients.respondsTo(WTViewController::Command::AddObject));
-  EXPECT_FALSE(clients.respondsTo(WTViewController::Command::ToggleTimer));
 }
 
 }  // namespace

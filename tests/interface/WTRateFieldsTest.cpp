@@ -223,6 +223,8 @@ TEST_F(WTRateFieldsTest, TheRowMenusSetAndClearRatesAndTheSheetStaysOpenOnAMista
   clients.view()->resize(600, 400);
   clients.view()->show();
   endTurn();
+  EXPECT_TRUE(clients.respondsTo(WTViewController::Command::AddObject));
+  EXPECT_FALSE(clients.respondsTo(WTViewController::Command::ToggleTimer));
   clients.tableView()->setClickedRow(clients.arrayController()->rowOfObject(acme));
   ASSERT_NE(actionTitled(clients.rowMenu(), "Set Rate…"), nullptr);
   whenRateDialogOpens([&](WTRateDialog* dialog) {
