@@ -42,8 +42,8 @@ class UrlCatcher : public QObject {
   void open(const QUrl& url) { opened.append(url); }
 };
 
-// A window that hosts one navigation stack, as the main window does. Asked about a deletion, it
-// records the question and its detail and answers `deletes`.
+// A window that hosts one navigation stack, as the main window does; asked about a deletion, it records
+// the question and answers `deletes`.
 class TestHostWindow : public QMainWindow, public WTNavigationHost {
  public:
   WTNavigationController* stack = nullptr;
@@ -59,8 +59,8 @@ class TestHostWindow : public QMainWindow, public WTNavigationHost {
   }
 };
 
-// A project's items outline shown in a host window, as the main window shows it, with its first
-// screen displayed. The window gives the view back before either goes.
+// A project's outline shown in a host window, its first screen displayed; the window gives the view back
+// before either goes.
 struct ShownOutline {
   ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
       : controller(context) {
@@ -119,8 +119,7 @@ struct ShownProjects {
   TestHostWindow window;
 };
 
-// The model's world (a real store file, its own settings, Europe/Berlin) with the clock at
-// 14 March 2024 10:00 until a test moves `clockNow`.
+// The model's world with the clock at 14 March 2024 10:00 until a test moves `clockNow`.
 class UiTest : public ModelTest {
  protected:
   void SetUp() override {
@@ -161,25 +160,15 @@ class UiTest : public ModelTest {
   }
 };
 
-// A project "Website" with the tasks Design and Build.
-class WebsiteTest : public UiTest {
+// A project "Website" with the tasks Design and Build shown in its outline, the outline's model under
+// Qt's model checker.
+class OutlineTest : public UiTest {
  protected:
   void SetUp() override {
     UiTest::SetUp();
     project = makeProject("Website");
     design = makeTask(project, "Design");
     build = makeTask(project, "Build");
-  }
-  WTProject* project = nullptr;
-  WTTask* design = nullptr;
-  WTTask* build = nullptr;
-};
-
-// The Website shown in its outline, the outline's model under Qt's model checker.
-class OutlineTest : public WebsiteTest {
- protected:
-  void SetUp() override {
-    WebsiteTest::SetUp();
     shown = std::make_unique<ShownOutline>(context.get(), project);
     controller = &shown->controller;
     tester = std::make_unique<QAbstractItemModelTester>(
@@ -194,6 +183,8 @@ class OutlineTest : public WebsiteTest {
   WTItemsModel* model() { return controller->treeController(); }
   QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
 
+  WTProject* project = nullptr;
+  WTTask *design = nullptr, *build = nullptr;
   std::unique_ptr<ShownOutline> shown;
   WTItemsViewController* controller = nullptr;
   std::unique_ptr<QAbstractItemModelTester> tester;

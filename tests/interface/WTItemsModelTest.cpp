@@ -7,18 +7,19 @@
 
 namespace {
 
-class WTItemsModelTest : public WebsiteTest {
+// A model of its own over the outline's project.
+class WTItemsModelTest : public OutlineTest {
  protected:
   void SetUp() override {
-    WebsiteTest::SetUp();
+    OutlineTest::SetUp();
     model = std::make_unique<WTItemsModel>(context.get());
-    tester = std::make_unique<QAbstractItemModelTester>(
+    ownTester = std::make_unique<QAbstractItemModelTester>(
         model.get(), QAbstractItemModelTester::FailureReportingMode::Fatal);
   }
   void TearDown() override {
-    tester.reset();
+    ownTester.reset();
     model.reset();
-    UiTest::TearDown();
+    OutlineTest::TearDown();
   }
 
   // The tree as text: "Task[Group[item,item],Group[...]]" per task, tasks joined by " ".
@@ -47,7 +48,7 @@ class WTItemsModelTest : public WebsiteTest {
   }
 
   std::unique_ptr<WTItemsModel> model;
-  std::unique_ptr<QAbstractItemModelTester> tester;
+  std::unique_ptr<QAbstractItemModelTester> ownTester;
 };
 
 TEST_F(WTItemsModelTest, TasksInStoredOrderThenPendingThenDaysNewestFirst) {
