@@ -22,13 +22,12 @@
 
 namespace {
 
-QString readAll(const QString& path) {
-  QFile file(path);
-  return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : "<unreadable>";
-}
 // The file's lines, sorted.
 QStringList linesOf(const QString& path) {
-  QStringList lines = readAll(path).split(u'\n', Qt::SkipEmptyParts);
+  QFile file(path);
+  QStringList lines = file.open(QIODevice::ReadOnly)
+                          ? QString(file.readAll()).split(u'\n', Qt::SkipEmptyParts)
+                          : QStringList{"<unreadable>"};
   lines.sort();
   return lines;
 }
@@ -37,13 +36,6 @@ void writeFile(const QString& path, const QString& text) {
   QFile file(path);
   ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
   file.write(text.toUtf8());
-}
-// Runs a poppler tool; empty when it fails.
-QString poppler(const QString& tool, const QStringList& arguments) {
-  QProcess process;
-  process.start(tool, arguments);
-  const bool ran = process.waitForFinished(30000) && process.exitStatus() == QProcess::NormalExit;
-  return ran && process.exitCode() == 0 ? QString::fromUtf8(process.readAllStandardOutput()) : QString();
 }
 
 // A client Acme with the projects Website (Design: 2:30 in March) and Backend (API: 2:00 in February), all
@@ -88,12 +80,16 @@ class ReportWindowTest : public UiTest {
     QObject::connect(window.get(), &WTReportWindowController::reportShown, [this] { ++shown; });
     renders = shown = 0;
   }
+  void rerender(const QString& text) {
+    writeFile(WTReportGenerator::userTemplatePath(), text);
+    window->refreshWebContent();
+  }
   QString text() const { return window->webView()->toPlainText(); }
-  QScrollBar* scrolledHalfway() {
-    QScrollBar* scroll = window->webView()->verticalScrollBar();
-    scroll->setValue(scroll->maximum() / 2);
-    EXPECT_GT(scroll->value(), 200);
-    return scroll;
+  QScrollBar* scroll() const { return window->webView()->verticalScrollBar(); }
+  int scrolledHalfway() {
+    scroll()->setValue(scroll()->maximum() / 2);
+    EXPECT_GT(scroll()->value(), 200);
+    return scroll()->value();
   }
   void save() { ASSERT_TRUE(context->save().ok()); }
   void waitForDocument() {
@@ -108,29 +104,30 @@ class ReportWindowTest : public UiTest {
 };
 
 // The segments choose the mode the report is rendered at; a template error is named in the bar, with
-// what was made around it still shown, until a render without one.
+// what was made around it still shown, until a render without one. A client's report covers exactly its
+// projects, including ones added later.
 TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMended) {
   openReport({web}, "mode={{ mode }} {% for project in projects %}[{{ project.name }}]{% /for %}");
-  EXPECT_EQ(window->html(), "mode=0 [Website]");
-  EXPECT_EQ(window->segmentedControl()->checkedId(), 0);
+  EXPECT_EQ(window->html() + ' ' + QString::number(window->segmentedControl()->checkedId()),
+            "mode=0 [Website] 0");
   for (int mode : {3, 1, 2}) {
     window->segmentedControl()->button(mode)->click();
-    EXPECT_EQ(std::pair(window->mode(), text()),
-              std::pair(mode, QStringLiteral("mode=%1 [Website]").arg(mode)));
+    EXPECT_EQ(QString::number(window->mode()) + ' ' + text(),
+              QStringLiteral("%1 mode=%1 [Website]").arg(mode));
   }
+  window->setClient(client);
+  makeProject("Elsewhere");  // no client: never in Acme's report
+  projectOfAcme("Later");
+  save();
+  EXPECT_EQ(window->html(), "mode=2 [Website][Backend][Later]");
+  EXPECT_EQ(window->windowTitle(), "Report — Acme");
   EXPECT_TRUE(window->errorBar()->isHidden());
-  writeFile(WTReportGenerator::userTemplatePath(),
-            "<p>fine</p>\n<p>{{ nosuchvariable }}</p>\n{% nosuchmarker %}\n");
-  window->refreshWebContent();
+  rerender("<p>fine</p>\n<p>{{ nosuchvariable }}</p>\n");
   EXPECT_FALSE(window->errorBar()->isHidden());
-  const QString bar = window->errorBar()->text();
-  EXPECT_TRUE(bar.contains("line 2") && bar.contains("nosuchvariable") && bar.contains("1 more"))
-      << bar.toStdString();
+  EXPECT_TRUE(window->errorBar()->text().contains("line 2")) << window->errorBar()->text().toStdString();
   EXPECT_TRUE(text().contains("fine"));
-  writeFile(WTReportGenerator::userTemplatePath(), "<p>mended</p>");
-  window->refreshWebContent();
+  rerender("<p>mended</p>");
   EXPECT_TRUE(window->errorBar()->isHidden());
-  EXPECT_TRUE(text().contains("mended"));
 }
 
 // A long report takes seconds to lay out again: it must do so for what it shows, only once seen, and keep
@@ -141,33 +138,29 @@ TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportW
   openReport({web, backend},
              "{% for project in projects %}[{{ project.name }} {{ project.duration }} "
              "{{ project.cost }}]{% /for %}{% for 1 to 300 %}<p>line</p>{% /for %}");
-  const int place = scrolledHalfway()->value();
+  const int place = scrolledHalfway();
   makeTime(chores, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 10));
   chores->project()->setName("Away");
   save();
   EXPECT_EQ(renders, 0) << "changes outside the report";
-
   // An entry moved out of the report is seen through the task it left.
   WTItem* kickOff = design->items().first();
   kickOff->setTask(chores);
   save();
   EXPECT_EQ(renders, 1);
   EXPECT_TRUE(window->html().contains("[Website 60 ")) << window->html().toStdString();
-  EXPECT_EQ(window->webView()->verticalScrollBar()->value(), place);
+  EXPECT_EQ(scroll()->value(), place);
   client->setName("Acme Ltd");  // a template may show project.client.name
   save();
   EXPECT_EQ(renders, 2);
-
   window->hide();
   kickOff->setTask(design);
   save();
   EXPECT_EQ(renders, 2) << "hidden";
   window->show();
-  EXPECT_EQ(renders, 3);
-  EXPECT_TRUE(window->html().contains("[Website 150 ")) << window->html().toStdString();
   window->show();
-  EXPECT_EQ(renders, 3) << "shown again with nothing new";
-
+  EXPECT_EQ(renders, 3) << "shown, then shown again with nothing new";
+  EXPECT_TRUE(window->html().contains("[Website 150 ")) << window->html().toStdString();
   // Costs follow a new default rate, which changes no record and so saves nothing; Design has a rate of
   // its own, so the project gets a task without one.
   makeTime(makeTask(web, "Copy"), berlin(2024, 3, 6, 9), berlin(2024, 3, 6, 10));
@@ -194,20 +187,17 @@ TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKe
   waitForDocument();
   EXPECT_EQ(shown, 1);
   EXPECT_TRUE(text().contains("Website 150 mode 0") && text().contains("line 3999"));
-
-  QScrollBar* scroll = scrolledHalfway();
-  const int place = scroll->value();
+  const int place = scrolledHalfway();
   const QPointer<QTextDocument> first = window->webView()->document();
   makeTime(design, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 9, 30));
   save();
   EXPECT_TRUE(window->isBuildingDocument());
-  EXPECT_EQ(scroll->value(), place) << "the previous report stays while the new one is read";
+  EXPECT_EQ(scroll()->value(), place) << "the previous report stays while the new one is read";
   waitForDocument();
   EXPECT_EQ(shown, 2);
   EXPECT_TRUE(text().contains("Website 180 mode 0"));
-  EXPECT_EQ(scroll->value(), place);
+  EXPECT_EQ(scroll()->value(), place);
   EXPECT_TRUE(first.isNull()) << "a replaced document is deleted";
-
   window->setMode(1);
   window->setMode(2);
   waitForDocument();
@@ -215,27 +205,16 @@ TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKe
   EXPECT_TRUE(text().contains("mode 2"));
   // A short render while a long one is being read: the long one never replaces it.
   window->setMode(3);
-  writeFile(WTReportGenerator::userTemplatePath(), "<p>short, mode {{ mode }}</p>");
-  window->refreshWebContent();
-  EXPECT_EQ(text().trimmed(), "short, mode 3");
+  rerender("<p>short, mode {{ mode }}</p>");
   waitForDocument();
   EXPECT_EQ(text().trimmed(), "short, mode 3");
 }
 
-TEST_F(ReportWindowTest, AClientReportCoversExactlyItsProjectsIncludingOnesAddedLater) {
-  openReport({}, "{% for project in projects %}[{{ project.name }}]{% /for %}");
-  window->setClient(client);
-  makeProject("Elsewhere");  // no client: never in Acme's report
-  projectOfAcme("Later");
-  save();
-  EXPECT_EQ(window->html(), "[Website][Backend][Later]");
-  EXPECT_EQ(window->windowTitle(), "Report — Acme");
-}
-
 // What the lines hold is the CSV export's; the window writes them for its mode to the file chosen, and
-// nothing when the choice is cancelled or the folder is missing.
+// nothing when the choice is cancelled or the folder is missing. The PDF holds the report on numbered
+// pages, the total on the last.
 TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
-  openReport({web});
+  openReport({web, backend});
   const QString csv = dir.filePath("report.csv"), html = dir.filePath("report.html");
   QStringList asked;
   window->setSaveLocationChooser([&](QWidget*, const QString&, const QString& filter, const QString&) {
@@ -244,7 +223,8 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   });
   window->setMode(1);
   window->exportCSV();
-  EXPECT_EQ(linesOf(csv), QStringList({"\"Website\",\"Design\",\"2024-03-03 09:00\",\"01:30\",\"90.00\"",
+  EXPECT_EQ(linesOf(csv), QStringList({"\"Backend\",\"API\",\"2024-02-10 09:00\",\"02:00\",\"120.00\"",
+                                       "\"Website\",\"Design\",\"2024-03-03 09:00\",\"01:30\",\"90.00\"",
                                        "\"Website\",\"Design\",\"2024-03-04 09:00\",\"01:00\",\"60.00\""}));
   EXPECT_TRUE(asked.front().endsWith("(*.csv)"));
   QFile::remove(csv);
@@ -252,17 +232,14 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   EXPECT_EQ(asked.size(), 2);
   EXPECT_FALSE(QFile::exists(csv));
   ASSERT_TRUE(window->saveHTMLToFile(html).ok());
-  EXPECT_EQ(readAll(html), window->html());
+  QFile saved(html);
+  ASSERT_TRUE(saved.open(QIODevice::ReadOnly));
+  EXPECT_EQ(QString::fromUtf8(saved.readAll()), window->html());
   const Result<void> refused = window->saveHTMLToFile(dir.filePath("missing/report.html"));
-  ASSERT_FALSE(refused.ok());
-  EXPECT_TRUE(refused.error().message.contains("missing/report.html"));
-}
+  EXPECT_TRUE(!refused.ok() && refused.error().message.contains("missing/report.html"));
 
-// Two hundred tasks of a day each make many pages; every page carries its number and the last the total.
-TEST_F(ReportWindowTest, ThePdfHoldsTheReportOnNumberedPages) {
   if (QStandardPaths::findExecutable("pdfinfo").isEmpty()) GTEST_SKIP() << "poppler-utils missing";
-  openReport({web, backend});
-  for (int i = 0; i < 200; ++i) {
+  for (int i = 0; i < 200; ++i) {  // two hundred tasks of a day each make many pages
     WTTask* task = makeTask(web, QString("Task %1").arg(i));
     task->setRate(Decimal(60));
     makeTime(task, berlin(2024, 3, 6, 8), berlin(2024, 3, 6, 9));
@@ -270,19 +247,25 @@ TEST_F(ReportWindowTest, ThePdfHoldsTheReportOnNumberedPages) {
   save();
   const QString pdf = dir.filePath("long.pdf");
   ASSERT_TRUE(window->savePDFToFile(pdf).ok());
-  const auto pages = QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf}));
-  ASSERT_TRUE(pages.hasMatch());
-  const int count = pages.captured(1).toInt();
+  EXPECT_FALSE(QFile::exists(pdf + ".part"));
+  auto poppler = [](const QString& tool, const QStringList& arguments) {
+    QProcess process;
+    process.start(tool, arguments);
+    EXPECT_TRUE(process.waitForFinished(30000) && process.exitCode() == 0) << tool.toStdString();
+    return QString::fromUtf8(process.readAllStandardOutput());
+  };
+  const int count =
+      QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf})).captured(1).toInt();
   EXPECT_GE(count, 3);
   for (int page = 1; page <= count; ++page) {
     const QString n = QString::number(page), pageText = poppler("pdftotext", {"-f", n, "-l", n, pdf, "-"});
-    EXPECT_EQ(pageText.trimmed().split(QLatin1Char('\n')).last().trimmed(), n) << "page " << page;
+    EXPECT_EQ(pageText.trimmed().split(u'\n').last().trimmed(), n) << "page " << page;
     EXPECT_TRUE(page < count || pageText.contains("12,270.00")) << pageText.toStdString();
   }
-  EXPECT_FALSE(QFile::exists(pdf + ".part"));
 }
 
 // How the copy is made is the generator's; the window opens it and shows the user's changes once saved.
+// The window closes when its context goes.
 TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
   UrlCatcher catcher;
   QDesktopServices::setUrlHandler("file", &catcher, "open");
@@ -294,10 +277,6 @@ TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
   writeFile(path, "<p>my own report</p>");
   EXPECT_TRUE(QTest::qWaitFor([&] { return window->html() == "<p>my own report</p>"; }, 5000));
   QDesktopServices::unsetUrlHandler("file");
-}
-
-TEST_F(ReportWindowTest, TheWindowClosesWhenItsContextGoes) {
-  openReport({web});
   QPointer<WTReportWindowController> open = window.release();
   open->setAttribute(Qt::WA_DeleteOnClose);
   context.reset();
@@ -305,14 +284,13 @@ TEST_F(ReportWindowTest, TheWindowClosesWhenItsContextGoes) {
   EXPECT_TRUE(open.isNull());
 }
 
-// The range menu offers its ranges in order; the custom days shown stand when the dialog is dismissed,
-// and are the ones the range takes (its bounds are the range predicate's).
-TEST_F(ReportWindowTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDaysShown) {
-  WTRangePopUpButton button(defaults.get());
-  QStringList titles;
-  for (int i = 0; i < button.count(); ++i) titles << button.itemText(i);
-  EXPECT_EQ(titles, QStringList({"Today", "Yesterday", "This week", "Last week", "This month", "Last month",
-                                 "This year", "Last year", "Any date", "", "Custom..."}));
+// The custom days shown stand when the range dialog is dismissed, and are the ones the range takes (its
+// bounds are the range predicate's). The export writes the range of the project chosen, or of every
+// project when "Selected project" finds none selected.
+TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTheRangeOfTheChosenProjects) {
+  WTProject* selected = nullptr;
+  WTExportController exporter(context.get(), [&] { return selected; });
+  WTRangePopUpButton& button = *exporter.rangeButton();
   using Range = std::pair<std::optional<Date>, std::optional<Date>>;
   auto range = [&] { return Range(button.customRangeBegin(), button.customRangeEnd()); };
   EXPECT_EQ(range(), Range(RZDate::addMonth(clockNow, -1), clockNow));
@@ -335,29 +313,23 @@ TEST_F(ReportWindowTest, TheRangeMenuOffersItsRangesInOrderAndKeepsTheCustomDays
   EXPECT_EQ(dialog->beginEdit()->date(), QDate(2024, 3, 3));
   dialog->accept();
   EXPECT_EQ(chosen, 2);
-}
 
-// "Selected project" without a selection exports every project's entries of the range.
-TEST_F(ReportWindowTest, TheExportWritesTheRangeOfTheChosenProjects) {
-  WTProject* selected = nullptr;
-  WTExportController exporter(context.get(), [&] { return selected; });
   const QString path = dir.filePath("times.csv");
   auto recordsIn = [&] {  // each line's project and task
     QStringList records = linesOf(path);
     for (QString& line : records) line = line.section(u',', 0, 1);
-    return records;
+    return records.join(u' ');
   };
-  exporter.rangeButton()->selectTag(WTRangePredicate::ThisMonth);
   exporter.setSaveLocationChooser(
       [&](QWidget*, const QString&, const QString&, const QString&) { return path; });
   exporter.projectChoice()->button(WTExportController::SelectedProject)->click();
   exporter.accept();
   EXPECT_EQ(exporter.result(), QDialog::Accepted);
-  EXPECT_EQ(recordsIn(), QStringList({"\"Website\",\"Design\"", "\"Website\",\"Design\""}));
+  EXPECT_EQ(recordsIn(), "\"Website\",\"Design\" \"Website\",\"Design\"");
   selected = backend;
-  exporter.rangeButton()->selectTag(WTRangePredicate::LastMonth);
+  button.selectTag(WTRangePredicate::LastMonth);
   ASSERT_TRUE(exporter.exportToPath(path).ok());
-  EXPECT_EQ(recordsIn(), QStringList({"\"Backend\",\"API\""}));
+  EXPECT_EQ(recordsIn(), "\"Backend\",\"API\"");
 }
 
 }  // namespace
