@@ -1,22 +1,25 @@
 #pragma once
 
 #include "ModelFixture.h"
+#include "UserLocale.h"
+#include "WTClientsViewController.h"
+#include "WTItemCellDelegate.h"
+#include "WTItemContainer.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
+#include "WTListView.h"
 #include "WTNavigationController.h"
+#include "WTObjectListModel.h"
 #include "WTOutlineView.h"
 #include "WTProjectsViewController.h"
+#include "WTRateField.h"
 #include "WTViewController.h"
 
-#include <QAbstractItemModelTester>
-#include <QApplication>
-#include <QHelpEvent>
-#include <QLineEdit>
-#include <QMainWindow>
-#include <QMenu>
-#include <QTest>
-#include <QToolTip>
+#include <QtTest>
+#include <QtWidgets>
 
+#include <functional>
+#include <map>
 #include <memory>
 
 // The first of a menu's entries whose title starts with `title`, or nothing.

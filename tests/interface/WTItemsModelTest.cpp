@@ -1,9 +1,4 @@
 #include "UiFixture.h"
-#include "UserLocale.h"
-#include "WTItemContainer.h"
-
-#include <QMimeData>
-#include <QSignalSpy>
 
 namespace {
 

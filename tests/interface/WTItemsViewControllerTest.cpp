@@ -1,11 +1,6 @@
 #include "UiFixture.h"
 #include "WTDatePopover.h"
-#include "WTItemCellDelegate.h"
-#include "WTItemContainer.h"
 #include "WTNotesTextView.h"
-
-#include <QLabel>
-#include <QScrollBar>
 
 namespace {
 

@@ -1,10 +1,5 @@
 #include "UiFixture.h"
-#include "WTClient.h"
 #include "WTDeletion.h"
-#include "WTListView.h"
-#include "WTObjectListModel.h"
-
-#include <QSignalSpy>
 
 namespace {
 

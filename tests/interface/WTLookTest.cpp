@@ -1,8 +1,4 @@
 #include "UiFixture.h"
-#include "WTClient.h"
-#include "WTClientsViewController.h"
-#include "WTListView.h"
-#include "WTObjectListModel.h"
 
 namespace {
 

@@ -1,7 +1,5 @@
 #include "UiFixture.h"
 
-#include <QLabel>
-
 namespace {
 
 class Page : public WTViewController {

@@ -3,13 +3,6 @@
 #include "UiFixture.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
-#include "WTRateField.h"
-
-#include <QCheckBox>
-#include <QDesktopServices>
-#include <QLabel>
-#include <QPushButton>
-#include <QSpinBox>
 
 namespace {
 

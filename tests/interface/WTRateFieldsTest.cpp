@@ -1,21 +1,7 @@
 #include "MemoryKeychain.h"
 #include "UiFixture.h"
-#include "UserLocale.h"
-#include "WTClient.h"
-#include "WTClientsViewController.h"
-#include "WTItemCellDelegate.h"
-#include "WTListView.h"
-#include "WTObjectListModel.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
-#include "WTRateField.h"
-
-#include <QLabel>
-#include <QSignalSpy>
-#include <QTimer>
-
-#include <functional>
-#include <map>
 
 namespace {
 

@@ -6,20 +6,6 @@
 #include "WTReportGenerator.h"
 #include "WTReportWindowController.h"
 
-#include <QAbstractButton>
-#include <QButtonGroup>
-#include <QDateEdit>
-#include <QDesktopServices>
-#include <QDir>
-#include <QFile>
-#include <QLabel>
-#include <QPointer>
-#include <QProcess>
-#include <QScrollBar>
-#include <QStandardPaths>
-#include <QTextBrowser>
-#include <QTextDocument>
-
 namespace {
 
 // The file's lines, sorted.
