@@ -6,8 +6,7 @@
 #include <QObject>
 #include <QStringList>
 
-// The StatusNotifierWatcher of a desktop's tray: it notes who registered which item, as a host would
-// then go and read it.
+// A desktop tray's StatusNotifierWatcher, noting who registered which item.
 class FakeStatusNotifierWatcher : public QObject, protected QDBusContext {
   Q_OBJECT
   Q_CLASSINFO("D-Bus Interface", "org.kde.StatusNotifierWatcher")

@@ -45,8 +45,7 @@ class UrlCatcher : public QObject {
   void open(const QUrl& url) { opened.append(url); }
 };
 
-// A window that hosts one navigation stack, as the main window does; asked about a deletion, it records
-// the question and answers `deletes`.
+// A window hosting one navigation stack; it records deletion questions and answers `deletes`.
 class TestHostWindow : public QMainWindow, public WTNavigationHost {
  public:
   WTNavigationController* stack = nullptr;
@@ -62,8 +61,7 @@ class TestHostWindow : public QMainWindow, public WTNavigationHost {
   }
 };
 
-// A project's outline shown in a host window, its first screen displayed; the window gives the view back
-// before either goes.
+// A project's outline shown in a host window, which gives the view back before either goes.
 struct ShownOutline {
   ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
       : controller(context) {
@@ -163,8 +161,7 @@ class UiTest : public ModelTest {
   }
 };
 
-// A project "Website" with the tasks Design and Build shown in its outline, the outline's model under
-// Qt's model checker.
+// A project Website with the tasks Design and Build in its outline, its model under Qt's checker.
 class OutlineTest : public UiTest {
  protected:
   void SetUp() override {

@@ -15,8 +15,7 @@ namespace {
 
 using Part = WTTableCellView::Part;
 
-// A row of 100 x 20 pixels painted on a red canvas (so untouched pixels show): its body at y 5, the
-// pixel above the groove and the groove's two lines.
+// A row painted on red: its body, the pixel above the groove, and the groove's two lines.
 std::array<QRgb, 4> paintRow(const WTTableRowView& row, bool selected) {
   QImage image(100, 20, QImage::Format_RGB32);
   image.fill(Qt::red);
@@ -26,8 +25,7 @@ std::array<QRgb, 4> paintRow(const WTTableRowView& row, bool selected) {
   return {image.pixel(50, 5), image.pixel(50, 17), image.pixel(50, 18), image.pixel(50, 19)};
 }
 
-// The body takes the row's colours, selected or not (a header looks the same either way) and reaches
-// down to the groove, whose dark and light lines are the same under every row.
+// The body takes the row's colours and reaches the groove, which is the same under every row.
 TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
   const QColor own(120, 130, 140), ownSelected(60, 70, 80);
   const WTTableRowView plain, header = WTTableRowView::initWithHeaderColors(),
@@ -61,8 +59,7 @@ TEST(RZColorTest, HexRGB) {
   for (const auto& [hex, colour] : rows) EXPECT_EQ(RZColor::colorFromHexRGB(hex).rgb(), colour.rgb()) << hex;
 }
 
-// Each mode paints: solid, a gradient from the top (begin) down, and tiles that reach a grown view's new
-// corner; an image of no area draws nothing.
+// Each mode paints; tiles reach a grown view's new corner; an image of no area draws nothing.
 TEST(RZBackgroundViewTest, PaintsEachMode) {
   RZBackgroundView view;
   view.resize(40, 40);
@@ -90,8 +87,7 @@ TEST(RZBackgroundViewTest, PaintsEachMode) {
   EXPECT_NE(larger.pixelColor(48, 48), QColor(Qt::red));
 }
 
-// The notes field shows at its smallest while edited empty, grows with wrapped text and a narrower row up
-// to its limit; a group row has none.
+// The notes field grows with its text and a narrower row, up to its limit.
 TEST(WTTableCellViewTest, TheNotesFieldGrowsBetweenItsLimits) {
   WTTableCellView cell("WTNote");
   cell.setFrame(QRectF(0, 0, 500, 30));
@@ -112,8 +108,7 @@ TEST(WTTableCellViewTest, TheNotesFieldGrowsBetweenItsLimits) {
   EXPECT_EQ(group.requestedHeight(true), group.initialFrame().height());
 }
 
-// A task's five add buttons sit side by side in the kinds' order inside the bar, and answer only while
-// shown; an entry has a date button and none of them.
+// A task's add buttons sit in order inside the bar and answer only while shown.
 TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   WTTableCellView task("WTTask"), time("WTTime");
   const QRectF row(0, 0, 800, 36), bar = task.partRect(Part::HoverBar, row);

@@ -76,8 +76,7 @@ TEST_F(WTItemsModelTest, DayHeadingsNameTheWeekdayAndTheDateInTheUsersLocale) {
   }
 }
 
-// Changes arrive row by row, never as a reset or a new layout; the emptied group goes, and so does
-// everything with the shown project.
+// Changes arrive row by row, never as a reset, down to the shown project's deletion.
 TEST_F(WTItemsModelTest, ChangesArriveAsRowMovesNotResets) {
   auto* a = makeItem<WTTime>(design, "a", at(2024, 3, 11, 8));
   auto* b = makeItem<WTTime>(design, "b", at(2024, 3, 11, 9));
@@ -149,8 +148,7 @@ TEST_F(WTItemsModelTest, ARunningTimersTickRepaintsOnlyItsRowItsGroupAndItsTask)
   EXPECT_EQ(changed.count(), 0);
 }
 
-// A drag carries the uuids in outline order, whatever the selection's, and says whether tasks go with it;
-// where it may land depends on that.
+// A drag carries uuids in outline order and whether tasks go with it; where it may land follows.
 TEST_F(WTItemsModelTest, DragsCarryUuidsInOutlineOrderAndLandOnlyWhereTheyFit) {
   auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));
   auto* time = makeItem<WTTime>(design, "time", at(2024, 3, 11));
@@ -206,7 +204,6 @@ TEST_F(WTItemsModelTest, ADropMovesTheDraggedRecordsToTheRowItLandsOn) {
   auto drop = [&](std::initializer_list<const WTObject*> dragged, int row, const QModelIndex& parent) {
     return model->dropMimeData(dragOf(dragged).get(), Qt::MoveAction, row, 0, parent);
   };
-  // Onto a day of another task; then onto "Pending", which takes the to-do only; then onto a task.
   ASSERT_TRUE(drop({note}, -1, model->indexOfContainer(design, at(2024, 3, 10, 0))));
   EXPECT_EQ(context->undoManager().undoActionName(), "Move");
   ASSERT_TRUE(drop({todo, note}, -1, model->indexOfContainer(design, std::nullopt)));

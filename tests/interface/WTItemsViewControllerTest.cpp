@@ -29,9 +29,7 @@ class WTItemsViewControllerTest : public OutlineTest {
   QString label(const char* name) { return controller->view()->findChild<QLabel*>(name)->text(); }
 };
 
-// A new entry is selected and edited inside open rows (yesterday's day stays as it was); each kind lands
-// in the task it was asked for, nothing without a task. The timer button starts and selects, then stops;
-// the keyboard command acts on the selected row's task.
+// New items land selected, in open rows, in the task asked for; the timer commands act on a task.
 TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpenRows) {
   auto* yesterday = makeItem<WTNote>(build, "yesterday", at(2024, 3, 13));
   WTTime* time = controller->addTimeItem(build);
@@ -60,8 +58,7 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
   EXPECT_FALSE(design->running());
 }
 
-// A tip names the button or field under the mouse and what an edit of it does; a row's text has none
-// (it once said "Start" everywhere), nor has a time's cost, which follows from the time.
+// A tip belongs to a button or editable field, never to a whole row (it once said "Start" everywhere).
 TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsAndEditableFieldsNotToTheWholeRow) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
@@ -91,9 +88,7 @@ TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsAndEditableFieldsNotToT
   QToolTip::hideText();
 }
 
-// Ticking a to-do's box completes it into today's open group, and back into Pending. The date popover
-// moves an item to the day picked, and opens it; a second open while it shows is ignored, and closed
-// without another day chosen it leaves the item alone.
+// Completing a to-do or picking a day moves the item into its new day's group, opened.
 TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   auto* todo = makeItem<WTToDo>(design, "call back", at(2024, 3, 1));
   auto* time = makeItem<WTTime>(design, "meeting", at(2024, 3, 14, 9, 15));
@@ -122,8 +117,7 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   EXPECT_EQ(todo->startDate(), before);
 }
 
-// Notes shown for editing grow the row, though empty, and are stored when editing ends; cleared while
-// still edited, the field stays until it is left.
+// Notes being edited grow the row, even empty; an empty note shrinks it once left.
 TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksItWhenLeft) {
   auto* flat = makeItem<WTFlat>(design, "fee", at(2024, 3, 14));
   endTurn();
@@ -154,8 +148,7 @@ TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksIt
   EXPECT_EQ(flat->notes(), "kept");
 }
 
-// Open rows are remembered per project, and found again by their identity in a new controller (as after
-// a relaunch).
+// Open rows are remembered per project and found again after a relaunch.
 TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 10));
   makeItem<WTToDo>(build, "todo", at(2024, 3, 11));
@@ -184,9 +177,7 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   EXPECT_FALSE(tree->indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
 }
 
-// The window's commands act on the project and the selection. What undo brings back is opened and
-// selected: an item in its day, a whole task as its own row; a change that is not undo leaves the
-// selection alone.
+// Undo reopens and selects what it brings back; other changes leave the selection alone.
 TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
   using Command = WTViewController::Command;
   EXPECT_TRUE(controller->respondsTo(Command::ToggleArchive) && controller->respondsTo(Command::Report));
@@ -223,9 +214,7 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
   EXPECT_EQ(build->items(), QList<WTItem*>{kept});
 }
 
-// The header's name, rate and totals share its width without covering one another, at the narrowest
-// window and with or without a vertical scroll bar beside the rows; a name too long for its room is
-// shortened visibly, not cut off, and shown whole in its tip.
+// The header's parts never overlap and its totals stand over the columns, with or without a scroll bar.
 TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCostColumns) {
   project->setName("The new website of the regional library and its branches");
   for (int day = 1; day <= 25; ++day) makeItem<WTTime>(design, "Sketches", at(2024, 3, day));
@@ -297,8 +286,7 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   EXPECT_EQ(span(time) + ' ' + rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30-10:00 08:30");
 }
 
-// A double-click opens a field, and what is refused leaves the entry as it was; Tab walks on through start,
-// end, duration and name, committing each on the way, and Shift+Tab walks back.
+// Refused times leave the entry as it was; Tab and Shift+Tab walk the fields, committing each.
 TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingTheOthers) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
   endTurn();

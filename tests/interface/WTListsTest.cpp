@@ -14,8 +14,7 @@ QStringList names(const WTObjectListModel& model) {
   return result;
 }
 
-// What a row shows (subtitle, duration, cost, image, tip) follows its records; only a project takes a
-// client, and only a client is one.
+// A row shows its records' totals and look; only a project takes a client, and only a client is one.
 TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   auto* client = makeClient("ACME");
   auto* project = makeProject("Site");
@@ -51,8 +50,7 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00|admin_2_32||false");
 }
 
-// The filtered list follows changes row by row, never by a reset; an archived project comes in, still
-// marked, while a timer started elsewhere (the tray) runs in it, and goes when it stops or its entry goes.
+// The filtered list follows changes row by row, and lists an archived project while its timer runs.
 TEST_F(WTObjectListModelTest, AFilteredListFollowsChangesRowByRowAndShowsAnArchivedProjectWhileItsTimerRuns) {
   makeProject("beta");
   auto* alpha = makeProject("Alpha");
@@ -160,8 +158,7 @@ class WTListControllerTest : public UiTest {
   WTProjectsViewController* projects = nullptr;
 };
 
-// A new project has a task General and its name is edited at once; one the list hides (here: every
-// unnamed one) is made but not edited.
+// A new project has a task General and is named at once, unless the list hides it.
 TEST_F(WTListControllerTest, ANewProjectHasATaskGeneralAndItsNameIsEditedAtOnce) {
   makeProject("Existing");
   endTurn();
@@ -184,8 +181,7 @@ TEST_F(WTListControllerTest, ANewProjectHasATaskGeneralAndItsNameIsEditedAtOnce)
   EXPECT_FALSE(projects->tableView()->isEditing());
 }
 
-// The row menu's archive item acts on the clicked row; without one it is left as it was, and the
-// toolbar's command takes the last selected row, or nothing.
+// The row menu acts on the clicked row, the toolbar on the last selected one, if any.
 TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLastSelected) {
   auto* archived = makeProject("Archived");
   auto *a = makeProject("A"), *c = makeProject("C");
@@ -246,9 +242,7 @@ TEST_F(WTListControllerTest, RemoveAsksWhenItemsGo) {
   EXPECT_EQ(context->undoManager().undoActionName(), "Delete “B”");
 }
 
-// Opening a project pushes its outline on the next turn, after the click, and reuses it for the next.
-// The client chooser offers the clients not archived and sets the project's. Opening a project pushes its
-// outline on the next turn, after the click, and reuses it for the next.
+// The client chooser offers clients not archived; opening a project pushes its outline, reused next time.
 TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   auto* first = makeProject("First");
   makeTask(first, "Only task");

@@ -2,8 +2,7 @@
 
 namespace {
 
-// A selected row of the view, painted with a palette of distinct highlight colours, is mostly highlight
-// and shows its text in the highlighted text colour (yellow).
+// A selected row is mostly the palette's highlight, its text in the highlighted text colour.
 void expectHighlighted(QAbstractItemView* view, const QModelIndex& index) {
   const QColor highlight(10, 90, 200);
   QPalette palette = view->palette();

@@ -15,9 +15,7 @@ class Page : public WTViewController {
   QString name_;
 };
 
-// A push onto an empty stack shows at once; another slides in from the right and a pop back from the left,
-// the view shown always filling the stack. A push from a page waits for the next turn; outside a host
-// window nothing happens.
+// Pushes slide in from the right and pops from the left; a page's push waits for the next turn.
 TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   TestHostWindow window;
   WTNavigationController stack;

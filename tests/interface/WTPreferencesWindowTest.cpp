@@ -11,8 +11,7 @@ using synctest::LoopbackHttpServer;
 const QString kUser = QStringLiteral("ann@example.org");
 const QString kPassword = QStringLiteral("correct horse battery");
 
-// The account the way the application delegate answers it: the user from the settings, the password
-// from the password store.
+// The account as the application delegate answers it: the password from the password store.
 class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
  public:
   StoreCredentials(UserDefaults& defaults, WTPasswordStore& passwords)
@@ -25,8 +24,7 @@ class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
   WTPasswordStore& passwords_;
 };
 
-// An installation with no account yet whose manager asks the password store for the password, as the
-// application delegate's does, and polls only when a test makes it.
+// An installation with no account yet, whose manager polls only when a test makes it.
 class WTPreferencesWindowTest : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -78,8 +76,7 @@ class WTPreferencesWindowTest : public ::testing::Test {
   std::unique_ptr<WTPreferencesWindowController> window;
 };
 
-// Blue without an account (a user name alone, or one of spaces, is none), red when syncing is off and
-// green when on, whoever switched it; a stored account shows in the fields.
+// Blue without an account (spaces are none), red when syncing is off, green when on.
 TEST_F(WTPreferencesWindowTest, TheLightIsBlueWithoutAnAccountRedWhenSyncingIsOffAndGreenWhenOn) {
   defaults->setValue("WTSyncUser", kUser);
   open();
@@ -95,14 +92,12 @@ TEST_F(WTPreferencesWindowTest, TheLightIsBlueWithoutAnAccountRedWhenSyncingIsOf
   EXPECT_EQ(lightAfter([&] { manager->enableSync(); }), "green");
   EXPECT_EQ(lightAfter([&] { manager->disableSync(); }), "red");
   EXPECT_FALSE(window->statusImageView()->toolTip().isEmpty());
-  // Spaces typed and started are stored as typed, and still light blue.
   EXPECT_EQ(lightAfter([&] { startSync("  ", kPassword); }), "blue");
   EXPECT_EQ(defaults->stringForKey("WTSyncUser"), "  ");
   EXPECT_TRUE(manager->syncEnabled());
 }
 
-// Half an account is not stored and starts nothing; a whole one is stored with its password in the
-// keychain only, also when the password alone is changed.
+// Half an account starts nothing; a whole one is stored, its password in the keychain only.
 TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKeychainOnly) {
   open();
   startSync(kUser, QString());
@@ -120,8 +115,7 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKey
   EXPECT_EQ(keychain.entries.value("sync-password"), "battery staple");
 }
 
-// A keyring that did not take the password is said under the password field, not in a dialog: also when
-// that happened at start, before the window was made.
+// A keyring that refused the password is said under the field, not in a dialog, even from start.
 TEST_F(WTPreferencesWindowTest, AKeyringThatDidNotTakeThePasswordIsSaidUnderIt) {
   keychain.available = false;
   defaults->setValue("WTSyncUser", kUser);
@@ -138,8 +132,7 @@ TEST_F(WTPreferencesWindowTest, AKeyringThatDidNotTakeThePasswordIsSaidUnderIt) 
   }
 }
 
-// A server that refuses the account turns the light red with the server's reason said; Start Sync turns
-// it green again.
+// A server's refusal turns the light red with its reason; Start Sync turns it green again.
 TEST_F(WTPreferencesWindowTest, AServerErrorTurnsTheLightRedAndStartSyncTurnsItGreenAgain) {
   LoopbackHttpServer server;
   bool refuse = true;
@@ -164,9 +157,7 @@ TEST_F(WTPreferencesWindowTest, AServerErrorTurnsTheLightRedAndStartSyncTurnsItG
   EXPECT_EQ(light(), "green");
 }
 
-// The server's address is stored as it is confirmed, an emptied one is unset, and one the field refuses
-// stays in it, marked, with nothing stored (what the rate field takes is the rate fields' test). Closing
-// the window, or quitting with it open, stores what was typed without Return.
+// Fields store what they take on Return, on closing and on quitting; what they refuse stays, marked.
 TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest) {
   defaults->setValue("WTSyncServer", "sync.example.org");
   open();
@@ -197,8 +188,7 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");
 }
 
-// Sign-up opens the server's page in the browser; the click ends the field's editing, so the address is
-// the sync's too.
+// Sign-up opens the server's page; the click also ends the field's editing.
 TEST_F(WTPreferencesWindowTest, SignUpOpensTheServersPageInTheBrowser) {
   UrlCatcher catcher;
   for (const char* scheme : {"https", "http"}) QDesktopServices::setUrlHandler(scheme, &catcher, "open");

@@ -30,8 +30,7 @@ class WTRateFieldsTest : public OutlineTest {
   static bool refusedIn(QLineEdit* field, const QString& text) {
     return WTRateField::isRefused(field) && field->text() == text && !field->toolTip().isEmpty();
   }
-  // Types into the outline's editor of one field of an item and presses Return; answers whether the text
-  // was refused in place, then leaves the editor.
+  // Types into an item's field editor with Return; answers whether it was refused in place.
   bool typeIntoRow(WTItem* item, Field field, const QString& text) {
     outline()->setCurrentIndex(rowOf(item));
     controller->cellDelegate()->setEditField(field);
@@ -49,8 +48,7 @@ class WTRateFieldsTest : public OutlineTest {
   WTClient* acme = nullptr;
 };
 
-// The project's field names the rate it inherits, readable whole; a refused rate stays in view through
-// other changes until edited, and an emptied field unsets the rate.
+// The project's field names the inherited rate; a refused rate stays in view until edited.
 TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotARate) {
   QLineEdit* field = controller->rateField();
   EXPECT_EQ(field->placeholderText(), "Inherited: 80.00");
@@ -76,8 +74,7 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   EXPECT_EQ(project->storedRate(), std::nullopt);
 }
 
-// Money typed into each field that takes it is read in the user's locale (how is the money format's), a
-// duration as minutes; what a field refuses stays in it, marked with the reason, and nothing is stored.
+// Each field reads money in the user's locale; what it refuses stays in it, marked, storing nothing.
 TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) {
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 11, 10));
   auto* flat = makeItem<WTFlat>(design, "Review", at(2024, 3, 11, 11));
@@ -123,7 +120,6 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
          return Outcome{defaults->decimalForKey("WTDefaultRate"), refused};
        }},
   };
-  // Each field's second row is refused and leaves what its first stored.
   const struct {
     const char *field, *locale, *typed, *stored;
     bool refused;
@@ -146,8 +142,7 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
   }
 }
 
-// Every row showing a cost repaints at once when a rate above it changes in the records or in the
-// preferences (which rates reach which records is the model's).
+// Every row showing a cost repaints at once when a rate above it changes.
 TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   WTTime* monday = makeItem<WTTime>(design, "Monday", at(2024, 3, 11, 9));
   WTTime* tuesday = makeItem<WTTime>(design, "Tuesday", at(2024, 3, 12, 9));
@@ -157,7 +152,6 @@ TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
                                              rowOf(tuesday), rowOf(tuesday).parent()};
   ASSERT_NE(rowOf(monday).parent(), rowOf(tuesday).parent());
   QSignalSpy spy(model(), &QAbstractItemModel::dataChanged);
-  // Whether every row was repainted since the last look, and the costs shown now.
   auto repaintedShowing = [&] {
     QSet<QPersistentModelIndex> seen;
     for (const QList<QVariant>& args : spy) {

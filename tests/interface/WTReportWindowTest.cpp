@@ -24,8 +24,7 @@ void writeFile(const QString& path, const QString& text) {
   file.write(text.toUtf8());
 }
 
-// A client Acme with the projects Website (Design: 2:30 in March) and Backend (API: 2:00 in February), all
-// at 60 an hour, over a real store file, and a report window on them.
+// Acme's Website (Design, 2:30 in March) and Backend (API, 2:00 in February), all at 60 an hour.
 class ReportWindowTest : public UiTest {
  protected:
   void SetUp() override {
@@ -54,8 +53,7 @@ class ReportWindowTest : public UiTest {
     project->setClient(client);
     return project;
   }
-  // Opens the window on `projects`, rendered with the user's template `text` when one is given; counts
-  // renders and reports shown from then on.
+  // Opens the window, with the user's template `text` if given; counts renders from then on.
   void openReport(const QList<WTProject*>& projects, const QString& text = {}) {
     if (!text.isEmpty()) writeFile(WTReportGenerator::userTemplatePath(), text);
     window = std::make_unique<WTReportWindowController>(context.get());
@@ -89,9 +87,7 @@ class ReportWindowTest : public UiTest {
   int renders = 0, shown = 0;
 };
 
-// The segments choose the mode the report is rendered at; a template error is named in the bar, with
-// what was made around it still shown, until a render without one. A client's report covers exactly its
-// projects, including ones added later.
+// The segments set the mode; a template error shows in the bar until mended; a client covers its projects.
 TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMended) {
   openReport({web}, "mode={{ mode }} {% for project in projects %}[{{ project.name }}]{% /for %}");
   EXPECT_EQ(window->html() + ' ' + QString::number(window->segmentedControl()->checkedId()),
@@ -116,8 +112,7 @@ TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMen
   EXPECT_TRUE(window->errorBar()->isHidden());
 }
 
-// A long report takes seconds to lay out again: it must do so for what it shows, only once seen, and keep
-// the reader's place; a deleted project leaves it.
+// Laying out is slow: only changes the report shows render it, only once seen, keeping the place.
 TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportWaitsUntilSeen) {
   WTTask* chores = makeTask(makeProject("Elsewhere"), "Chores");
   save();
@@ -129,7 +124,6 @@ TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportW
   chores->project()->setName("Away");
   save();
   EXPECT_EQ(renders, 0) << "changes outside the report";
-  // An entry moved out of the report is seen through the task it left.
   WTItem* kickOff = design->items().first();
   kickOff->setTask(chores);
   save();
@@ -147,8 +141,7 @@ TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportW
   window->show();
   EXPECT_EQ(renders, 3) << "shown, then shown again with nothing new";
   EXPECT_TRUE(window->html().contains("[Website 150 ")) << window->html().toStdString();
-  // Costs follow a new default rate, which changes no record and so saves nothing; Design has a rate of
-  // its own, so the project gets a task without one.
+  // A new default rate changes no record, yet costs follow it (Copy has no rate of its own).
   makeTime(makeTask(web, "Copy"), berlin(2024, 3, 6, 9), berlin(2024, 3, 6, 10));
   save();
   defaults->setValue("WTDefaultRate", "100");
@@ -161,8 +154,7 @@ TEST_F(ReportWindowTest, OnlyChangesTheReportShowsRenderItAgainAndAHiddenReportW
   EXPECT_EQ(window->projects(), QList<WTProject*>{web});
 }
 
-// A long report is read into its document on another thread, so the window's thread never stalls for it;
-// only the newest render reaches the view, and the reader keeps their place.
+// A long report is read on another thread; only the newest render reaches the view.
 TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKeepingThePlace) {
   openReport({web},
              "{% for project in projects %}<h1>{{ project.name }} {{ project.duration }} mode {{ mode }}"
@@ -189,16 +181,13 @@ TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKe
   waitForDocument();
   EXPECT_EQ(shown, 3);
   EXPECT_TRUE(text().contains("mode 2"));
-  // A short render while a long one is being read: the long one never replaces it.
   window->setMode(3);
   rerender("<p>short, mode {{ mode }}</p>");
   waitForDocument();
   EXPECT_EQ(text().trimmed(), "short, mode 3");
 }
 
-// What the lines hold is the CSV export's; the window writes them for its mode to the file chosen, and
-// nothing when the choice is cancelled or the folder is missing. The PDF holds the report on numbered
-// pages, the total on the last.
+// Exports go to the file chosen (none when cancelled); the PDF's pages are numbered, the total last.
 TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   openReport({web, backend});
   const QString csv = dir.filePath("report.csv"), html = dir.filePath("report.html");
@@ -250,8 +239,7 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   }
 }
 
-// How the copy is made is the generator's; the window opens it and shows the user's changes once saved.
-// The window closes when its context goes.
+// The user's copy of the template opens and its changes show; the window goes with its context.
 TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
   UrlCatcher catcher;
   QDesktopServices::setUrlHandler("file", &catcher, "open");
@@ -270,9 +258,7 @@ TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
   EXPECT_TRUE(open.isNull());
 }
 
-// The custom days shown stand when the range dialog is dismissed, and are the ones the range takes (its
-// bounds are the range predicate's). The export writes the range of the project chosen, or of every
-// project when "Selected project" finds none selected.
+// Custom days stand when the range dialog is dismissed; the export writes the chosen project's range.
 TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTheRangeOfTheChosenProjects) {
   WTProject* selected = nullptr;
   WTExportController exporter(context.get(), [&] { return selected; });

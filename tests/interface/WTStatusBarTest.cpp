@@ -55,17 +55,14 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   EXPECT_EQ(rowsOf(popup), QStringList({"T4:Stop", "T1:Stop", "T9:Start", "T8:Start", "T7:Start"}));
   EXPECT_GE(popup.y(), 24) << "below the icon it opened from";
 
-  // The button of T8's row starts T8's timer; the list follows with the popup still open.
   ASSERT_EQ(rowsOf(popup).indexOf("T8:Start"), 3);
   shownRows(popup)[3]->findChild<QToolButton*>("timerButton")->click();
   settle();
   EXPECT_TRUE(tasks[8]->running());
   EXPECT_EQ(runningTimesOf(tasks[8]).size(), 1);
   EXPECT_TRUE(popup.isVisible());
-  // Running tasks come first, the latest tracked of them first: T8 last ended after T4 and T1.
   EXPECT_EQ(rowsOf(popup), QStringList({"T8:Stop", "T4:Stop", "T1:Stop", "T9:Start", "T7:Start"}));
 
-  // A second click on the icon while it is open does nothing; an empty list closes it.
   statusBar.statusBarClicked(QRect(0, 0, 24, 24));
   EXPECT_GE(popup.y(), 24);
   for (WTTask* task : tasks) context->deleteObject(task);
@@ -73,8 +70,7 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   EXPECT_FALSE(popup.isVisible());
 }
 
-// The icon and its tip carry the running time; the list shows the running task's minutes and follows the
-// ticks in place, its rows left as they are.
+// The icon, its tip and the list carry the running time, the list's rows updated in place.
 TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) {
   WTTask* task = makeTask();
   WTStatusBarController statusBar(context.get(), updater.get());
@@ -116,9 +112,7 @@ TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) 
   EXPECT_EQ(shows(), "Tessal StopWatch");
 }
 
-// The item registers with the watcher; a host reads it as AppIndicator hosts do and hears its label change;
-// its menu is the tray menu, a click on an entry is that entry's, and a click on the item opens the list.
-// A tray that restarts (GNOME reloading its extensions) gets the item again.
+// The tray item registers, labels and serves its menu on the bus, and comes back when the tray does.
 TEST_F(TrayHostTest, TheTrayItemRegistersWithTheWatcherAndCarriesTheRunningTimeAsItsLabel) {
   QDBusConnection watcherBus = PrivateBus::instance().connect();
   watcher.moveToThread(&serviceThread);
