@@ -1,17 +1,11 @@
 #pragma once
-// A desktop's tray as the tray item meets it on the bus.
-#include <QDBusContext>
-#include <QDBusMessage>
-#include <QMutex>
-#include <QObject>
-#include <QStringList>
+#include <QtDBus>
 
 // A desktop tray's StatusNotifierWatcher, noting who registered which item.
 class FakeStatusNotifierWatcher : public QObject, protected QDBusContext {
   Q_OBJECT
   Q_CLASSINFO("D-Bus Interface", "org.kde.StatusNotifierWatcher")
  public:
-  // The service names items registered, in order.
   QStringList registered() const {
     QMutexLocker lock(&mutex_);
     return registered_;

@@ -6,8 +6,7 @@
 
 #include <gtest/gtest.h>
 
-#include <QApplication>
-#include <QPainter>
+#include <QtWidgets>
 
 #include <array>
 

@@ -120,25 +120,18 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
          return Outcome{defaults->decimalForKey("WTDefaultRate"), refused};
        }},
   };
-  const struct {
-    const char *field, *locale, *typed, *stored;
-    bool refused;
-  } rows[] = {{"project", "de_DE", "1.250,5", "1250.5", false},
-              {"project", "en_US", "1.250,5", "1250.5", true},
-              {"client", "de_DE", "1.250,5", "1250.5", false},
-              {"client", "en_US", "1.250,5", "1250.5", true},
-              {"expense", "de_DE", "1.250,5", "1250.5", false},
-              {"expense", "en_US", "1.250,5", "1250.5", true},
-              {"preferences", "de_DE", "1.250,5", "1250.5", false},
-              {"preferences", "en_US", "1.250,5", "1250.5", true},
-              {"duration", "en_US", "1:15", "75", false},
-              {"duration", "en_US", "1.5", "75", true}};
-  for (const auto& row : rows) {
-    SCOPED_TRACE(std::string(row.field) + ' ' + row.locale + " \"" + row.typed + '"');
-    const UserLocale user(row.locale);
-    endTurn();
-    EXPECT_EQ(fields.at(row.field)(QString::fromUtf8(row.typed)),
-              Outcome(Decimal::fromString(QString::fromUtf8(row.stored)), row.refused));
+  // German takes money typed "1.250,5", American refuses it; a duration is taken as "1:15", never as "1.5".
+  for (const char* field : {"project", "client", "expense", "preferences", "duration"}) {
+    const bool money = std::string(field) != "duration";
+    for (const bool refused : {false, true}) {
+      SCOPED_TRACE(std::string(field) + (refused ? " refused" : " taken"));
+      const UserLocale user(money && !refused ? "de_DE" : "en_US");
+      endTurn();
+      EXPECT_EQ(fields.at(field)(money     ? "1.250,5"
+                                 : refused ? "1.5"
+                                           : "1:15"),
+                Outcome(money ? dec("1250.5") : Decimal(75), refused));
+    }
   }
 }
 

@@ -7,17 +7,12 @@
 #include "WTStatusBarController.h"
 #include "WTStatusBarPopup.h"
 #include "WTStatusNotifierItem.h"
-#include "WTTask.h"
-#include "WTTime.h"
 
 #include <gtest/gtest.h>
 
-#include <QDBusPendingCall>
-#include <QLabel>
-#include <QSignalSpy>
-#include <QSystemTrayIcon>
-#include <QThread>
-#include <QToolButton>
+#include <QtDBus>
+#include <QtTest>
+#include <QtWidgets>
 
 namespace {
 
