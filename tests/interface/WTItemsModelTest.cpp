@@ -169,28 +169,17 @@ TEST_F(WTItemsModelTest, DragsCarryUuidsInOutlineOrderAndLandOnlyWhereTheyFit) {
   QByteArray no;
   QDataStream(&no, QIODevice::WriteOnly) << false;
   onlyFlag.setData("WTContainsTasks", no);
-  const struct {
-    const char* what;
-    const QMimeData* data;
-    int row;
-    QModelIndex parent;
-    bool accepted;
-  } cases[] = {
-      {"tasks between top-level rows", tasks.get(), 1, {}, true},
-      {"tasks at the end of the outline", tasks.get(), -1, {}, true},
-      {"tasks onto a task", tasks.get(), -1, task, false},
-      {"tasks into a group", tasks.get(), 0, pending, false},
-      {"items onto a task", items.get(), -1, task, true},
-      {"items onto a day group", items.get(), -1, day, true},
-      {"items onto the pending group", items.get(), -1, pending, true},
-      {"items between rows of a group", items.get(), 0, day, false},
-      {"items between tasks", items.get(), 1, {}, false},
-      {"items onto an item", items.get(), -1, item, false},
-      {"a drag without uuids", &onlyFlag, -1, task, false},
-      {"something else altogether", &foreign, -1, task, false},
+  const std::tuple<const QMimeData*, int, QModelIndex> drops[] = {
+      {tasks.get(), 1, {}},    {tasks.get(), -1, {}},   {tasks.get(), -1, task},    {tasks.get(), 0, pending},
+      {items.get(), -1, task}, {items.get(), -1, day},  {items.get(), -1, pending}, {items.get(), 0, day},
+      {items.get(), 1, {}},    {items.get(), -1, item}, {&onlyFlag, -1, task},      {&foreign, -1, task},
   };
-  for (const auto& c : cases)
-    EXPECT_EQ(model->canDropMimeData(c.data, Qt::MoveAction, c.row, 0, c.parent), c.accepted) << c.what;
+  QString accepted;
+  for (const auto& [data, row, parent] : drops)
+    accepted += model->canDropMimeData(data, Qt::MoveAction, row, 0, parent) ? u'1' : u'0';
+  // Tasks between top rows, at the end, onto a task, into a group; items onto a task, a day, Pending,
+  // between a group's rows, between tasks, onto an item; a drag without uuids; something else.
+  EXPECT_EQ(accepted, "110011100000");
 }
 
 // What each drop does to the records is the model's; here, that each row hands the drop on.
@@ -223,24 +212,17 @@ TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
   EXPECT_TRUE(model->setData(model->indexOfObject(time), "1:30", WTItemsModel::DurationEditRole));
   EXPECT_EQ(time->duration(), 90);
   time->setRunning(true);  // a running entry's length belongs to the clock
-  const struct {
-    const WTObject* row;
-    const char* typed;
-    int role;
-    bool taken;
-  } rows[] = {
-      {flat, "45", WTItemsModel::DurationEditRole, true},
-      {flat, "1.5", WTItemsModel::DurationEditRole, false},  // never a fraction cut to whole minutes
-      {flat, "0:1,5", WTItemsModel::DurationEditRole, false},
-      {expense, "12.50", WTItemsModel::AmountEditRole, true},
-      {expense, "twelve", WTItemsModel::AmountEditRole, false},
-      {expense, "1:00", WTItemsModel::DurationEditRole, false},
-      {time, "2:00", WTItemsModel::DurationEditRole, false},
-      {design, "Design & UX", WTItemsModel::NameRole, true},
-      {flat, "line one\nline two", WTItemsModel::NotesRole, true},
+  const int duration = WTItemsModel::DurationEditRole, amount = WTItemsModel::AmountEditRole,
+            name = WTItemsModel::NameRole, notes = WTItemsModel::NotesRole;
+  const std::tuple<const WTObject*, const char*, int> edits[] = {
+      {flat, "45", duration},     {flat, "1.5", duration},       {flat, "0:1,5", duration},
+      {expense, "12.50", amount}, {expense, "twelve", amount},   {expense, "1:00", duration},
+      {time, "2:00", duration},   {design, "Design & UX", name}, {flat, "line one\nline two", notes},
   };
-  for (const auto& row : rows)
-    EXPECT_EQ(model->setData(model->indexOfObject(row.row), row.typed, row.role), row.taken) << row.typed;
+  QString taken;
+  for (const auto& [object, typed, role] : edits)
+    taken += model->setData(model->indexOfObject(object), typed, role) ? u'1' : u'0';
+  EXPECT_EQ(taken, "100100011");  // a fraction is never cut to whole minutes
   EXPECT_EQ(
       std::tuple(flat->duration(), expense->expense(), design->name(), flat->notes()),
       std::tuple(45, Decimal::fromString(u"12.5"), QString("Design & UX"), QString("line one\nline two")));

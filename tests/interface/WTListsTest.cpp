@@ -181,10 +181,12 @@ TEST_F(WTListControllerTest, ANewProjectHasATaskGeneralAndItsNameIsEditedAtOnce)
   EXPECT_FALSE(projects->tableView()->isEditing());
 }
 
-// The row menu acts on the clicked row, the toolbar on the last selected one, if any.
-TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLastSelected) {
+// The row menu acts on the clicked row, the toolbar on the last selected one, if any; removing asks the
+// window only when something of value goes.
+TEST_F(WTListControllerTest, TheRowMenuAndTheToolbarActOnTheClickedOrLastSelectedRow) {
   auto* archived = makeProject("Archived");
   auto *a = makeProject("A"), *c = makeProject("C");
+  makeItem<WTNote>(makeTask(a, "General"), "note", at(2024, 3, 1));
   archived->setArchived(true);
   projects->setArchivedPredicate({});  // archived ones shown
   endTurn();
@@ -204,7 +206,6 @@ TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLast
   tagged->setText("untouched");
   click(-1);
   EXPECT_EQ(tagged->text(), "untouched");
-
   QSignalSpy validation(projects, &WTViewController::validationChanged);
   select(a);
   EXPECT_GE(validation.count(), 1);
@@ -213,33 +214,24 @@ TEST_F(WTListControllerTest, TheRowMenuArchivesTheClickedRowAndTheToolbarTheLast
   EXPECT_TRUE(c->archived() && !a->archived());
   endTurn();  // drawn archived and selected, still listed
   EXPECT_GE(rowOf(c), 0);
-  projects->tableView()->selectionModel()->clearSelection();
-  projects->toggleArchive();
-  EXPECT_FALSE(a->archived());
-}
 
-// Removing asks the window only when something of value goes, by the toolbar and the row's menu alike.
-TEST_F(WTListControllerTest, RemoveAsksWhenItemsGo) {
-  auto *a = makeProject("A"), *b = makeProject("B");
-  endTurn();
-  select(a, QItemSelectionModel::ClearAndSelect);
+  select(archived, QItemSelectionModel::ClearAndSelect);
   projects->removeSelectedObjects();
-  EXPECT_EQ(context->fetch<WTProject>(), QList<WTProject*>{b});
-  EXPECT_EQ(names(*projects->arrayController()), QStringList{"B"});
+  EXPECT_EQ(names(*projects->arrayController()), QStringList({"A", "C"}));
   EXPECT_EQ(projects->selectedObject(), nullptr);
   EXPECT_EQ(shown->window.questions, QStringList{});
-  makeItem<WTNote>(makeTask(b, "General"), "note", at(2024, 3, 1));
+  projects->toggleArchive();  // nothing selected: nothing happens
+  EXPECT_FALSE(a->archived());
   shown->window.deletes = false;
-  projects->selectObject(b);
+  projects->selectObject(a);
   projects->removeSelectedObjects();
-  EXPECT_EQ(shown->window.questions, QStringList{"Delete “B” and its 1 item?"});
-  EXPECT_TRUE(context->fetch<WTProject>().contains(b));
+  EXPECT_EQ(shown->window.questions, QStringList{"Delete “A” and its 1 item?"});
   shown->window.deletes = true;
-  projects->tableView()->setClickedRow(rowOf(b));
-  projects->rowMenu()->actions().last()->trigger();
+  click(rowOf(a));
+  menu->actions().last()->trigger();
   EXPECT_EQ(shown->window.questions.size(), 2);
-  EXPECT_FALSE(context->fetch<WTProject>().contains(b));
-  EXPECT_EQ(context->undoManager().undoActionName(), "Delete “B”");
+  EXPECT_EQ(context->fetch<WTProject>(), QList<WTProject*>{c});
+  EXPECT_EQ(context->undoManager().undoActionName(), "Delete “A”");
 }
 
 // The client chooser offers clients not archived; opening a project pushes its outline, reused next time.
