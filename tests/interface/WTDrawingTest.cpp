@@ -1,5 +1,4 @@
 #include "RZBackgroundView.h"
-#include "RZColor.h"
 #include "WTImages.h"
 #include "WTTableCellView.h"
 #include "WTTableRowView.h"
@@ -50,13 +49,6 @@ TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
   EXPECT_EQ(paintRow(bare, false), (std::array<QRgb, 4>{red, red, red, red}));
 }
 
-TEST(RZColorTest, HexRGB) {
-  const std::pair<const char*, QColor> rows[] = {
-      {"FF8000", QColor(255, 128, 0)}, {"1FF8000", QColor(255, 128, 0)}, {"0x0000ff", QColor(0, 0, 255)},
-      {"", QColor(Qt::black)},         {"not hex", QColor(Qt::black)},
-  };
-  for (const auto& [hex, colour] : rows) EXPECT_EQ(RZColor::colorFromHexRGB(hex).rgb(), colour.rgb()) << hex;
-}
 
 // Each mode paints; tiles reach a grown view's new corner; an image of no area draws nothing.
 TEST(RZBackgroundViewTest, PaintsEachMode) {

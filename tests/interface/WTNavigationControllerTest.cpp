@@ -42,7 +42,7 @@ TEST(WTNavigationControllerTest, PushSlidesInAndPopSlidesBack) {
   EXPECT_TRUE(stack.isAnimating());
   EXPECT_EQ(root.displayed + detail.displayed, 2);
   QTest::qWait(60);
-  EXPECT_GT(detail.view()->x(), 0);
+  EXPECT_GT(detail.view()->x(), 0);  // coming in from the right
   ASSERT_TRUE(QTest::qWaitFor([&] { return !stack.isAnimating(); }, 2000));
   EXPECT_EQ(shown(), QList<QWidget*>{detail.view()});
   detail.popViewController();

@@ -23,12 +23,15 @@ class StatusBarTest : public TrackingTest {
     rows.removeIf([&](const QWidget* row) { return !row->isVisibleTo(&popup); });
     return rows;
   }
-  // Each row of the popup as "TITLE:BUTTON", in order.
+  // Each row of the popup as "TITLE:BUTTON", and its elapsed time if shown, in order.
   static QStringList rowsOf(const WTStatusBarPopup& popup) {
     QStringList rows;
-    for (const QWidget* row : shownRows(popup))
+    for (const QWidget* row : shownRows(popup)) {
+      const QString elapsed = row->findChild<QLabel*>("taskElapsed")->text();
       rows << row->findChild<QLabel*>("taskTitle")->text().section(u'\n', 0, 0) + ":" +
-                  row->findChild<QToolButton*>("timerButton")->text();
+                  row->findChild<QToolButton*>("timerButton")->text() +
+                  (elapsed.isEmpty() ? "" : " " + elapsed);
+    }
     return rows;
   }
 };
@@ -47,7 +50,8 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   WTStatusBarPopup& popup = *statusBar.popup();
   statusBar.statusBarClicked(QRect(600, 0, 24, 24));
   ASSERT_TRUE(popup.isVisible());
-  EXPECT_EQ(rowsOf(popup), QStringList({"T4:Stop", "T1:Stop", "T9:Start", "T8:Start", "T7:Start"}));
+  EXPECT_EQ(rowsOf(popup),
+            QStringList({"T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T8:Start", "T7:Start"}));
   EXPECT_GE(popup.y(), 24) << "below the icon it opened from";
 
   ASSERT_EQ(rowsOf(popup).indexOf("T8:Start"), 3);
@@ -56,7 +60,8 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   EXPECT_TRUE(tasks[8]->running());
   EXPECT_EQ(runningTimesOf(tasks[8]).size(), 1);
   EXPECT_TRUE(popup.isVisible());
-  EXPECT_EQ(rowsOf(popup), QStringList({"T8:Stop", "T4:Stop", "T1:Stop", "T9:Start", "T7:Start"}));
+  EXPECT_EQ(rowsOf(popup),
+            QStringList({"T8:Stop 00:00", "T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T7:Start"}));
 
   statusBar.statusBarClicked(QRect(0, 0, 24, 24));
   EXPECT_GE(popup.y(), 24);
@@ -85,23 +90,13 @@ TEST_F(StatusBarTest, TheXEmbedIconAndThePopupCarryTheRunningTimeAfterEachTick) 
   makeTask(nullptr, "Idle");
   statusBar.statusBarClicked(QRect(600, 0, 24, 24));
   settle();
-  auto labels = [&] {
-    QList<const QLabel*> shown;
-    for (const QWidget* row : shownRows(*statusBar.popup())) shown << row->findChild<QLabel*>("taskElapsed");
-    return shown;
-  };
-  auto elapsed = [&] {
-    QStringList texts;
-    for (const QLabel* label : labels()) texts << label->text();
-    return texts.join(u'|');
-  };
-  EXPECT_EQ(elapsed(), "01:15|");
-  const QList<const QLabel*> before = labels();
+  const QList<QWidget*> before = shownRows(*statusBar.popup());
+  EXPECT_EQ(rowsOf(*statusBar.popup()), QStringList({"Task:Stop 01:15", "Idle:Start"}));
   advance(60);
   updater->update();
   settle();
-  EXPECT_EQ(elapsed(), "01:16|");
-  EXPECT_EQ(labels(), before);
+  EXPECT_EQ(rowsOf(*statusBar.popup()), QStringList({"Task:Stop 01:16", "Idle:Start"}));
+  EXPECT_EQ(shownRows(*statusBar.popup()), before);
   task->stopAllTimers();
   settle();
   EXPECT_EQ(shows(), "Tessal StopWatch");
