@@ -157,7 +157,8 @@ TEST_F(WTPreferencesWindowTest, AServerErrorTurnsTheLightRedAndStartSyncTurnsItG
   EXPECT_EQ(light(), "green");
 }
 
-// Fields store what they take on Return, on closing and on quitting; what they refuse stays, marked.
+// Fields store what they take on Return, closing or quitting, and refuse the rest; sign-up opens the server's
+// page.
 TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest) {
   defaults->setValue("WTSyncServer", "sync.example.org");
   open();
@@ -174,7 +175,19 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
         << typed;
   }
   EXPECT_FALSE(defaults->hasStoredValue("WTSyncServer"));
-  EXPECT_FALSE(window->signUpButton()->isEnabled());  // no address
+  EXPECT_FALSE(window->signUpButton()->isEnabled() || window->signUp());  // no address
+  UrlCatcher catcher;
+  for (const char* scheme : {"https", "http"}) QDesktopServices::setUrlHandler(scheme, &catcher, "open");
+  type(window->serverField(), "sync.example.org");
+  EXPECT_TRUE(window->signUpButton()->isEnabled());
+  QTest::mouseClick(window->signUpButton(), Qt::LeftButton);
+  EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.org");
+  type(window->serverField(), "http://127.0.0.1:8080/tessal/");
+  QTest::mouseClick(window->signUpButton(), Qt::LeftButton);
+  EXPECT_EQ(catcher.opened, (QList<QUrl>{QUrl("https://sync.example.org/sync/tessal/signup.php"),
+                                         QUrl("http://127.0.0.1:8080/tessal/sync/tessal/signup.php")}));
+  EXPECT_EQ(manager->configuredEndpoint(), QUrl("http://127.0.0.1:8080/tessal/sync/tessal/sync.php"));
+  for (const char* scheme : {"https", "http"}) QDesktopServices::unsetUrlHandler(scheme);
   type(window->defaultRateField(), "abc", true);
   type(window->defaultRateField(), "95");
   EXPECT_FALSE(WTRateField::isRefused(window->defaultRateField()));  // typing clears the mark
@@ -186,24 +199,6 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   type(window->serverField(), "sync.example.com");
   window.reset();
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");
-}
-
-// Sign-up opens the server's page; the click also ends the field's editing.
-TEST_F(WTPreferencesWindowTest, SignUpOpensTheServersPageInTheBrowser) {
-  UrlCatcher catcher;
-  for (const char* scheme : {"https", "http"}) QDesktopServices::setUrlHandler(scheme, &catcher, "open");
-  open();
-  EXPECT_FALSE(window->signUp());
-  type(window->serverField(), "sync.example.org");
-  EXPECT_TRUE(window->signUpButton()->isEnabled());
-  QTest::mouseClick(window->signUpButton(), Qt::LeftButton);
-  EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.org");
-  type(window->serverField(), "http://127.0.0.1:8080/tessal/");
-  QTest::mouseClick(window->signUpButton(), Qt::LeftButton);
-  EXPECT_EQ(catcher.opened, (QList<QUrl>{QUrl("https://sync.example.org/sync/tessal/signup.php"),
-                                         QUrl("http://127.0.0.1:8080/tessal/sync/tessal/signup.php")}));
-  EXPECT_EQ(manager->configuredEndpoint(), QUrl("http://127.0.0.1:8080/tessal/sync/tessal/sync.php"));
-  for (const char* scheme : {"https", "http"}) QDesktopServices::unsetUrlHandler(scheme);
 }
 
 // The timer settings are stored as they are changed, and shown again by the next window.
