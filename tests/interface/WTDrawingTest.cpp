@@ -49,7 +49,6 @@ TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
   EXPECT_EQ(paintRow(bare, false), (std::array<QRgb, 4>{red, red, red, red}));
 }
 
-
 // Each mode paints; tiles reach a grown view's new corner; an image of no area draws nothing.
 TEST(RZBackgroundViewTest, PaintsEachMode) {
   RZBackgroundView view;

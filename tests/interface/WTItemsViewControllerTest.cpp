@@ -26,7 +26,6 @@ class WTItemsViewControllerTest : public OutlineTest {
     return (date ? RZDate::stringWithPattern(*date, "MM-dd") : QString("Pending")) +
            (outline()->isExpanded(group) ? " open" : " closed");
   }
-  QString label(const char* name) { return controller->view()->findChild<QLabel*>(name)->text(); }
 };
 
 // New items land selected, in open rows, in the task asked for; the timer commands act on a task.
@@ -248,22 +247,6 @@ TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCost
       EXPECT_TRUE(title->text() == project->name() || title->toolTip() == project->name());
     }
   }
-}
-
-// Totals once waited for the next minute tick after a start was moved or a rate was undone.
-TEST_F(WTItemsViewControllerTest, TheHeaderTotalsFollowAMovedStartAndAnUndoneRateAtOnce) {
-  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
-  endTurn();
-  ASSERT_TRUE(model()->setData(rowOf(time), "11:45", WTItemsModel::StartTimeEditRole));
-  EXPECT_EQ(label("projectDuration") + ' ' + label("projectCost").right(5), "00:45 37.50");  // at 50
-  endTurn();
-  design->setRate(Decimal(80));
-  endTurn();
-  EXPECT_EQ(label("projectCost").right(5), "60.00");
-  context->undoManager().undo();
-  EXPECT_EQ(label("projectCost").right(5), "37.50");
-  context->undoManager().undo();  // the start
-  EXPECT_EQ(label("projectDuration"), "00:30");
 }
 
 // Time already spent is entered stopped by typing its duration: it ends now, not that long from now.
