@@ -77,27 +77,6 @@ TEST(RZBackgroundViewTest, PaintsEachMode) {
   EXPECT_NE(larger.pixelColor(48, 48), QColor(Qt::red));
 }
 
-// The notes field grows with its text and a narrower row, up to its limit.
-TEST(WTTableCellViewTest, TheNotesFieldGrowsBetweenItsLimits) {
-  WTTableCellView cell("WTNote");
-  cell.setFrame(QRectF(0, 0, 500, 30));
-  const qreal main = cell.initialFrame().height(), editingEmpty = cell.requestedHeight(true);
-  EXPECT_EQ(cell.requestedHeight(false), main);
-  EXPECT_GE(editingEmpty, main + WTTableCellView::kMinimumNotesHeight + WTTableCellView::kNotesBottomMargin);
-  cell.setNotes("short");
-  EXPECT_EQ(cell.requestedHeight(false), editingEmpty);
-  cell.setNotes(QString("word ").repeated(60));
-  const qreal wrapped = cell.requestedHeight(false);
-  EXPECT_GT(wrapped, editingEmpty);
-  cell.setFrame(QRectF(0, 0, 300, 30));
-  EXPECT_GT(cell.requestedHeight(false), wrapped);
-  cell.setNotes(QString("line\n").repeated(500));
-  EXPECT_EQ(cell.notesFrame().height(), WTTableCellView::kMaximumNotesHeight);
-  WTTableCellView group("WTItemContainer");
-  group.setNotes("ignored");
-  EXPECT_EQ(group.requestedHeight(true), group.initialFrame().height());
-}
-
 // A task's add buttons sit in order inside the bar and answer only while shown.
 TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   WTTableCellView task("WTTask"), time("WTTime");

@@ -134,6 +134,8 @@ TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksIt
   EXPECT_GE(open, withField);
   editor->setPlainText("first\nsecond\nthird\nfourth");
   EXPECT_GT(height(), open);
+  editor->setPlainText(QString("line\n").repeated(500));
+  EXPECT_LE(height(), plain + WTTableCellView::kMaximumNotesHeight + WTTableCellView::kNotesBottomMargin);
   EXPECT_EQ(flat->notes(), QString());
   editor->clear();
   EXPECT_GE(height(), withField);
