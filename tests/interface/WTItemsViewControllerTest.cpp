@@ -57,36 +57,6 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
   EXPECT_FALSE(design->running());
 }
 
-// A tip belongs to a button or editable field, never to a whole row (it once said "Start" everywhere).
-TEST_F(WTItemsViewControllerTest, ToolTipsBelongToButtonsAndEditableFieldsNotToTheWholeRow) {
-  WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13));
-  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
-  controller->expandContainerOfItem(time);  // its day is not shown yet: only its task opens
-  EXPECT_TRUE(outline()->isExpanded(rowOf(design)));
-  endTurn();
-  controller->expandContainerOfItem(time);
-  ASSERT_FALSE(design->buttonTitle().isEmpty());
-  const std::tuple<const WTObject*, Part, QString> rows[] = {
-      // all of a task's tip, else a part of it; empty: no tip
-      {design, Part::TimerButton, design->buttonTitle()},
-      {design, Part::Name, {}},
-      {time, Part::Label, "the end stays"},
-      {time, Part::End, "the start stays"},
-      {time, Part::Duration, "the end moves"},
-      {time, Part::Cost, {}},
-      {expense, Part::Cost, "double-click"},
-  };
-  for (const auto& [object, part, says] : rows) {
-    const QString tip = shown->tipAt(shown->centreOf(object, part));
-    if (says.isEmpty() || object == design) {
-      EXPECT_EQ(tip, says) << object->name().toStdString() << ' ' << int(part);
-    } else {
-      EXPECT_TRUE(tip.contains("double-click") && tip.contains(says)) << tip.toStdString();
-    }
-  }
-  QToolTip::hideText();
-}
-
 // Completing a to-do or picking a day moves the item into its new day's group, opened.
 TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   auto* todo = makeItem<WTToDo>(design, "call back", at(2024, 3, 1));
@@ -257,10 +227,8 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   ASSERT_NE(actionTitled(menu.get(), "New Time Entry"), nullptr);
   actionTitled(menu.get(), "New Time Entry")->trigger();
   ASSERT_EQ(build->items().size(), 1);
-  ASSERT_EQ(build->items().first()->entity(), WTEntity::Time);
-  auto* time = static_cast<WTTime*>(build->items().first());
-  EXPECT_FALSE(time->running());
-  ASSERT_TRUE(outline()->isEditing());
+  auto* time = dynamic_cast<WTTime*>(build->items().first());
+  ASSERT_TRUE(time && !time->running() && outline()->isEditing());
   auto* editor = outline()->viewport()->findChild<QLineEdit*>("durationEditor");
   ASSERT_NE(editor, nullptr);
   editor->setText("1:30");
@@ -271,11 +239,35 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
   EXPECT_EQ(span(time) + ' ' + rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30-10:00 08:30");
 }
 
-// Refused times leave the entry as it was; Tab and Shift+Tab walk the fields, committing each.
+// Tips belong to buttons and editable fields, never a whole row (once "Start" everywhere); refused times
+// leave the entry as it was; Tab and Shift+Tab walk the fields, committing each.
 TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingTheOthers) {
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
+  auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
+  controller->expandContainerOfItem(time);  // its day is not shown yet: only its task opens
+  EXPECT_TRUE(outline()->isExpanded(rowOf(design)));
   endTurn();
   controller->expandContainerOfItem(time);
+  ASSERT_FALSE(design->buttonTitle().isEmpty());
+  const std::tuple<const WTObject*, Part, QString> tips[] = {
+      // all of a task's tip, else a part of it; empty: no tip
+      {design, Part::TimerButton, design->buttonTitle()},
+      {design, Part::Name, {}},
+      {time, Part::Label, "the end stays"},
+      {time, Part::End, "the start stays"},
+      {time, Part::Duration, "the end moves"},
+      {time, Part::Cost, {}},
+      {expense, Part::Cost, "double-click"},
+  };
+  for (const auto& [object, part, says] : tips) {
+    const QString tip = shown->tipAt(shown->centreOf(object, part));
+    if (says.isEmpty() || object == design) {
+      EXPECT_EQ(tip, says) << object->name().toStdString() << ' ' << int(part);
+    } else {
+      EXPECT_TRUE(tip.contains("double-click") && tip.contains(says)) << tip.toStdString();
+    }
+  }
+  QToolTip::hideText();
   const struct {
     Part part;
     const char *typed, *shownBefore, *after;
