@@ -110,6 +110,19 @@ TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMen
   EXPECT_TRUE(text().contains("fine"));
   rerender("<p>mended</p>");
   EXPECT_TRUE(window->errorBar()->isHidden());
+  // Editing opens the user's copy, whose saved changes show; the window goes with its context.
+  UrlCatcher catcher;
+  QDesktopServices::setUrlHandler("file", &catcher, "open");
+  window->editReportTemplate();
+  EXPECT_EQ(catcher.opened, QList<QUrl>{QUrl::fromLocalFile(WTReportGenerator::userTemplatePath())});
+  writeFile(WTReportGenerator::userTemplatePath(), "<p>my own report</p>");
+  EXPECT_TRUE(QTest::qWaitFor([&] { return window->html() == "<p>my own report</p>"; }, 5000));
+  QDesktopServices::unsetUrlHandler("file");
+  QPointer<WTReportWindowController> open = window.release();
+  open->setAttribute(Qt::WA_DeleteOnClose);
+  context.reset();
+  QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+  EXPECT_TRUE(open.isNull());
 }
 
 // Laying out is slow: only changes the report shows render it, only once seen, keeping the place.
@@ -237,25 +250,6 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
     EXPECT_EQ(pageText.trimmed().split(u'\n').last().trimmed(), n) << "page " << page;
     EXPECT_TRUE(page < count || pageText.contains("12,270.00")) << pageText.toStdString();
   }
-}
-
-// The user's copy of the template opens and its changes show; the window goes with its context.
-TEST_F(ReportWindowTest, EditingTheTemplateOpensTheUsersCopyAndItsChangesShow) {
-  UrlCatcher catcher;
-  QDesktopServices::setUrlHandler("file", &catcher, "open");
-  openReport({web});
-  const QString path = WTReportGenerator::userTemplatePath();
-  window->editReportTemplate();
-  ASSERT_TRUE(QFile::exists(path));
-  EXPECT_EQ(catcher.opened, QList<QUrl>{QUrl::fromLocalFile(path)});
-  writeFile(path, "<p>my own report</p>");
-  EXPECT_TRUE(QTest::qWaitFor([&] { return window->html() == "<p>my own report</p>"; }, 5000));
-  QDesktopServices::unsetUrlHandler("file");
-  QPointer<WTReportWindowController> open = window.release();
-  open->setAttribute(Qt::WA_DeleteOnClose);
-  context.reset();
-  QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-  EXPECT_TRUE(open.isNull());
 }
 
 // Custom days stand when the range dialog is dismissed; the export writes the chosen project's range.
