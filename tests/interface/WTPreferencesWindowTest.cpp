@@ -76,43 +76,36 @@ class WTPreferencesWindowTest : public ::testing::Test {
   std::unique_ptr<WTPreferencesWindowController> window;
 };
 
-// Blue without an account (spaces are none), red when syncing is off, green when on.
-TEST_F(WTPreferencesWindowTest, TheLightIsBlueWithoutAnAccountRedWhenSyncingIsOffAndGreenWhenOn) {
-  defaults->setValue("WTSyncUser", kUser);
+// Blue without an account (a user alone, or spaces, is none), red when syncing is off, green when on;
+// half an account starts nothing, a whole one is stored with its password in the keychain only.
+TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountAndTheLightFollowsSyncing) {
   open();
   EXPECT_EQ(window->emailTextField()->text() + window->passwordTextField()->text(), "");
-  EXPECT_EQ(lightAfter([&] { manager->enableSync(); }), "blue");
-  manager->disableSync();
-  passwords->setPassword(kPassword);
-  open();
-  EXPECT_EQ(window->emailTextField()->text() + ' ' + window->passwordTextField()->text(),
-            kUser + ' ' + kPassword);
-  EXPECT_EQ(window->passwordTextField()->echoMode(), QLineEdit::Password);
-  EXPECT_EQ(light(), "red");
-  EXPECT_EQ(lightAfter([&] { manager->enableSync(); }), "green");
-  EXPECT_EQ(lightAfter([&] { manager->disableSync(); }), "red");
-  EXPECT_FALSE(window->statusImageView()->toolTip().isEmpty());
-  EXPECT_EQ(lightAfter([&] { startSync("  ", kPassword); }), "blue");
-  EXPECT_EQ(defaults->stringForKey("WTSyncUser"), "  ");
-  EXPECT_TRUE(manager->syncEnabled());
-}
-
-// Half an account starts nothing; a whole one is stored, its password in the keychain only.
-TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountWithThePasswordInTheKeychainOnly) {
-  open();
   startSync(kUser, QString());
   EXPECT_FALSE(defaults->hasStoredValue("WTSyncUser") || manager->syncEnabled() || keychain.writes > 0);
+  defaults->setValue("WTSyncUser", kUser);
+  EXPECT_EQ(lightAfter([&] { manager->enableSync(); }), "blue");
+  manager->disableSync();
   EXPECT_EQ(lightAfter([&] { startSync(kUser, kPassword); }), "green");
-  EXPECT_EQ(defaults->stringForKey("WTSyncUser"), kUser);
   EXPECT_EQ(keychain.entries.value("sync-password"), kPassword);
   EXPECT_TRUE(manager->syncEnabled());
   QFile settings(defaults->fileName());
   ASSERT_TRUE(settings.open(QIODevice::ReadOnly));
   const QByteArray bytes = settings.readAll();
   EXPECT_TRUE(bytes.contains("ann@example.org") && !bytes.contains("horse"));
-  manager->disableSync();
+  EXPECT_EQ(lightAfter([&] { manager->disableSync(); }), "red");
+  EXPECT_FALSE(window->statusImageView()->toolTip().isEmpty());
   EXPECT_EQ(lightAfter([&] { type(window->passwordTextField(), "battery staple", true); }), "green");
   EXPECT_EQ(keychain.entries.value("sync-password"), "battery staple");
+  open();
+  EXPECT_EQ(window->emailTextField()->text() + ' ' + window->passwordTextField()->text(),
+            kUser + " battery staple");
+  EXPECT_EQ(window->passwordTextField()->echoMode(), QLineEdit::Password);
+  EXPECT_EQ(lightAfter([&] { manager->disableSync(); }), "red");
+  EXPECT_EQ(lightAfter([&] { manager->enableSync(); }), "green");  // whoever switches it
+  EXPECT_EQ(lightAfter([&] { startSync("  ", kPassword); }), "blue");
+  EXPECT_EQ(defaults->stringForKey("WTSyncUser"), "  ");
+  EXPECT_TRUE(manager->syncEnabled());
 }
 
 // A keyring that refused the password is said under the field, not in a dialog, even from start.
