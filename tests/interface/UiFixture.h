@@ -61,19 +61,31 @@ class TestHostWindow : public QMainWindow, public WTNavigationHost {
   }
 };
 
-// A project's outline shown in a host window, which gives the view back before either goes.
-struct ShownOutline {
-  ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
+// A controller on a navigation stack in a host window, as the main window shows it; the window gives the
+// stack's view back before either goes.
+template <class Controller>
+struct Shown {
+  Shown(WTObjectContext* context, QSize size, const std::function<void(Controller&)>& prepare = {})
       : controller(context) {
-    controller.setProject(project);
-    window.setCentralWidget(controller.view());
+    if (prepare) prepare(controller);
+    window.stack = &stack;
+    window.setCentralWidget(stack.view());
     window.resize(size);
+    stack.pushViewController(&controller);
     window.show();
     EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
-    controller.willDisplayView();
   }
-  ~ShownOutline() { window.takeCentralWidget(); }
+  ~Shown() { window.takeCentralWidget(); }
+  WTNavigationController stack;
+  Controller controller;
+  TestHostWindow window;
+};
+using ShownProjects = Shown<WTProjectsViewController>;
 
+// A project's outline, shown.
+struct ShownOutline : Shown<WTItemsViewController> {
+  ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
+      : Shown(context, size, [project](WTItemsViewController& outline) { outline.setProject(project); }) {}
   WTOutlineView* outline() { return controller.outlineView(); }
   QModelIndex rowOf(const WTObject* object) { return controller.treeController()->indexOfObject(object); }
   // The middle of one part of a record's row, in the outline's viewport.
@@ -99,25 +111,6 @@ struct ShownOutline {
     const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
     return editors.size() == 1 ? editors.first() : nullptr;
   }
-
-  WTItemsViewController controller;
-  TestHostWindow window;
-};
-
-// The projects list on its navigation stack in a host window, as the main window shows it.
-struct ShownProjects {
-  explicit ShownProjects(WTObjectContext* context) : projects(context) {
-    window.stack = &stack;
-    window.setCentralWidget(stack.view());
-    window.resize(800, 500);
-    stack.pushViewController(&projects);
-    window.show();
-    EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
-  }
-  ~ShownProjects() { window.takeCentralWidget(); }
-  WTNavigationController stack;
-  WTProjectsViewController projects;
-  TestHostWindow window;
 };
 
 // The model's world with the clock at 14 March 2024 10:00 until a test moves `clockNow`.

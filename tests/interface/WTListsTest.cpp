@@ -141,8 +141,8 @@ class WTListControllerTest : public UiTest {
  protected:
   void SetUp() override {
     UiTest::SetUp();
-    shown = std::make_unique<ShownProjects>(context.get());
-    projects = &shown->projects;
+    shown = std::make_unique<ShownProjects>(context.get(), QSize(800, 500));
+    projects = &shown->controller;
     projects->setArchivedPredicate(notArchived);
   }
   void TearDown() override {

@@ -46,15 +46,15 @@ TEST_F(WTLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour) {
   WTTask* task = makeTask(project, "Design");
   WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
   ShownOutline shown(context.get(), project, QSize(800, 400));
-  ShownProjects list(context.get());
+  ShownProjects list(context.get(), QSize(800, 500));
   endTurn();
   for (const WTObject* object : QList<const WTObject*>{task, time}) {
     SCOPED_TRACE(object->name().toStdString());
     shown.controller.expandContainerOfItem(time);
     expectHighlighted(shown.outline(), shown.rowOf(object));
   }
-  ASSERT_TRUE(list.projects.arrayController()->index(0, 0).isValid());
-  expectHighlighted(list.projects.tableView(), list.projects.arrayController()->index(0, 0));
+  ASSERT_TRUE(list.controller.arrayController()->index(0, 0).isValid());
+  expectHighlighted(list.controller.tableView(), list.controller.arrayController()->index(0, 0));
 }
 
 // An empty list says how to add the first row, and forgets it once there is one (the outline paints alike).
