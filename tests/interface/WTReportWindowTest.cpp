@@ -31,8 +31,8 @@ class ReportWindowTest : public UiTest {
     UiTest::SetUp();
     setNow(berlin(2024, 3, 20, 12));
     client = makeClient("Acme");
-    web = projectOfAcme("Website");
-    backend = projectOfAcme("Backend");
+    for (WTProject* project : {web = makeProject("Website"), backend = makeProject("Backend")})
+      project->setClient(client);
     design = makeTask(web, "Design");
     api = makeTask(backend, "API");
     for (WTTask* task : {design, api}) task->setRate(Decimal(60));
@@ -48,11 +48,6 @@ class ReportWindowTest : public UiTest {
     UiTest::TearDown();
   }
 
-  WTProject* projectOfAcme(const QString& name) {
-    WTProject* project = makeProject(name);
-    project->setClient(client);
-    return project;
-  }
   // Opens the window, with the user's template `text` if given; counts renders from then on.
   void openReport(const QList<WTProject*>& projects, const QString& text = {}) {
     if (!text.isEmpty()) writeFile(WTReportGenerator::userTemplatePath(), text);
@@ -99,7 +94,7 @@ TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMen
   }
   window->setClient(client);
   makeProject("Elsewhere");  // no client: never in Acme's report
-  projectOfAcme("Later");
+  makeProject("Later")->setClient(client);
   save();
   EXPECT_EQ(window->html(), "mode=2 [Website][Backend][Later]");
   EXPECT_EQ(window->windowTitle(), "Report — Acme");
