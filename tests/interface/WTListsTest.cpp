@@ -158,29 +158,6 @@ class WTListControllerTest : public UiTest {
   WTProjectsViewController* projects = nullptr;
 };
 
-// A new project has a task General and is named at once, unless the list hides it.
-TEST_F(WTListControllerTest, ANewProjectHasATaskGeneralAndItsNameIsEditedAtOnce) {
-  makeProject("Existing");
-  endTurn();
-  projects->addObject();
-  const QList<WTProject*> all = context->fetch<WTProject>();
-  ASSERT_EQ(all.size(), 2);
-  WTProject* fresh = all[0]->name().isEmpty() ? all[0] : all[1];
-  ASSERT_EQ(fresh->tasks().size(), 1);
-  EXPECT_EQ(fresh->tasks()[0]->name(), "General");
-  EXPECT_EQ(projects->tableView()->currentIndex(), projects->arrayController()->indexOfObject(fresh));
-  auto* editor = projects->tableView()->findChild<QLineEdit*>("nameEditor");
-  ASSERT_NE(editor, nullptr);
-  editor->setText("Brand new");
-  projects->tableView()->setFocus();
-  QTest::qWait(10);
-  EXPECT_EQ(fresh->name(), "Brand new");
-  projects->setArchivedPredicate([](const WTObject* object) { return !object->name().isEmpty(); });
-  projects->addObject();
-  EXPECT_EQ(context->fetch<WTProject>().size(), 3);
-  EXPECT_FALSE(projects->tableView()->isEditing());
-}
-
 // The row menu acts on the clicked row, the toolbar on the last selected one, if any; removing asks the
 // window only when something of value goes.
 TEST_F(WTListControllerTest, TheRowMenuAndTheToolbarActOnTheClickedOrLastSelectedRow) {
@@ -272,6 +249,26 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   EXPECT_TRUE(projects->itemsViewController() == items && items->project() == second);
   projects->openClients();
   EXPECT_EQ(shown->window.clientsShown, 1);
+  stack.popViewController();
+  stack.finishAnimation();
+  // A new project has a task General and is named at once, unless the list hides it.
+  projects->addObject();
+  const QList<WTProject*> all = context->fetch<WTProject>();
+  ASSERT_EQ(all.size(), 3);
+  WTProject* fresh = *std::find_if(all.begin(), all.end(), [](auto* p) { return p->name().isEmpty(); });
+  ASSERT_EQ(fresh->tasks().size(), 1);
+  EXPECT_EQ(fresh->tasks()[0]->name(), "General");
+  EXPECT_EQ(projects->tableView()->currentIndex(), projects->arrayController()->indexOfObject(fresh));
+  auto* editor = projects->tableView()->findChild<QLineEdit*>("nameEditor");
+  ASSERT_NE(editor, nullptr);
+  editor->setText("Brand new");
+  projects->tableView()->setFocus();
+  QTest::qWait(10);
+  EXPECT_EQ(fresh->name(), "Brand new");
+  projects->setArchivedPredicate([](const WTObject* object) { return !object->name().isEmpty(); });
+  projects->addObject();
+  EXPECT_EQ(context->fetch<WTProject>().size(), 4);
+  EXPECT_FALSE(projects->tableView()->isEditing());
 }
 
 }  // namespace
