@@ -1,18 +1,11 @@
 #pragma once
-// A desktop's tray as the tray item meets it on the bus.
-#include <QDBusContext>
-#include <QDBusMessage>
-#include <QMutex>
-#include <QObject>
-#include <QStringList>
+#include <QtDBus>
 
-// The StatusNotifierWatcher of a desktop's tray: it notes who registered which item, as a host would
-// then go and read it.
+// A desktop tray's StatusNotifierWatcher, noting who registered which item.
 class FakeStatusNotifierWatcher : public QObject, protected QDBusContext {
   Q_OBJECT
   Q_CLASSINFO("D-Bus Interface", "org.kde.StatusNotifierWatcher")
  public:
-  // The service names items registered, in order.
   QStringList registered() const {
     QMutexLocker lock(&mutex_);
     return registered_;

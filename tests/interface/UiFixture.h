@@ -1,41 +1,32 @@
 #pragma once
 
 #include "ModelFixture.h"
+#include "UserLocale.h"
+#include "WTClientsViewController.h"
+#include "WTItemCellDelegate.h"
+#include "WTItemContainer.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
+#include "WTListView.h"
 #include "WTNavigationController.h"
+#include "WTObjectListModel.h"
 #include "WTOutlineView.h"
 #include "WTProjectsViewController.h"
+#include "WTRateField.h"
 #include "WTViewController.h"
 
-#include <QAbstractItemModelTester>
-#include <QApplication>
-#include <QHelpEvent>
-#include <QLineEdit>
-#include <QMainWindow>
-#include <QMenu>
-#include <QTest>
-#include <QToolTip>
+#include <QtTest>
+#include <QtWidgets>
 
+#include <functional>
+#include <map>
 #include <memory>
-#include <ostream>
-
-// Failures show texts as text.
-inline void PrintTo(const QString& text, std::ostream* os) {
-  *os << '"' << text.toStdString() << '"';
-}
 
 // The first of a menu's entries whose title starts with `title`, or nothing.
 inline QAction* actionTitled(const QMenu* menu, const QString& title) {
   for (QAction* action : menu->actions())
     if (action->text().startsWith(title)) return action;
   return nullptr;
-}
-// A menu's titles, a separator's empty.
-inline QStringList titlesOf(const QMenu* menu) {
-  QStringList titles;
-  for (const QAction* action : menu->actions()) titles << action->text();
-  return titles;
 }
 // Types into a field as a user does, over what it held, then presses Return if asked.
 inline void type(QLineEdit* field, const QString& text, bool andReturn = false) {
@@ -54,8 +45,7 @@ class UrlCatcher : public QObject {
   void open(const QUrl& url) { opened.append(url); }
 };
 
-// A window that hosts one navigation stack, as the main window does. Asked about a deletion, it
-// records the question and its detail and answers `deletes`.
+// A window hosting one navigation stack; it records deletion questions and answers `deletes`.
 class TestHostWindow : public QMainWindow, public WTNavigationHost {
  public:
   WTNavigationController* stack = nullptr;
@@ -71,28 +61,38 @@ class TestHostWindow : public QMainWindow, public WTNavigationHost {
   }
 };
 
-// A project's items outline shown in a host window, as the main window shows it, with its first
-// screen displayed. The window gives the view back before either goes.
-struct ShownOutline {
-  ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
+// A controller on a navigation stack in a host window, as the main window shows it; the window gives the
+// stack's view back before either goes.
+template <class Controller>
+struct Shown {
+  Shown(WTObjectContext* context, QSize size, const std::function<void(Controller&)>& prepare = {})
       : controller(context) {
-    controller.setProject(project);
-    window.setCentralWidget(controller.view());
+    if (prepare) prepare(controller);
+    window.stack = &stack;
+    window.setCentralWidget(stack.view());
     window.resize(size);
+    stack.pushViewController(&controller);
     window.show();
     EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
-    controller.willDisplayView();
   }
-  ~ShownOutline() { window.takeCentralWidget(); }
+  ~Shown() { window.takeCentralWidget(); }
+  WTNavigationController stack;
+  Controller controller;
+  TestHostWindow window;
+};
+using ShownProjects = Shown<WTProjectsViewController>;
 
+// A project's outline, shown.
+struct ShownOutline : Shown<WTItemsViewController> {
+  ShownOutline(WTObjectContext* context, WTProject* project, QSize size = QSize(900, 600))
+      : Shown(context, size, [project](WTItemsViewController& outline) { outline.setProject(project); }) {}
   WTOutlineView* outline() { return controller.outlineView(); }
   QModelIndex rowOf(const WTObject* object) { return controller.treeController()->indexOfObject(object); }
   // The middle of one part of a record's row, in the outline's viewport.
   QPoint centreOf(const WTObject* object, WTTableCellView::Part part) {
-    const QModelIndex index = rowOf(object);
-    const QRect visual = outline()->visualRect(index);
+    const QRect visual = outline()->visualRect(rowOf(object));
     const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
-    return controller.cellViewPrototypeForIndex(index).partRect(part, row).center().toPoint();
+    return controller.cellViewPrototypeForIndex(rowOf(object)).partRect(part, row).center().toPoint();
   }
   // The tip shown over a point of the viewport, or nothing.
   QString tipAt(QPoint point) {
@@ -104,55 +104,33 @@ struct ShownOutline {
   }
   // The one line editor open in the outline once closed ones are gone, else nothing.
   QLineEdit* openEditor() {
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-    QApplication::processEvents();
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+    for (int i = 0; i < 2; ++i) {
+      QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
+      QApplication::processEvents();
+    }
     const QList<QLineEdit*> editors = outline()->viewport()->findChildren<QLineEdit*>();
     return editors.size() == 1 ? editors.first() : nullptr;
   }
-
-  WTItemsViewController controller;
-  TestHostWindow window;
 };
 
-// The projects list on its navigation stack in a host window, as the main window shows it.
-struct ShownProjects {
-  explicit ShownProjects(WTObjectContext* context) : projects(context) {
-    window.stack = &stack;
-    window.setCentralWidget(stack.view());
-    window.resize(800, 500);
-    stack.pushViewController(&projects);
-    window.show();
-    EXPECT_TRUE(QTest::qWaitForWindowExposed(&window));
-  }
-  ~ShownProjects() { window.takeCentralWidget(); }
-  WTNavigationController stack;
-  WTProjectsViewController projects;
-  TestHostWindow window;
-};
-
-// The model's world (a real store file, its own settings, Europe/Berlin) with the clock at
-// 14 March 2024 10:00 until a test moves `clockNow`.
+// The model's world with the clock at 14 March 2024 10:00 until a test moves `clockNow`.
 class UiTest : public ModelTest {
  protected:
   void SetUp() override {
     ModelTest::SetUp();
     setNow(at(2024, 3, 14, 10, 0));
   }
-
   static Date at(int year, int month, int day, int hour = 12, int minute = 0) {
     return berlin(year, month, day, hour, minute);
   }
-  WTProject* makeProject(const QString& name) {
-    auto* project = WTProject::insertNewObject(context.get());
-    project->setName(name);
-    return project;
+  template <class T>
+  T* named(const QString& name) {
+    auto* object = T::insertNewObject(context.get());
+    object->setName(name);
+    return object;
   }
-  WTClient* makeClient(const QString& name) {
-    auto* client = WTClient::insertNewObject(context.get());
-    client->setName(name);
-    return client;
-  }
+  WTProject* makeProject(const QString& name) { return named<WTProject>(name); }
+  WTClient* makeClient(const QString& name) { return named<WTClient>(name); }
   using ModelTest::makeItem;
   // A named item; a time entry lasts half an hour.
   template <class T>
@@ -162,6 +140,13 @@ class UiTest : public ModelTest {
     if constexpr (std::is_same_v<T, WTTime>) item->setEndDate(date.addingSeconds(30 * 60));
     return item;
   }
+  // An entry's start and end on its day, "HH:mm-HH:mm".
+  static QString span(const WTTime* item) {
+    auto time = [](std::optional<Date> date) {
+      return date ? RZDate::stringWithPattern(*date, "HH:mm") : "none";
+    };
+    return time(item->startDate()) + '-' + time(item->endDate());
+  }
   // Ends the event-loop turn, as the application does after every event.
   void endTurn() {
     context->processPendingChanges();
@@ -169,8 +154,7 @@ class UiTest : public ModelTest {
   }
 };
 
-// A project "Website" with the tasks Design and Build, shown in its outline, the outline's model under
-// Qt's model checker.
+// A project Website with the tasks Design and Build in its outline, its model under Qt's checker.
 class OutlineTest : public UiTest {
  protected:
   void SetUp() override {
@@ -188,14 +172,12 @@ class OutlineTest : public UiTest {
     shown.reset();
     UiTest::TearDown();
   }
-
   WTOutlineView* outline() { return controller->outlineView(); }
   WTItemsModel* model() { return controller->treeController(); }
   QModelIndex rowOf(const WTObject* object) { return model()->indexOfObject(object); }
 
   WTProject* project = nullptr;
-  WTTask* design = nullptr;
-  WTTask* build = nullptr;
+  WTTask *design = nullptr, *build = nullptr;
   std::unique_ptr<ShownOutline> shown;
   WTItemsViewController* controller = nullptr;
   std::unique_ptr<QAbstractItemModelTester> tester;
