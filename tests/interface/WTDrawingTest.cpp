@@ -77,6 +77,27 @@ TEST(RZBackgroundViewTest, PaintsEachMode) {
   EXPECT_NE(larger.pixelColor(48, 48), QColor(Qt::red));
 }
 
+// The settings come back from an archive, the image loaded again by its name; hex colours take the last six
+// digits of the text, after an optional "0x", and anything else is black.
+TEST(RZBackgroundViewTest, ArchivedSettingsAndHexColoursComeBack) {
+  RZBackgroundView view;
+  view.setIBGradientBeginHexColor("112233");
+  view.setIBGradientEndHexColor("0x445566");
+  view.setGradientAngle(90);
+  view.setIBSolidHexColor("1FFFF00");
+  view.setIBTiledImageName("play_32");
+  std::unique_ptr<RZBackgroundView> copy(RZBackgroundView::initWithCoder(view.encodeWithCoder()));
+  EXPECT_EQ(std::tuple(copy->backgroundMode(), copy->scaleMode(), copy->gradientAngle(), copy->imageName()),
+            std::tuple(int(RZBackgroundView::Image), int(RZBackgroundView::Tiled), 90.0, QString("play_32")));
+  EXPECT_EQ(QList<QColor>({copy->beginColor(), copy->endColor(), copy->solidColor()}),
+            QList<QColor>({QColor(0x11, 0x22, 0x33), QColor(0x44, 0x55, 0x66), QColor(Qt::yellow)}));
+  EXPECT_FALSE(copy->image().isNull());
+  for (const char* hex : {"", "not hex"}) {
+    view.setIBSolidHexColor(hex);
+    EXPECT_EQ(view.solidColor(), QColor(Qt::black)) << hex;
+  }
+}
+
 // A task's add buttons sit in order inside the bar and answer only while shown.
 TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   WTTableCellView task("WTTask"), time("WTTime");
