@@ -33,64 +33,71 @@ Outcome run(const QStringList& arguments, const QByteArray& input = {}) {
           process.readAllStandardOutput().toStdString(), process.readAllStandardError().toStdString()};
 }
 
-class ServerCommandLineTest : public testing::TestWithParam<Storage> {
+class ServerCommandLineTest : public StorageTest {
  protected:
-  void SetUp() override {
-    if (GetParam() == Storage::PostgreSQL && postgresUri().empty())
-      GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set";
-    storage_ = std::make_unique<StorageLocation>(GetParam());
-    db_ = QString::fromStdString(storage_->location());
-  }
-  // Starts `serve` on a free port and gives the port it reports; 0 when it does not say.
-  int serve(QProcess& server, const QStringList& more = {}) {
+  // Adds the account, starts `serve` on a free port and checks a head of that account goes through.
+  int serve(QProcess& server, const QString& email, const QStringList& more = {}) {
+    const Outcome added = run({"add-user", email, "--db", db()}, "a password on stdin\n");
+    EXPECT_EQ(added.exitCode, 0) << added.err;
+    EXPECT_NE(added.out.find(email.toLower().toStdString()), std::string::npos) << added.out;
     server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE),
-                 QStringList{"serve", "--listen", "127.0.0.1:0", "--db", db_} + more);
-    EXPECT_TRUE(server.waitForStarted(10000) && server.waitForReadyRead(10000))
-        << server.readAllStandardError().toStdString();
+                 QStringList{"serve", "--listen", "127.0.0.1:0", "--db", db()} + more);
+    EXPECT_TRUE(server.waitForStarted(10000) && server.waitForReadyRead(10000));
     const QString line = QString::fromUtf8(server.readLine());
-    const QRegularExpressionMatch match =
-        QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line);
+    const auto match = QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line);
     EXPECT_TRUE(match.hasMatch()) << line.toStdString();
     return match.captured(1).toInt();
   }
-  // A clean stop on SIGTERM.
-  static void expectStopsOnTerm(QProcess& server) {
+  static void expectHeadThenCleanStop(QProcess& server, int port, const QString& email) {
+    const Reply reply = post(
+        port, kSyncPath, requestBody(email.toLower().toStdString(), "a password on stdin", "head", 0, "cli"));
+    EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
     ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
     ASSERT_TRUE(server.waitForFinished(10000));
     EXPECT_EQ(server.exitStatus(), QProcess::NormalExit);
     EXPECT_EQ(server.exitCode(), 0);
   }
-  std::unique_ptr<StorageLocation> storage_;
-  QString db_;
+  QString db() const { return QString::fromStdString(storage_->location()); }
 };
 
-TEST_P(ServerCommandLineTest, AddUserThenServe) {
-  const Outcome added = run({"add-user", "Cli@Example.com", "--db", db_}, "a password on stdin\n");
-  EXPECT_EQ(added.exitCode, 0) << added.err;
-  EXPECT_NE(added.out.find("cli@example.com"), std::string::npos) << added.out;
-  EXPECT_EQ(run({"add-user", "cli@example.com", "--db", db_}, "another password\n").exitCode, 1);
-  EXPECT_EQ(run({"add-user", "short@example.com", "--db", db_}, "short\n").exitCode, 1);
-
+TEST_P(ServerCommandLineTest, AddUserThenServeAndRefusals) {
   QProcess server;
-  const int port = serve(server);
+  const int port = serve(server, "Cli@Example.com");
   ASSERT_GT(port, 0);
-  const Reply reply = post(port, "/sync/tessal/sync.php",
-                           requestBody("cli@example.com", "a password on stdin", "head", 0, "cli-device"));
-  EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
   EXPECT_EQ(get(port, "/sync/tessal/signup.php").status, 200);
-  expectStopsOnTerm(server);
+  expectHeadThenCleanStop(server, port, "Cli@Example.com");
+  const struct {
+    QStringList arguments;
+    int exitCode;
+    const char* input;
+  } rows[] = {
+      {{"add-user", "cli@example.com", "--db", db()}, 1, "another password\n"},  // taken
+      {{"add-user", "short@example.com", "--db", db()}, 1, "short\n"},
+      {{}, 2, ""},
+      {{"start"}, 2, ""},
+      {{"serve", "--db", db()}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:0"}, 2, ""},
+      {{"serve", "--listen", "localhost", "--db", db()}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:70000", "--db", db()}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:0", "--db", db(), "--threads", "many"}, 2, ""},
+      {{"add-user", "--db", db()}, 2, ""},
+  };
+  for (const auto& row : rows) {
+    const Outcome result = run(row.arguments, row.input);
+    EXPECT_EQ(result.exitCode, row.exitCode) << row.arguments.join(' ').toStdString();
+    EXPECT_TRUE(row.exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
+  }
 }
 
 // Under a low descriptor limit the server holds only the connections it has descriptors for and closes
 // the rest at once, instead of leaving them unanswered in the backlog while it fails to accept them.
 TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce) {
-  ASSERT_EQ(run({"add-user", "fd@example.com", "--db", db_}, "a password on stdin\n").exitCode, 0);
   QProcess server;
   server.setChildProcessModifier([] {
     const rlimit files{160, 160};  // soft and hard: the server cannot raise it
     setrlimit(RLIMIT_NOFILE, &files);
   });
-  const int port = serve(server, {"--threads", "4"});
+  const int port = serve(server, "fd@example.com", {"--threads", "4"});
   ASSERT_GT(port, 0);
   std::vector<std::unique_ptr<RawConnection>> clients;
   for (int i = 0; i < 300; ++i) {
@@ -102,33 +109,11 @@ TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce
   for (const auto& client : clients) {
     pollfd readable{client->fd(), POLLIN, 0};
     char byte;
-    if (poll(&readable, 1, 0) == 1 && recv(client->fd(), &byte, 1, MSG_DONTWAIT) == 0) ++closedAtOnce;
+    closedAtOnce += poll(&readable, 1, 0) == 1 && recv(client->fd(), &byte, 1, MSG_DONTWAIT) == 0;
   }
   clients.clear();
   EXPECT_GE(closedAtOnce, 150) << "of 300, with descriptors for fewer than 160";
-
-  const Reply reply = post(port, "/sync/tessal/sync.php",
-                           requestBody("fd@example.com", "a password on stdin", "head", 0, "cli-device"));
-  EXPECT_EQ(reply.status, 200) << reply.body;
-  expectStopsOnTerm(server);
-}
-
-TEST_P(ServerCommandLineTest, WrongUsageExitsWith2) {
-  const QStringList cases[] = {
-      {},
-      {"start"},
-      {"serve", "--db", db_},
-      {"serve", "--listen", "127.0.0.1:0"},
-      {"serve", "--listen", "localhost", "--db", db_},
-      {"serve", "--listen", "127.0.0.1:70000", "--db", db_},
-      {"serve", "--listen", "127.0.0.1:0", "--db", db_, "--threads", "many"},
-      {"add-user", "--db", db_},
-  };
-  for (const QStringList& arguments : cases) {
-    const Outcome result = run(arguments);
-    EXPECT_EQ(result.exitCode, 2) << arguments.join(' ').toStdString();
-    EXPECT_NE(result.err.find("usage"), std::string::npos);
-  }
+  expectHeadThenCleanStop(server, port, "fd@example.com");
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, ServerCommandLineTest,

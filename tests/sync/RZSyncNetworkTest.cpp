@@ -11,7 +11,6 @@
 #include <QTcpSocket>
 
 using synctest::HttpRequest;
-using synctest::LogCapture;
 using synctest::LoopbackHttpServer;
 using synctest::waitUntil;
 

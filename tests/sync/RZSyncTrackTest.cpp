@@ -28,7 +28,6 @@
 
 using synctest::compact;
 using synctest::dec;
-using synctest::LogCapture;
 using Section = RZSyncTrack::Section;
 
 namespace {
@@ -176,7 +175,7 @@ TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
     const std::optional<QVariant> transformed = RZSyncTrack::transformedValue(c.value);
-    EXPECT_EQ(transformed ? compact(*transformed) : QString(), c.json);
+    EXPECT_EQ(transformed ? compact(*transformed) : "", c.json.toStdString());
   }
 }
 
@@ -262,7 +261,7 @@ class RZSyncTrackContextTest : public ::testing::Test {
   // Saves and gives what the save journaled, starting the journal afresh.
   std::string saved() {
     EXPECT_TRUE(context.save().ok());
-    const std::string journaled = compact(track.dictionary()).toStdString();
+    const std::string journaled = compact(track.dictionary());
     track.resetChanges();
     return journaled;
   }
