@@ -18,14 +18,17 @@
 
 using namespace synctest;
 using Section = RZSyncTrack::Section;
-using Records = std::vector<std::pair<QString, std::string>>;
 
 namespace {
 
-class RZSyncManagerTest : public ::testing::Test {
- public:
+QVariantMap json(const char* text) {
+  return RZSyncJSON::parse(text).value_or(QVariant()).toMap();
+}
+
+// A scripted server and one installation on it.
+struct Bench {
   // Answers heads with nothing new at `head` and saves with `head` + 1 unless a test says otherwise.
-  void SetUp() override {
+  Bench() {
     server.handler = [this](const HttpRequest& r) {
       return r.json().value("action") == "save" ? saveReply(++head) : headReply(head);
     };
@@ -48,27 +51,27 @@ class RZSyncManagerTest : public ::testing::Test {
     EXPECT_FALSE(client.track().hasChanges());
     setUpRequests = server.requests.size();
   }
-  // Task T in project P, synced.
+  template <class T>
+  T* make(const char* uuid, const char* name = nullptr) {
+    T* object = client.context->insertNewObject<T>();
+    object->setUuid(QString::fromLatin1(uuid));
+    if (name) object->setName(name);
+    return object;
+  }
+  // Task T "Design" in project P "Site", synced.
   WTTask* syncedTask() {
-    auto* project = client.context->insertNewObject<WTProject>();
-    project->setUuid("P@WTProject");
-    project->setName("Site");
-    auto* task = client.context->insertNewObject<WTTask>();
-    task->setUuid("T@WTTask");
-    task->setName("Design");
-    task->setProject(project);
+    auto* task = make<WTTask>("T@WTTask", "Design");
+    task->setProject(make<WTProject>("P@WTProject", "Site"));
     synced();
     return task;
   }
-  template <class T>
-  T* make(const char* uuid) {
-    T* object = client.context->insertNewObject<T>();
-    object->setUuid(QString::fromLatin1(uuid));
-    return object;
-  }
-  void expectRecords(const Records& records) {
-    for (const auto& [uuid, values] : records)
-      EXPECT_EQ(storedRecord(*client.context, uuid), values) << uuid.toStdString();
+  // `expected` holds a line "uuid set-values" (or "uuid (none)") for each record to compare.
+  void expectRecords(const std::string& expected) {
+    std::string actual;
+    for (const QString& line : QString::fromStdString(expected).split('\n', Qt::SkipEmptyParts))
+      actual += line.section(' ', 0, 0).toStdString() + " " +
+                storedRecord(*client.context, line.section(' ', 0, 0)) + "\n";
+    EXPECT_EQ(actual, expected);
   }
 
   qint64 head = 1;
@@ -76,6 +79,8 @@ class RZSyncManagerTest : public ::testing::Test {
   LoopbackHttpServer server;
   SyncClient client{server.address()};
 };
+
+class RZSyncManagerTest : public ::testing::Test, public Bench {};
 
 }  // namespace
 
@@ -96,22 +101,18 @@ TEST(RZSyncManagerEndpoint, ServerAddressBecomesTheEndpoint) {
 
 // Records arrive as sent, owners named only made empty; saved, not journaled, not undoable.
 TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney) {
-  const Records records = {
-      {"C@WTClient", R"({"name":"Acme"})"},
-      {"P@WTProject",
-       R"({"client":"C@WTClient","name":"Site","rate":80.50,"tasks":["T2@WTTask","T1@WTTask"]})"},
-      {"T1@WTTask", R"({"budget":1200.00,"name":"One","project":"P@WTProject"})"},
-      {"T2@WTTask", R"({"name":"Two","project":"P@WTProject"})"},
-      {"E@WTTime", R"({"endDate":1700003600,"startDate":1700000000,"task":"T1@WTTask"})"},
-      {"X@WTExpense", R"({"expense":12.30,"startDate":1700000000,"task":"T1@WTTask"})"},
-      {"N@WTNote",
-       R"({"color":"#80ff0000","name":"Filed under a task not sent","startDate":1700000000,"task":"T3@WTTask"})"},
-      {"T3@WTTask", "{}"},
-  };
+  const std::string records = R"(C@WTClient {"name":"Acme"}
+P@WTProject {"client":"C@WTClient","name":"Site","rate":80.50,"tasks":["T2@WTTask","T1@WTTask"]}
+T1@WTTask {"budget":1200.00,"name":"One","project":"P@WTProject"}
+T2@WTTask {"name":"Two","project":"P@WTProject"}
+E@WTTime {"endDate":1700003600,"startDate":1700000000,"task":"T1@WTTask"}
+X@WTExpense {"expense":12.30,"startDate":1700000000,"task":"T1@WTTask"}
+N@WTNote {"color":"#80ff0000","name":"Filed under a task not sent","startDate":1700000000,"task":"T3@WTTask"}
+T3@WTTask {}
+)";
   QVariantMap updated;  // every record under both sections, as the server sends them
-  for (const auto& [uuid, values] : records)
-    if (uuid != "T3@WTTask")
-      updated.insert(uuid, RZSyncJSON::parse(QByteArray::fromStdString(values)).value());
+  for (const QString& line : QString::fromStdString(records).split('\n', Qt::SkipEmptyParts))
+    if (!line.startsWith("T3@")) updated.insert(line.section(' ', 0, 0), json(line.section(' ', 1).toUtf8()));
   QVariantMap inserted = updated, project = updated.value("P@WTProject").toMap();
   inserted["C@WTClient"] = QVariantMap{{"name", "Acme"}, {"uuid", "C@WTClient"}};
   project.remove("tasks");  // the order only among the updates, naming tasks of this same head
@@ -124,95 +125,83 @@ TEST_F(RZSyncManagerTest, HeadResultIsMergedByUuidWithRelationshipsDatesAndMoney
   EXPECT_EQ(client.track().iteration(), 9);
   client.reopen();
   EXPECT_EQ(client.track().iteration(), 9);
-  expectRecords({records[1]});
+  expectRecords(records);
 }
 
 // A server value (null clears) replaces a pending key, which is not sent; the server's deletion takes
 // the record's items here too, and one filed under it here only goes out as a deletion; a deletion still
 // waiting to be sent wins: the merge neither revives the record nor files under it.
-struct MergeCase {
-  const char* what;
-  std::function<void(RZSyncManagerTest&, WTTask*)> local;  // on a synced T in P
-  QVariantMap result;
-  Records records;
-  const char* sent;  // the save's data
-  friend void PrintTo(const MergeCase& c, std::ostream* out) { *out << c.what; }
-};
-class RZSyncManagerMergeTest : public RZSyncManagerTest, public ::testing::WithParamInterface<MergeCase> {};
-
-TEST_P(RZSyncManagerMergeTest, ServerAndPendingChanges) {
-  const MergeCase& c = GetParam();
-  c.local(*this, syncedTask());
-  answer(headReply(5, c.result), saveReply(6));
-  ASSERT_TRUE(client.syncOnce());
-  expectRecords(c.records);
-  ASSERT_EQ(sent("save").size(), 1);
-  EXPECT_EQ(sent("save")[0].value("iteration").toLongLong(), 5);
-  EXPECT_EQ(compact(sent("save")[0].value("data")), c.sent);
-  EXPECT_FALSE(client.track().hasChanges());
-  EXPECT_EQ(client.track().iteration(), 6);
+TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
+  const struct {
+    const char* what;
+    std::function<void(Bench&, WTTask*)> local;  // on a synced T in P
+    const char *result, *records, *sent;         // the head's change set, records afterwards, the save's data
+  } rows[] = {
+      {"ServerValueWinsOverAPendingKey",
+       [](Bench& t, WTTask* task) {
+         task->setBudget(dec("500.00"));
+         task->setRate(dec("90.00"));
+         t.synced();
+         task->setName("Local name");
+         task->setNotes("Local notes");  // not saved yet: the poll saves it first
+       },
+       R"({"u":{"T@WTTask":{"name":"Server name","budget":null,"rate":null}}})",
+       R"(T@WTTask {"name":"Server name","notes":"Local notes","project":"P@WTProject"}
+)",
+       R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})"},
+      {"ServerDeletionTakesOwnedRecordsHere",
+       [](Bench& t, WTTask* task) {
+         task->setName("Renamed here");
+         t.make<WTNote>("N@WTNote")->setTask(task);
+       },
+       R"({"x":["T@WTTask","Gone@WTNote"]})", "T@WTTask (none)\nN@WTNote (none)\n",
+       R"({"u":{},"x":["N@WTNote"]})"},
+      {"PendingDeletionWinsOverTheMerge",
+       [](Bench& t, WTTask* task) {
+         auto* kept = t.make<WTTask>("K@WTTask");
+         kept->setProject(task->project());
+         auto* moved = t.make<WTNote>("M@WTNote");
+         moved->setTask(kept);
+         moved->setStartDate(Date::fromSeconds(1700000000));
+         auto* acme = t.make<WTClient>("A@WTClient");
+         t.synced();
+         t.client.context->deleteObject(task);
+         t.client.context->deleteObject(acme);
+         t.client.save();
+       },
+       R"({"i":{"New@WTTime":{"task":"T@WTTask","startDate":1700000000,"endDate":1700000060},)"
+       R"("Deeper@WTNote":{"task":"NewTask@WTTask","startDate":1700000000},)"
+       R"("NewTask@WTTask":{"project":"P@WTProject","name":"fine"},"P2@WTProject":{"client":"A@WTClient",)"
+       R"("name":"Outlives its client"}},"u":{"T@WTTask":{"name":"Renamed elsewhere"},"M@WTNote":{"task":"T@WTTask"},)"
+       R"("P@WTProject":{"tasks":["T@WTTask","K@WTTask"]}}})",
+       R"(T@WTTask (none)
+A@WTClient (none)
+New@WTTime {"endDate":1700000060,"startDate":1700000000}
+M@WTNote {"startDate":1700000000,"task":"K@WTTask"}
+P@WTProject {"name":"Site","tasks":["K@WTTask","NewTask@WTTask"]}
+NewTask@WTTask {"name":"fine","project":"P@WTProject"}
+Deeper@WTNote {"startDate":1700000000,"task":"NewTask@WTTask"}
+P2@WTProject {"name":"Outlives its client"}
+)",
+       R"({"i":{},"u":{},"x":["A@WTClient","T@WTTask"]})"},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.what);
+    Bench t;
+    row.local(t, t.syncedTask());
+    const QVariantMap result = json(row.result);
+    t.answer(headReply(5, changeSet(result["i"].toMap(), result["u"].toMap(), result["x"].toStringList())),
+             saveReply(6));
+    ASSERT_TRUE(t.client.syncOnce());
+    t.expectRecords(row.records);
+    ASSERT_EQ(t.sent("save").size(), 1);
+    const QVariantMap data = t.sent("save")[0].value("data").toMap();
+    EXPECT_EQ(compact(row.sent[2] == 'u' ? QVariantMap{{"u", data["u"]}, {"x", data["x"]}} : data), row.sent);
+    EXPECT_EQ(t.sent("save")[0].value("iteration").toLongLong(), 5);
+    EXPECT_FALSE(t.client.track().hasChanges());
+    EXPECT_EQ(t.client.track().iteration(), 6);
+  }
 }
-
-INSTANTIATE_TEST_SUITE_P(
-    Cases, RZSyncManagerMergeTest,
-    ::testing::Values(
-        MergeCase{
-            "ServerValueWinsOverAPendingKey",
-            [](RZSyncManagerTest& t, WTTask* task) {
-              task->setBudget(dec("500.00"));
-              task->setRate(dec("90.00"));
-              t.synced();
-              task->setName("Local name");
-              task->setNotes("Local notes");  // not saved yet: the poll saves it first
-            },
-            changeSet({}, {{"T@WTTask", QVariantMap{{"name", "Server name"}, {"budget", {}}, {"rate", {}}}}}),
-            {{"T@WTTask", R"({"name":"Server name","notes":"Local notes","project":"P@WTProject"})"}},
-            R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})"},
-        MergeCase{
-            "ServerDeletionTakesOwnedRecordsHere",
-            [](RZSyncManagerTest& t, WTTask* task) {
-              task->setName("Renamed here");
-              auto* note = t.make<WTNote>("N@WTNote");
-              note->setTask(task);
-              note->setStartDate(Date::fromSeconds(1700000000));
-            },
-            changeSet({}, {}, {"T@WTTask", "Gone@WTNote"}),
-            {{"T@WTTask", "(none)"}, {"N@WTNote", "(none)"}},
-            R"({"i":{"N@WTNote":{"archived":false,"startDate":1700000000,"task":"T@WTTask","uuid":"N@WTNote"}},)"
-            R"("u":{},"x":["N@WTNote"]})"},
-        MergeCase{
-            "PendingDeletionWinsOverTheMerge",
-            [](RZSyncManagerTest& t, WTTask* task) {
-              auto* kept = t.make<WTTask>("K@WTTask");
-              kept->setProject(task->project());
-              auto* moved = t.make<WTNote>("M@WTNote");
-              moved->setTask(kept);
-              moved->setStartDate(Date::fromSeconds(1700000000));
-              auto* acme = t.make<WTClient>("A@WTClient");
-              t.synced();
-              t.client.context->deleteObject(task);
-              t.client.context->deleteObject(acme);
-              t.client.save();
-            },
-            changeSet(
-                {{"New@WTTime",
-                  QVariantMap{{"task", "T@WTTask"}, {"startDate", 1700000000}, {"endDate", 1700000060}}},
-                 {"Deeper@WTNote", QVariantMap{{"task", "NewTask@WTTask"}, {"startDate", 1700000000}}},
-                 {"NewTask@WTTask", QVariantMap{{"project", "P@WTProject"}, {"name", "fine"}}},
-                 {"P2@WTProject", QVariantMap{{"client", "A@WTClient"}, {"name", "Outlives its client"}}}},
-                {{"T@WTTask", QVariantMap{{"name", "Renamed elsewhere"}}},
-                 {"M@WTNote", QVariantMap{{"task", "T@WTTask"}}},
-                 {"P@WTProject", QVariantMap{{"tasks", QStringList{"T@WTTask", "K@WTTask"}}}}}),
-            {{"T@WTTask", "(none)"},
-             {"A@WTClient", "(none)"},
-             {"New@WTTime", R"({"endDate":1700000060,"startDate":1700000000})"},
-             {"M@WTNote", R"({"startDate":1700000000,"task":"K@WTTask"})"},
-             {"P@WTProject", R"({"name":"Site","tasks":["K@WTTask","NewTask@WTTask"]})"},
-             {"NewTask@WTTask", R"({"name":"fine","project":"P@WTProject"})"},
-             {"Deeper@WTNote", R"({"startDate":1700000000,"task":"NewTask@WTTask"})"},
-             {"P2@WTProject", R"({"name":"Outlives its client"})"}},
-            R"({"i":{},"u":{},"x":["A@WTClient","T@WTTask"]})"}),
-    [](const auto& info) { return std::string(info.param.what); });
 
 // The key is dropped only from the section the server sent it under.
 TEST_F(RZSyncManagerTest, ServerValueDropsThePendingKeyOfItsOwnSectionOnly) {
@@ -268,57 +257,46 @@ TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
 }
 
 // Stale head (code 4): with an iteration resend claiming it, without keep the journal; others stop syncing.
-struct RefusalCase {
-  const char* what;
-  QByteArray answer;      // to the first request; later heads find nothing new and saves are confirmed
-  qint64 resentClaiming;  // the iteration the resent journal claims; -1 when nothing is resent
-  const char* shown;      // the sync error shown, if any
-  const char* logged;     // a log line written, if any
-  friend void PrintTo(const RefusalCase& c, std::ostream* out) { *out << c.what; }
-};
-class RZSyncManagerRefusalTest : public RZSyncManagerTest,
-                                 public ::testing::WithParamInterface<RefusalCase> {};
-
-TEST_P(RZSyncManagerRefusalTest, IsTakenByItsKind) {
-  const RefusalCase& c = GetParam();
-  syncedTask()->setName("Pending");
-  client.save();
-  const qint64 iteration = client.track().iteration();
-  server.handler = [&](const HttpRequest& request) {
-    if (server.requests.size() == setUpRequests + 1) return c.answer;
-    return request.json().value("action") == "save" ? saveReply(13) : headReply(13);
+TEST(RZSyncManagerRefusal, IsTakenByItsKind) {
+  const struct {
+    QByteArray answer;           // to the first request; later heads find nothing new and saves are confirmed
+    qint64 resentClaiming;       // the iteration the resent journal claims; -1 when nothing is resent
+    const char *shown, *logged;  // the sync error shown, a log line written, if any
+  } rows[] = {
+      {errorReply("Try iteration 12", 4, 12), 12, nullptr, nullptr},
+      {errorReply("Poll head first", 4, 0), -1, nullptr, "Head iteration problem"},
+      {LoopbackHttpServer::json(QVariantMap{{"action", "save"}}), -1, nullptr, "Iteration not received"},
+      {errorReply("Wrong e-mail address or password.", 2), -1,
+       "Wrong e-mail address or password. - (Code: 2)", nullptr},
   };
-  QSignalSpy status(client.manager.get(), &RZSyncManager::syncStatusDidChange);
-  LogCapture log(QStringLiteral("tessal.sync.debug=true"));
-  client.manager->setIntervals({60000, 60000, 60000});
-  client.manager->enableSync();
-  ASSERT_TRUE(waitUntil([&] { return server.requests.size() > setUpRequests && client.idle(); }));
-  EXPECT_TRUE(!c.logged || log.contains(QString::fromLatin1(c.logged)));
-  const bool resent = c.resentClaiming >= 0;
-  ASSERT_EQ(server.requests.size(), setUpRequests + (resent ? 2 : 1));
-  if (resent) {
-    EXPECT_EQ(sent("save")[0].value("iteration").toLongLong(), c.resentClaiming);
-    EXPECT_TRUE(sent("save")[0].value("data").toMap().value("u").toMap().contains("T@WTTask"));
+  for (const auto& c : rows) {
+    SCOPED_TRACE(c.answer.toStdString());
+    Bench t;
+    t.syncedTask()->setName("Pending");
+    t.client.save();
+    const qint64 iteration = t.client.track().iteration();
+    t.server.handler = [&](const HttpRequest& request) {
+      if (t.server.requests.size() == t.setUpRequests + 1) return c.answer;
+      return request.json().value("action") == "save" ? saveReply(13) : headReply(13);
+    };
+    QSignalSpy status(t.client.manager.get(), &RZSyncManager::syncStatusDidChange);
+    LogCapture log(QStringLiteral("tessal.sync.debug=true"));
+    t.client.manager->setIntervals({60000, 60000, 60000});
+    t.client.manager->enableSync();
+    ASSERT_TRUE(waitUntil([&] { return t.server.requests.size() > t.setUpRequests && t.client.idle(); }));
+    EXPECT_TRUE(!c.logged || log.contains(QString::fromLatin1(c.logged)));
+    const bool resent = c.resentClaiming >= 0;
+    ASSERT_EQ(t.server.requests.size(), t.setUpRequests + (resent ? 2 : 1));
+    EXPECT_TRUE(!resent || (t.sent("save")[0].value("iteration").toLongLong() == c.resentClaiming &&
+                            t.sent("save")[0].value("data").toMap().value("u").toMap().contains("T@WTTask")));
+    EXPECT_EQ(t.client.track().hasChanges(), !resent);
+    EXPECT_EQ(t.client.track().iteration(), resent ? 13 : iteration);
+    EXPECT_EQ(t.client.presenter.syncErrors, c.shown ? QStringList{c.shown} : QStringList{});
+    EXPECT_EQ(t.client.manager->syncEnabled(), !c.shown);
+    EXPECT_EQ(t.client.manager->scheduledInterval(), c.shown ? -1 : 60000);
+    EXPECT_EQ(status.count(), c.shown ? 2 : 1);  // on, then off
   }
-  EXPECT_EQ(client.track().hasChanges(), !resent);
-  EXPECT_EQ(client.track().iteration(), resent ? 13 : iteration);
-  EXPECT_EQ(client.presenter.syncErrors, c.shown ? QStringList{c.shown} : QStringList{});
-  EXPECT_EQ(client.manager->syncEnabled(), !c.shown);
-  EXPECT_EQ(client.manager->scheduledInterval(), c.shown ? -1 : 60000);
-  EXPECT_EQ(status.count(), c.shown ? 2 : 1);  // on, then off
 }
-
-INSTANTIATE_TEST_SUITE_P(
-    Replies, RZSyncManagerRefusalTest,
-    ::testing::Values(RefusalCase{"StaleHeadNamingAnIteration", errorReply("Try iteration 12", 4, 12), 12,
-                                  nullptr, nullptr},
-                      RefusalCase{"StaleHeadNamingNone", errorReply("Poll head first", 4, 0), -1, nullptr,
-                                  "Head iteration problem"},
-                      RefusalCase{"NoIteration", LoopbackHttpServer::json(QVariantMap{{"action", "save"}}),
-                                  -1, nullptr, "Iteration not received"},
-                      RefusalCase{"OtherCode", errorReply("Wrong e-mail address or password.", 2), -1,
-                                  "Wrong e-mail address or password. - (Code: 2)", nullptr}),
-    [](const auto& info) { return std::string(info.param.what); });
 
 // The next wait: none while off (a save still journals then), the poll's, the retry's after a failure, the
 // short one after a save; failures in a row are shown once and a good reply ends the run by itself.
