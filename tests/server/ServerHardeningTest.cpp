@@ -25,13 +25,13 @@ class ServerHardeningTest : public ServerTest {
                          int polls, std::chrono::milliseconds pause) {
     startServer();
     const std::string user = newUser("owner");
-    ASSERT_EQ(head(user, 0, "laptop").status, 200);
+    ASSERT_EQ(sync(user, "head", 0, "laptop").status, 200);
     std::atomic<bool> done{false};
     std::vector<std::thread> threads;
     for (int t = 0; t < attackers; ++t) threads.emplace_back([&, t] { attack(t, done); });
     std::this_thread::sleep_for(300ms);  // every attacker is at it
     for (int poll = 0; poll < polls; ++poll, std::this_thread::sleep_for(pause)) {
-      const Reply reply = head(user, 0, "laptop");
+      const Reply reply = sync(user, "head", 0, "laptop");
       EXPECT_EQ(reply.status, 200) << reply.body;
     }
     done = true;

@@ -93,13 +93,6 @@ class ServerTest : public StorageTest {
   std::string newUser(const std::string& name);
   Reply sync(const std::string& email, const std::string& action, int64_t iteration,
              const std::string& device = {}, const std::string& data = {});
-  Reply head(const std::string& email, int64_t iteration, const std::string& device = {}) {
-    return sync(email, "head", iteration, device);
-  }
-  Reply save(const std::string& email, int64_t iteration, const std::string& device,
-             const std::string& data) {
-    return sync(email, "save", iteration, device, data);
-  }
 
   std::unique_ptr<SyncServer> server_;
 };

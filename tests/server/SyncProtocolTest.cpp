@@ -50,6 +50,10 @@ class SyncProtocolTest : public ServerTest {
     if (!IsSkipped()) startServer();
   }
   std::string post(const std::string& body) { return describe(servertest::post(port(), kSyncPath, body)); }
+  std::string ask(const std::string& user, const std::string& action, int64_t base,
+                  const std::string& device = {}, const std::string& data = {}) {
+    return describe(sync(user, action, base, device, data));
+  }
 };
 
 // Each block of tests/data/sync-conversations.txt is one account's conversation, a step a line.
@@ -69,7 +73,7 @@ TEST_P(SyncProtocolTest, EveryConversationGetsTheExpectedReplies) {
     int64_t base = 0;
     step >> device >> action >> base >> std::ws;
     std::getline(step, data);
-    EXPECT_EQ(describe(sync(user, action, base, device == "-" ? "" : device, data == "-" ? "" : data)),
+    EXPECT_EQ(ask(user, action, base, device == "-" ? "" : device, data == "-" ? "" : data),
               line.substr(line.find(" => ") + 4))
         << "line " << number << ": " << line;
     ++steps;
@@ -112,7 +116,7 @@ TEST_P(SyncProtocolTest, RefusedRequestsStoreNothing) {
     rows.emplace_back(requestBody(user, password, "save", 0, "d", set), "code 5");
   }
   for (const auto& [body, expected] : rows) EXPECT_EQ(post(body), expected) << body;
-  EXPECT_EQ(describe(head(user, 0, "observer")), kEmpty);
+  EXPECT_EQ(ask(user, "head", 0, "observer"), kEmpty);
 }
 
 TEST_P(SyncProtocolTest, WrongPasswordIsCode2AndRepeatedFailuresAreSlowedDown) {
@@ -144,27 +148,27 @@ TEST_P(SyncProtocolTest, AccountsNeverSeeEachOther) {
   const std::string alice = newUser("Alice"), bob = newUser("bob");
   EXPECT_EQ(post(requestBody("nobody@example.com", "whatever-it-is", "head", 0)), "code 2");
   EXPECT_EQ(post(requestBody("  ALICE@EXAMPLE.com\n", " password-of-" + alice + " ", "head", 0)), kEmpty);
-  ASSERT_EQ(describe(save(alice, 0, "a", R"({"i":{"shared@WTClient":{"name":"Alice's"}}})")), "save 1");
+  ASSERT_EQ(ask(alice, "save", 0, "a", R"({"i":{"shared@WTClient":{"name":"Alice's"}}})"), "save 1");
   // The same identity in another account is another record.
-  ASSERT_EQ(describe(save(bob, 0, "b", R"({"i":{"shared@WTClient":{"name":"Bob's"}},"x":["gone@WTNote"]})")),
+  ASSERT_EQ(ask(bob, "save", 0, "b", R"({"i":{"shared@WTClient":{"name":"Bob's"}},"x":["gone@WTNote"]})"),
             "save 1");
-  ASSERT_EQ(describe(save(bob, 1, "b", R"({"x":["shared@WTClient"]})")), "save 2");
-  EXPECT_EQ(describe(head(alice, 0, "other")), R"(head 1 {"shared@WTClient":{"name":"Alice's"}} [])");
-  EXPECT_EQ(describe(head(bob, 0, "other")), R"(head 2 {} ["gone@WTNote","shared@WTClient"])");
+  ASSERT_EQ(ask(bob, "save", 1, "b", R"({"x":["shared@WTClient"]})"), "save 2");
+  EXPECT_EQ(ask(alice, "head", 0, "other"), R"(head 1 {"shared@WTClient":{"name":"Alice's"}} [])");
+  EXPECT_EQ(ask(bob, "head", 0, "other"), R"(head 2 {} ["gone@WTNote","shared@WTClient"])");
 }
 
 TEST_P(SyncProtocolTest, DataAndTheBodyLimitSurviveARestart) {
   const std::string user = newUser("restart");
-  ASSERT_EQ(describe(save(user, 0, "a", R"({"i":{"p@WTProject":{"name":"kept","rate":80.00}}})")), "save 1");
+  ASSERT_EQ(ask(user, "save", 0, "a", R"({"i":{"p@WTProject":{"name":"kept","rate":80.00}}})"), "save 1");
   stopServer();
   options.maxBodyBytes = 4096;
   startServer();
-  EXPECT_EQ(describe(head(user, 0, "b")), R"(head 1 {"p@WTProject":{"name":"kept","rate":80.00}} [])");
+  EXPECT_EQ(ask(user, "head", 0, "b"), R"(head 1 {"p@WTProject":{"name":"kept","rate":80.00}} [])");
   const Reply big =
-      save(user, 1, "d", R"({"i":{"c@WTClient":{"notes":")" + std::string(5000, 'n') + R"("}}})");
+      sync(user, "save", 1, "d", R"({"i":{"c@WTClient":{"notes":")" + std::string(5000, 'n') + R"("}}})");
   EXPECT_EQ(big.status, 413);
   EXPECT_EQ(big.code(), 6) << big.body;
-  EXPECT_EQ(describe(save(user, 1, "d", R"({"i":{"c@WTClient":{"notes":"short"}}})")), "save 2");
+  EXPECT_EQ(ask(user, "save", 1, "d", R"({"i":{"c@WTClient":{"notes":"short"}}})"), "save 2");
 }
 
 // Every save is based on 0: each reply is 0 once others had saved, or the save's own iteration.
@@ -176,14 +180,15 @@ TEST_P(SyncProtocolTest, ConcurrentSavesGetOneIterationEach) {
     threads.emplace_back([&, d] {
       for (int s = 0; s < kSaves; ++s) {
         const std::string uuid = "d" + std::to_string(d) + "s" + std::to_string(s) + "@WTNote";
-        EXPECT_GE(save(user, 0, "device" + std::to_string(d), R"({"i":{")" + uuid + R"(":{"name":"x"}}})")
-                      .integer("iteration"),
-                  0);
+        EXPECT_GE(
+            sync(user, "save", 0, "device" + std::to_string(d), R"({"i":{")" + uuid + R"(":{"name":"x"}}})")
+                .integer("iteration"),
+            0);
       }
     });
   }
   for (std::thread& thread : threads) thread.join();
-  const Reply all = head(user, 0, "observer");
+  const Reply all = sync(user, "head", 0, "observer");
   EXPECT_EQ(all.integer("iteration"), kDevices * kSaves);
   EXPECT_EQ(all["result"]->find("i")->members().size(), static_cast<size_t>(kDevices * kSaves));
 }
