@@ -14,7 +14,7 @@
 
 #include <QSignalSpy>
 
-#include <sstream>
+#include <fstream>
 
 using namespace synctest;
 using Section = RZSyncTrack::Section;
@@ -393,19 +393,11 @@ TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
   };
   const QByteArray journalBefore = journalFile();
   ASSERT_FALSE(journalBefore.isEmpty());
-  std::istringstream bad(
-      R"({"action":"head","iteration":-5,"result":{}} {"action":"head","iteration":"abc","result":{}})"
-      R"( {"action":"head","iteration":true,"result":{}} {"action":"head","iteration":1e300,"result":{}})"
-      R"( {"action":"head","iteration":7.5,"result":{}} {"action":"save","iteration":-1} {"action":"head","iteration":7})"
-      R"( {"action":"head","iteration":7,"result":[]} {"action":"head","iteration":7,"result":{"i":[]}})"
-      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":"name"}}})"
-      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTTask":{"name":{"text":"x"}}}}})"
-      R"( {"action":"head","iteration":7,"result":{"u":{"A@WTProject":{"tasks":[["A@WTTask"]]}}}})"
-      R"( {"action":"head","iteration":7,"result":{"i":{"A@WTTask":{"uuid":"B@WTTask"}}}})"
-      R"( {"action":"head","iteration":7,"result":{"x":"A@WTTask"}} {"action":"head","iteration":7,"result":{"x":[5]}})"
-      R"( {"action":"head","iteration":7,"result":{"q":{}}} {"action":"push","iteration":7})"
-      R"( {"error":["not","text"],"code":1} {"error":"Busy","code":"4","iteration":7} [1,2,3])");
-  for (std::string text; bad >> text;) {
+  std::ifstream bad(TESSAL_TEST_DATA_DIR "/sync-bad-replies.txt");
+  int replies = 0;
+  for (std::string text; std::getline(bad, text);) {
+    if (text.empty() || text[0] == '#') continue;
+    ++replies;
     server.handler = [&](const HttpRequest&) {
       return LoopbackHttpServer::raw(QByteArray::fromStdString(text));
     };
@@ -414,6 +406,7 @@ TEST_F(RZSyncManagerTest, RepliesOfTheWrongShapeFailAndLeaveTheJournalAlone) {
     EXPECT_EQ(client.track().iteration(), before) << text;
     EXPECT_EQ(task->name(), "Design") << text;
   }
+  EXPECT_EQ(replies, 20);
   EXPECT_EQ(journalFile(), journalBefore);
   ASSERT_EQ(client.presenter.networkErrors.size(), 1);  // one run of failures, shown once
   EXPECT_TRUE(client.presenter.networkErrors[0].contains("not in the expected form"));

@@ -43,8 +43,9 @@ constexpr const char* kEmpty = R"({"i":{},"u":{},"x":[]})";
 
 }  // namespace
 
-// Pretty-printed, money as written; read back the same, and nothing but the journal left in the folder.
-TEST(RZSyncTrackFile, HoldsIterationAndTrackAndReadsBack) {
+// Pretty-printed, money as written, read back the same; a write that fails half-way (the kernel refuses to
+// grow a file past 4 KiB) leaves the previous journal in place, and nothing but the journal is left.
+TEST(RZSyncTrackFile, HoldsIterationAndTrackAndKeepsItThroughAFailedWrite) {
   QTemporaryDir dir;
   const QString path = dir.filePath("Tessal.sync");
   RZSyncTrack track;
@@ -66,7 +67,23 @@ TEST(RZSyncTrackFile, HoldsIterationAndTrackAndReadsBack) {
                   .value("budget")
                   .value<Decimal>()
                   .isIdenticalTo(dec("12.30")));
+
+  track.insertValues({{"notes", QString(64 * 1024, u'x')}}, "B@WTTask");
+  struct rlimit old {};
+  ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
+  const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
+  struct rlimit small = old;
+  small.rlim_cur = 4096;
+  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
+  const Result<void> written = track.writeToFile(path);
+  setrlimit(RLIMIT_FSIZE, &old);
+  std::signal(SIGXFSZ, oldHandler);
+  EXPECT_FALSE(written.ok());
+  EXPECT_EQ(readFile(path), text);
   EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
+  EXPECT_TRUE(track.entries(Section::Inserted).contains("B@WTTask"));  // memory unchanged
+  EXPECT_TRUE(track.writeToFile(path).ok());
+  EXPECT_FALSE(track.writeToFile(dir.filePath("missing/Tessal.sync")).ok());
 }
 
 // Missing sections load empty; an unreadable journal is kept aside, byte for byte (an earlier copy kept
@@ -106,33 +123,6 @@ TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
     RZSyncTrack second(file);
     EXPECT_EQ(readFile(file + ".corrupt.2"), "second");
   }
-}
-
-// A write that fails half-way leaves the previous journal in place and no stray file.
-TEST(RZSyncTrackFile, FailedWriteKeepsThePreviousFile) {
-  QTemporaryDir dir;
-  const QString path = dir.filePath("Tessal.sync");
-  RZSyncTrack track;
-  track.insertValues({{"name", "small"}}, "A@WTTask");
-  ASSERT_TRUE(track.writeToFile(path).ok());
-  const QByteArray before = readFile(path);
-  track.insertValues({{"notes", QString(64 * 1024, u'x')}}, "B@WTTask");
-  // The kernel refuses to grow any file beyond 4 KiB while the limit holds.
-  struct rlimit old {};
-  ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
-  const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
-  struct rlimit small = old;
-  small.rlim_cur = 4096;
-  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
-  const Result<void> written = track.writeToFile(path);
-  setrlimit(RLIMIT_FSIZE, &old);
-  std::signal(SIGXFSZ, oldHandler);
-  EXPECT_FALSE(written.ok());
-  EXPECT_EQ(readFile(path), before);
-  EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
-  EXPECT_TRUE(track.entries(Section::Inserted).contains("B@WTTask"));  // memory unchanged
-  EXPECT_TRUE(track.writeToFile(path).ok());
-  EXPECT_FALSE(track.writeToFile(dir.filePath("missing/Tessal.sync")).ok());
 }
 
 TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
