@@ -1,5 +1,4 @@
-// The tessal-sync-server executable itself: add-user with the password on standard input, serve, and
-// a clean stop on SIGTERM.
+// The tessal-sync-server executable: add-user (password on stdin), serve, a clean stop on SIGTERM.
 #include "ServerTestSupport.h"
 
 #include <QProcess>
@@ -89,8 +88,7 @@ TEST_P(ServerCommandLineTest, AddUserThenServeAndRefusals) {
   }
 }
 
-// Under a low descriptor limit the server holds only the connections it has descriptors for and closes
-// the rest at once, instead of leaving them unanswered in the backlog while it fails to accept them.
+// Out of descriptors, the server closes further connections at once instead of leaving them unanswered.
 TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce) {
   QProcess server;
   server.setChildProcessModifier([] {

@@ -19,8 +19,7 @@ std::string requestHead(const std::string& extraHeaders) {
 
 class ServerHardeningTest : public ServerTest {
  protected:
-  // Starts the server; `attackers` threads run `attack(thread, done)` while the owner's device polls
-  // `polls` times, every poll answered.
+  // Starts the server; while `attackers` threads attack, every one of the owner's `polls` is answered.
   void ownerPollsThrough(int attackers, const std::function<void(int, const std::atomic<bool>&)>& attack,
                          int polls, std::chrono::milliseconds pause) {
     startServer();

@@ -25,17 +25,13 @@ std::string postgresUri() {
 
 static void runOnPostgres(const std::string& sql) {
   std::string error;
-  std::unique_ptr<tessal::server::SqlDatabase> database =
-      tessal::server::SqlDatabase::open(postgresUri(), error);
+  const auto database = tessal::server::SqlDatabase::open(postgresUri(), error);
   ASSERT_TRUE(database) << error;
   database->acquire()->executeScript(sql);
 }
 
-StorageLocation::StorageLocation(Storage storage) {
-  if (storage == Storage::SQLite) {
-    location_ = (dir_.path() + "/sync.db").toStdString();
-    return;
-  }
+StorageLocation::StorageLocation(Storage storage) : location_((dir_.path() + "/sync.db").toStdString()) {
+  if (storage == Storage::SQLite) return;
   std::random_device random;
   schema_ = "test_" + std::to_string(random()) + "_" + std::to_string(random());
   runOnPostgres("CREATE SCHEMA " + schema_);
@@ -125,8 +121,7 @@ void ServerTest::SetUp() {
 void ServerTest::startServer() {
   std::string error;
   server_ = SyncServer::create(storage_->location(), options, error);
-  ASSERT_TRUE(server_) << error;
-  ASSERT_TRUE(server_->start(error)) << error;
+  ASSERT_TRUE(server_ && server_->start(error)) << error;
 }
 
 void ServerTest::stopServer() {

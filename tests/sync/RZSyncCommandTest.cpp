@@ -20,8 +20,7 @@ std::string run(SyncClient& client, const QStringList& arguments = {}) {
 
 }  // namespace
 
-// Polls until a head brings nothing and nothing waits to be sent: what is here goes up and what others
-// did comes down, however many rounds that takes.
+// Polls, however many rounds it takes, until a head brings nothing and nothing waits to be sent.
 TEST(RZSyncCommand, RunsUntilInStep) {
   LoopbackHttpServer server;
   const QByteArray answers[] = {

@@ -38,8 +38,7 @@ TEST(RZSyncJSON, NumbersKeepTheirKindAndDigits) {
   }
 }
 
-// Strings round-trip through another JSON implementation; a repeated key: the last one counts; null is a
-// null variant; pretty and compact writing give the same value.
+// Strings round-trip through another parser; the last repeated key counts; both styles give one value.
 TEST(RZSyncJSON, StringsContainersAndStyles) {
   const QString text =
       QStringLiteral("quote \" backslash \\ tab\t newline\n nul%1 bell\a del\x7f é € 😀").arg(QChar(0));

@@ -128,9 +128,7 @@ T3@WTTask {}
   expectRecords(records);
 }
 
-// A server value (null clears) replaces a pending key, which is not sent; the server's deletion takes
-// the record's items here too, and one filed under it here only goes out as a deletion; a deletion still
-// waiting to be sent wins: the merge neither revives the record nor files under it.
+// A server value or deletion beats a pending change here; a pending deletion beats the merge.
 TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
   const struct {
     const char* what;
@@ -298,8 +296,7 @@ TEST(RZSyncManagerRefusal, IsTakenByItsKind) {
   }
 }
 
-// The next wait: none while off (a save still journals then), the poll's, the retry's after a failure, the
-// short one after a save; failures in a row are shown once and a good reply ends the run by itself.
+// The next wait follows what happened; failures in a row are shown once, a good reply ends the run.
 TEST_F(RZSyncManagerTest, TheWaitBeforeTheNextPollFollowsWhatHappened) {
   RZSyncManager& manager = *client.manager;
   EXPECT_EQ(manager.scheduledInterval(), -1);  // off until enabled
@@ -336,8 +333,7 @@ TEST_F(RZSyncManagerTest, TheWaitBeforeTheNextPollFollowsWhatHappened) {
   ASSERT_TRUE(waitUntil([&] { return client.presenter.networkErrors.size() == 2; }, 3000));
 }
 
-// Every request names the installation, which keeps its identity and its journal across launches; without
-// a server address nothing is sent.
+// Identity and journal survive a relaunch; without a server address nothing is sent.
 TEST_F(RZSyncManagerTest, DeviceAndJournalSurviveARestart) {
   WTTask* task = syncedTask();
   ASSERT_TRUE(client.syncOnce());

@@ -107,9 +107,7 @@ TEST_F(RZSyncNetworkTest, CredentialsAreTrimmedAndBlankOnesSendNothing) {
             R"("bob@example.org""secret""carl@example.org")");
 }
 
-// Only a JSON object or array is delivered, whatever the status; a failure says what came. A redirect
-// fails (the request carries the password); a reply over the limit fails as its bytes arrive; a closed
-// port fails and is logged.
+// Only an object or array is delivered; a redirect (the request carries the password) fails.
 TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
   LoopbackHttpServer elsewhere;
   network.setMaxReplyBytes(1024);

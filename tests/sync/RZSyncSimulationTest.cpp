@@ -1,5 +1,4 @@
-// Installations make random edits and sync through a lossy proxy while the real server restarts; once
-// quiet, all stores are equal and hold every applied change not replaced or deleted since.
+// Random edits synced through a lossy proxy and a server restart converge on every accepted change.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
 #include "Decimal.h"
 #include "ServerTestSupport.h"
@@ -22,8 +21,7 @@ using namespace synctest;
 
 namespace {
 
-// What the accepted saves add up to, with the server's consequences: what is filed under a deleted task
-// or project goes too, a project under a deleted client loses it.
+// What the accepted saves add up to, deletions taking what is filed under them (a project its client).
 struct Expected {
   QSet<QString> deleted;
   QMap<QString, QVariantMap> values;
@@ -58,8 +56,7 @@ struct Expected {
   }
 };
 
-// The proxy holds every request until released (so a run depends on its seed only, not on the machine's
-// speed), then forwards it or loses the request or the reply; it keeps every save the server accepted.
+// The proxy holds every request until released, so a run depends on its seed, not on the machine.
 class Simulation {
  public:
   Simulation(unsigned seed, SyncServerProcess& server) : seed_(seed), random_(seed), server_(server) {
@@ -264,8 +261,7 @@ class Simulation {
     settleArrivals();
   }
 
-  // Answers the oldest held request and waits until its client has dealt with the answer (and any request
-  // it sent in turn is held).
+  // Answers the oldest held request and waits until its client dealt with the answer.
   void release(Fate fate) {
     static const QByteArray kGatewayError = LoopbackHttpServer::raw("Bad gateway", 502, "text/plain");
     const HttpRequest request = proxy_.requests.value(released_++);

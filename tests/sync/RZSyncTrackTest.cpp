@@ -43,8 +43,7 @@ constexpr const char* kEmpty = R"({"i":{},"u":{},"x":[]})";
 
 }  // namespace
 
-// Pretty-printed, money as written, read back the same; a write that fails half-way (the kernel refuses to
-// grow a file past 4 KiB) leaves the previous journal in place, and nothing but the journal is left.
+// Written pretty and read back the same; a write that fails half-way leaves the previous file alone.
 TEST(RZSyncTrackFile, HoldsIterationAndTrackAndKeepsItThroughAFailedWrite) {
   QTemporaryDir dir;
   const QString path = dir.filePath("Tessal.sync");
@@ -86,8 +85,7 @@ TEST(RZSyncTrackFile, HoldsIterationAndTrackAndKeepsItThroughAFailedWrite) {
   EXPECT_FALSE(track.writeToFile(dir.filePath("missing/Tessal.sync")).ok());
 }
 
-// Missing sections load empty; an unreadable journal is kept aside, byte for byte (an earlier copy kept
-// too), and starts over.
+// An unreadable journal is kept aside, byte for byte (an earlier copy too), and starts over.
 TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
   const struct {
     const char* text;  // null: no file
@@ -151,8 +149,7 @@ TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
   }
 }
 
-// An update of a pending insertion stays one; writing a deleted record undoes the deletion; a cleared
-// value is null, one not journaled still leaves an entry. Every change is logged for a developer who asks.
+// Changes combine per record; they are logged only for a developer who asks.
 TEST(RZSyncTrackSections, ChangesCombinePerRecord) {
   RZSyncTrack track;
   LogCapture quiet;
@@ -203,8 +200,7 @@ TEST(RZSyncTrackSections, ConfirmedSaveForgetsOnlyWhatItSentUnchanged) {
   EXPECT_FALSE(track.hasChanges());
 }
 
-// The journal as saves of a real context fill it; the unordered sides (a task's items, a client's
-// projects) are never journaled, and cleared values go out as null so other devices clear them too.
+// Saves fill the journal; unordered sides are left out and cleared values go out as null.
 TEST(RZSyncTrackContext, SavesReportInsertionsUpdatesAndDeletions) {
   QTemporaryDir dir;
   WTObjectContext context;

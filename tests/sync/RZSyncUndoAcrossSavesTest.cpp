@@ -45,9 +45,7 @@ class RZSyncUndoAcrossSavesWithServer : public synctest::TwoDevicesTest {
   }
 };
 
-// Undo reaches the other device; redo brings the records back there (under new identities, since the
-// server keeps deletions for good); undo+redo between polls changes nothing there. A task whose deletion
-// reached the server, brought back by undo, reaches every device with its entries and later ones.
+// Undo, redo, and undoing a deletion the server kept for good all reach the other device.
 TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   auto* task = make<WTTask>("Design");
   task->setProject(make<WTProject>("Atlas"));

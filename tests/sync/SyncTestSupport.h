@@ -1,7 +1,6 @@
 #pragma once
 
-// Real parts for the sync tests: a scripted HTTP server on 127.0.0.1, a client over a real store file,
-// and the real tessal-sync-server process.
+// Real parts for the sync tests: a scripted HTTP server, a client over a store file, the real server.
 #include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
@@ -61,8 +60,7 @@ struct HttpRequest {
   QVariantMap json() const { return RZSyncJSON::parse(body).value_or(QVariant()).toMap(); }
 };
 
-// An HTTP/1.1 server on the event loop: records each request and answers the handler's raw bytes; an
-// empty answer holds the request until answerHeld().
+// Records each request and answers the handler's raw bytes; an empty answer holds it until answerHeld().
 class LoopbackHttpServer {
  public:
   using Handler = std::function<QByteArray(const HttpRequest&)>;
@@ -166,8 +164,7 @@ class RecordingPresenter final : public RZSyncErrorPresenter {
   QStringList syncErrors, networkErrors;
 };
 
-// One installation in its own folder, with a sync manager made with syncing off; it answers the
-// credentials the way the application delegate does, from the user defaults.
+// One installation in its own folder, syncing off; credentials come from its user defaults.
 class SyncClient final : public RZSyncNetworkCredentialDelegate {
  public:
   SyncClient(const QString& server, const QString& user = QStringLiteral("ann@example.org"),
@@ -222,8 +219,7 @@ class SyncClient final : public RZSyncNetworkCredentialDelegate {
   RecordingPresenter presenter;
 };
 
-// A stored value in journal form; an item answers "rate" with its task's rate, so the stored one is read,
-// and a project's task order is read as a list of records.
+// A stored value in journal form (an item's own rate, not its task's; a task order as uuids).
 inline QVariant storedValue(const WTObject* object, const QString& key) {
   const std::optional<Decimal> rate = key == QLatin1String("rate") ? object->storedRate() : std::nullopt;
   QVariant value = key == QLatin1String("rate") ? (rate ? QVariant::fromValue(*rate) : QVariant())
@@ -237,8 +233,7 @@ inline QVariant storedValue(const WTObject* object, const QString& key) {
   return RZSyncTrack::transformedValue(value).value_or(QVariant());
 }
 
-// A record's stored values in journal form, a project's task order included, as one line; without the
-// uuid and unset values when `setOnly`.
+// A record's stored values as one line of JSON; without the uuid and unset values when `setOnly`.
 inline std::string journalValues(const WTObject* object, bool setOnly = false) {
   QVariantMap values;
   QStringList keys = object->storedKeys();
