@@ -60,28 +60,9 @@ class RZSyncNetworkTest : public ::testing::Test {
 
 }  // namespace
 
-// A head carries neither data nor an unset device; a save carries its data pretty, money as written.
-TEST_F(RZSyncNetworkTest, RequestCarriesBodyAndHeaders) {
-  exchange();
-  EXPECT_EQ(server.requests.value(0).json().keys(), (QStringList{"action", "iteration", "password", "user"}));
-  network.setDevice(QStringLiteral("device-1"));
-  exchange(changeSet({{"A@WTExpense", QVariantMap{{"expense", money("12.30")}}}}), QStringLiteral("save"), 9);
-  ASSERT_EQ(server.requests.size(), 2);
-  const HttpRequest& request = server.requests[1];
-  EXPECT_EQ(request.method + ' ' + request.path + ' ' + request.headers.value("accept") + ' ' +
-                request.headers.value("content-type") + ' ' + request.headers.value("content-length"),
-            "POST /sync/tessal/sync.php application/json application/json " +
-                QByteArray::number(request.body.size()));
-  EXPECT_TRUE(request.body.contains("\n  \"action\": \"save\"") &&
-              request.body.contains("\"expense\": 12.30"))
-      << request.body.toStdString();
-  EXPECT_EQ(compact(request.json()),
-            R"({"action":"save","data":{"i":{"A@WTExpense":{"expense":12.30}},"u":{},"x":[]},)"
-            R"("device":"device-1","iteration":9,"password":"pw","user":"ann@example.org"})");
-}
-
-// Credentials come trimmed from the delegate unless set; blank ones send nothing and call back nothing.
-TEST_F(RZSyncNetworkTest, CredentialsAreTrimmedAndBlankOnesSendNothing) {
+// Credentials come trimmed from the delegate unless set, blank ones send nothing; a head carries neither
+// data nor an unset device; a save carries its data pretty, money as written.
+TEST_F(RZSyncNetworkTest, RequestCarriesCredentialsBodyAndHeaders) {
   network.setCredentialDelegate(&delegate);
   for (const auto& [user, password] :
        {std::pair<QString, QString>{"   ", "pw"}, {"ann", "\n\t"}, {"", "pw"}, {"ann", ""}}) {
@@ -97,14 +78,24 @@ TEST_F(RZSyncNetworkTest, CredentialsAreTrimmedAndBlankOnesSendNothing) {
   EXPECT_EQ(delegate.calls(), 0);
   delegate.user = QStringLiteral("  bob@example.org\n");
   delegate.password = QStringLiteral("\tsecret ");
-  EXPECT_TRUE(network.hasCredentials());
   exchange();
+  EXPECT_EQ(compact(server.requests.value(0).json()),
+            R"({"action":"head","iteration":7,"password":"secret","user":"bob@example.org"})");
   network.setUser(QStringLiteral("carl@example.org"));
-  exchange();
-  EXPECT_EQ(compact(server.requests[0].json().value("user")) +
-                compact(server.requests[0].json().value("password")) +
-                compact(server.requests[1].json().value("user")),
-            R"("bob@example.org""secret""carl@example.org")");
+  network.setDevice(QStringLiteral("device-1"));
+  exchange(changeSet({{"A@WTExpense", QVariantMap{{"expense", money("12.30")}}}}), QStringLiteral("save"), 9);
+  ASSERT_EQ(server.requests.size(), 2);
+  const HttpRequest& request = server.requests[1];
+  EXPECT_EQ(request.method + ' ' + request.path + ' ' + request.headers.value("accept") + ' ' +
+                request.headers.value("content-type") + ' ' + request.headers.value("content-length"),
+            "POST /sync/tessal/sync.php application/json application/json " +
+                QByteArray::number(request.body.size()));
+  EXPECT_TRUE(request.body.contains("\n  \"action\": \"save\"") &&
+              request.body.contains("\"expense\": 12.30"))
+      << request.body.toStdString();
+  EXPECT_EQ(compact(request.json()),
+            R"({"action":"save","data":{"i":{"A@WTExpense":{"expense":12.30}},"u":{},"x":[]},)"
+            R"("device":"device-1","iteration":9,"password":"secret","user":"carl@example.org"})");
 }
 
 // Only an object or array is delivered; a redirect (the request carries the password) fails.

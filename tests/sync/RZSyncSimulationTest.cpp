@@ -284,13 +284,11 @@ class Simulation {
   }
 
   void settleArrivals() {
-    ASSERT_TRUE(waitUntil(
-        [this] {
-          return std::count_if(clients_.begin(), clients_.end(), [](auto& c) { return !c->idle(); }) ==
-                 held();
-        },
-        20000))
-        << "a request did not arrive or a reply was not handled";
+    const auto busy = [this] {
+      return std::count_if(clients_.begin(), clients_.end(), [](auto& c) { return !c->idle(); });
+    };
+    ASSERT_TRUE(waitUntil([&] { return busy() == held(); }, 20000))
+        << "a request or its reply went unhandled";
   }
   void drain() {
     while (held() > 0) release(Fate::Deliver);
@@ -319,12 +317,10 @@ class Simulation {
 }  // namespace
 
 // Over both storages of the server: PostgreSQL when a throw-away cluster is given (TESSAL_TEST_POSTGRES).
-class RZSyncSimulation : public testing::TestWithParam<servertest::Storage> {};
+class RZSyncSimulation : public servertest::StorageTest {};
 
 TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
   if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-  if (GetParam() == servertest::Storage::PostgreSQL && servertest::postgresUri().empty())
-    GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";
   std::vector<unsigned> seeds;
   const int runs =
       qEnvironmentVariableIsSet("TESSAL_SYNC_RUNS") ? qEnvironmentVariableIntValue("TESSAL_SYNC_RUNS") : 2;
