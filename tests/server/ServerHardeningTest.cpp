@@ -90,7 +90,7 @@ TEST_P(ServerHardeningTest, AFloodOfGuessesWaitsForNoVerificationSlot) {
   EXPECT_EQ(unanswered, 0);
 }
 
-// A stranger cannot lock out the owner's devices, even after their remembered success expired.
+// Guesses are slowed down but never lock out the owner's devices, even after their proven password expired.
 TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePassword) {
   std::atomic<int64_t> offset{0};
   options.authentication.now = [&] {
@@ -105,6 +105,14 @@ TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePasswor
     return post(port(), kSyncPath, requestBody(user, secret, "head", 0, "laptop"));
   };
   ASSERT_EQ(attempt("password-of-" + user).status, 200);
+  // A wrong password is code 2; while locked a guess is not even tried (429, to retry); the lock doubles.
+  for (const auto& [seconds, outcome] : {std::pair{0, 2}, {0, 429}, {61, 2}, {61, 429}, {61, 2}}) {
+    offset += seconds;
+    const Reply guess = attempt("guess");
+    EXPECT_EQ(outcome == 2 ? guess.code() : guess.status, outcome) << offset << " s: " << guess.body;
+    EXPECT_TRUE(outcome == 2 || (!guess.json && !guess.retryAfter.empty())) << guess.body;
+    EXPECT_EQ(attempt("password-of-" + user).status, 200) << "remembered credentials pass during a lock";
+  }
   for (int minute = 0; minute < 30; ++minute) {
     offset += 70;  // past the remembered success after ten minutes
     const Reply guess = attempt("guess-" + std::to_string(minute));
