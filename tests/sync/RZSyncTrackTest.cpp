@@ -2,7 +2,6 @@
 
 #include "Date.h"
 #include "Decimal.h"
-#include "KeyPath.h"
 #include "RZSyncJSON.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
@@ -123,30 +122,17 @@ TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
   }
 }
 
+// Values the other tests do not journal: dates before 1970 (toward zero), colours, escapes, integers, null.
 TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
-  WTObjectContext context;
-  auto* project = context.insertNewObject<WTProject>();
-  auto* first = context.insertNewObject<WTTask>();
-  auto* second = context.insertNewObject<WTTask>();
-  const std::pair<QVariant, QString> cases[] = {
-      // empty: not journaled
-      {QVariant::fromValue(Date::fromSeconds(1700000000.999)), "1700000000"},  // fraction dropped
-      {QVariant::fromValue(Date::fromSeconds(-1.5)), "-1"},                    // toward zero
-      {KeyPath::variantFromObject(project), QString("\"%1\"").arg(project->uuid())},
-      {QVariant::fromValue(WTOrderedRelationship{{second, first}}),
-       QString("[\"%1\",\"%2\"]").arg(second->uuid(), first->uuid())},
-      {QVariant::fromValue(WTUnorderedRelationship{{first}}), ""},
-      {synctest::money("-0.50"), "-0.50"},
+  const std::pair<QVariant, std::string> cases[] = {
+      {QVariant::fromValue(Date::fromSeconds(-1.5)), "-1"},
       {QVariant(QColor(255, 0, 0, 128)), "\"#80ff0000\""},
       {QVariant(QStringLiteral("a\"b")), "\"a\\\"b\""},
-      {QVariant(true), "true"},
       {QVariant(90), "90"},
       {QVariant(), "null"},
   };
-  for (const auto& [value, json] : cases) {
-    const std::optional<QVariant> transformed = RZSyncTrack::transformedValue(value);
-    EXPECT_EQ(transformed ? compact(*transformed) : "", json.toStdString()) << json.toStdString();
-  }
+  for (const auto& [value, json] : cases)
+    EXPECT_EQ(compact(RZSyncTrack::transformedValue(value).value()), json);
 }
 
 // Changes combine per record; they are logged only for a developer who asks.
