@@ -105,6 +105,28 @@ int RawConnection::status(const std::string& response) {
   return response.rfind("HTTP/1.1 ", 0) == 0 && response.size() >= 12 ? std::stoi(response.substr(9, 3)) : 0;
 }
 
+LocalServer::LocalServer(const std::string& location, const std::string& email, const std::string& password)
+    : location_(location) {
+  options_.threads = 8;
+  EXPECT_TRUE(start());
+  EXPECT_EQ(server_->authenticator().createAccount(email, password),
+            tessal::server::PasswordAuthenticator::SignUp::Created);
+}
+
+bool LocalServer::start() {
+  std::string error;
+  server_ = SyncServer::create(location_, options_, error);
+  const bool started = server_ && server_->start(error);
+  EXPECT_TRUE(started) << error;
+  options_.port = started ? server_->port() : options_.port;
+  return started;
+}
+
+void LocalServer::stop() {
+  if (server_) server_->stop();
+  server_.reset();
+}
+
 void StorageTest::SetUp() {
   if (GetParam() == Storage::PostgreSQL && postgresUri().empty())
     GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";

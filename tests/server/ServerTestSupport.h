@@ -71,6 +71,23 @@ class RawConnection {
   bool connected_ = false;
 };
 
+// The sync server in this process on 127.0.0.1 over `location` with one account; a restart takes the same
+// port.
+class LocalServer {
+ public:
+  LocalServer(const std::string& location, const std::string& email, const std::string& password);
+  ~LocalServer() { stop(); }
+  bool start();
+  void stop();
+  int port() const { return options_.port; }
+  QString address() const { return QStringLiteral("http://127.0.0.1:%1").arg(options_.port); }
+
+ private:
+  std::string location_;
+  SyncServer::Options options_;
+  std::unique_ptr<SyncServer> server_;
+};
+
 // Each test on each storage (PostgreSQL when TESSAL_TEST_POSTGRES names a cluster).
 class StorageTest : public testing::TestWithParam<Storage> {
  protected:

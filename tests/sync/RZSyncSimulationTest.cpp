@@ -59,7 +59,7 @@ struct Expected {
 // The proxy holds every request until released, so a run depends on its seed, not on the machine.
 class Simulation {
  public:
-  Simulation(unsigned seed, SyncServerProcess& server) : seed_(seed), random_(seed), server_(server) {
+  Simulation(unsigned seed, servertest::LocalServer& server) : seed_(seed), random_(seed), server_(server) {
     proxy_.handler = [](const HttpRequest&) { return QByteArray(); };  // hold
     // Syncing stays "off": no timer polls on its own, every exchange is one the run starts.
     for (int i = std::uniform_int_distribution<int>(3, 5)(random_); i > 0; --i)
@@ -268,8 +268,8 @@ class Simulation {
     if (fate == Fate::LoseRequest) {
       proxy_.answerHeld(kGatewayError), ++lost_;
     } else {
-      const servertest::Reply reply = servertest::post(
-          QUrl(server_.address()).port(), request.path.toStdString(), request.body.toStdString());
+      const servertest::Reply reply =
+          servertest::post(server_.port(), request.path.toStdString(), request.body.toStdString());
       const QByteArray body = QByteArray::fromStdString(reply.body);
       const QVariantMap answer = RZSyncJSON::parse(body).value_or(QVariant()).toMap();
       if (answer.value("action") == "save" && !answer.contains("error"))
@@ -310,7 +310,7 @@ class Simulation {
   LoopbackHttpServer proxy_;
   qsizetype released_ = 0;
   QList<QVariantMap> appliedSaves_;  // the "data" of each save the server confirmed, in order
-  SyncServerProcess& server_;
+  servertest::LocalServer& server_;
   std::vector<std::unique_ptr<SyncClient>> clients_;
 };
 
@@ -320,7 +320,6 @@ class Simulation {
 class RZSyncSimulation : public servertest::StorageTest {};
 
 TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
-  if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
   std::vector<unsigned> seeds;
   const int runs =
       qEnvironmentVariableIsSet("TESSAL_SYNC_RUNS") ? qEnvironmentVariableIntValue("TESSAL_SYNC_RUNS") : 2;
@@ -329,9 +328,8 @@ TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
   for (const unsigned seed : seeds) {
     SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
     const servertest::StorageLocation storage(GetParam());
-    SyncServerProcess server(QString::fromStdString(storage.location()));
-    ASSERT_TRUE(server.addUser(Simulation::kUser, Simulation::kPassword));
-    ASSERT_TRUE(server.start());
+    servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
+                                   Simulation::kPassword.toStdString());
     Simulation simulation(seed, server);
     simulation.run(600);
     ASSERT_TRUE(simulation.settle()) << "no quiescence";

@@ -1,6 +1,7 @@
 // Undo and redo after the autosave wrote the change reach other devices through the real server.
 #include "RZSyncCommand.h"
 
+#include "ServerTestSupport.h"
 #include "SyncTestSupport.h"
 #include "WTItem.h"
 #include "WTProject.h"
@@ -11,8 +12,20 @@
 
 using synctest::SyncClient;
 
-class RZSyncUndoAcrossSavesWithServer : public synctest::TwoDevicesTest {
+// Two installations of one account on a real server.
+class RZSyncUndoAcrossSavesWithServer : public ::testing::Test {
  protected:
+  void expectSameStores() {
+    const auto left = synctest::snapshot(*a->context), right = synctest::snapshot(*b->context);
+    EXPECT_TRUE(left == right) << synctest::snapshotDifference(left, right);
+  }
+  const servertest::StorageLocation storage{servertest::Storage::SQLite};
+  servertest::LocalServer server{storage.location(), "ann@example.org", "correct horse battery"};
+  std::unique_ptr<SyncClient> a =
+      std::make_unique<SyncClient>(server.address(), "ann@example.org", "correct horse battery");
+  std::unique_ptr<SyncClient> b =
+      std::make_unique<SyncClient>(server.address(), "ann@example.org", "correct horse battery");
+
   // Undoes or redoes `steps` steps on A and saves; then A, and B, run the sync command until in step.
   void undoOrRedoThenSync(qsizetype steps, bool undo, bool sync = true) {
     for (qsizetype i = 0; i < steps; ++i) {

@@ -1,6 +1,6 @@
 #pragma once
 
-// Real parts for the sync tests: a scripted HTTP server, a client over a store file, the real server.
+// Real parts for the sync tests: a scripted HTTP server on 127.0.0.1 and a client over a real store file.
 #include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
@@ -14,17 +14,13 @@
 
 #include <QCoreApplication>
 #include <QDeadlineTimer>
-#include <QFileInfo>
 #include <QPointer>
-#include <QProcess>
 #include <QTcpServer>
 #include <QTcpSocket>
 #include <QTemporaryDir>
 #include <QTest>
 #include <QTimer>
 
-#include <sys/prctl.h>
-#include <csignal>
 #include <functional>
 #include <memory>
 
@@ -276,94 +272,5 @@ inline std::string snapshotDifference(const QMap<QString, std::string>& a,
   }
   return out;
 }
-
-// The real tessal-sync-server, run as its own process on 127.0.0.1 with a SQLite file in a temp folder.
-class SyncServerProcess {
- public:
-  static QString executable() {
-#ifdef TESSAL_SYNC_SERVER_EXE
-    return QString::fromUtf8(TESSAL_SYNC_SERVER_EXE);
-#else
-    return {};
-#endif
-  }
-  static bool available() {
-    return !executable().isEmpty() && QFileInfo::exists(executable());
-  }
-
-  // Serves from `database` (a SQLite path or a PostgreSQL URI); a SQLite file of its own when empty.
-  explicit SyncServerProcess(const QString& database = {})
-      : database_(database.isEmpty() ? dir.filePath(QStringLiteral("sync.sqlite")) : database) {}
-  ~SyncServerProcess() {
-    stop();
-  }
-  QString database() const {
-    return database_;
-  }
-
-  bool addUser(const QString& email, const QString& password) {
-    QProcess process;
-    process.start(executable(), {QStringLiteral("add-user"), email, QStringLiteral("--db"), database()});
-    process.write(password.toUtf8() + '\n');
-    process.closeWriteChannel();
-    return process.waitForFinished(30000) && process.exitCode() == 0;
-  }
-
-  // Starts serving; the first start picks a free port, later ones take the same port again.
-  bool start() {
-    process_ = std::make_unique<QProcess>();
-    process_->setProcessChannelMode(QProcess::ForwardedErrorChannel);
-    // The server goes when the test process goes, even when it dies.
-    process_->setChildProcessModifier([] { ::prctl(PR_SET_PDEATHSIG, SIGTERM); });
-    process_->start(executable(),
-                    {QStringLiteral("serve"), QStringLiteral("--listen"),
-                     QStringLiteral("127.0.0.1:%1").arg(port_), QStringLiteral("--db"), database()});
-    QByteArray out;
-    for (QDeadlineTimer deadline(20000); !out.contains('\n') && !deadline.hasExpired();) {
-      if (!process_->waitForReadyRead(int(deadline.remainingTime()))) break;
-      out += process_->readAllStandardOutput();
-    }
-    port_ = out.contains("listening on") ? out.mid(out.lastIndexOf(':') + 1).trimmed().toInt() : 0;
-    return port_ > 0;
-  }
-  void stop() {
-    if (!process_) return;
-    process_->terminate();
-    if (!process_->waitForFinished(10000)) process_->kill();
-    process_->waitForFinished(5000);
-    process_.reset();
-  }
-  QString address() const {
-    return QStringLiteral("http://127.0.0.1:%1").arg(port_);
-  }
-
-  QTemporaryDir dir;
-
- private:
-  QString database_;
-  std::unique_ptr<QProcess> process_;
-  int port_ = 0;
-};
-
-// One account on the real server and two installations on it.
-class TwoDevicesTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-    ASSERT_TRUE(server.addUser(kUser, kPassword));
-    ASSERT_TRUE(server.start());
-    a = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
-    b = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
-  }
-  void expectSameStores() const {
-    const auto left = snapshot(*a->context), right = snapshot(*b->context);
-    EXPECT_TRUE(left == right) << snapshotDifference(left, right);
-  }
-
-  const QString kUser = QStringLiteral("ann@example.org");
-  const QString kPassword = QStringLiteral("correct horse battery");
-  SyncServerProcess server;
-  std::unique_ptr<SyncClient> a, b;
-};
 
 }  // namespace synctest
