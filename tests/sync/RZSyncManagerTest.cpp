@@ -1,14 +1,11 @@
 #include "RZSyncManager.h"
 
-#include "Decimal.h"
 #include "RZSyncJSON.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
-#include "WTExpense.h"
 #include "WTNote.h"
 #include "WTProject.h"
 #include "WTTask.h"
-#include "WTTime.h"
 
 #include <gtest/gtest.h>
 

@@ -1,7 +1,5 @@
 #include "RZSyncNetwork.h"
 
-#include "Decimal.h"
-#include "RZSyncJSON.h"
 #include "SyncTestSupport.h"
 
 #include <gtest/gtest.h>

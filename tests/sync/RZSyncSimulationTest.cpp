@@ -189,11 +189,9 @@ class Simulation {
                      : type == 2 ? insert<WTExpense>(client)
                      : type == 3 ? static_cast<WTItem*>(insert<WTNote>(client))
                                  : insert<WTToDo>(client);
-      if (auto* time = dynamic_cast<WTTime*>(item)) {
-        const Date start = day();
-        time->setStartDate(start);
-        time->setEndDate(start.addingSeconds(60.0 * roll(300)));
-      }
+      if (auto* time = dynamic_cast<WTTime*>(item)) time->setStartDate(day());
+      if (auto* time = dynamic_cast<WTTime*>(item))
+        time->setEndDate(time->startDate()->addingSeconds(60.0 * roll(300)));
       if (auto* flat = dynamic_cast<WTFlat*>(item)) flat->setMinutes(roll(600));
       if (auto* expense = dynamic_cast<WTExpense*>(item)) expense->setExpense(money());
       item->setStartDate(day());
@@ -214,17 +212,12 @@ class Simulation {
       }
       if (change == 5) object->setArchived(roll(2) == 1);
     } else if (WTItem* item = kind == 6 ? anyItem(client) : nullptr) {  // item values
-      if (auto* time = dynamic_cast<WTTime*>(item)) {
+      if (auto* time = dynamic_cast<WTTime*>(item))
         time->setEndDate(time->startDate().value_or(day()).addingSeconds(60.0 * roll(300)));
-      } else if (auto* expense = dynamic_cast<WTExpense*>(item)) {
-        expense->setExpense(money());
-      } else if (auto* flat = dynamic_cast<WTFlat*>(item)) {
-        flat->setMinutes(roll(600));
-      } else if (auto* todo = dynamic_cast<WTToDo*>(item)) {
-        todo->setCompleted(!todo->completed());
-      } else {
-        item->setStartDate(day());
-      }
+      if (auto* expense = dynamic_cast<WTExpense*>(item)) expense->setExpense(money());
+      if (auto* flat = dynamic_cast<WTFlat*>(item)) flat->setMinutes(roll(600));
+      if (auto* todo = dynamic_cast<WTToDo*>(item)) todo->setCompleted(!todo->completed());
+      if (dynamic_cast<WTNote*>(item)) item->setStartDate(day());
     } else if (kind == 7) {  // reorder or move a task
       WTTask* task = any<WTTask>(client);
       WTProject* project = any<WTProject>(client);

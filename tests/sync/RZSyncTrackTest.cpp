@@ -2,7 +2,6 @@
 
 #include "Date.h"
 #include "Decimal.h"
-#include "RZSyncJSON.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
 #include "WTExpense.h"
