@@ -11,6 +11,7 @@
 #include <chrono>
 #include <csignal>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 namespace servertest {
@@ -52,9 +53,8 @@ class ServerCommandLineTest : public StorageTest {
         port, kSyncPath, requestBody(email.toLower().toStdString(), "a password on stdin", "head", 0, "cli"));
     EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
     ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
-    ASSERT_TRUE(server.waitForFinished(10000));
-    EXPECT_EQ(server.exitStatus(), QProcess::NormalExit);
-    EXPECT_EQ(server.exitCode(), 0);
+    EXPECT_TRUE(server.waitForFinished(10000) && server.exitStatus() == QProcess::NormalExit &&
+                server.exitCode() == 0);
   }
   QString db() const { return QString::fromStdString(storage_->location()); }
 };
@@ -65,11 +65,8 @@ TEST_P(ServerCommandLineTest, AddUserThenServeAndRefusals) {
   ASSERT_GT(port, 0);
   EXPECT_EQ(get(port, "/sync/tessal/signup.php").status, 200);
   expectHeadThenCleanStop(server, port, "Cli@Example.com");
-  const struct {
-    QStringList arguments;
-    int exitCode;
-    const char* input;
-  } rows[] = {
+  const std::tuple<QStringList, int, const char*> rows[] = {
+      // arguments, exit code, standard input
       {{"add-user", "cli@example.com", "--db", db()}, 1, "another password\n"},  // taken
       {{"add-user", "short@example.com", "--db", db()}, 1, "short\n"},
       {{}, 2, ""},
@@ -81,10 +78,10 @@ TEST_P(ServerCommandLineTest, AddUserThenServeAndRefusals) {
       {{"serve", "--listen", "127.0.0.1:0", "--db", db(), "--threads", "many"}, 2, ""},
       {{"add-user", "--db", db()}, 2, ""},
   };
-  for (const auto& row : rows) {
-    const Outcome result = run(row.arguments, row.input);
-    EXPECT_EQ(result.exitCode, row.exitCode) << row.arguments.join(' ').toStdString();
-    EXPECT_TRUE(row.exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
+  for (const auto& [arguments, exitCode, input] : rows) {
+    const Outcome result = run(arguments, input);
+    EXPECT_EQ(result.exitCode, exitCode) << arguments.join(' ').toStdString();
+    EXPECT_TRUE(exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
   }
 }
 

@@ -15,10 +15,7 @@ using synctest::SyncClient;
 // Two installations of one account on a real server.
 class RZSyncUndoAcrossSavesWithServer : public ::testing::Test {
  protected:
-  void expectSameStores() {
-    const auto left = synctest::snapshot(*a->context), right = synctest::snapshot(*b->context);
-    EXPECT_TRUE(left == right) << synctest::snapshotDifference(left, right);
-  }
+  void expectSameStores() { EXPECT_EQ(synctest::snapshot(*a->context), synctest::snapshot(*b->context)); }
   const servertest::StorageLocation storage{servertest::Storage::SQLite};
   servertest::LocalServer server{storage.location(), "ann@example.org", "correct horse battery"};
   std::unique_ptr<SyncClient> a =

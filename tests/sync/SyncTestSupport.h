@@ -245,32 +245,19 @@ inline std::string journalValues(const WTObject* object, bool setOnly = false) {
   return compact(values);
 }
 
-// Every record of a store as text: uuid -> its journal values. Two stores in step give equal snapshots.
-inline QMap<QString, std::string> snapshot(WTObjectContext& context) {
-  QMap<QString, std::string> records;
+// Every record of a store, a line each: uuid and journal values. Stores in step give the same text.
+inline std::string snapshot(WTObjectContext& context) {
+  QStringList lines;
   for (WTObject* object : context.fetchObjectsForEntityName("WTObject").value_or(QList<WTObject*>()))
-    records.insert(object->uuid(), journalValues(object));
-  return records;
+    lines.append(object->uuid() + ' ' + QString::fromStdString(journalValues(object)));
+  lines.sort();
+  return lines.join('\n').toStdString();
 }
 
 // One record's set values, as one line; "(none)" when missing.
 inline std::string storedRecord(WTObjectContext& context, const QString& uuid) {
   const WTObject* object = context.objectWithUUID(uuid, false);
   return object ? journalValues(object, true) : "(none)";
-}
-
-// Where two snapshots differ, for failure messages.
-inline std::string snapshotDifference(const QMap<QString, std::string>& a,
-                                      const QMap<QString, std::string>& b) {
-  std::string out;
-  QStringList keys = a.keys() + b.keys();
-  keys.sort();
-  keys.removeDuplicates();
-  for (const QString& key : keys) {
-    if (a.value(key) != b.value(key) && out.size() < 4000)
-      out += key.toStdString() + "\n  " + a.value(key, "(none)") + "\n  " + b.value(key, "(none)") + "\n";
-  }
-  return out;
 }
 
 }  // namespace synctest
