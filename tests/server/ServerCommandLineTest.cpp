@@ -33,67 +33,26 @@ Outcome run(const QStringList& arguments, const QByteArray& input = {}) {
           process.readAllStandardOutput().toStdString(), process.readAllStandardError().toStdString()};
 }
 
-class ServerCommandLineTest : public StorageTest {
- protected:
-  // Adds the account, starts `serve` on a free port and checks a head of that account goes through.
-  int serve(QProcess& server, const QString& email, const QStringList& more = {}) {
-    const Outcome added = run({"add-user", email, "--db", db()}, "a password on stdin\n");
-    EXPECT_EQ(added.exitCode, 0) << added.err;
-    EXPECT_NE(added.out.find(email.toLower().toStdString()), std::string::npos) << added.out;
-    server.start(QStringLiteral(TESSAL_SYNC_SERVER_EXE),
-                 QStringList{"serve", "--listen", "127.0.0.1:0", "--db", db()} + more);
-    EXPECT_TRUE(server.waitForStarted(10000) && server.waitForReadyRead(10000));
-    const QString line = QString::fromUtf8(server.readLine());
-    const auto match = QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line);
-    EXPECT_TRUE(match.hasMatch()) << line.toStdString();
-    return match.captured(1).toInt();
-  }
-  static void expectHeadThenCleanStop(QProcess& server, int port, const QString& email) {
-    const Reply reply = post(
-        port, kSyncPath, requestBody(email.toLower().toStdString(), "a password on stdin", "head", 0, "cli"));
-    EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
-    ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
-    EXPECT_TRUE(server.waitForFinished(10000) && server.exitStatus() == QProcess::NormalExit &&
-                server.exitCode() == 0);
-  }
-  QString db() const { return QString::fromStdString(storage_->location()); }
-};
-
-TEST_P(ServerCommandLineTest, AddUserThenServeAndRefusals) {
-  QProcess server;
-  const int port = serve(server, "Cli@Example.com");
-  ASSERT_GT(port, 0);
-  EXPECT_EQ(get(port, "/sync/tessal/signup.php").status, 200);
-  expectHeadThenCleanStop(server, port, "Cli@Example.com");
-  const std::tuple<QStringList, int, const char*> rows[] = {
-      // arguments, exit code, standard input
-      {{"add-user", "cli@example.com", "--db", db()}, 1, "another password\n"},  // taken
-      {{"add-user", "short@example.com", "--db", db()}, 1, "short\n"},
-      {{}, 2, ""},
-      {{"start"}, 2, ""},
-      {{"serve", "--db", db()}, 2, ""},
-      {{"serve", "--listen", "127.0.0.1:0"}, 2, ""},
-      {{"serve", "--listen", "localhost", "--db", db()}, 2, ""},
-      {{"serve", "--listen", "127.0.0.1:70000", "--db", db()}, 2, ""},
-      {{"serve", "--listen", "127.0.0.1:0", "--db", db(), "--threads", "many"}, 2, ""},
-      {{"add-user", "--db", db()}, 2, ""},
-  };
-  for (const auto& [arguments, exitCode, input] : rows) {
-    const Outcome result = run(arguments, input);
-    EXPECT_EQ(result.exitCode, exitCode) << arguments.join(' ').toStdString();
-    EXPECT_TRUE(exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
-  }
-}
+class ServerCommandLineTest : public StorageTest {};
 
 // Out of descriptors, the server closes further connections at once instead of leaving them unanswered.
-TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce) {
+TEST_P(ServerCommandLineTest, AddUserServeWithFewDescriptorsStopAndRefusals) {
+  const QString db = QString::fromStdString(storage_->location());
+  const Outcome added = run({"add-user", "Cli@Example.com", "--db", db}, "a password on stdin\n");
+  EXPECT_EQ(added.exitCode, 0) << added.err;
+  EXPECT_NE(added.out.find("cli@example.com"), std::string::npos) << added.out;
   QProcess server;
   server.setChildProcessModifier([] {
     const rlimit files{160, 160};  // soft and hard: the server cannot raise it
     setrlimit(RLIMIT_NOFILE, &files);
   });
-  const int port = serve(server, "fd@example.com", {"--threads", "4"});
-  ASSERT_GT(port, 0);
+  server.start(TESSAL_SYNC_SERVER_EXE, {"serve", "--listen", "127.0.0.1:0", "--db", db, "--threads", "4"});
+  ASSERT_TRUE(server.waitForStarted(10000) && server.waitForReadyRead(10000));
+  const QString line = QString::fromUtf8(server.readLine());
+  const int port =
+      QRegularExpression("listening on http://127\\.0\\.0\\.1:(\\d+)").match(line).captured(1).toInt();
+  ASSERT_GT(port, 0) << line.toStdString();
+  EXPECT_EQ(get(port, "/sync/tessal/signup.php").status, 200);
   std::vector<std::unique_ptr<RawConnection>> clients;
   for (int i = 0; i < 300; ++i) {
     clients.push_back(std::make_unique<RawConnection>(port));
@@ -108,7 +67,30 @@ TEST_P(ServerCommandLineTest, ConnectionsBeyondTheDescriptorLimitAreClosedAtOnce
   }
   clients.clear();
   EXPECT_GE(closedAtOnce, 150) << "of 300, with descriptors for fewer than 160";
-  expectHeadThenCleanStop(server, port, "fd@example.com");
+  const Reply reply =
+      post(port, kSyncPath, requestBody("cli@example.com", "a password on stdin", "head", 0, "cli"));
+  EXPECT_EQ(reply.body, R"({"action":"head","iteration":0,"result":{"i":{},"u":{},"x":[]}})");
+  ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
+  EXPECT_TRUE(server.waitForFinished(10000) && server.exitStatus() == QProcess::NormalExit &&
+              server.exitCode() == 0);
+  const std::tuple<QStringList, int, const char*> rows[] = {
+      // arguments, exit code, standard input
+      {{"add-user", "cli@example.com", "--db", db}, 1, "another password\n"},  // taken
+      {{"add-user", "short@example.com", "--db", db}, 1, "short\n"},
+      {{}, 2, ""},
+      {{"start"}, 2, ""},
+      {{"serve", "--db", db}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:0"}, 2, ""},
+      {{"serve", "--listen", "localhost", "--db", db}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:70000", "--db", db}, 2, ""},
+      {{"serve", "--listen", "127.0.0.1:0", "--db", db, "--threads", "many"}, 2, ""},
+      {{"add-user", "--db", db}, 2, ""},
+  };
+  for (const auto& [arguments, exitCode, input] : rows) {
+    const Outcome result = run(arguments, input);
+    EXPECT_EQ(result.exitCode, exitCode) << arguments.join(' ').toStdString();
+    EXPECT_TRUE(exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, ServerCommandLineTest,
