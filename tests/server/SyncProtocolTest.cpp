@@ -112,20 +112,6 @@ TEST_P(SyncProtocolTest, AccountsNeverSeeEachOther) {
   EXPECT_EQ(ask(bob, "head", 0, "other"), R"(head 2 {} ["gone@WTNote","shared@WTClient"])");
 }
 
-TEST_P(SyncProtocolTest, DataAndTheBodyLimitSurviveARestart) {
-  const std::string user = newUser("restart");
-  ASSERT_EQ(ask(user, "save", 0, "a", R"({"i":{"p@WTProject":{"name":"kept","rate":80.00}}})"), "save 1");
-  stopServer();
-  options.maxBodyBytes = 4096;
-  startServer();
-  EXPECT_EQ(ask(user, "head", 0, "b"), R"(head 1 {"p@WTProject":{"name":"kept","rate":80.00}} [])");
-  const Reply big =
-      sync(user, "save", 1, "d", R"({"i":{"c@WTClient":{"notes":")" + std::string(5000, 'n') + R"("}}})");
-  EXPECT_EQ(big.status, 413);
-  EXPECT_EQ(big.code(), 6) << big.body;
-  EXPECT_EQ(ask(user, "save", 1, "d", R"({"i":{"c@WTClient":{"notes":"short"}}})"), "save 2");
-}
-
 // Every save is based on 0: each reply is 0 once others had saved, or the save's own iteration.
 TEST_P(SyncProtocolTest, ConcurrentSavesGetOneIterationEach) {
   constexpr int kDevices = 6, kSaves = 8;
@@ -148,7 +134,8 @@ TEST_P(SyncProtocolTest, ConcurrentSavesGetOneIterationEach) {
   EXPECT_EQ(all["result"]->find("i")->members().size(), static_cast<size_t>(kDevices * kSaves));
 }
 
-TEST_P(SyncProtocolTest, SignUpPageCreatesAccounts) {
+// Accounts made on the sign-up page sign in; data, the body limit and turning sign-up off survive a restart.
+TEST_P(SyncProtocolTest, SignUpPageCreatesAccountsAndARestartKeepsTheData) {
   const Reply page = get(port(), "/sync/tessal/signup.php");
   EXPECT_EQ(page.status, 200);
   for (const char* field : {"name=\"email\"", "name=\"password\"", "name=\"password2\"", "method=\"post\""})
@@ -176,15 +163,25 @@ TEST_P(SyncProtocolTest, SignUpPageCreatesAccounts) {
     EXPECT_NE(reply.body.find(row.says), std::string::npos) << reply.body;
     EXPECT_EQ(reply.body.find("<script>"), std::string::npos);
   }
-  EXPECT_EQ(post(requestBody("new@example.com", "long enough", "head", 0)), kEmpty);
-  EXPECT_EQ(post(requestBody("new@example.com", "other password", "head", 0)), "code 2");
   EXPECT_EQ(post(requestBody("two@example.com", "long enough", "head", 0)), "code 2");
+  const auto as = [](int64_t base, const std::string& data) {
+    return requestBody("new@example.com", "long enough", data.empty() ? "head" : "save", base, "a", data);
+  };
+  EXPECT_EQ(post(as(0, R"({"i":{"p@WTProject":{"name":"kept","rate":80.00}}})")), "save 1");
 
   stopServer();
   options.signUp = false;
+  options.maxBodyBytes = 4096;
   startServer();
   EXPECT_EQ(get(port(), "/sync/tessal/signup.php").status, 404);
   EXPECT_EQ(submit("a%40b.c", "12345678", "12345678").status, 404);
+  EXPECT_EQ(post(as(0, "")), R"(head 1 {} [])");  // its own change, from its own device
+  const Reply big = servertest::post(
+      port(), kSyncPath, as(1, R"({"i":{"c@WTClient":{"notes":")" + std::string(5000, 'n') + R"("}}})"));
+  EXPECT_TRUE(big.status == 413 && big.code() == 6) << big.body;
+  EXPECT_EQ(post(as(1, R"({"i":{"c@WTClient":{"notes":"short"}}})")), "save 2");
+  EXPECT_EQ(post(requestBody("new@example.com", "long enough", "head", 0, "b")),
+            R"(head 2 {"c@WTClient":{"notes":"short"},"p@WTProject":{"name":"kept","rate":80.00}} [])");
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, SyncProtocolTest, testing::Values(Storage::SQLite, Storage::PostgreSQL),
