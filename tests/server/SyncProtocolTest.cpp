@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <fstream>
 #include <sstream>
-#include <string>
 #include <thread>
 
 namespace servertest {

@@ -3,8 +3,6 @@
 #include "SyncTestSupport.h"
 #include "WTTask.h"
 
-#include <gtest/gtest.h>
-
 using namespace synctest;
 
 namespace {

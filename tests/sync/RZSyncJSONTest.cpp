@@ -1,9 +1,6 @@
 #include "RZSyncJSON.h"
 
-#include "Decimal.h"
 #include "SyncTestSupport.h"
-
-#include <gtest/gtest.h>
 
 #include <nlohmann/json.hpp>
 

@@ -1,13 +1,10 @@
 #include "RZSyncManager.h"
 
-#include "RZSyncJSON.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
 #include "WTNote.h"
 #include "WTProject.h"
 #include "WTTask.h"
-
-#include <gtest/gtest.h>
 
 #include <QSignalSpy>
 

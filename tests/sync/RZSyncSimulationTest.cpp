@@ -1,6 +1,5 @@
 // Random edits synced through a lossy proxy and a server restart converge on every accepted change.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
-#include "Decimal.h"
 #include "ServerTestSupport.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
@@ -11,8 +10,6 @@
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
-
-#include <gtest/gtest.h>
 
 #include <iostream>
 #include <random>

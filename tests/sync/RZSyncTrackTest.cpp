@@ -1,21 +1,15 @@
 #include "RZSyncTrack.h"
 
 #include "Date.h"
-#include "Decimal.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
 #include "WTExpense.h"
-#include "WTObjectContext.h"
 #include "WTProject.h"
-#include "WTStore.h"
 #include "WTTask.h"
-
-#include <gtest/gtest.h>
 
 #include <QColor>
 #include <QDir>
 #include <QFile>
-#include <QTemporaryDir>
 
 #include <nlohmann/json.hpp>
 

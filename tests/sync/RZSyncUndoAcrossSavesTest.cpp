@@ -8,8 +8,6 @@
 #include "WTTask.h"
 #include "WTTime.h"
 
-#include <gtest/gtest.h>
-
 using synctest::SyncClient;
 
 // Two installations of one account on a real server.
