@@ -76,8 +76,8 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   EXPECT_EQ(unanswered, 0);
 }
 
-// Guesses are slowed down but never lock out the owner's devices, even after their proven password expired.
-TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePassword) {
+// Guesses are slowed down, never locking out the owner's devices; sign-ups from strangers are refused.
+TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   std::atomic<int64_t> offset{0};
   options.authentication.now = [&] {
     return std::chrono::steady_clock::now() + std::chrono::seconds(offset.load());
@@ -106,10 +106,8 @@ TEST_P(ServerHardeningTest, FailedGuessesNeverLockOutDevicesThatProvedThePasswor
     EXPECT_EQ(attempt("password-of-" + user).status, 200) << "minute " << minute;
   }
   EXPECT_EQ(attempt("one-more-guess").status, 429);
-}
 
-TEST_P(ServerHardeningTest, SignUpRefusesOtherSitesQueriesFloodsAndSaysWhatIsWrong) {
-  startServer();
+  // Sign-ups from other sites, with the fields in the query or too often are refused, saying what is wrong.
   const std::string sameSite = "Origin: http://127.0.0.1:" + std::to_string(port()) + "\r\n";
   // The reply to a sign-up, and whether the account exists afterwards.
   auto signUp = [&](const std::string& name, const std::string& password, const std::string& headers,
