@@ -35,7 +35,6 @@ class StorageLocation {
   std::string schema_, location_;
 };
 
-// A reply as the client sees it.
 struct Reply {
   int status = 0;  // 0 when the connection failed
   std::string body;
@@ -71,8 +70,7 @@ class RawConnection {
   bool connected_ = false;
 };
 
-// The sync server in this process on 127.0.0.1 over `location` with one account; a restart takes the same
-// port.
+// The sync server in this process over `location`, with one account; a restart takes the same port.
 class LocalServer {
  public:
   LocalServer(const std::string& location, const std::string& email, const std::string& password);

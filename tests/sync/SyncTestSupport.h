@@ -44,12 +44,10 @@ inline Decimal dec(const char* text) {
 inline QVariant money(const char* text) {
   return QVariant::fromValue(dec(text));
 }
-// A value as one line of JSON, for comparing journal entries and request bodies as text.
 inline std::string compact(const QVariant& value) {
   return RZSyncJSON::write(value, RZSyncJSON::Style::Compact).toStdString();
 }
 
-// One HTTP request as the test server received it.
 struct HttpRequest {
   QByteArray method, path, body;
   QMap<QByteArray, QByteArray> headers;  // names in lower case
@@ -152,7 +150,6 @@ inline QByteArray errorReply(const QString& message, qint64 code, const QVariant
   return LoopbackHttpServer::json(reply);
 }
 
-// Remembers what the manager presented to the user.
 class RecordingPresenter final : public RZSyncErrorPresenter {
  public:
   void presentSyncError(const QString& message) override { syncErrors.append(message); }
