@@ -4,13 +4,15 @@
 
 #include <httplib.h>
 
+#include <arpa/inet.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
 #include <cstdlib>
 #include <random>
 
 namespace servertest {
-
-using tessal::server::appendJsonString;
-using tessal::server::SqlDatabase;
 
 std::string storageName(const testing::TestParamInfo<Storage>& info) {
   return info.param == Storage::SQLite ? "SQLite" : "PostgreSQL";
@@ -21,22 +23,15 @@ std::string postgresUri() {
   return uri ? uri : "";
 }
 
-namespace {
-
-void runOnPostgres(const std::string& sql) {
+static void runOnPostgres(const std::string& sql) {
   std::string error;
-  std::unique_ptr<SqlDatabase> database = SqlDatabase::open(postgresUri(), error);
+  const auto database = tessal::server::SqlDatabase::open(postgresUri(), error);
   ASSERT_TRUE(database) << error;
   database->acquire()->executeScript(sql);
 }
 
-}  // namespace
-
-StorageLocation::StorageLocation(Storage storage) : storage_(storage) {
-  if (storage_ == Storage::SQLite) {
-    location_ = (dir_.path() + "/sync.db").toStdString();
-    return;
-  }
+StorageLocation::StorageLocation(Storage storage) : location_((dir_.path() + "/sync.db").toStdString()) {
+  if (storage == Storage::SQLite) return;
   std::random_device random;
   schema_ = "test_" + std::to_string(random()) + "_" + std::to_string(random());
   runOnPostgres("CREATE SCHEMA " + schema_);
@@ -53,19 +48,11 @@ int64_t Reply::integer(const char* name) const {
   return value && value->integerValue() ? *value->integerValue() : -1;
 }
 
-namespace {
-
-Reply toReply(const httplib::Result& result) {
-  Reply reply;
-  if (!result) return reply;
-  reply.status = result->status;
-  reply.body = result->body;
-  reply.json = JsonValue::parse(reply.body);
-  reply.retryAfter = result->get_header_value("Retry-After");
-  return reply;
+static Reply toReply(const httplib::Result& result) {
+  if (!result) return {};
+  return {result->status, result->body, JsonValue::parse(result->body),
+          result->get_header_value("Retry-After")};
 }
-
-}  // namespace
 
 Reply post(int port, const std::string& path, const std::string& body, const std::string& contentType) {
   httplib::Client client("127.0.0.1", port);
@@ -74,44 +61,89 @@ Reply post(int port, const std::string& path, const std::string& body, const std
 }
 
 Reply get(int port, const std::string& path) {
-  httplib::Client client("127.0.0.1", port);
-  return toReply(client.Get(path.c_str()));
+  return toReply(httplib::Client("127.0.0.1", port).Get(path.c_str()));
 }
 
 std::string requestBody(const std::string& user, const std::string& password, const std::string& action,
                         int64_t iteration, const std::string& device, const std::string& data) {
-  const auto field = [](const char* name, const std::string& text) {
-    std::string out = std::string(",\"") + name + "\":";
-    appendJsonString(out, text);
-    return out;
+  std::string body = "{";
+  const auto field = [&](const char* name, const std::string& text) {
+    body += std::string(body.size() > 1 ? "," : "") + "\"" + name + "\":";
+    tessal::server::appendJsonString(body, text);
   };
-  std::string body = "{" + field("user", user).substr(1) + field("password", password) +
-                     field("action", action) + ",\"iteration\":" + std::to_string(iteration);
-  if (!device.empty()) body += field("device", device);
-  if (!data.empty()) body += ",\"data\":" + data;
-  return body + "}";
+  field("user", user), field("password", password), field("action", action);
+  body += ",\"iteration\":" + std::to_string(iteration);
+  if (!device.empty()) field("device", device);
+  return body + (data.empty() ? "" : ",\"data\":" + data) + "}";
+}
+
+RawConnection::RawConnection(int port) : fd_(socket(AF_INET, SOCK_STREAM, 0)) {
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_port = htons(static_cast<uint16_t>(port));
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  connected_ = connect(fd_, reinterpret_cast<sockaddr*>(&address), sizeof address) == 0;
+  timeval timeout{5, 0};
+  setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
+}
+RawConnection::~RawConnection() {
+  ::close(fd_);
+}
+
+bool RawConnection::send(const std::string& bytes) {
+  return ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+}
+
+std::string RawConnection::readAll() {
+  std::string out;
+  char buffer[4096];
+  for (ssize_t got; (got = recv(fd_, buffer, sizeof buffer, 0)) > 0;) out.append(buffer, size_t(got));
+  return out;
+}
+
+int RawConnection::status(const std::string& response) {
+  return response.rfind("HTTP/1.1 ", 0) == 0 && response.size() >= 12 ? std::stoi(response.substr(9, 3)) : 0;
+}
+
+LocalServer::LocalServer(const std::string& location, const std::string& email, const std::string& password)
+    : location_(location) {
+  options_.threads = 8;
+  EXPECT_TRUE(start());
+  EXPECT_EQ(server_->authenticator().createAccount(email, password),
+            tessal::server::PasswordAuthenticator::SignUp::Created);
+}
+
+bool LocalServer::start() {
+  std::string error;
+  server_ = SyncServer::create(location_, options_, error);
+  const bool started = server_ && server_->start(error);
+  EXPECT_TRUE(started) << error;
+  options_.port = started ? server_->port() : options_.port;
+  return started;
+}
+
+void LocalServer::stop() {
+  if (server_) server_->stop();
+  server_.reset();
+}
+
+void StorageTest::SetUp() {
+  if (GetParam() == Storage::PostgreSQL && postgresUri().empty())
+    GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";
+  storage_ = std::make_unique<StorageLocation>(GetParam());
 }
 
 void ServerTest::SetUp() {
-  if (GetParam() == Storage::PostgreSQL && postgresUri().empty()) {
-    GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";
-  }
-  storage_ = std::make_unique<StorageLocation>(GetParam());
+  StorageTest::SetUp();
   options.threads = 8;
   options.authentication.firstLock = std::chrono::milliseconds(300);
   options.authentication.longestLock = std::chrono::seconds(2);
 }
 
-void ServerTest::TearDown() {
-  stopServer();
-  storage_.reset();
-}
-
 void ServerTest::startServer() {
   std::string error;
   server_ = SyncServer::create(storage_->location(), options, error);
-  ASSERT_TRUE(server_) << error;
-  ASSERT_TRUE(server_->start(error)) << error;
+  ASSERT_TRUE(server_ && server_->start(error)) << error;
 }
 
 void ServerTest::stopServer() {
@@ -119,21 +151,16 @@ void ServerTest::stopServer() {
   server_.reset();
 }
 
-void ServerTest::addAccount(const std::string& email, const std::string& password) {
-  ASSERT_EQ(server_->authenticator().createAccount(email, password),
-            tessal::server::PasswordAuthenticator::SignUp::Created);
-}
-
 std::string ServerTest::newUser(const std::string& name) {
   const std::string email = name + "@example.com";
-  addAccount(email, "password-of-" + email);
+  EXPECT_EQ(server_->authenticator().createAccount(email, "password-of-" + email),
+            tessal::server::PasswordAuthenticator::SignUp::Created);
   return email;
 }
 
 Reply ServerTest::sync(const std::string& email, const std::string& action, int64_t iteration,
                        const std::string& device, const std::string& data) {
-  return post(port(), "/sync/tessal/sync.php",
-              requestBody(email, "password-of-" + email, action, iteration, device, data));
+  return post(port(), kSyncPath, requestBody(email, "password-of-" + email, action, iteration, device, data));
 }
 
 }  // namespace servertest

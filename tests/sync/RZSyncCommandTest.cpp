@@ -3,91 +3,78 @@
 #include "SyncTestSupport.h"
 #include "WTTask.h"
 
-#include <gtest/gtest.h>
-
-using synctest::HttpRequest;
-using synctest::LoopbackHttpServer;
-using synctest::SyncClient;
+using namespace synctest;
 
 namespace {
 
-struct CommandResult {
-  int code;
-  QString out;
-  QString err;
-};
-
-CommandResult run(SyncClient& client, const QStringList& arguments = {}) {
+// The exit code, standard output and standard error, as one line each.
+std::string run(SyncClient& client, const QStringList& arguments = {}) {
   QString out, err;
   QTextStream outStream(&out), errStream(&err);
   const int code = runSyncCommand(*client.manager, arguments, outStream, errStream);
-  return {code, out, err};
+  outStream.flush(), errStream.flush();
+  return (QString::number(code) + " | " + out.trimmed() + " | " + err.trimmed()).toStdString();
 }
 
 }  // namespace
 
-// Polls until a head brings nothing and nothing waits to be sent: what is here goes up and what others
-// did comes down, however many rounds that takes.
+// Polls, however many rounds it takes, until a head brings nothing and nothing waits to be sent.
 TEST(RZSyncCommand, RunsUntilInStep) {
   LoopbackHttpServer server;
   const QByteArray answers[] = {
-      synctest::headReply(3, synctest::changeSet({{"One@WTTask", QVariantMap{{"name", "One"}}}})),
-      synctest::saveReply(4),
-      synctest::headReply(5, synctest::changeSet({{"Two@WTTask", QVariantMap{{"name", "Two"}}}})),
-      synctest::headReply(5)};
+      headReply(3, changeSet({{"One@WTTask", QVariantMap{{"name", "One"}}}})), saveReply(4),
+      headReply(5, changeSet({{"Two@WTTask", QVariantMap{{"name", "Two"}}}})), headReply(5)};
   server.handler = [&](const HttpRequest&) {
     return answers[std::min<qsizetype>(server.requests.size(), 4) - 1];
   };
   SyncClient client(server.address());
   client.context->insertNewObject<WTTask>()->setName("Here");
   client.save();
-  const CommandResult result = run(client, {"--timeout", "10"});
-  EXPECT_EQ(result.code, 0) << result.err.toStdString();
-  EXPECT_EQ(result.out, "In step with " + server.url().toString() + " at iteration 5.\n");
+  EXPECT_EQ(run(client, {"--timeout", "10"}),
+            "0 | In step with " + server.url().toString().toStdString() + " at iteration 5. | ");
   EXPECT_EQ(server.requests.size(), 4);
   EXPECT_NE(client.find<WTTask>("Two@WTTask"), nullptr);
   EXPECT_FALSE(client.track().hasChanges());
 }
 
+// Refusals, failures and a missing server, account or argument end with a message and send nothing more.
 TEST(RZSyncCommand, FailsWithAMessage) {
   LoopbackHttpServer server;
-  struct Case {
-    const char* what;
+  const struct {
     QByteArray answer;  // empty: never answers
     QStringList arguments;
-    const char* message;
-  };
-  const Case cases[] = {
-      {"refused",
-       synctest::errorReply("Wrong e-mail address or password.", 2),
+    QString server, user;
+    const char* result;  // the start of what run() gives
+  } rows[] = {
+      {errorReply("Wrong e-mail address or password.", 2),
        {},
-       "The server refused: Wrong e-mail address or password. - (Code: 2)"},
-      {"no usable answer", LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"), {}, "Sync failed: "},
-      {"no answer in time", QByteArray(), {"--timeout", "1"}, "Not in step with the server after 1 seconds."},
+       server.address(),
+       "ann",
+       "1 |  | The server refused: Wrong e-mail address or password. - (Code: 2)"},
+      {LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"),
+       {},
+       server.address(),
+       "ann",
+       "1 |  | Sync failed: "},
+      {QByteArray(),
+       {"--timeout", "1"},
+       server.address(),
+       "ann",
+       "1 |  | Not in step with the server after 1 seconds."},
+      {QByteArray(), {}, "", "ann", "1 |  | "},  // the message names the missing setting
+      {QByteArray(), {}, server.address(), "  ", "1 |  | "},
+      {QByteArray(), {"--timeout"}, server.address(), "ann", "2 |  | "},
+      {QByteArray(), {"--timeout", "0"}, server.address(), "ann", "2 |  | "},
+      {QByteArray(), {"now"}, server.address(), "ann", "2 |  | "},
   };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.what);
-    server.handler = [&](const HttpRequest&) { return c.answer; };
-    SyncClient client(server.address());
-    const CommandResult result = run(client, c.arguments);
-    EXPECT_EQ(result.code, 1);
-    EXPECT_TRUE(result.err.contains(QString::fromLatin1(c.message))) << result.err.toStdString();
-    EXPECT_TRUE(result.out.isEmpty());
-  }
-}
-
-TEST(RZSyncCommand, NeedsAServerAndAnAccount) {
-  LoopbackHttpServer server;
-  SyncClient noServer(QString{});
-  EXPECT_TRUE(run(noServer).err.contains("\"WTSyncServer\""));
-  SyncClient noAccount(server.address(), QStringLiteral("  "));
-  const CommandResult result = run(noAccount);
-  EXPECT_EQ(result.code, 1);
-  EXPECT_TRUE(result.err.contains("\"WTSyncUser\""));
-  EXPECT_TRUE(server.requests.isEmpty());
-  SyncClient client(server.address());
-  for (const QStringList& arguments :
-       {QStringList{"--timeout"}, QStringList{"--timeout", "0"}, QStringList{"now"}}) {
-    EXPECT_EQ(run(client, arguments).code, 2);
+  for (const auto& row : rows) {
+    server.handler = [&](const HttpRequest&) { return row.answer; };
+    SyncClient client(row.server, row.user);
+    const qsizetype before = server.requests.size();
+    const std::string result = run(client, row.arguments);
+    EXPECT_EQ(result.substr(0, strlen(row.result)), row.result) << result;
+    EXPECT_TRUE(row.server.isEmpty() == (result.find("\"WTSyncServer\"") != std::string::npos)) << result;
+    EXPECT_TRUE((row.user == "  ") == (result.find("\"WTSyncUser\"") != std::string::npos)) << result;
+    EXPECT_EQ(server.requests.size() > before, &row < rows + 3) << result;  // only the first rows get as far
   }
 }

@@ -1,7 +1,6 @@
 #pragma once
 
-// Real parts for the sync tests: a scripted HTTP server on 127.0.0.1, a client over a real store file,
-// and the real tessal-sync-server process.
+// Real parts for the sync tests: a scripted HTTP server on 127.0.0.1 and a client over a real store file.
 #include "Decimal.h"
 #include "LogCapture.h"
 #include "RZSyncErrorPresenter.h"
@@ -15,18 +14,13 @@
 
 #include <QCoreApplication>
 #include <QDeadlineTimer>
-#include <QFileInfo>
 #include <QPointer>
-#include <QProcess>
 #include <QTcpServer>
 #include <QTcpSocket>
 #include <QTemporaryDir>
 #include <QTest>
 #include <QTimer>
 
-#include <sys/prctl.h>
-#include <algorithm>
-#include <csignal>
 #include <functional>
 #include <memory>
 
@@ -37,15 +31,12 @@ inline bool waitUntil(const std::function<bool()>& done, int ms = 5000) {
   const QDeadlineTimer deadline(ms);
   QTimer wake;  // no batch of events ever waits longer than this
   wake.start(20);
-  while (!done()) {
+  for (; !done(); QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete)) {
     if (deadline.hasExpired()) return false;
     QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents);
-    QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
   }
   return true;
 }
-
-using ::LogCapture;
 
 inline Decimal dec(const char* text) {
   return *Decimal::fromString(QString::fromLatin1(text));
@@ -53,26 +44,20 @@ inline Decimal dec(const char* text) {
 inline QVariant money(const char* text) {
   return QVariant::fromValue(dec(text));
 }
-// A value as one line of JSON, for comparing journal entries and request bodies as text.
-inline QString compact(const QVariant& value) {
-  return QString::fromUtf8(RZSyncJSON::write(value, RZSyncJSON::Style::Compact));
+inline std::string compact(const QVariant& value) {
+  return RZSyncJSON::write(value, RZSyncJSON::Style::Compact).toStdString();
 }
 
-// One HTTP request as the test server received it.
 struct HttpRequest {
-  QByteArray method;
-  QByteArray path;
+  QByteArray method, path, body;
   QMap<QByteArray, QByteArray> headers;  // names in lower case
-  QByteArray body;
   QVariantMap json() const { return RZSyncJSON::parse(body).value_or(QVariant()).toMap(); }
 };
 
-// An HTTP/1.1 server on the event loop: records each request and answers the handler's raw bytes; an
-// empty answer holds the request until answerHeld().
+// Records each request and answers the handler's raw bytes; an empty answer holds it until answerHeld().
 class LoopbackHttpServer {
  public:
   using Handler = std::function<QByteArray(const HttpRequest&)>;
-
   LoopbackHttpServer() {
     EXPECT_TRUE(server_.listen(QHostAddress::LocalHost, 0));
     QObject::connect(&server_, &QTcpServer::newConnection, [this] {
@@ -83,10 +68,10 @@ class LoopbackHttpServer {
     });
   }
 
-  QUrl url(const QString& path = QString::fromLatin1(RZSyncManager::kEndpointPath)) const {
-    return QUrl(QStringLiteral("http://127.0.0.1:%1%2").arg(server_.serverPort()).arg(path));
-  }
   QString address() const { return QStringLiteral("http://127.0.0.1:%1").arg(server_.serverPort()); }
+  QUrl url(const QString& path = QString::fromLatin1(RZSyncManager::kEndpointPath)) const {
+    return QUrl(address() + path);
+  }
 
   Handler handler = [](const HttpRequest&) { return json(QVariantMap{}); };
   QList<HttpRequest> requests;
@@ -94,19 +79,15 @@ class LoopbackHttpServer {
   bool hasHeld() const { return !held_.isEmpty(); }
   // Answers the oldest held request; false when none is held (or its client gave up).
   bool answerHeld(const QByteArray& answer) {
-    if (held_.isEmpty()) return false;
-    QPointer<QTcpSocket> socket = held_.takeFirst();
-    if (!socket) return false;
-    reply(socket, answer);
-    return true;
+    QPointer<QTcpSocket> socket = held_.isEmpty() ? nullptr : held_.takeFirst();
+    if (socket) reply(socket, answer);
+    return socket;
   }
   // Closes the oldest held request's connection without an answer.
   void dropHeld() {
-    if (held_.isEmpty()) return;
-    if (QPointer<QTcpSocket> socket = held_.takeFirst()) socket->abort();
+    if (QPointer<QTcpSocket> socket = held_.isEmpty() ? nullptr : held_.takeFirst()) socket->abort();
   }
 
-  // A complete response with a JSON body.
   static QByteArray json(const QVariant& value, int status = 200) {
     return raw(RZSyncJSON::write(value, RZSyncJSON::Style::Compact), status);
   }
@@ -128,10 +109,9 @@ class LoopbackHttpServer {
     const QList<QByteArray> first = lines.value(0).trimmed().split(' ');
     request.method = first.value(0);
     request.path = first.value(1);
-    for (qsizetype i = 1; i < lines.size(); ++i) {
-      const qsizetype colon = lines[i].indexOf(':');
-      if (colon > 0)
-        request.headers.insert(lines[i].left(colon).trimmed().toLower(), lines[i].mid(colon + 1).trimmed());
+    for (const QByteArray& line : lines.mid(1)) {
+      if (const qsizetype colon = line.indexOf(':'); colon > 0)
+        request.headers.insert(line.left(colon).trimmed().toLower(), line.mid(colon + 1).trimmed());
     }
     const qsizetype length = request.headers.value("content-length").toLongLong();
     if (buffer.size() < end + 4 + length) return;
@@ -139,13 +119,8 @@ class LoopbackHttpServer {
     buffer.remove(0, end + 4 + length);
     requests.append(request);
     const QByteArray answer = handler(request);
-    if (answer.isEmpty()) {
-      held_.append(socket);
-      return;
-    }
-    reply(socket, answer);
+    answer.isEmpty() ? held_.append(socket) : reply(socket, answer);
   }
-
   static void reply(QTcpSocket* socket, const QByteArray& answer) {
     socket->write(answer);
     socket->flush();
@@ -175,32 +150,15 @@ inline QByteArray errorReply(const QString& message, qint64 code, const QVariant
   return LoopbackHttpServer::json(reply);
 }
 
-// Remembers what the manager presented to the user.
 class RecordingPresenter final : public RZSyncErrorPresenter {
  public:
   void presentSyncError(const QString& message) override { syncErrors.append(message); }
   void presentNetworkError(const QString& message) override { networkErrors.append(message); }
-  QStringList syncErrors;
-  QStringList networkErrors;
+  QStringList syncErrors, networkErrors;
 };
 
-// Answers the credentials the way the application delegate does, from the user defaults.
-class DefaultsCredentials final : public RZSyncNetworkCredentialDelegate {
- public:
-  explicit DefaultsCredentials(UserDefaults& defaults) : defaults_(defaults) {}
-  QString syncNetworkRequestsUser(RZSyncNetwork*) override {
-    return defaults_.stringForKey(QStringLiteral("WTSyncUser"));
-  }
-  QString syncNetworkRequestsPassword(RZSyncNetwork*) override {
-    return defaults_.stringForKey(QStringLiteral("WTSyncPassword"));
-  }
-
- private:
-  UserDefaults& defaults_;
-};
-
-// One installation in its own folder, with a sync manager made with syncing off.
-class SyncClient {
+// One installation in its own folder, syncing off; credentials come from its user defaults.
+class SyncClient final : public RZSyncNetworkCredentialDelegate {
  public:
   SyncClient(const QString& server, const QString& user = QStringLiteral("ann@example.org"),
              const QString& password = QStringLiteral("secret-password")) {
@@ -209,45 +167,39 @@ class SyncClient {
     defaults->setValue(QStringLiteral("WTSyncServer"), server);
     defaults->setValue(QStringLiteral("WTSyncUser"), user);
     defaults->setValue(QStringLiteral("WTSyncPassword"), password);
-    credentials = std::make_unique<DefaultsCredentials>(*defaults);
     open();
   }
-  ~SyncClient() { close(); }
+  ~SyncClient() override { close(); }
+  QString syncNetworkRequestsUser(RZSyncNetwork*) override { return defaults->stringForKey("WTSyncUser"); }
+  QString syncNetworkRequestsPassword(RZSyncNetwork*) override {
+    return defaults->stringForKey("WTSyncPassword");
+  }
 
   void open() {
     context = std::make_unique<WTObjectContext>(defaults.get());
     auto store = WTStore::open(dir.filePath(QStringLiteral("Tessal.sqlite")));
-    EXPECT_TRUE(store.ok()) << store.error().message.toStdString();
-    if (store.ok()) {
-      EXPECT_TRUE(context->attachStore(std::move(store.value())).ok());
-    }
+    EXPECT_TRUE(store.ok() && context->attachStore(std::move(store.value())).ok());
     manager = std::make_unique<RZSyncManager>(context.get(), journalPath());
-    manager->syncNetwork()->setCredentialDelegate(credentials.get());
+    manager->syncNetwork()->setCredentialDelegate(this);
     manager->setErrorPresenter(&presenter);
   }
   // Drops manager and context as quitting does (nothing unsaved is saved).
-  void close() {
-    manager.reset();
-    context.reset();
-  }
+  void close() { manager.reset(), context.reset(); }
   void reopen() { close(), open(); }
 
   QString journalPath() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
   RZSyncTrack& track() const { return *manager->syncTrack(); }
   RZSyncNetwork& network() const { return *manager->syncNetwork(); }
   bool idle() const { return network().networkAction() == RZSyncNetwork::Idle; }
-
   void save() {
     const Result<void> saved = context->save();
     EXPECT_TRUE(saved.ok()) << saved.error().message.toStdString();
   }
-
   // One poll, waiting for it and for any save it sends; false when it did not finish in time.
   bool syncOnce(int ms = 10000) {
     manager->sync();
     return waitUntil([this] { return idle(); }, ms);
   }
-
   template <class T>
   T* find(const QString& uuid) const {
     return dynamic_cast<T*>(context->objectWithUUID(uuid, false));
@@ -255,177 +207,54 @@ class SyncClient {
 
   QTemporaryDir dir;
   std::unique_ptr<UserDefaults> defaults;
-  std::unique_ptr<DefaultsCredentials> credentials;
   std::unique_ptr<WTObjectContext> context;
   std::unique_ptr<RZSyncManager> manager;
   RecordingPresenter presenter;
 };
 
-// A stored value by key; an item answers "rate" with its task's rate, so the stored one is read directly.
+// A stored value in journal form (an item's own rate, not its task's; a task order as uuids).
 inline QVariant storedValue(const WTObject* object, const QString& key) {
-  if (key == QLatin1String("rate")) {
-    const std::optional<Decimal> rate = object->storedRate();
-    return rate ? QVariant::fromValue(*rate) : QVariant();
+  const std::optional<Decimal> rate = key == QLatin1String("rate") ? object->storedRate() : std::nullopt;
+  QVariant value = key == QLatin1String("rate") ? (rate ? QVariant::fromValue(*rate) : QVariant())
+                                                : object->valueForKey(key);
+  if (key == QLatin1String("tasks")) {
+    QVariantList uuids;
+    for (const QVariant& task : value.toList())
+      uuids.append(RZSyncTrack::transformedValue(task).value_or(QVariant()));
+    value = uuids;
   }
-  return object->valueForKey(key);
+  return RZSyncTrack::transformedValue(value).value_or(QVariant());
 }
 
-// A record's stored values in journal form, a project's task order included.
-inline QVariantMap journalValues(const WTObject* object) {
+// A record's stored values as one line of JSON; without the uuid and unset values when `setOnly`.
+inline std::string journalValues(const WTObject* object, bool setOnly = false) {
   QVariantMap values;
   QStringList keys = object->storedKeys();
   if (object->entity() == WTEntity::Project) keys << QStringLiteral("tasks");
   for (const QString& key : keys) {
-    QVariant value = storedValue(object, key);
-    if (key == QLatin1String("tasks")) {
-      QVariantList uuids;
-      for (const QVariant& task : value.toList())
-        uuids.append(RZSyncTrack::transformedValue(task).value_or(QVariant()));
-      value = uuids;
-    }
-    values.insert(key, RZSyncTrack::transformedValue(value).value_or(QVariant()));
-  }
-  return values;
-}
-
-// Every record of a store as text: uuid -> its journal values. Two stores in step give equal snapshots.
-inline QMap<QString, QString> snapshot(WTObjectContext& context) {
-  QMap<QString, QString> records;
-  for (WTObject* object :
-       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
-    records.insert(object->uuid(), compact(journalValues(object)));
-  return records;
-}
-
-// One record's journal values without unset ones or the uuid, as one line; "(none)" when missing.
-inline std::string storedRecord(WTObjectContext& context, const QString& uuid) {
-  const WTObject* object = context.objectWithUUID(uuid, false);
-  if (!object) return "(none)";
-  QVariantMap values = journalValues(object);
-  values.remove(QStringLiteral("uuid"));
-  for (auto it = values.begin(); it != values.end();) {
-    const QVariant& v = it.value();
+    const QVariant v = storedValue(object, key);
     const bool unset =
         !v.isValid() || v.isNull() || (v.typeId() == QMetaType::Bool && !v.toBool()) ||
         (v.canConvert<QVariantList>() && v.typeId() != QMetaType::QString && v.toList().isEmpty()) ||
-        (v.typeId() == QMetaType::QString && v.toString().isEmpty());
-    it = unset ? values.erase(it) : std::next(it);
+        (v.typeId() == QMetaType::QString && v.toString().isEmpty()) || key == "uuid";
+    if (!setOnly || !unset) values.insert(key, v);
   }
-  return compact(values).toStdString();
+  return compact(values);
 }
 
-// Where two snapshots differ, for failure messages.
-inline std::string snapshotDifference(const QMap<QString, QString>& a, const QMap<QString, QString>& b) {
-  std::string out;
-  int shown = 0;
-  QStringList keys = a.keys() + b.keys();
-  keys.sort();
-  keys.removeDuplicates();
-  for (const QString& key : keys) {
-    if (a.value(key) == b.value(key)) continue;
-    if (++shown > 8) break;
-    out += key.toStdString() + "\n  " + a.value(key, "(none)").toStdString() + "\n  " +
-           b.value(key, "(none)").toStdString() + "\n";
-  }
-  return out;
+// Every record of a store, a line each: uuid and journal values. Stores in step give the same text.
+inline std::string snapshot(WTObjectContext& context) {
+  QStringList lines;
+  for (WTObject* object : context.fetchObjectsForEntityName("WTObject").value_or(QList<WTObject*>()))
+    lines.append(object->uuid() + ' ' + QString::fromStdString(journalValues(object)));
+  lines.sort();
+  return lines.join('\n').toStdString();
 }
 
-// The real tessal-sync-server, run as its own process on 127.0.0.1 with a SQLite file in a temp folder.
-class SyncServerProcess {
- public:
-  static QString executable() {
-#ifdef TESSAL_SYNC_SERVER_EXE
-    return QString::fromUtf8(TESSAL_SYNC_SERVER_EXE);
-#else
-    return {};
-#endif
-  }
-  static bool available() {
-    return !executable().isEmpty() && QFileInfo::exists(executable());
-  }
-
-  // Serves from `database` (a SQLite path or a PostgreSQL URI); a SQLite file of its own when empty.
-  explicit SyncServerProcess(const QString& database = {}) : database_(database) {
-    EXPECT_TRUE(dir.isValid());
-  }
-  ~SyncServerProcess() {
-    stop();
-  }
-
-  QString database() const {
-    return database_.isEmpty() ? dir.filePath(QStringLiteral("sync.sqlite")) : database_;
-  }
-
-  bool addUser(const QString& email, const QString& password) {
-    QProcess process;
-    process.start(executable(), {QStringLiteral("add-user"), email, QStringLiteral("--db"), database()});
-    if (!process.waitForStarted()) return false;
-    process.write(password.toUtf8() + '\n');
-    process.closeWriteChannel();
-    return process.waitForFinished(30000) && process.exitCode() == 0;
-  }
-
-  // Starts serving; the first start picks a free port, later ones take the same port again.
-  bool start() {
-    process_ = std::make_unique<QProcess>();
-    process_->setProcessChannelMode(QProcess::ForwardedErrorChannel);
-    // The server goes when the test process goes, even when it dies.
-    process_->setChildProcessModifier([] { ::prctl(PR_SET_PDEATHSIG, SIGTERM); });
-    const QString listen = QStringLiteral("127.0.0.1:%1").arg(port_);
-    process_->start(executable(), {QStringLiteral("serve"), QStringLiteral("--listen"), listen,
-                                   QStringLiteral("--db"), database()});
-    if (!process_->waitForStarted()) return false;
-    QByteArray out;
-    QDeadlineTimer deadline(20000);
-    while (!out.contains('\n') && !deadline.hasExpired()) {
-      if (!process_->waitForReadyRead(int(deadline.remainingTime()))) break;
-      out += process_->readAllStandardOutput();
-    }
-    const qsizetype colon = out.lastIndexOf(':');
-    if (!out.contains("listening on") || colon < 0) return false;
-    port_ = out.mid(colon + 1).trimmed().toInt();
-    return port_ > 0;
-  }
-
-  void stop() {
-    if (!process_) return;
-    process_->terminate();
-    if (!process_->waitForFinished(10000)) process_->kill();
-    process_->waitForFinished(5000);
-    process_.reset();
-  }
-
-  QString address() const {
-    return QStringLiteral("http://127.0.0.1:%1").arg(port_);
-  }
-
-  QTemporaryDir dir;
-  QString database_;
-
- private:
-  std::unique_ptr<QProcess> process_;
-  int port_ = 0;
-};
-
-// One account on the real server and two installations on it.
-class TwoDevicesTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    if (!SyncServerProcess::available()) GTEST_SKIP() << "tessal-sync-server is not built";
-    ASSERT_TRUE(server.addUser(kUser, kPassword));
-    ASSERT_TRUE(server.start());
-    a = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
-    b = std::make_unique<SyncClient>(server.address(), kUser, kPassword);
-  }
-  void expectSameStores() const {
-    const auto left = snapshot(*a->context), right = snapshot(*b->context);
-    EXPECT_TRUE(left == right) << snapshotDifference(left, right);
-  }
-
-  const QString kUser = QStringLiteral("ann@example.org");
-  const QString kPassword = QStringLiteral("correct horse battery");
-  SyncServerProcess server;
-  std::unique_ptr<SyncClient> a, b;
-};
+// One record's set values, as one line; "(none)" when missing.
+inline std::string storedRecord(WTObjectContext& context, const QString& uuid) {
+  const WTObject* object = context.objectWithUUID(uuid, false);
+  return object ? journalValues(object, true) : "(none)";
+}
 
 }  // namespace synctest
