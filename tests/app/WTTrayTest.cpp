@@ -109,7 +109,6 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
   ASSERT_TRUE(list) << "the list did not open";
   EXPECT_GE(list->y, icon->y + icon->height - 1);
   EXPECT_LE(list->x + list->width, 1280);
-  EXPECT_GE(list->height, 5 * 24) << "five rows";
   // The running task's button has the focus: Space stops it, and the copy saves that.
   x.xdotool({"key", "space"});
   EXPECT_TRUE(QTest::qWaitFor([&] { return here.tessal({"status"}).code == 1; }, 5000))
