@@ -120,7 +120,6 @@ TEST_F(WTCommandLineKeyring, SyncNamesThePasswordsStoreAndNeverHangsOnTheKeyring
        "The secret service gave no password (The secret service did not answer within 5 seconds); "
        "the settings file (",
        {}},
-      {{}, "a password", fromFile, "http://127.0.0.1:1"},
   };
   for (const auto& [bus, password, said, server] : rows) {
     SCOPED_TRACE(said.toStdString() + server.toStdString());
