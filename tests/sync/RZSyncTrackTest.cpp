@@ -115,14 +115,11 @@ TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
   }
 }
 
-// Values the other tests do not journal: dates before 1970 (toward zero), colours, escapes, integers, null.
+// Values the other tests do not journal: dates before 1970 (toward zero), colours.
 TEST(RZSyncTrackTransform, ValuesTakeTheirJSONForm) {
   const std::pair<QVariant, std::string> cases[] = {
       {QVariant::fromValue(Date::fromSeconds(-1.5)), "-1"},
       {QVariant(QColor(255, 0, 0, 128)), "\"#80ff0000\""},
-      {QVariant(QStringLiteral("a\"b")), "\"a\\\"b\""},
-      {QVariant(90), "90"},
-      {QVariant(), "null"},
   };
   for (const auto& [value, json] : cases)
     EXPECT_EQ(compact(RZSyncTrack::transformedValue(value).value()), json);
