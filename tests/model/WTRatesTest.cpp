@@ -15,7 +15,6 @@ TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
       {true, nullptr, "65", "70.25", {}, {"70.25", "65", "100"}},
       {false, nullptr, nullptr, nullptr, {}, {"75", "50", "100"}},
       {false, nullptr, nullptr, nullptr, "90", {"90", "90", "90"}},
-      {false, nullptr, nullptr, nullptr, 80.5, {"80.5", "80.5", "80.5"}},
       {true, "110", nullptr, nullptr, "90", {"110", "110", "110"}}};
   for (const auto& [linked, clientRate, projectRate, taskRate, defaultRate, expected] : rows) {
     SCOPED_TRACE(expected.join(' ').toStdString() + " default " + defaultRate.toString().toStdString());
