@@ -78,8 +78,6 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   EXPECT_FALSE(at(10, 10));
   EXPECT_FALSE(at(21, 3));
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
-  EXPECT_EQ(matcher.markerStart(), "{%");
-  EXPECT_EQ(matcher.filterDelimiter(), "|");
 }
 
 TEST_F(MatcherTest, FindsWhatASearchFromTheAskedPositionFinds) {

@@ -29,14 +29,6 @@ TEST_F(WTItemContainerTest, ATaskGroupsPendingToDosThenDaysNewestFirst) {
   EXPECT_EQ(task->itemContainerForItem(makeItem<WTNote>(task, berlin(2026, 1, 1))),
             nullptr);  // not rebuilt yet
   EXPECT_TRUE(makeTask()->children().empty());
-  // 29 March 2026 has 23 hours in Berlin; both ends of it belong to the same day.
-  WTTask* spring = makeTask();
-  makeTime(spring, berlin(2026, 3, 29, 0, 30), berlin(2026, 3, 29, 0, 45));
-  makeTime(spring, berlin(2026, 3, 29, 23, 30), berlin(2026, 3, 29, 23, 45));
-  makeTime(spring, berlin(2026, 3, 30, 0, 10), berlin(2026, 3, 30, 0, 20));
-  ASSERT_EQ(spring->children().size(), 2u);
-  EXPECT_EQ(std::pair(spring->children()[1]->items().size(), spring->children()[1]->date()),
-            std::pair(qsizetype(2), std::optional(berlin(2026, 3, 29))));
 }
 
 // Undated items group after every day; other keys group by their values, greatest first.

@@ -27,10 +27,6 @@ class LogCapture {
   bool contains(const QString& text) const {
     return std::any_of(lines.begin(), lines.end(), [&](const QString& line) { return line.contains(text); });
   }
-  qsizetype count(const QString& text) const {
-    return std::count_if(lines.begin(), lines.end(),
-                         [&](const QString& line) { return line.contains(text); });
-  }
   QStringList lines;
 
  private:
