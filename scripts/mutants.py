@@ -10,7 +10,8 @@ ccache compiles a mutated file once for both. LINES.tsv has one line to mutate a
     FILE:LINE <tab> BINARY <tab> OLD_FILTER <tab> NEW_FILTER
 
 FILE:LINE names the line in NEW_TREE (the same text is found in OLD_TREE's file); BINARY is the test
-binary (in DIR/tests) holding the tests that covered it; the filters are gtest filters of the tests that
+binary (in DIR/tests) holding the tests that covered it, or OLD_BINARY>NEW_BINARY when a check moved to
+the tests of another binary (a lower layer); the filters are gtest filters of the tests that
 covered it in each suite. Each line gets one mutant, the first of these that applies: a comparison
 flipped, `&&` and `||` swapped, an integer constant +1, the statement deleted. A mutant is killed when the
 filtered tests fail (or crash, or time out). Prints a table and exits 1 when a mutant the old suite killed
@@ -129,7 +130,9 @@ def main():
     rows = [row.split("\t") for row in options.lines.read_text().splitlines() if row.strip() and not
             row.startswith("#")]
     lost, results = 0, []
-    for place, binary, old_filter, new_filter in rows:
+    for place, binaries, old_filter, new_filter in rows:
+        old_binary, _, new_binary = binaries.partition(">")
+        new_binary = new_binary or old_binary
         file, number = place.rsplit(":", 1)
         new_path, old_path = options.new / file, options.old / file
         new_original, old_original = new_path.read_text(), old_path.read_text()
@@ -147,8 +150,8 @@ def main():
             old_lines[old_index] = mutated
             new_path.write_text("\n".join(new_lines))
             old_path.write_text("\n".join(old_lines))
-            old = verdict(options.old, options.build, binary, old_filter)
-            new = verdict(options.new, options.build, binary, new_filter) if old != "stillborn" else "-"
+            old = verdict(options.old, options.build, old_binary, old_filter)
+            new = verdict(options.new, options.build, new_binary, new_filter) if old != "stillborn" else "-"
         finally:
             new_path.write_text(new_original)
             old_path.write_text(old_original)
@@ -159,7 +162,7 @@ def main():
 
     # Restore the binaries to the unmutated sources.
     for tree in (options.old, options.new):
-        for binary in sorted({row[1] for row in rows}):
+        for binary in sorted({name for row in rows for name in row[1].split(">")}):
             run(["cmake", "--build", str(tree / options.build), "--target", binary])
     made = [r for r in results if r[2] in ("killed", "survived")]
     old_killed = [r for r in made if r[2] == "killed"]

@@ -49,8 +49,6 @@ class RZBackgroundView : public QWidget {
   // "Mode" and "ScaleMode". The image itself is not archived: it is loaded again by name.
   QVariantMap encodeWithCoder() const;
 
-  // Whether a pre-tiled copy of the image is kept (built on the first tiled paint).
-  bool hasTiledCache() const { return !tiledImage_.isNull(); }
   void invalidateTiledImage() { tiledImage_ = QImage(); }
 
   // Paints the background into `painter` over `rect` (what paintEvent does).

@@ -63,10 +63,6 @@ WTStatusBarPopup::WTStatusBarPopup(WTRecentTasks* tasks, QWidget* parent)
   });
 }
 
-int WTStatusBarPopup::rowCount() const {
-  return rows_->count();
-}
-
 void WTStatusBarPopup::popUp(const QRect& anchor) {
   tasks_->setActive(true);
   rebuildRows();

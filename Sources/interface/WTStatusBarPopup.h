@@ -23,8 +23,6 @@ class WTStatusBarPopup : public QFrame {
   // Shows the popup beside `anchor` (global coordinates: the tray icon or the button that opened it),
   // below it when there is room, above otherwise, and always inside that screen.
   void popUp(const QRect& anchor);
-  // The rows on screen, for whoever drives the popup (tests, accessibility).
-  int rowCount() const;
   // Shows the running timers' minutes as they are now (after a tick); changes nothing else, so the
   // focus and the keyboard stay where they are.
   void updateElapsedTimes();
