@@ -229,6 +229,8 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
   EXPECT_EQ(exporter->projectLimit(), first);
   exporter->reject();
+  window->saveLastSelectedProject(2);
+  EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 2);
 }
 
 // The window registers a custom range; it fits the screen and comes back where it was.

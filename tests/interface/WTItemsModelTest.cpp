@@ -212,13 +212,14 @@ TEST_F(WTItemsModelTest, EditsGoToTheRightKeys) {
   const int duration = WTItemsModel::DurationEditRole, amount = WTItemsModel::AmountEditRole,
             name = WTItemsModel::NameRole, notes = WTItemsModel::NotesRole;
   const std::tuple<const WTObject*, const char*, int> edits[] = {
-      {flat, "45", duration},   {expense, "12.50", amount},    {expense, "1:00", duration},
-      {time, "2:00", duration}, {design, "Design & UX", name}, {flat, "line one\nline two", notes},
+      {flat, "45", duration},      {expense, "12.50", amount},    {expense, "1:00", duration},
+      {time, "2:00", duration},    {design, "Design & UX", name}, {flat, "line one\nline two", notes},
+      {expense, "twelve", amount},
   };
   QString taken;
   for (const auto& [object, typed, role] : edits)
     taken += model->setData(model->indexOfObject(object), typed, role) ? u'1' : u'0';
-  EXPECT_EQ(taken, "110011");
+  EXPECT_EQ(taken, "1100110");
   EXPECT_EQ(
       std::tuple(flat->duration(), expense->expense(), design->name(), flat->notes()),
       std::tuple(45, Decimal::fromString(u"12.5"), QString("Design & UX"), QString("line one\nline two")));

@@ -121,7 +121,7 @@ TEST_F(WTItemsViewControllerTest, EditingNotesGrowsTheRowAndAnEmptyNoteShrinksIt
 // Open rows are remembered per project and found again after a relaunch.
 TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   auto* note = makeItem<WTNote>(design, "note", at(2024, 3, 10));
-  makeItem<WTToDo>(build, "todo", at(2024, 3, 11));
+  auto* todo = makeItem<WTToDo>(build, "todo", at(2024, 3, 11));
   endTurn();
   outline()->expand(rowOf(design));
   outline()->expand(model()->indexOfContainerOfItem(note));
@@ -144,6 +144,14 @@ TEST_F(WTItemsViewControllerTest, ExpandedRowsAreRememberedPerProject) {
   for (const QString& identity : {design->uuid() + "|12345", QString("nobody@WTTask")})
     EXPECT_FALSE(tree->indexForPersistentIdentity(identity).isValid()) << identity.toStdString();
   EXPECT_FALSE(tree->indexOfContainer(design, at(2024, 1, 1)).isValid());  // a day without items
+  const QModelIndex pending = tree->indexOfContainerOfItem(todo);
+  EXPECT_EQ(tree->indexForPersistentIdentity(tree->persistentIdentity(pending)), pending);
+  // A day that is not a number is no day, not the one whose key is 0.
+  RZDate::setDefaultTimeZone(QStringLiteral("UTC"));
+  makeItem<WTNote>(design, "epoch", Date::fromSeconds(0));
+  endTurn();
+  ASSERT_TRUE(tree->indexOfContainer(design, Date::fromSeconds(0)).isValid());
+  EXPECT_FALSE(tree->indexForPersistentIdentity(design->uuid() + "|soon").isValid());
 }
 
 // Undo reopens and selects what it brings back; other changes leave the selection alone.

@@ -117,6 +117,13 @@ TEST_F(WTPreferencesWindowTest, AKeyringThatDidNotTakeThePasswordIsSaidUnderIt) 
     type(window->passwordTextField(), available ? "battery staple" : "horse", true);
     EXPECT_EQ(window->keychainNoteLabel()->isVisible(), !available);
   }
+  // Empty fields the user is not in show the account the keyring answers later.
+  window->emailTextField()->clear();
+  window->passwordTextField()->clear();
+  window->startSyncButton()->setFocus();
+  passwords->setPassword(kPassword);
+  EXPECT_EQ(window->emailTextField()->text() + ' ' + window->passwordTextField()->text(),
+            kUser + ' ' + kPassword);
 }
 
 // Fields store what they take on Return, closing or quitting, and refuse the rest; sign-up opens the server's
@@ -157,6 +164,9 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   EXPECT_EQ(defaults->decimalForKey("WTDefaultRate"), Decimal(95));
   open();
   EXPECT_EQ(window->defaultRateField()->text(), "95.00");  // in the user's format
+  window->defaultRateField()->clear();
+  type(window->defaultRateField(), "", true);
+  EXPECT_FALSE(defaults->hasStoredValue("WTDefaultRate"));
   type(window->serverField(), "sync.example.com");
   window.reset();
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");

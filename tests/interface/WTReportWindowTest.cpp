@@ -99,9 +99,11 @@ TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMen
   EXPECT_EQ(window->html(), "mode=2 [Website][Backend][Later]");
   EXPECT_EQ(window->windowTitle(), "Report — Acme");
   EXPECT_TRUE(window->errorBar()->isHidden());
-  rerender("<p>fine</p>\n<p>{{ nosuchvariable }}</p>\n");
+  rerender("<p>fine</p>\n<p>{{ nosuchvariable }}</p>\n<p>{{ nosuchother }}</p>\n");
   EXPECT_FALSE(window->errorBar()->isHidden());
   EXPECT_TRUE(window->errorBar()->text().contains("line 2")) << window->errorBar()->text().toStdString();
+  EXPECT_TRUE(window->errorBar()->text().endsWith("(and 1 more)"))
+      << window->errorBar()->text().toStdString();
   EXPECT_TRUE(text().contains("fine"));
   rerender("<p>mended</p>");
   EXPECT_TRUE(window->errorBar()->isHidden());
