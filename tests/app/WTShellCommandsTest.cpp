@@ -180,6 +180,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   // Review has 09:00–10:15 on 2026-03-03 (Berlin).
   const QDate today = QDateTime::currentDateTime().toTimeZone(QTimeZone("Europe/Berlin")).date();
   const QString tomorrow = today.addDays(1).toString(Qt::ISODate);
+  const QString yesterday = today.addDays(-1).toString(Qt::ISODate);
   const struct {
     QStringList arguments;
     int code;
@@ -191,10 +192,12 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "Review", "11:00-10:30", "--date", "2026-03-02"}, 1, "would end (10:30) before it starts (11:00)"},
       {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
+      {{"add", "Review", "12:00-12:30", "--date", "yesterday"}, 0, "Added Hermes › Review  " + yesterday + " 12:00–12:30  00:30\n"},
       {{"add", "Design", "0:30"}, 1, "2 tasks are named “Design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"},
       {{"add", "Design", "45", "--project", "Atlas"}, 0, "Added Atlas › Design  "},
       {{"add", "Design", "0:10", "--project", "Atlas"}, 1, "overlaps the entry "},
       {{"start", "Write"}, 1, "no task is named “Write”"},
+      {{"start", "Design", "--project", "Hermes", "--client", "Acme"}, 1, "no task is named “Design”, and there are no tasks of projects named “Hermes”, of clients named “Acme”"},
       {{"start", "Write", "--create"}, 1, "name the project to make it in with --project: “Atlas” (Acme), “Hermes”"},
       {{"start", "Write", "--project", "Zeus", "--client", "Olymp", "--create"}, 0, "Created client Olymp\nCreated project Zeus\nCreated task Zeus › Write\nStarted Zeus › Write\n"},
       {{"start", "write", "--project", "zeus", "--create"}, 0, "Zeus › Write is running already\n"},
@@ -207,9 +210,9 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   for (const auto& c : cases) here.expect(c.arguments, c.code, c.says);
   EXPECT_EQ(here.out({"list", "projects", "--client", "olymp"}), "Zeus\n");
   EXPECT_EQ(running(), QStringList({"Zeus/Write"}));
-  // Exactly the accepted: 45 minutes ending now, the call, two on 4 March, the running one.
+  // Exactly the accepted: 45 minutes ending now, the call, yesterday's, two on 4 March, the running one.
   const std::unique_ptr<WTObjectContext> context = here.readStore();
-  EXPECT_EQ(context->fetch<WTTime>().size(), 6);
+  EXPECT_EQ(context->fetch<WTTime>().size(), 7);
   EXPECT_EQ(context
                 ->fetch<WTTime>([](const WTTime* time) {
                   return time->task()->project()->name() == "Atlas" && time->duration() == 45 &&

@@ -69,12 +69,14 @@ TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
       {"At", "@home"},
       {"LooksLikeMarker", "@Decimal(1)"},
       {"WTStopsOtherTimes", true},
-      {"WTLastSelectedProject", qlonglong(1) << 40}};
+      {"WTLastSelectedProject", qlonglong(1) << 40},
+      {"Ratio", 1234567.5}};
   const QStringList expected = {"Decimal 12.30",          "Decimal -0.000000000000000000000000000000000001",
                                 "Date 1709632800.123456", "Date -86399.750000",
                                 "Date 1700000000.000000", "Date 1700000000.250000",
                                 "QString @home",          "QString @Decimal(1)",
-                                "QString true",           "QString 1099511627776"};
+                                "QString true",           "QString 1099511627776",
+                                "QString 1234567.5"};
   UserDefaults writer(path());
   for (const auto& [key, value] : written) writer.setValue(key, value);
   // `writer` stays alive: everything must already be in the file.

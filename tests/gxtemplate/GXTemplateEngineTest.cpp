@@ -307,6 +307,13 @@ TEST_F(EngineVariableTest, SetValueChangesWhereTheNameLivesUnlessForced) {
   render(QString(), {{"client", QVariantMap{{"name", "Bar"}}}});
   engine.setValue("Baz", "client.name", false);
   EXPECT_EQ(engine.resolveVariable("client.name"), QVariant("Baz"));
+  // Asked where a value lives, the engine answers its container and its key there.
+  QVariant parent, top;
+  QString key, topKey;
+  EXPECT_EQ(engine.valueForVariable("client.name", &parent, &key), QVariant("Baz"));
+  EXPECT_EQ(std::pair(parent, key), std::pair(QVariant(QVariantMap{{"name", "Baz"}}), QString("name")));
+  EXPECT_EQ(engine.valueForVariable("client", &top, &topKey), parent);
+  EXPECT_EQ(std::pair(top.toMap().value("client"), topKey), std::pair(parent, QString("client")));
   engine.setValue("forced", "client.name", true);
   EXPECT_EQ(engine.templateVariables().value("client.name"), QVariant("forced"));
   EXPECT_EQ(engine.resolveVariable("client.name"), QVariant("Baz"));

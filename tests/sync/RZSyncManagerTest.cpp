@@ -7,6 +7,7 @@
 #include "WTTask.h"
 
 #include <QSignalSpy>
+#include <QUuid>
 
 #include <fstream>
 
@@ -245,6 +246,12 @@ TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
   for (const HttpRequest& request : server.requests) EXPECT_EQ(request.json().value("device"), device);
   EXPECT_FALSE(device.isEmpty());
   EXPECT_NE(SyncClient(server.address()).network().device(), device);
+  // Without settings to keep them in, a manager makes a device of its own anyway and has no server.
+  WTObjectContext bare;
+  const RZSyncManager alone(&bare, client.dir.filePath("alone.sync"));
+  EXPECT_FALSE(QUuid(alone.syncNetwork()->device()).isNull());
+  EXPECT_NE(alone.syncNetwork()->device(), device);
+  EXPECT_TRUE(alone.configuredEndpoint().isEmpty() && alone.syncNetwork()->url().isEmpty());
   const qsizetype requests = server.requests.size();
   client.defaults->setValue("WTSyncServer", QVariant());
   client.manager->sync();
