@@ -24,11 +24,15 @@ else
   filter=(-R "^([^.]*/)?(${suites})\\.")
 fi
 find "$build" -name '*.gcda' -delete
+# Notes of objects the build no longer makes (a test file removed, a source moved to another target) would
+# be read beside the current ones and stop gcovr.
+ninja -C "$build" -t cleandead >/dev/null
+find "$build" -name '*.gcno' | while read -r notes; do [ -f "${notes%.gcno}.o" ] || rm -f "$notes"; done
 env -u DBUS_SESSION_BUS_ADDRESS -u DISPLAY -u WAYLAND_DISPLAY QT_QPA_PLATFORM=offscreen \
   bash scripts/pg-test-cluster.sh run ctest --test-dir "$build" --timeout 600 -j2 "${filter[@]}" >"$build/ctest-$name.log" ||
   echo "some tests failed: $build/ctest-$name.log" >&2
 report="$build/coverage-$name.json"
 gcovr --root . --object-directory "$build" --filter 'Sources/' --filter 'GXTemplate/' --filter 'server/' \
-  --exclude-unreachable-branches --exclude-throw-branches --gcov-ignore-parse-errors -j2 --json "$report" \
+  --exclude-unreachable-branches --exclude-throw-branches --gcov-ignore-parse-errors --json "$report" \
   --print-summary
 echo "report: $report"
