@@ -129,7 +129,7 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const WTProject* project = scope->project;
   const QString outPath = parser.value(QStringLiteral("out"));
   if (outPath.isEmpty()) {
-    out << WTCSVExport::timesCSV(WTCSVExport::timesMatching(context, predicate.value(), project));
+    out << WTCSVExport::timesCSV(WTRangePredicate::timesMatching(context, predicate.value(), project));
     out.flush();
     return 0;
   }

@@ -4,7 +4,6 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
-#include "WTCSVExport.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTObjectContext.h"
@@ -215,7 +214,7 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   if (!scope) return 1;
   WTObjectContext& context = scope->snapshot->context();
   const WTProject* project = scope->project;
-  QList<WTTime*> times = WTCSVExport::timesMatching(context, predicate.value(), project);
+  QList<WTTime*> times = WTRangePredicate::timesMatching(context, predicate.value(), project);
   std::sort(times.begin(), times.end(), [](const WTTime* a, const WTTime* b) {
     return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
   });

@@ -93,14 +93,6 @@ QString reportCSV(const QList<WTProject*>& projects, int mode) {
   return out;
 }
 
-QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
-                             const WTProject* project) {
-  return context.fetch<WTTime>([&](const WTTime* time) {
-    if (project && (!time->task() || time->task()->project() != project)) return false;
-    return !predicate || predicate(time);
-  });
-}
-
 QString timesCSV(QList<WTTime*> times) {
   static const QString keys[] = {QStringLiteral("task.project.name"), QStringLiteral("task.title"),
                                  QStringLiteral("flatDateBegin"), QStringLiteral("startTime")};
@@ -150,7 +142,7 @@ Result<void> writeTextAtomically(const QString& path, const QString& text) {
 
 Result<int> exportTimes(const WTObjectContext& context, const WTItemPredicate& predicate,
                         const WTProject* project, const QString& path) {
-  const QList<WTTime*> times = timesMatching(context, predicate, project);
+  const QList<WTTime*> times = WTRangePredicate::timesMatching(context, predicate, project);
   qCDebug(lcExport, "%s",
           qPrintable(QStringLiteral("Exporting %1 items to: %2").arg(times.size()).arg(path)));
   const Result<void> written = writeTextAtomically(path, timesCSV(times));

@@ -24,11 +24,6 @@ QString escapedString(const QVariant& text);
 // "yyyy-MM-dd" or "yyyy-MM". Projects in the given order, tasks in their own. Empty without projects.
 QString reportCSV(const QList<WTProject*>& projects, int mode);
 
-// The time entries of `context` that `predicate` accepts (all when it is empty) and, when `project` is
-// given, that belong to it; in no particular order.
-QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
-                             const WTProject* project);
-
 // Seven columns per entry (project, task, task rate, name, start and end as short dates, minutes),
 // sorted by project name, task title, flat period start and start time.
 QString timesCSV(QList<WTTime*> times);

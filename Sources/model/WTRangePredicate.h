@@ -4,10 +4,15 @@
 #include "RZDate.h"
 #include "Result.h"
 
+#include <QList>
+
 #include <functional>
 #include <optional>
 
 class WTItem;
+class WTObjectContext;
+class WTProject;
+class WTTime;
 
 // A test over items; an empty function means "no predicate" (the choice gives no range).
 using WTItemPredicate = std::function<bool(const WTItem*)>;
@@ -44,5 +49,10 @@ WTItemPredicate predicateForTag(int tag, std::optional<Date> customBegin = {},
 // this-month, last-month, this-year, last-year, any, or YYYY-MM-DD..YYYY-MM-DD (local days, the end
 // day whole). A word that is none of these, or a range ending before it begins, is an error.
 Result<WTItemPredicate> predicateForRangeWord(const QString& word);
+
+// The time entries of `context` that `predicate` accepts (all when it is empty) and, when `project` is
+// given, that belong to it; in no particular order.
+QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
+                             const WTProject* project = nullptr);
 
 }  // namespace WTRangePredicate

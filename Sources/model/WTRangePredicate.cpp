@@ -1,6 +1,10 @@
 #include "WTRangePredicate.h"
 
 #include "WTItem.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
 
 #include <QDate>
 #include <QRegularExpression>
@@ -99,6 +103,14 @@ Result<WTItemPredicate> predicateForRangeWord(const QString& word) {
   return Error{1, QStringLiteral("%1: not a range (today, yesterday, this-week, last-week, this-month, "
                                  "last-month, this-year, last-year, any or YYYY-MM-DD..YYYY-MM-DD)")
                       .arg(word)};
+}
+
+QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
+                             const WTProject* project) {
+  return context.fetch<WTTime>([&](const WTTime* time) {
+    if (project && (!time->task() || time->task()->project() != project)) return false;
+    return !predicate || predicate(time);
+  });
 }
 
 }  // namespace WTRangePredicate
