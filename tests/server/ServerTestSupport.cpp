@@ -113,13 +113,23 @@ LocalServer::LocalServer(const std::string& location, const std::string& email, 
             tessal::server::PasswordAuthenticator::SignUp::Created);
 }
 
-bool LocalServer::start() {
+namespace {
+
+// A server over `location` on loopback, started; null, with the failure recorded, when it did not start.
+std::unique_ptr<SyncServer> startedServer(const std::string& location, const SyncServer::Options& options) {
   std::string error;
-  server_ = SyncServer::create(location_, options_, error);
-  const bool started = server_ && server_->start(error);
-  EXPECT_TRUE(started) << error;
-  options_.port = started ? server_->port() : options_.port;
-  return started;
+  std::unique_ptr<SyncServer> server = SyncServer::create(location, options, error);
+  if (server && server->start(error)) return server;
+  ADD_FAILURE() << "the server did not start: " << error;
+  return nullptr;
+}
+
+}  // namespace
+
+bool LocalServer::start() {
+  server_ = startedServer(location_, options_);
+  if (server_) options_.port = server_->port();  // a restart comes back on the same port
+  return server_ != nullptr;
 }
 
 void LocalServer::stop() {
@@ -141,9 +151,8 @@ void ServerTest::SetUp() {
 }
 
 void ServerTest::startServer() {
-  std::string error;
-  server_ = SyncServer::create(storage_->location(), options, error);
-  ASSERT_TRUE(server_ && server_->start(error)) << error;
+  server_ = startedServer(storage_->location(), options);
+  ASSERT_TRUE(server_);
 }
 
 void ServerTest::stopServer() {
