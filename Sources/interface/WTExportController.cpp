@@ -87,9 +87,8 @@ void WTExportController::updateSelectedProjectLabel() {
 void WTExportController::updateFormatNote() {
   formatNote_->setText(
       format() == WTCSVExport::Format::Times
-          ? tr("Time entries are written as CSV: project, task, rate, name, start, end and minutes, one "
-               "entry "
-               "a line.")
+          ? tr("Time entries are written as CSV: project, task, rate, name, start, end and "
+               "minutes, one entry a line.")
           : tr("Time entries, flat fees and expenses are written as a spreadsheet with a header row: client, "
                "project, task, kind, name, date, start, end, duration, billed duration, rate, amount, "
                "currency and notes."));
