@@ -99,6 +99,16 @@ QString plainNumber(const Decimal& value, int places) {
   return text;
 }
 
+QString spreadsheetField(const QString& text) {
+  const bool plain = std::none_of(text.begin(), text.end(), [](QChar c) {
+    return c == QLatin1Char('"') || c == QLatin1Char(',') || c == QLatin1Char('\r') || c == QLatin1Char('\n');
+  });
+  if (plain) return text;
+  QString quoted = text;
+  quoted.replace(QLatin1Char('"'), QLatin1String("\"\""));
+  return QLatin1Char('"') + quoted + QLatin1Char('"');
+}
+
 void appendSpreadsheetRow(QString& out, const QStringList& fields) {
   for (qsizetype i = 0; i < fields.size(); ++i) {
     if (i) out += QLatin1Char(',');
@@ -119,16 +129,6 @@ QString kindOf(const WTItem* item) {
 }
 
 }  // namespace
-
-QString spreadsheetField(const QString& text) {
-  const bool plain = std::none_of(text.begin(), text.end(), [](QChar c) {
-    return c == QLatin1Char('"') || c == QLatin1Char(',') || c == QLatin1Char('\r') || c == QLatin1Char('\n');
-  });
-  if (plain) return text;
-  QString quoted = text;
-  quoted.replace(QLatin1Char('"'), QLatin1String("\"\""));
-  return QLatin1Char('"') + quoted + QLatin1Char('"');
-}
 
 const QStringList& spreadsheetColumns() {
   static const QStringList columns = {QStringLiteral("client"),   QStringLiteral("project"),

@@ -41,10 +41,6 @@ Result<void> writeTextAtomically(const QString& path, const QString& text);
 Result<int> exportTimes(const WTObjectContext& context, const WTItemPredicate& predicate,
                         const WTProject* project, const QString& path);
 
-// One field of the spreadsheet CSV: as it is, or in double quotes with each quote doubled when it holds a
-// comma, a quote, a carriage return or a line feed.
-QString spreadsheetField(const QString& text);
-
 // The spreadsheet's columns, in order, as its header row names them.
 const QStringList& spreadsheetColumns();
 
@@ -54,7 +50,8 @@ QList<WTItem*> billableItemsMatching(const WTObjectContext& context, const WTIte
                                      const WTProject* project = nullptr);
 
 // The header row and one row per item (notes and to-dos bill nothing and are left out), sorted by client,
-// project and task name, then date. Fields are separated by ',' and rows end in CR LF. Dates and times
+// project and task name, then date. Fields are separated by ',' and rows end in CR LF; a field is quoted
+// only when it holds a comma, a quote, a CR or an LF, and its quotes are then doubled. Dates and times
 // are local, with ASCII digits whatever the locale: yyyy-MM-dd, HH:MM (start and end of time entries
 // only; no end while running), durations H:MM (none for an expense). Rate and amount are plain numbers
 // with '.' and no grouping; the amount is the billed one, with the currency's minor unit.
