@@ -22,7 +22,8 @@ using WTCommandArguments::usage;
 
 constexpr char kReportUsage[] =
     "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n";
-constexpr char kExportUsage[] = "usage: tessal export [--range RANGE] [--project NAME] [--out FILE.csv]\n";
+constexpr char kExportUsage[] =
+    "usage: tessal export [--range RANGE] [--project NAME] [--format times|spreadsheet] [--out FILE.csv]\n";
 
 enum class ReportFormat { HTML, PDF, CSV, Unknown };
 
@@ -114,9 +115,16 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
 
 int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   QCommandLineParser parser;
-  const QString problem =
-      parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project"), QStringLiteral("out")});
+  const QString problem = parse(
+      parser, arguments,
+      {QStringLiteral("range"), QStringLiteral("project"), QStringLiteral("format"), QStringLiteral("out")});
   if (!problem.isEmpty()) return usage(err, kExportUsage, problem);
+  const QString formatWord = parser.isSet(QStringLiteral("format")) ? parser.value(QStringLiteral("format"))
+                                                                    : QStringLiteral("times");
+  if (formatWord != QLatin1String("times") && formatWord != QLatin1String("spreadsheet"))
+    return usage(err, kExportUsage,
+                 QStringLiteral("%1: not a format (times or spreadsheet)").arg(formatWord));
+  const bool spreadsheet = formatWord == QLatin1String("spreadsheet");
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("any");
   const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
@@ -129,11 +137,16 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const WTProject* project = scope->project;
   const QString outPath = parser.value(QStringLiteral("out"));
   if (outPath.isEmpty()) {
-    out << WTCSVExport::timesCSV(WTRangePredicate::timesMatching(context, predicate.value(), project));
+    out << (spreadsheet ? WTCSVExport::spreadsheetCSV(
+                              WTCSVExport::billableItemsMatching(context, predicate.value(), project))
+                        : WTCSVExport::timesCSV(
+                              WTRangePredicate::timesMatching(context, predicate.value(), project)));
     out.flush();
     return 0;
   }
-  const Result<int> exported = WTCSVExport::exportTimes(context, predicate.value(), project, outPath);
+  const Result<int> exported =
+      spreadsheet ? WTCSVExport::exportSpreadsheet(context, predicate.value(), project, outPath)
+                  : WTCSVExport::exportTimes(context, predicate.value(), project, outPath);
   if (!exported) return failure(err, exported.error().message);
   return 0;
 }

@@ -6,6 +6,7 @@
 #include "WTRangePopUpButton.h"
 
 #include <QButtonGroup>
+#include <QComboBox>
 #include <QDialogButtonBox>
 #include <QFormLayout>
 #include <QLabel>
@@ -44,14 +45,20 @@ WTExportController::WTExportController(WTObjectContext* context, std::function<W
   choices->addWidget(selected);
   choices->addWidget(selectedProjectLabel_);
   form->addRow(tr("Export:"), choices);
+  formatChoice_ = new QComboBox(this);
+  formatChoice_->setObjectName(QStringLiteral("exportFormat"));
+  formatChoice_->addItem(tr("Time entries"), int(WTCSVExport::Format::Times));
+  formatChoice_->addItem(tr("Spreadsheet"), int(WTCSVExport::Format::Spreadsheet));
+  form->addRow(tr("Format:"), formatChoice_);
   layout->addLayout(form);
 
-  auto* note = new QLabel(tr("Time entries are written as CSV: project, task, rate, name, start, end and "
-                             "minutes, one entry a line."),
-                          this);
-  note->setWordWrap(true);
-  note->setForegroundRole(QPalette::PlaceholderText);
-  layout->addWidget(note);
+  formatNote_ = new QLabel(this);
+  formatNote_->setObjectName(QStringLiteral("exportFormatNote"));
+  formatNote_->setWordWrap(true);
+  formatNote_->setForegroundRole(QPalette::PlaceholderText);
+  layout->addWidget(formatNote_);
+  connect(formatChoice_, &QComboBox::currentIndexChanged, this, &WTExportController::updateFormatNote);
+  updateFormatNote();
 
   auto* buttons = new QDialogButtonBox(QDialogButtonBox::Cancel, this);
   QPushButton* exportButton = buttons->addButton(tr("Export…"), QDialogButtonBox::AcceptRole);
@@ -77,6 +84,20 @@ void WTExportController::updateSelectedProjectLabel() {
   selectedProjectLabel_->setEnabled(project != nullptr);
 }
 
+void WTExportController::updateFormatNote() {
+  formatNote_->setText(
+      format() == WTCSVExport::Format::Times
+          ? tr("Time entries are written as CSV: project, task, rate, name, start, end and "
+               "minutes, one entry a line.")
+          : tr("Time entries, flat fees and expenses are written as a spreadsheet with a header row: client, "
+               "project, task, kind, name, date, start, end, duration, billed duration, rate, amount, "
+               "currency and notes."));
+}
+
+WTCSVExport::Format WTExportController::format() const {
+  return WTCSVExport::Format(formatChoice_->currentData().toInt());
+}
+
 WTProject* WTExportController::projectLimit() const {
   if (projectChoice_->checkedId() != SelectedProject || !selectedProject_) return nullptr;
   return selectedProject_();
@@ -84,6 +105,8 @@ WTProject* WTExportController::projectLimit() const {
 
 Result<int> WTExportController::exportToPath(const QString& path) const {
   if (!context_) return Error{1, tr("There is no store to export from.")};
+  if (format() == WTCSVExport::Format::Spreadsheet)
+    return WTCSVExport::exportSpreadsheet(*context_, rangeButton_->selectedPredicate(), projectLimit(), path);
   return WTCSVExport::exportTimes(*context_, rangeButton_->selectedPredicate(), projectLimit(), path);
 }
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Result.h"
+#include "WTCSVExport.h"
 #include "WTRangePredicate.h"
 #include "WTSaveLocation.h"
 
@@ -9,14 +10,16 @@
 #include <functional>
 
 class QButtonGroup;
+class QComboBox;
 class QLabel;
 class WTObjectContext;
 class WTProject;
 class WTRangePopUpButton;
 
 // File › Export…: the time entries of a date range, of every project or only of the one selected in
-// the main window, written as CSV to a file the user picks. The dialog holds the choices; accepting it
-// asks for the file and writes it.
+// the main window, written as CSV to a file the user picks; or, as the other format, the spreadsheet of
+// every billable item of that range. The dialog holds the choices; accepting it asks for the file and
+// writes it.
 class WTExportController : public QDialog {
   Q_OBJECT
  public:
@@ -31,6 +34,9 @@ class WTExportController : public QDialog {
 
   WTRangePopUpButton* rangeButton() const { return rangeButton_; }
   QButtonGroup* projectChoice() const { return projectChoice_; }
+  // The time-entry CSV first, and chosen when the dialog is made; the spreadsheet second.
+  QComboBox* formatChoice() const { return formatChoice_; }
+  WTCSVExport::Format format() const;
 
   // The project the export is limited to: the selected one when that choice is made and a project is
   // selected, otherwise none (every project).
@@ -48,11 +54,14 @@ class WTExportController : public QDialog {
 
  private:
   void updateSelectedProjectLabel();
+  void updateFormatNote();
 
   WTObjectContext* context_;
   std::function<WTProject*()> selectedProject_;
   WTRangePopUpButton* rangeButton_;
   QButtonGroup* projectChoice_;
   QLabel* selectedProjectLabel_;
+  QComboBox* formatChoice_;
+  QLabel* formatNote_;
   WTSaveLocationChooser chooseSaveLocation_;
 };

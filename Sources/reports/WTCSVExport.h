@@ -7,14 +7,19 @@
 #include <QString>
 #include <QVariant>
 
+class WTItem;
 class WTObjectContext;
 class WTProject;
 class WTTime;
 
-// The CSV texts of the reports and of the time-entry export, shared by the windows and the commands.
-// Every field is quoted; a double quote inside a field becomes backslash-quote (quotes are not doubled:
-// the files are read back by tools that expect exactly this). No header line.
+// The CSV texts of the reports and of the exports, shared by the windows and the commands.
+// The report's and the time-entry CSV quote every field and write a double quote inside a field as
+// backslash-quote (quotes are not doubled: the files are read back by tools that expect exactly this),
+// without a header line. The spreadsheet CSV is the other kind: RFC 4180, for spreadsheets and scripts.
 namespace WTCSVExport {
+
+// What an export writes: today's time entries (the default), or the spreadsheet with a header.
+enum class Format { Times, Spreadsheet };
 
 // "" for a null value; otherwise the value's text with every '"' replaced by '\"'.
 QString escapedString(const QVariant& text);
@@ -35,5 +40,25 @@ Result<void> writeTextAtomically(const QString& path, const QString& text);
 // Returns the number of entries written.
 Result<int> exportTimes(const WTObjectContext& context, const WTItemPredicate& predicate,
                         const WTProject* project, const QString& path);
+
+// The spreadsheet's columns, in order, as its header row names them.
+const QStringList& spreadsheetColumns();
+
+// The time entries, flat fees and expenses of `context` that `predicate` accepts (all when it is empty)
+// and, when `project` is given, that belong to it; in no particular order.
+QList<WTItem*> billableItemsMatching(const WTObjectContext& context, const WTItemPredicate& predicate,
+                                     const WTProject* project = nullptr);
+
+// The header row and one row per item (notes and to-dos bill nothing and are left out), sorted by client,
+// project and task name, then date. Fields are separated by ',' and rows end in CR LF; a field is quoted
+// only when it holds a comma, a quote, a CR or an LF, and its quotes are then doubled. Dates and times
+// are local, with ASCII digits whatever the locale: yyyy-MM-dd, HH:MM (start and end of time entries
+// only; no end while running), durations H:MM (none for an expense). Rate and amount are plain numbers
+// with '.' and no grouping; the amount is the billed one, with the currency's minor unit.
+QString spreadsheetCSV(QList<WTItem*> items);
+
+// As exportTimes, with the spreadsheet CSV of billableItemsMatching.
+Result<int> exportSpreadsheet(const WTObjectContext& context, const WTItemPredicate& predicate,
+                              const WTProject* project, const QString& path);
 
 }  // namespace WTCSVExport

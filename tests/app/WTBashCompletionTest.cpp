@@ -75,6 +75,7 @@ TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
       {{"st"}, {"start", "status", "stop"}},
       {{"report", "--"}, {"--client", "--mode", "--out", "--project", "--template"}},
       {{"export", "--range", "last-"}, {"last-month", "last-week", "last-year"}},
+      {{"export", "--format", ""}, {"spreadsheet", "times"}},
       {{"report", "--mode", ""}, {"0", "1", "2", "3"}},
       {{"list", "p"}, {"projects"}},
       {{"a"}, {"add"}},

@@ -164,7 +164,7 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
       {"report", "--project", "Hermes", "--mode", "one"}, {"report", "--project", "Hermes", "--out", here.path("r.doc")},
       {"report", "--project", "Hermes", "--template", here.path("missing.txt")},
       {"report", "--project", "Hermes", "--project", "Atlas"}, {"report", "--project", "Hermes", "stray"},
-      {"report", "--projects", "Hermes"}, {"export", "--range", "fortnight"},
+      {"report", "--projects", "Hermes"}, {"export", "--range", "fortnight"}, {"export", "--format", "xlsx"},
       // clang-format on
   };
   for (const QStringList& arguments : refused) {
@@ -314,6 +314,22 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
   const Outcome written = here.expect({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, 0, "");
   EXPECT_EQ(written.out + written.err, "");
   EXPECT_EQ(bytesOf(file), day.out.toUtf8());
+  EXPECT_EQ(here.expect({"export", "--range", "2026-03-03..2026-03-03", "--format", "times"}, 0, "").out,
+            day.out);
+
+  // The spreadsheet: a header, the preference's currency, quotes doubled, the same in the file.
+  here.setSetting("WTCurrency", "CHF");
+  const Outcome sheet = here.expect({"export", "--format", "spreadsheet"}, 0, "");
+  const QString design = "Acme,Atlas,\"Design \"\"v2\"\", final\",time,,2026-03-03,";
+  EXPECT_EQ(sheet.out.toStdString(),
+            ("client,project,task,kind,name,date,start,end,duration,billed "
+             "duration,rate,amount,currency,notes\r\n" +
+             design + "00:30,02:00,1:30,1:30,80.00,120.00,CHF,\r\n" + design +
+             "23:30,00:15,0:45,0:45,80.00,60.00,CHF,\r\n"
+             "Acme,Beacon,Build,time,,2026-03-04,10:00,11:00,1:00,1:00,80.00,80.00,CHF,\r\n")
+                .toStdString());
+  here.expect({"export", "--format", "spreadsheet", "--out", file}, 0, "");
+  EXPECT_EQ(bytesOf(file), sheet.out.toUtf8());
 }
 
 // Names that fit no record or several (1, naming the candidates) and broken templates write nothing.

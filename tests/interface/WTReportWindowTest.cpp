@@ -290,6 +290,14 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
   button.selectTag(WTRangePredicate::LastMonth);
   ASSERT_TRUE(exporter.exportToPath(path).ok());
   EXPECT_EQ(recordsIn(), "\"Backend\",\"API\"");
+  // The spreadsheet is the other choice, never the one offered first.
+  EXPECT_EQ(exporter.format(), WTCSVExport::Format::Times);
+  exporter.formatChoice()->setCurrentIndex(1);
+  ASSERT_TRUE(exporter.exportToPath(path).ok());
+  const QStringList rows = linesOf(path);
+  EXPECT_TRUE(rows.size() == 2 && rows[0].startsWith("Acme,Backend,API,time,,2024-02-10,09:00,11:00,2:00") &&
+              rows[1].startsWith("client,project,"))
+      << rows.join(u'\n').toStdString();
 }
 
 }  // namespace

@@ -9,6 +9,9 @@
 #include "WTReportGenerator.h"
 
 #include <QFile>
+#include <QJsonArray>
+#include <QJsonDocument>
+#include <QProcess>
 #include <QStandardPaths>
 
 #include <algorithm>
@@ -169,6 +172,91 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   const Result<int> failed = WTCSVExport::exportTimes(*context, {}, nullptr, missing);
   ASSERT_FALSE(failed.ok());
   EXPECT_TRUE(failed.error().message.contains(missing) && !QFile::exists(missing));
+}
+
+// The rows as Python's csv module reads the file with its default dialect (and that delimiter).
+QList<QStringList> rowsReadByPython(const QString& path, const char* delimiter = ",") {
+  QProcess python;
+  python.start(QStringLiteral("python3"),
+               {QStringLiteral("-c"),
+                QStringLiteral("import csv, json, sys\n"
+                               "with open(sys.argv[1], newline='', encoding='utf-8') as f:\n"
+                               "    json.dump(list(csv.reader(f, delimiter=sys.argv[2])), sys.stdout)\n"),
+                path, QString::fromLatin1(delimiter)});
+  EXPECT_TRUE(python.waitForFinished(30000) && python.exitCode() == 0)
+      << python.readAllStandardError().toStdString();
+  QList<QStringList> rows;
+  for (const QJsonValue& row : QJsonDocument::fromJson(python.readAllStandardOutput()).array())
+    rows.append(row.toVariant().toStringList());
+  return rows;
+}
+
+// Quoted only where needed, quotes doubled, CR LF rows; awkward text, minor units and a rounding rule
+// come back intact through Python's csv module.
+TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
+  design->setName(QStringLiteral("Design, \"final\""));
+  ASSERT_TRUE(client->setValue(QStringLiteral("currency"), QStringLiteral("EUR")));
+  client->setRoundingMinutes(15);
+  client->setRoundingMode(QStringLiteral("up"));
+  WTTime* brief = makeTime(design, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 9, 7));
+  brief->setName(QStringLiteral("Line one\nLine \"two\""));
+  brief->setNotes(QStringLiteral("Größe – ½ €\r\nzweite Zeile"));
+  auto* tanaka = WTClient::insertNewObject(context.get());
+  tanaka->setName(QStringLiteral("Tanaka 株式会社"));
+  ASSERT_TRUE(tanaka->setValue(QStringLiteral("currency"), QStringLiteral("JPY")));
+  backend->setClient(tanaka);
+  api->setRate(dec("33.33"));  // finer than the yen: kept as it is; 2 hours bill 66.66, so 67 yen
+
+  const QString path = dir.filePath(QStringLiteral("sheet.csv"));
+  const Result<int> written = WTCSVExport::exportSpreadsheet(*context, {}, nullptr, path);
+  ASSERT_TRUE(written.ok() && written.value() == 6);  // four entries, a fee and an expense; no note, no to-do
+  const QString site = QStringLiteral("Web \"Site\""), task = design->name();
+  const QList<QStringList> expected = {
+      WTCSVExport::spreadsheetColumns(),
+      {"Acme", site, task, "time", "Sketch", "2024-02-10", "10:00", "11:00", "1:00", "1:00", "60.00", "60.00",
+       "EUR", ""},
+      {"Acme", site, task, "time", "Kick \"off\"", "2024-03-03", "09:00", "10:30", "1:30", "1:30", "60.00",
+       "90.00", "EUR", ""},
+      {"Acme", site, task, "time", "Review", "2024-03-03", "14:00", "14:30", "0:30", "0:30", "60.00", "30.00",
+       "EUR", ""},
+      {"Acme", site, task, "expense", "Fonts", "2024-03-04", "", "", "", "", "", "1234.50", "EUR", ""},
+      {"Acme", site, task, "time", brief->name(), "2024-03-05", "09:00", "09:07", "0:07", "0:15", "60.00",
+       "15.00", "EUR", brief->notes()},
+      {"Tanaka 株式会社", "Backend", "API", "flat fee", "Setup", "2024-03-06", "", "", "2:00", "2:00",
+       "33.33", "67", "JPY", ""},
+  };
+  const QList<QStringList> rows = rowsReadByPython(path);
+  ASSERT_EQ(rows.size(), expected.size());
+  for (qsizetype i = 0; i < rows.size(); ++i)
+    EXPECT_EQ(rows[i].join(u'|').toStdString(), expected[i].join(u'|').toStdString());
+  EXPECT_TRUE(
+      readAll(path).contains("\r\nAcme,\"Web \"\"Site\"\"\",\"Design, "
+                             "\"\"final\"\"\",time,Sketch,2024-02-10,10:00,11:00,1:00,1:00,60.00,"
+                             "60.00,EUR,\r\n"))
+      << readAll(path).toStdString();
+
+  const Result<WTItemPredicate> day =
+      WTRangePredicate::predicateForRangeWord(QStringLiteral("2024-03-03..2024-03-04"));
+  ASSERT_TRUE(day.ok());
+  EXPECT_EQ(WTCSVExport::exportSpreadsheet(*context, day.value(), web, path).value(), 3);
+}
+
+// LibreOffice's default import, saved again as tab-separated text: every row in the same columns.
+TEST_F(ReportTest, SpreadsheetCsvOpensAsColumnsInLibreOffice) {
+  const QString soffice = QStandardPaths::findExecutable(QStringLiteral("soffice"));
+  if (soffice.isEmpty()) GTEST_SKIP() << "soffice is not installed: LibreOffice's import is not checked";
+  design->setNotes(QStringLiteral("first, \"quoted\"\nsecond – ½"));
+  const QString path = dir.filePath(QStringLiteral("sheet.csv"));
+  ASSERT_TRUE(WTCSVExport::exportSpreadsheet(*context, {}, nullptr, path).ok());
+  QProcess convert;
+  convert.start(soffice,
+                {"--headless", "-env:UserInstallation=file://" + dir.filePath("lo"), "--convert-to",
+                 "csv:Text - txt - csv (StarCalc):9,34,76", "--outdir", dir.filePath("lo-out"), path});
+  ASSERT_TRUE(convert.waitForFinished(120000) && convert.exitCode() == 0);
+  const QList<QStringList> rows = rowsReadByPython(dir.filePath(QStringLiteral("lo-out/sheet.csv")), "\t");
+  ASSERT_EQ(rows.size(), 6);  // the header, four entries and a fee, an expense
+  EXPECT_EQ(rows[0].join(u'|').toStdString(), WTCSVExport::spreadsheetColumns().join(u'|').toStdString());
+  for (const QStringList& row : rows) EXPECT_EQ(row.size(), 14) << row.join(u'|').toStdString();
 }
 
 // Every mode over all projects, an empty one and none: every total, no error, no stray rows, escaped names.
