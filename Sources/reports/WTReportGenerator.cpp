@@ -3,15 +3,19 @@
 #include "GXTemplateEngine.h"
 #include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
+#include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTHTMLFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTItemKindFilter.h"
+#include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTReportFilters.h"
 #include "WTReportLevelMarker.h"
+#include "WTReportPeriod.h"
 #include "WTTask.h"
 
 #include <QDir>
@@ -47,44 +51,76 @@ class ErrorCollector : public GXTemplateEngineDelegate {
 
 }  // namespace
 
+WTReportGenerator::WTReportGenerator() = default;
+
+WTReportGenerator::WTReportGenerator(QList<WTProject*> projects, int mode)
+    : projects_(std::move(projects)), mode_(mode) {}
+
 WTReportGenerator::~WTReportGenerator() = default;
+
+void WTReportGenerator::setPeriod(const std::optional<RZDate::Range>& period) {
+  period_ = period;
+  periodViews_.reset();
+}
+
+WTReportPeriod& WTReportGenerator::periodViews() const {
+  if (!periodViews_) periodViews_ = std::make_unique<WTReportPeriod>(*period_);
+  return *periodViews_;
+}
 
 QVariantMap WTReportGenerator::variables() const {
   QVariantList projects;
   QVariant client;
-  for (WTProject* project : projects_) {
-    projects.append(KeyPath::variantFromObject(project));
-    if (project->client()) client = KeyPath::variantFromObject(project->client());
+  if (period_) {
+    periodViews_.reset();  // the records may have changed since the last render
+    WTReportPeriod& views = periodViews();
+    for (WTProject* project : projects_) {
+      if (const KeyValueCoding* view = views.viewOfProject(project))
+        projects.append(KeyPath::variantFromObject(view));
+      if (project->client()) client = KeyPath::variantFromObject(views.viewOfClient(project->client()));
+    }
+  } else {
+    for (WTProject* project : projects_) {
+      projects.append(KeyPath::variantFromObject(project));
+      if (project->client()) client = KeyPath::variantFromObject(project->client());
+    }
+  }
+  QVariantMap billing;
+  const UserDefaults* defaults = projects_.isEmpty() || !projects_.first()->context()
+                                     ? nullptr
+                                     : projects_.first()->context()->userDefaults();
+  for (const auto& [key, setting] : {std::pair{"name", SettingsKeys::kBillingName},
+                                     {"address", SettingsKeys::kBillingAddress},
+                                     {"taxNumber", SettingsKeys::kBillingTaxNumber},
+                                     {"paymentTerms", SettingsKeys::kBillingPaymentTerms}}) {
+    // None rather than an empty text, which a template's condition would take for a value.
+    const QString text = defaults ? defaults->stringForKey(setting).trimmed() : QString();
+    billing.insert(QLatin1String(key), text.isEmpty() ? QVariant() : QVariant(text));
   }
   return {{QStringLiteral("client"), client},
           {QStringLiteral("projects"), projects},
-          {QStringLiteral("mode"), mode_}};
+          {QStringLiteral("mode"), mode_},
+          {QStringLiteral("period"), period_ ? QVariant(periodViews_->variable()) : QVariant()},
+          {QStringLiteral("billing"), billing}};
 }
 
 QVariant WTReportGenerator::filteredItemsForTask(WTTask* task, int mode) {
-  if (!task) return {};
-  auto keep = [this](std::vector<std::shared_ptr<WTItemContainer>> groups) {
+  if (!task || mode < 1 || mode > 3) return {};
+  const QList<WTItem*> items =
+      period_ ? periodViews().filtered(task->valuableItems()) : task->valuableItems();
+  if (mode == 1) {
     QVariantList list;
-    list.reserve(qsizetype(groups.size()));
-    for (auto& group : groups) {
-      list.append(KeyPath::variantFromObject(group.get()));
-      groups_.push_back(std::move(group));
-    }
+    for (WTItem* item : items) list.append(KeyPath::variantFromObject(item));
     return list;
-  };
-  switch (mode) {
-    case 1: {
-      QVariantList list;
-      for (WTItem* item : task->valuableItems()) list.append(KeyPath::variantFromObject(item));
-      return list;
-    }
-    case 2:
-      return keep(task->dailyItems());
-    case 3:
-      return keep(task->monthlyItems());
-    default:
-      return {};
   }
+  QVariantList list;
+  for (auto& group : WTItemContainer::containersByKeyPath(
+           mode == 2 ? QStringLiteral("startDate.midnight") : QStringLiteral("startDate.beginOfMonth"),
+           items)) {
+    list.append(KeyPath::variantFromObject(group.get()));
+    groups_.push_back(std::move(group));
+  }
+  return list;
 }
 
 QString WTReportGenerator::userTemplatePath() {

@@ -216,6 +216,53 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
             QStringLiteral("[]"));
 }
 
+// A period takes the items starting in it (its end is the next period's), at every level and in every
+// total; without one ("any") the records answer as they always did.
+TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
+  for (const auto& [name, start] : {std::pair{"Edge in", berlin(2024, 3, 3)},
+                                    {"Edge out", berlin(2024, 3, 4)},
+                                    {"Eve", berlin(2024, 3, 2, 23, 45)}})
+    makeTime(design, start, start.addingSeconds(15 * 60))->setName(QString::fromUtf8(name));
+  // What follows a nested loop is guarded by the enclosing loop's variable (an empty loop's end writes).
+  const QString text = QStringLiteral(
+      "{% for project in projects %}{{ project.name }} {{ project.duration }}m {{ project.cost | decimal }}:"
+      "{% for task in project.tasks %} {{ task.name }} {{ task.duration }}m {{ task.cost | decimal }} "
+      "[{% for item in task.valuableItems %}{{ item.name }};{% /for %}{% if task %}] days{% /if %}"
+      "{% for day in task.dailyItems %} {{ day.date | date_format: \"MM-dd\" }}={{ day.duration }}m{% /for %}"
+      "{% if task %} months{% /if %}{% for month in task.monthlyItems %} {{ month.date | date_format: \"MM\" "
+      "}}="
+      "{{ month.cost | decimal }}{% /for %}{% /for %}{% if project %}\n{% /if %}{% /for %}total "
+      "{{ projects.@sum.cost | decimal }} client {{ client.cost | decimal }} {% if period %}"
+      "{{ period.begin | date_format: \"MM-dd\" }}..{{ period.end | date_format: \"MM-dd\" }}{% /if %}");
+  const std::pair<const char*, const char*> cases[] = {
+      // clang-format off
+      {"2024-03-03..2024-03-03", "Web \"Site\" 135m 135.00: Design 135m 135.00 [Review;Kick \"off\";Edge in;] days "
+                                 "03-03=135m months 03=135.00\ntotal 135.00 client 135.00 03-03..03-03"},
+      {"2024-03-04..2024-03-06", "Web \"Site\" 15m 1,249.50: Design 15m 1,249.50 [Fonts;Edge out;] days 03-04=15m "
+                                 "months 03=1,249.50\nBackend 120m 200.00: API 120m 200.00 [Setup;] days 03-06=120m "
+                                 "months 03=200.00\ntotal 1,449.50 client 1,449.50 03-04..03-06"},
+      {"last-month", "Web \"Site\" 60m 60.00: Design 60m 60.00 [Sketch;] days 02-10=60m months 02=60.00\n"
+                     "total 60.00 client 60.00 02-01..02-29"},
+      {"2024-01-01..2024-01-31", "total 0.00 client 0.00 01-01..01-31"},
+      {"any", "Web \"Site\" 225m 1,459.50: Design 225m 1,459.50 [Fonts;Edge out;Review;Kick \"off\";Edge in;Eve;"
+              "Sketch;] days 03-04=15m 03-03=135m 03-02=15m 02-10=60m months 03=1,399.50 02=60.00\nBackend 120m "
+              "200.00: API 120m 200.00 [Setup;] days 03-06=120m months 03=200.00\ntotal 1,659.50 client 1,659.50 "},
+      // clang-format on
+  };
+  WTReportGenerator generator(projects(), 2);
+  for (const auto& [word, expected] : cases) {
+    const Result<std::optional<RZDate::Range>> period = WTRangePredicate::boundsForRangeWord(word);
+    ASSERT_TRUE(period.ok()) << word;
+    generator.setPeriod(period.value());
+    const WTReport report = generator.renderText(text);
+    EXPECT_TRUE(report.errors.empty()) << word;
+    EXPECT_EQ(report.html.toStdString(), expected) << word;
+  }
+  EXPECT_EQ(WTCSVExport::reportCSV(projects(), 0,
+                                   WTRangePredicate::boundsForRangeWord("2024-03-03..2024-03-03").value()),
+            "\"Web \\\"Site\\\"\",\"Design\",\"02:15\",\"135.00\"\n");
+}
+
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
 TEST_F(ReportTest, VariablesAndLevelParts) {
   WTReportGenerator empty;
