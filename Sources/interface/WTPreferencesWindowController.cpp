@@ -13,13 +13,16 @@
 #include <QCheckBox>
 #include <QDesktopServices>
 #include <QDialogButtonBox>
+#include <QEvent>
 #include <QFormLayout>
 #include <QGroupBox>
 #include <QHBoxLayout>
 #include <QLabel>
 #include <QLineEdit>
+#include <QPlainTextEdit>
 #include <QPushButton>
 #include <QSpinBox>
+#include <QTabWidget>
 #include <QVBoxLayout>
 
 namespace {
@@ -87,12 +90,17 @@ WTPreferencesWindowController::~WTPreferencesWindowController() {
   // Hiding ends the edit in the focused field, which stores it. That has to happen while this object is
   // still whole: left to QDialog's destructor, the field's editingFinished would reach a half-destroyed one.
   hide();
+  billingAddressField_->removeEventFilter(this);
   for (QObject* child : findChildren<QObject*>())
     disconnect(child, nullptr, this, nullptr);
 }
 
 void WTPreferencesWindowController::buildInterface() {
-  auto* layout = new QVBoxLayout(this);
+  auto* windowLayout = new QVBoxLayout(this);
+  pages_ = new QTabWidget(this);
+  pages_->setObjectName(QStringLiteral("preferencesPages"));
+  auto* general = new QWidget(pages_);
+  auto* layout = new QVBoxLayout(general);
 
   // The account.
   auto* account = new QGroupBox(tr("Sync account"), this);
@@ -168,10 +176,14 @@ void WTPreferencesWindowController::buildInterface() {
       defaultRateField_->fontMetrics().horizontalAdvance(defaultRateField_->placeholderText()) + 16);
   ratesForm->addRow(tr("Default hourly rate:"), defaultRateField_);
   layout->addWidget(rates);
+  layout->addStretch(1);
+  pages_->addTab(general, tr("General"));
+  pages_->addTab(buildBillingPage(), tr("Billing"));
+  windowLayout->addWidget(pages_);
 
   auto* buttons = new QDialogButtonBox(QDialogButtonBox::Close, this);
   buttons->button(QDialogButtonBox::Close)->setObjectName(QStringLiteral("closeButton"));
-  layout->addWidget(buttons);
+  windowLayout->addWidget(buttons);
 
   // Return in a text field ends its editing; only in the password field does it also start syncing.
   for (QPushButton* button : findChildren<QPushButton*>()) {
@@ -202,6 +214,63 @@ void WTPreferencesWindowController::buildInterface() {
           [this] { WTRateField::setRefused(defaultRateField_, {}); });
 }
 
+QWidget* WTPreferencesWindowController::buildBillingPage() {
+  auto* page = new QWidget(pages_);
+  page->setObjectName(QStringLiteral("billingPage"));
+  auto* layout = new QVBoxLayout(page);
+
+  auto* details = new QGroupBox(tr("Your details"), page);
+  auto* form = new QFormLayout(details);
+  auto lineField = [&](const char* name, const QString& label, const QString& placeholder) {
+    auto* field = new QLineEdit(details);
+    field->setObjectName(QLatin1String(name));
+    field->setPlaceholderText(placeholder);
+    form->addRow(label, field);
+    connect(field, &QLineEdit::editingFinished, this, &WTPreferencesWindowController::commitBillingDetails);
+    return field;
+  };
+  billingNameField_ = lineField("billingNameField", tr("Name:"), tr("Your name or your business's"));
+  billingAddressField_ = new QPlainTextEdit(details);
+  billingAddressField_->setObjectName(QStringLiteral("billingAddressField"));
+  billingAddressField_->setPlaceholderText(tr("Street\nPostcode and town\nCountry"));
+  billingAddressField_->setTabChangesFocus(true);
+  billingAddressField_->setFixedHeight(billingAddressField_->fontMetrics().lineSpacing() * 4 + 12);
+  form->addRow(tr("Address:"), billingAddressField_);
+  billingTaxNumberField_ =
+      lineField("billingTaxNumberField", tr("Tax number:"), tr("VAT or tax identification"));
+  billingPaymentTermsField_ =
+      lineField("billingPaymentTermsField", tr("Payment terms:"), tr("Payable within 30 days"));
+  auto* note = new QLabel(tr("Shown at the head of your reports."), details);
+  note->setWordWrap(true);
+  form->addRow(QString(), note);
+  layout->addWidget(details);
+  layout->addStretch(1);
+  // A text edit has no end of editing of its own: its text is stored when it loses the focus.
+  billingAddressField_->installEventFilter(this);
+  return page;
+}
+
+bool WTPreferencesWindowController::eventFilter(QObject* watched, QEvent* event) {
+  if (watched == billingAddressField_ && event->type() == QEvent::FocusOut) commitBillingDetails();
+  return QDialog::eventFilter(watched, event);
+}
+
+void WTPreferencesWindowController::commitBillingDetails() {
+  const std::pair<QLatin1StringView, QString> fields[] = {
+      {SettingsKeys::kBillingName, billingNameField_->text()},
+      {SettingsKeys::kBillingAddress, billingAddressField_->toPlainText()},
+      {SettingsKeys::kBillingTaxNumber, billingTaxNumberField_->text()},
+      {SettingsKeys::kBillingPaymentTerms, billingPaymentTermsField_->text()}};
+  for (const auto& [key, typed] : fields) {
+    const QString text = typed.trimmed();
+    if (text == defaults_->stringForKey(key) && defaults_->hasStoredValue(key) == !text.isEmpty()) continue;
+    if (text.isEmpty())
+      defaults_->removeValue(key);
+    else
+      defaults_->setValue(key, text);
+  }
+}
+
 void WTPreferencesWindowController::loadValues() {
   // The account shows only when it is complete.
   const QString password = passwords_->password();
@@ -223,6 +292,10 @@ void WTPreferencesWindowController::loadValues() {
   stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(SettingsKeys::kStopsOtherTimes));
   const std::optional<Decimal> rate = defaults_->decimalForKey(SettingsKeys::kDefaultRate);
   defaultRateField_->setText(rate ? WTRateField::text(*rate) : QString());
+  billingNameField_->setText(defaults_->stringForKey(SettingsKeys::kBillingName));
+  billingAddressField_->setPlainText(defaults_->stringForKey(SettingsKeys::kBillingAddress));
+  billingTaxNumberField_->setText(defaults_->stringForKey(SettingsKeys::kBillingTaxNumber));
+  billingPaymentTermsField_->setText(defaults_->stringForKey(SettingsKeys::kBillingPaymentTerms));
 }
 
 void WTPreferencesWindowController::showWindow() {
@@ -320,5 +393,6 @@ void WTPreferencesWindowController::hideEvent(QHideEvent* event) {
   // Closing the window ends the editing of the field in hand.
   commitServer();
   commitDefaultRate();
+  commitBillingDetails();
   QDialog::hideEvent(event);
 }

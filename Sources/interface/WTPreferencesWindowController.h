@@ -8,16 +8,19 @@
 class QCheckBox;
 class QLabel;
 class QLineEdit;
+class QPlainTextEdit;
 class QPushButton;
 class QSpinBox;
+class QTabWidget;
 class RZSyncManager;
 class UserDefaults;
 class WTPasswordStore;
 
-// The preferences window: the sync account (e-mail address and password), the button that starts
+// The preferences window. General: the sync account (e-mail address and password), the button that starts
 // syncing, the sync status as a light and the way to an account on the server's sign-up page; then the
 // server's address, idle handling, whether starting a timer stops the others, and the default hourly
-// rate.
+// rate. Billing: the user's own details for the head of a report (name, address, tax number, payment
+// terms).
 //
 // The account is stored only by "Start Sync"; the other settings are stored as they are edited (a text
 // field when editing ends, or when the window closes). One window per application, not modal: make it
@@ -61,9 +64,15 @@ class WTPreferencesWindowController : public QDialog {
   QSpinBox* idleTimeSpinBox() const { return idleTimeSpinBox_; }
   QCheckBox* stopsOtherTimesCheckBox() const { return stopsOtherTimesCheckBox_; }
   QLineEdit* defaultRateField() const { return defaultRateField_; }
+  QTabWidget* pages() const { return pages_; }
+  QLineEdit* billingNameField() const { return billingNameField_; }
+  QPlainTextEdit* billingAddressField() const { return billingAddressField_; }
+  QLineEdit* billingTaxNumberField() const { return billingTaxNumberField_; }
+  QLineEdit* billingPaymentTermsField() const { return billingPaymentTermsField_; }
 
  protected:
   void hideEvent(QHideEvent* event) override;
+  bool eventFilter(QObject* watched, QEvent* event) override;
 
  private:
   void buildInterface();
@@ -71,6 +80,9 @@ class WTPreferencesWindowController : public QDialog {
   // Stores the text fields' values when they are acceptable; a refused one is marked and not stored.
   void commitServer();
   void commitDefaultRate();
+  QWidget* buildBillingPage();
+  // Stores the billing details as the fields show them (none for an empty field).
+  void commitBillingDetails();
   void updateSignUpButton();
   void passwordDidLoad();
   void updateKeychainNote();
@@ -92,4 +104,9 @@ class WTPreferencesWindowController : public QDialog {
   QSpinBox* idleTimeSpinBox_ = nullptr;
   QCheckBox* stopsOtherTimesCheckBox_ = nullptr;
   QLineEdit* defaultRateField_ = nullptr;
+  QTabWidget* pages_ = nullptr;
+  QLineEdit* billingNameField_ = nullptr;
+  QPlainTextEdit* billingAddressField_ = nullptr;
+  QLineEdit* billingTaxNumberField_ = nullptr;
+  QLineEdit* billingPaymentTermsField_ = nullptr;
 };

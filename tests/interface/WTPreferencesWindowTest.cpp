@@ -4,6 +4,9 @@
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
 
+#include <QPlainTextEdit>
+#include <QTabWidget>
+
 namespace {
 
 const QString kUser = QStringLiteral("ann@example.org");
@@ -26,7 +29,9 @@ class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
 class WTPreferencesWindowTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword"}) defaults->removeValue(key);
+    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword", "WTBillingName",
+                            "WTBillingAddress", "WTBillingTaxNumber", "WTBillingPaymentTerms"})
+      defaults->removeValue(key);
     manager->syncNetwork()->setCredentialDelegate(&credentials);
     manager->setIntervals({600000, 600000, 600000});
   }
@@ -191,6 +196,35 @@ TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
   EXPECT_EQ(shows(), std::tuple(true, true, 21, true));
   QTest::mouseClick(window->shouldIdleCheckBox(), Qt::LeftButton);
   EXPECT_FALSE(defaults->boolForKey("WTShouldIdle") || window->idleTimeSpinBox()->isEnabled());
+}
+
+// The details for a report's head are stored as each field is left (the address, on several lines, when
+// the focus goes), or when the window closes; an emptied field stores none.
+TEST_F(WTPreferencesWindowTest, TheBillingPageStoresYourDetails) {
+  open();
+  window->pages()->setCurrentIndex(window->pages()->indexOf(window->findChild<QWidget*>("billingPage")));
+  type(window->billingNameField(), "Ann Smith", true);
+  QPlainTextEdit* address = window->billingAddressField();
+  address->setFocus();
+  QTest::keyClicks(address, "Main St 1");
+  QTest::keyClick(address, Qt::Key_Return);
+  QTest::keyClicks(address, "12345 Town ");
+  type(window->billingTaxNumberField(), "DE123456789");
+  EXPECT_EQ(defaults->stringForKey("WTBillingAddress"), "Main St 1\n12345 Town");
+  type(window->billingPaymentTermsField(), "30 days net");
+  QTest::mouseClick(window->findChild<QPushButton*>("closeButton"), Qt::LeftButton);
+  const char* keys[] = {"WTBillingName", "WTBillingAddress", "WTBillingTaxNumber", "WTBillingPaymentTerms"};
+  QStringList stored;
+  for (const char* key : keys) stored << defaults->stringForKey(key);
+  EXPECT_EQ(stored, QStringList({"Ann Smith", "Main St 1\n12345 Town", "DE123456789", "30 days net"}));
+  open();
+  EXPECT_EQ(
+      QStringList({window->billingNameField()->text(), window->billingAddressField()->toPlainText(),
+                   window->billingTaxNumberField()->text(), window->billingPaymentTermsField()->text()}),
+      stored);
+  window->billingNameField()->clear();
+  type(window->billingNameField(), "  ", true);
+  EXPECT_FALSE(defaults->hasStoredValue("WTBillingName"));
 }
 
 }  // namespace
