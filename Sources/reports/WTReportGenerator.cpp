@@ -176,6 +176,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.setDelegate(&collector);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
+  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
   engine.loadFilter(std::make_shared<WTHTMLFilter>());
   engine.loadFilter(std::make_shared<WTItemKindFilter>());
   engine.loadMarker(std::make_shared<WTReportLevelMarker>(&engine, mode_));

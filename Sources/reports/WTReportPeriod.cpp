@@ -1,5 +1,6 @@
 #include "WTReportPeriod.h"
 
+#include "MoneyFormat.h"
 #include "WTClient.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
@@ -26,13 +27,22 @@ QVariant groupsVariant(const WTItemContainerList& groups) {
   return list;
 }
 
+// What a view sums over the period's items, as its record sums over all of them.
 struct Totals {
   int duration = 0;
   Decimal cost;
+  int billedDuration = 0;
+  Decimal billedCost;
+
+  // None billed yet, written with the places of `currency`, as the records' own sums start.
+  explicit Totals(const QString& currency)
+      : billedCost(Decimal().rounded(MoneyFormat::minorUnitDigits(currency))) {}
 
   void add(const Totals& other) {
     duration += other.duration;
     cost += other.cost;
+    billedDuration += other.billedDuration;
+    billedCost += other.billedCost;
   }
   // True when `key` names a total; its value is then in `value`.
   bool answer(const QString& key, QVariant& value) const {
@@ -42,6 +52,14 @@ struct Totals {
     }
     if (key == QLatin1String("cost")) {
       value = QVariant::fromValue(cost);
+      return true;
+    }
+    if (key == QLatin1String("billedDuration")) {
+      value = billedDuration;
+      return true;
+    }
+    if (key == QLatin1String("billedCost")) {
+      value = QVariant::fromValue(billedCost);
       return true;
     }
     return false;
@@ -74,12 +92,17 @@ class WTReportPeriod::TaskView final : public View {
       : View(period, task),
         task_(task),
         items_(period.filtered(task->items())),
-        valuable_(period.filtered(task->valuableItems())) {
-    // Every item bills at the task's rate, as the task's own total reads it.
+        valuable_(period.filtered(task->valuableItems())),
+        totals_(task->billingCurrency()) {
+    // Every item bills by the task's rate, rule and currency, resolved once as the task's own sums do.
     const Decimal rate = task->inheritedRate();
+    const WTRoundingRule rule = task->roundingRule();
+    const int places = MoneyFormat::minorUnitDigits(task->billingCurrency());
     for (const WTItem* item : items_) {
       totals_.duration += item->duration();
       totals_.cost += item->costAtRate(rate);
+      totals_.billedDuration += item->billedDurationWithRule(rule);
+      totals_.billedCost += item->billedCostWith(rule, rate, places);
     }
   }
 
@@ -144,7 +167,8 @@ class WTReportPeriod::TaskView final : public View {
 
 class WTReportPeriod::ProjectView final : public View {
  public:
-  ProjectView(WTReportPeriod& period, WTProject* project) : View(period, project), project_(project) {
+  ProjectView(WTReportPeriod& period, WTProject* project)
+      : View(period, project), project_(project), totals_(project->billingCurrency()) {
     for (WTTask* task : project->tasks()) {
       TaskView* view = period.taskView(task);
       if (view->isEmpty()) continue;
@@ -177,12 +201,14 @@ class WTReportPeriod::ProjectView final : public View {
 
 class WTReportPeriod::ClientView final : public View {
  public:
-  ClientView(WTReportPeriod& period, WTClient* client) : View(period, client), client_(client) {}
+  ClientView(WTReportPeriod& period, WTClient* client)
+      : View(period, client), client_(client), totals_(client->billingCurrency()) {}
 
  protected:
   bool answer(const QString& key, QVariant& value) const override {
     // A client's other projects are read only when a template asks for the client's own lists or totals.
-    const bool total = key == QLatin1String("duration") || key == QLatin1String("cost");
+    const bool total = key == QLatin1String("duration") || key == QLatin1String("cost") ||
+                       key == QLatin1String("billedDuration") || key == QLatin1String("billedCost");
     if (!total && key != QLatin1String("projects")) return false;
     if (!projects_) {
       projects_.emplace();

@@ -22,9 +22,10 @@ class WTTask;
 //
 // Those are views: they answer the keys of their record, except that their item lists hold only the
 // period's items and their totals ("duration", "cost", "billedDuration", "billedCost") are sums over
-// those; a project lists only the tasks with a valued item in the period, a client only such projects.
-// Items and day or month groups are the records themselves. A view is made on first request and lives as
-// long as the period; one record has one view, so `task.project` is the view that lists the task.
+// those, each item billed as its record bills it; a project lists only the tasks with a valued item in the
+// period, a client only such projects. Items and day or month groups are the records themselves. A view is
+// made on first request and lives as long as the period; one record has one view, so `task.project` is the
+// view that lists the task.
 class WTReportPeriod {
  public:
   explicit WTReportPeriod(const RZDate::Range& bounds);
