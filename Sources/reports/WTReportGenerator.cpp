@@ -69,21 +69,23 @@ WTReportPeriod& WTReportGenerator::periodViews() const {
 }
 
 QVariantMap WTReportGenerator::variables() const {
+  WTClient* client = nullptr;  // any one project's
+  for (WTProject* project : projects_) {
+    if (project->client()) client = project->client();
+  }
   QVariantList projects;
-  QVariant client;
+  QVariant clientVariable;
   if (period_) {
     periodViews_.reset();  // the records may have changed since the last render
     WTReportPeriod& views = periodViews();
     for (WTProject* project : projects_) {
       if (const KeyValueCoding* view = views.viewOfProject(project))
         projects.append(KeyPath::variantFromObject(view));
-      if (project->client()) client = KeyPath::variantFromObject(views.viewOfClient(project->client()));
     }
+    clientVariable = KeyPath::variantFromObject(views.viewOfClient(client));
   } else {
-    for (WTProject* project : projects_) {
-      projects.append(KeyPath::variantFromObject(project));
-      if (project->client()) client = KeyPath::variantFromObject(project->client());
-    }
+    for (WTProject* project : projects_) projects.append(KeyPath::variantFromObject(project));
+    clientVariable = KeyPath::variantFromObject(client);
   }
   QVariantMap billing;
   const UserDefaults* defaults = projects_.isEmpty() || !projects_.first()->context()
@@ -97,11 +99,16 @@ QVariantMap WTReportGenerator::variables() const {
     const QString text = defaults ? defaults->stringForKey(setting).trimmed() : QString();
     billing.insert(QLatin1String(key), text.isEmpty() ? QVariant() : QVariant(text));
   }
-  return {{QStringLiteral("client"), client},
+  // The client's, else the projects' (the preferences' without a client).
+  const QVariant currency = client                ? QVariant(client->billingCurrency())
+                            : projects_.isEmpty() ? QVariant()
+                                                  : QVariant(projects_.first()->billingCurrency());
+  return {{QStringLiteral("client"), clientVariable},
           {QStringLiteral("projects"), projects},
           {QStringLiteral("mode"), mode_},
           {QStringLiteral("period"), period_ ? QVariant(periodViews_->variable()) : QVariant()},
-          {QStringLiteral("billing"), billing}};
+          {QStringLiteral("billing"), billing},
+          {QStringLiteral("currency"), currency}};
 }
 
 QVariant WTReportGenerator::filteredItemsForTask(WTTask* task, int mode) {

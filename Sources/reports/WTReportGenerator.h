@@ -59,8 +59,9 @@ class WTReportGenerator {
 
   // "client" (the client of any one of the projects; null without projects or client), "projects" (all of
   // them; with a period, those with a valued item in it), "mode", "period" (null without one, else
-  // {begin, end}: its first and last day) and "billing" (the user's details from the settings of the
-  // projects' store: name, address, taxNumber, paymentTerms; each null when not set). Each call makes the
+  // {begin, end}: its first and last day), "billing" (the user's details from the settings of the
+  // projects' store: name, address, taxNumber, paymentTerms; each null when not set) and "currency" (the
+  // client's billing currency, else the first project's; null without projects). Each call makes the
   // period's views afresh.
   QVariantMap variables() const;
 
@@ -84,7 +85,7 @@ class WTReportGenerator {
   void setLogsErrors(bool logs) { logsErrors_ = logs; }
 
   // Renders the template at `path` (templatePath() when empty) with variables() and the filters
-  // "digiclock", "decimal", "html" and "item_kind".
+  // "digiclock", "decimal", "money", "html" and "item_kind".
   WTReport render(const QString& path = QString());
   // The same with the template's text.
   WTReport renderText(const QString& templateText);

@@ -2,6 +2,7 @@
 
 #include "KeyPath.h"
 #include "LogCapture.h"
+#include "MoneyFormat.h"
 #include "UserLocale.h"
 #include "WTCSVExport.h"
 #include "WTItemContainer.h"
@@ -9,6 +10,7 @@
 #include "WTReportGenerator.h"
 
 #include <QFile>
+#include <QRegularExpression>
 #include <QStandardPaths>
 
 #include <algorithm>
@@ -261,6 +263,53 @@ TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
   EXPECT_EQ(WTCSVExport::reportCSV(projects(), 0,
                                    WTRangePredicate::boundsForRangeWord("2024-03-03..2024-03-03").value()),
             "\"Web \\\"Site\\\"\",\"Design\",\"02:15\",\"135.00\"\n");
+}
+
+// Three amounts of 138.465 bill 138.47 each: the built-in template's lines add up to its subtotal and
+// total (415.41) at every level, where the exact sum rounded once said 415.40. Its head names both sides.
+TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides) {
+  auto* billed = WTProject::insertNewObject(context.get());
+  billed->setName(QStringLiteral("Billed"));
+  billed->setClient(client);
+  for (int month : {1, 2, 3}) {
+    WTTask* task = makeTask(billed, QStringLiteral("Task %1").arg(month));
+    task->setRate(dec("92.31"));
+    makeTime(task, berlin(2024, month, 5, 9), berlin(2024, month, 5, 10, 30));
+  }
+  defaults->setValue(QStringLiteral("WTBillingName"), QStringLiteral("Ann <Smith>"));
+  defaults->setValue(QStringLiteral("WTBillingAddress"), QStringLiteral("Main St 1\n12345 Town"));
+  defaults->setValue(QStringLiteral("WTBillingPaymentTerms"), QStringLiteral("Due in 30 days"));
+  client->setAddress(QStringLiteral("1 Acme Way\nSpringfield"));
+  // The amounts of the rows of a kind (their last cell), and their sum.
+  const auto amounts = [](const QString& html, const QString& kind) {
+    QStringList cells;
+    Decimal sum;
+    const QRegularExpression row(QStringLiteral("<tr class=\"%1\">.*<td[^>]*>([^<]*)</td></tr>").arg(kind));
+    for (auto match = row.globalMatch(html); match.hasNext();) {
+      cells << match.next().captured(1);
+      sum += Decimal::fromString(QString(cells.last()).remove(u',')).value_or(Decimal(-1000));
+    }
+    return std::pair(cells, MoneyFormat::format(sum).toStdString());
+  };
+  // Over February and March, two of them.
+  const auto period = WTRangePredicate::boundsForRangeWord(QStringLiteral("2024-02-01..2024-03-31")).value();
+  QString html;
+  for (const auto& [range, total] :
+       {std::pair{std::optional<RZDate::Range>(), "415.41"}, {period, "276.94"}}) {
+    for (int mode = 0; mode <= 3; ++mode) {
+      WTReportGenerator generator({billed}, mode);
+      generator.setPeriod(range);
+      html = generator.render().html;
+      const QString lines = mode == 0 ? QStringLiteral("task") : QStringLiteral("item");
+      EXPECT_EQ(amounts(html, lines).first, QStringList(range ? 2 : 3, QStringLiteral("138.47"))) << mode;
+      for (const char* kind : {"task", "item", "subtotal", "total"})
+        EXPECT_EQ(amounts(html, kind).second, mode > 0 || kind != QLatin1String("item") ? total : "0.00")
+            << mode << kind;
+    }
+  }
+  for (const char* text : {"<b>Ann &lt;Smith&gt;</b>", ">Main St 1\n12345 Town</p>",
+                           "<b>Acme</b>\n1 Acme Way\nSpringfield</p>", ">Due in 30 days</p>", ">92.31</td>"})
+    EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
 }
 
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
