@@ -51,6 +51,22 @@ class ErrorCollector : public GXTemplateEngineDelegate {
 
 }  // namespace
 
+// The report's client as the template reads it: an address that is blank is none, so the head's
+// `{% if client.address %}` holds only for a client with an address (a template takes any text, even an
+// empty one, for true). Every other key is the client's own.
+class WTReportGenerator::ClientVariable final : public KeyValueCoding {
+ public:
+  explicit ClientVariable(const KeyValueCoding* client) : client_(client) {}
+  QVariant valueForKey(const QString& key) const override {
+    QVariant value = client_->valueForKey(key);
+    if (key == QLatin1String("address") && value.toString().trimmed().isEmpty()) return {};
+    return value;
+  }
+
+ private:
+  const KeyValueCoding* client_;
+};
+
 WTReportGenerator::WTReportGenerator() = default;
 
 WTReportGenerator::WTReportGenerator(QList<WTProject*> projects, int mode)
@@ -74,7 +90,7 @@ QVariantMap WTReportGenerator::variables() const {
     if (project->client()) client = project->client();
   }
   QVariantList projects;
-  QVariant clientVariable;
+  const KeyValueCoding* clientRecord = client;
   if (period_) {
     periodViews_.reset();  // the records may have changed since the last render
     WTReportPeriod& views = periodViews();
@@ -82,11 +98,11 @@ QVariantMap WTReportGenerator::variables() const {
       if (const KeyValueCoding* view = views.viewOfProject(project))
         projects.append(KeyPath::variantFromObject(view));
     }
-    clientVariable = KeyPath::variantFromObject(views.viewOfClient(client));
+    clientRecord = views.viewOfClient(client);
   } else {
     for (WTProject* project : projects_) projects.append(KeyPath::variantFromObject(project));
-    clientVariable = KeyPath::variantFromObject(client);
   }
+  clientVariable_ = clientRecord ? std::make_unique<ClientVariable>(clientRecord) : nullptr;
   QVariantMap billing;
   const UserDefaults* defaults = projects_.isEmpty() || !projects_.first()->context()
                                      ? nullptr
@@ -103,7 +119,7 @@ QVariantMap WTReportGenerator::variables() const {
   const QVariant currency = client                ? QVariant(client->billingCurrency())
                             : projects_.isEmpty() ? QVariant()
                                                   : QVariant(projects_.first()->billingCurrency());
-  return {{QStringLiteral("client"), clientVariable},
+  return {{QStringLiteral("client"), KeyPath::variantFromObject(clientVariable_.get())},
           {QStringLiteral("projects"), projects},
           {QStringLiteral("mode"), mode_},
           {QStringLiteral("period"), period_ ? QVariant(periodViews_->variable()) : QVariant()},

@@ -95,11 +95,13 @@ class WTReportGenerator {
 
   // The views of the period, made on first need after the last call of variables().
   WTReportPeriod& periodViews() const;
+  class ClientVariable;
 
   QList<WTProject*> projects_;
   int mode_ = 0;
   std::optional<RZDate::Range> period_;
   mutable std::unique_ptr<WTReportPeriod> periodViews_;
+  mutable std::unique_ptr<ClientVariable> clientVariable_;
   bool logsErrors_ = true;
   std::vector<std::shared_ptr<WTItemContainer>> groups_;
 };

@@ -279,6 +279,8 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
   defaults->setValue(QStringLiteral("WTBillingName"), QStringLiteral("Ann <Smith>"));
   defaults->setValue(QStringLiteral("WTBillingAddress"), QStringLiteral("Main St 1\n12345 Town"));
   defaults->setValue(QStringLiteral("WTBillingPaymentTerms"), QStringLiteral("Due in 30 days"));
+  client->setAddress(QStringLiteral("\n"));  // left blank
+  EXPECT_FALSE(WTReportGenerator({billed}, 0).render().html.contains("class=\"to\""));
   client->setAddress(QStringLiteral("1 Acme Way\nSpringfield"));
   // The amounts of the rows of a kind (their last cell), and their sum.
   const auto amounts = [](const QString& html, const QString& kind) {
