@@ -9,8 +9,10 @@
 #include "WTPasswordStore.h"
 #include "WTProject.h"
 #include "WTRateField.h"
+#include "WTRoundingRule.h"
 
 #include <QCheckBox>
+#include <QComboBox>
 #include <QDesktopServices>
 #include <QDialogButtonBox>
 #include <QEvent>
@@ -25,12 +27,41 @@
 #include <QTabWidget>
 #include <QVBoxLayout>
 
+#include <unicode/ucurr.h>
+#include <unicode/uenum.h>
+
+#include <algorithm>
+#include <memory>
+
 namespace {
 
 constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
 // What the idle check uses when no usable number of minutes is set.
 constexpr int kIdleMinutesWhenUnset = 5;
 constexpr QSize kLightSize(16, 16);
+
+// The ISO 4217 codes in use today, as ICU knows them, each with its name in the user's language.
+QList<std::pair<QString, QString>> currencies() {
+  QList<std::pair<QString, QString>> found;
+  UErrorCode status = U_ZERO_ERROR;
+  const std::unique_ptr<UEnumeration, decltype(&uenum_close)> codes(
+      ucurr_openISOCurrencies(UCURR_COMMON | UCURR_NON_DEPRECATED, &status), &uenum_close);
+  if (U_FAILURE(status)) return found;
+  int32_t length = 0;
+  while (const UChar* code = uenum_unext(codes.get(), &length, &status)) {
+    if (U_FAILURE(status)) break;
+    UBool isChoiceFormat = false;
+    int32_t nameLength = 0;
+    UErrorCode nameStatus = U_ZERO_ERROR;
+    const UChar* name =
+        ucurr_getName(code, nullptr, UCURR_LONG_NAME, &isChoiceFormat, &nameLength, &nameStatus);
+    found.append(
+        {QString(reinterpret_cast<const QChar*>(code), length),
+         U_SUCCESS(nameStatus) ? QString(reinterpret_cast<const QChar*>(name), nameLength) : QString()});
+  }
+  std::sort(found.begin(), found.end());
+  return found;
+}
 
 void markRefused(QLineEdit* field, bool refused, const QString& reason) {
   field->setProperty("refused", refused);
@@ -244,7 +275,55 @@ QWidget* WTPreferencesWindowController::buildBillingPage() {
   note->setWordWrap(true);
   form->addRow(QString(), note);
   layout->addWidget(details);
+
+  // What a client bills by when it sets nothing of its own.
+  auto* money = new QGroupBox(tr("Billing defaults"), page);
+  auto* moneyForm = new QFormLayout(money);
+  currencyComboBox_ = new QComboBox(money);
+  currencyComboBox_->setObjectName(QStringLiteral("currencyComboBox"));
+  currencyComboBox_->setEditable(true);
+  currencyComboBox_->setInsertPolicy(QComboBox::NoInsert);
+  for (const auto& [code, name] : currencies()) {
+    currencyComboBox_->addItem(code, code);
+    currencyComboBox_->setItemData(currencyComboBox_->count() - 1, name, Qt::ToolTipRole);
+  }
+  currencyComboBox_->setToolTip(
+      tr("The ISO 4217 code of the currency your clients are billed in, unless a "
+         "client has its own"));
+  moneyForm->addRow(tr("Currency:"), currencyComboBox_);
+  auto* roundingRow = new QHBoxLayout;
+  roundingMinutesSpinBox_ = new QSpinBox(money);
+  roundingMinutesSpinBox_->setObjectName(QStringLiteral("roundingMinutesSpinBox"));
+  roundingMinutesSpinBox_->setRange(1, 24 * 60);
+  roundingMinutesSpinBox_->setSpecialValueText(tr("None"));
+  roundingMinutesSpinBox_->setSuffix(tr(" min"));
+  roundingMinutesSpinBox_->setKeyboardTracking(false);
+  roundingMinutesSpinBox_->setAccessibleName(tr("Rounding minutes"));
+  roundingModeComboBox_ = new QComboBox(money);
+  roundingModeComboBox_->setObjectName(QStringLiteral("roundingModeComboBox"));
+  roundingModeComboBox_->addItem(tr("Up"), QStringLiteral("up"));
+  roundingModeComboBox_->addItem(tr("To the nearest"), QStringLiteral("nearest"));
+  roundingModeComboBox_->addItem(tr("Down"), QStringLiteral("down"));
+  roundingModeComboBox_->setAccessibleName(tr("Rounding mode"));
+  roundingRow->addWidget(roundingMinutesSpinBox_);
+  roundingRow->addWidget(roundingModeComboBox_);
+  roundingRow->addStretch(1);
+  moneyForm->addRow(tr("Round time entries to:"), roundingRow);
+  layout->addWidget(money);
   layout->addStretch(1);
+
+  connect(currencyComboBox_->lineEdit(), &QLineEdit::editingFinished, this,
+          &WTPreferencesWindowController::commitCurrency);
+  connect(currencyComboBox_, &QComboBox::activated, this, &WTPreferencesWindowController::commitCurrency);
+  connect(currencyComboBox_->lineEdit(), &QLineEdit::textEdited, this,
+          [this] { markRefused(currencyComboBox_->lineEdit(), false, {}); });
+  connect(roundingMinutesSpinBox_, &QSpinBox::valueChanged, this, [this](int minutes) {
+    defaults_->setValue(SettingsKeys::kRoundingMinutes, minutes);
+    roundingModeComboBox_->setEnabled(minutes > 1);
+  });
+  connect(roundingModeComboBox_, &QComboBox::activated, this, [this] {
+    defaults_->setValue(SettingsKeys::kRoundingMode, roundingModeComboBox_->currentData().toString());
+  });
   // A text edit has no end of editing of its own: its text is stored when it loses the focus.
   billingAddressField_->installEventFilter(this);
   return page;
@@ -269,6 +348,17 @@ void WTPreferencesWindowController::commitBillingDetails() {
     else
       defaults_->setValue(key, text);
   }
+}
+
+void WTPreferencesWindowController::commitCurrency() {
+  const QString code = currencyComboBox_->currentText().trimmed().toUpper();
+  const int index = currencyComboBox_->findData(code);
+  markRefused(currencyComboBox_->lineEdit(), index < 0,
+              tr("Not a currency: type its ISO 4217 code, such as EUR, USD or JPY"));
+  if (index < 0) return;
+  if (currencyComboBox_->currentText() != code) currencyComboBox_->setCurrentIndex(index);
+  if (code != defaults_->stringForKey(SettingsKeys::kCurrency))
+    defaults_->setValue(SettingsKeys::kCurrency, code);
 }
 
 void WTPreferencesWindowController::loadValues() {
@@ -296,6 +386,19 @@ void WTPreferencesWindowController::loadValues() {
   billingAddressField_->setPlainText(defaults_->stringForKey(SettingsKeys::kBillingAddress));
   billingTaxNumberField_->setText(defaults_->stringForKey(SettingsKeys::kBillingTaxNumber));
   billingPaymentTermsField_->setText(defaults_->stringForKey(SettingsKeys::kBillingPaymentTerms));
+
+  const QSignalBlocker currencyBlocker(currencyComboBox_);
+  const QSignalBlocker roundingBlocker(roundingMinutesSpinBox_);
+  const QString currency = defaults_->stringForKey(SettingsKeys::kCurrency).trimmed().toUpper();
+  currencyComboBox_->setCurrentIndex(
+      currencyComboBox_->findData(currency.isEmpty() ? MoneyFormat::localeCurrency() : currency));
+  const qint64 rounding = defaults_->integerForKey(SettingsKeys::kRoundingMinutes);
+  roundingMinutesSpinBox_->setValue(int(std::clamp<qint64>(rounding, 1, roundingMinutesSpinBox_->maximum())));
+  const WTRoundingRule::Mode mode =
+      WTRoundingRule::modeFromName(defaults_->stringForKey(SettingsKeys::kRoundingMode))
+          .value_or(WTRoundingRule::Mode::Nearest);
+  roundingModeComboBox_->setCurrentIndex(roundingModeComboBox_->findData(WTRoundingRule::nameOfMode(mode)));
+  roundingModeComboBox_->setEnabled(roundingMinutesSpinBox_->value() > 1);
 }
 
 void WTPreferencesWindowController::showWindow() {
@@ -394,5 +497,6 @@ void WTPreferencesWindowController::hideEvent(QHideEvent* event) {
   commitServer();
   commitDefaultRate();
   commitBillingDetails();
+  commitCurrency();
   QDialog::hideEvent(event);
 }

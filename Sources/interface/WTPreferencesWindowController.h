@@ -6,6 +6,7 @@
 #include <QUrl>
 
 class QCheckBox;
+class QComboBox;
 class QLabel;
 class QLineEdit;
 class QPlainTextEdit;
@@ -20,7 +21,7 @@ class WTPasswordStore;
 // syncing, the sync status as a light and the way to an account on the server's sign-up page; then the
 // server's address, idle handling, whether starting a timer stops the others, and the default hourly
 // rate. Billing: the user's own details for the head of a report (name, address, tax number, payment
-// terms).
+// terms), and what clients bill by unless they set their own: the currency and the rounding rule.
 //
 // The account is stored only by "Start Sync"; the other settings are stored as they are edited (a text
 // field when editing ends, or when the window closes). One window per application, not modal: make it
@@ -69,6 +70,11 @@ class WTPreferencesWindowController : public QDialog {
   QPlainTextEdit* billingAddressField() const { return billingAddressField_; }
   QLineEdit* billingTaxNumberField() const { return billingTaxNumberField_; }
   QLineEdit* billingPaymentTermsField() const { return billingPaymentTermsField_; }
+  // Editable: an ISO 4217 code typed in any case is taken when ICU knows it, anything else refused.
+  QComboBox* currencyComboBox() const { return currencyComboBox_; }
+  // 1 minute (shown as "None") bills the minutes as they are.
+  QSpinBox* roundingMinutesSpinBox() const { return roundingMinutesSpinBox_; }
+  QComboBox* roundingModeComboBox() const { return roundingModeComboBox_; }
 
  protected:
   void hideEvent(QHideEvent* event) override;
@@ -83,6 +89,8 @@ class WTPreferencesWindowController : public QDialog {
   QWidget* buildBillingPage();
   // Stores the billing details as the fields show them (none for an empty field).
   void commitBillingDetails();
+  // Stores the currency typed or chosen when ICU knows it; marks it refused otherwise.
+  void commitCurrency();
   void updateSignUpButton();
   void passwordDidLoad();
   void updateKeychainNote();
@@ -109,4 +117,7 @@ class WTPreferencesWindowController : public QDialog {
   QPlainTextEdit* billingAddressField_ = nullptr;
   QLineEdit* billingTaxNumberField_ = nullptr;
   QLineEdit* billingPaymentTermsField_ = nullptr;
+  QComboBox* currencyComboBox_ = nullptr;
+  QSpinBox* roundingMinutesSpinBox_ = nullptr;
+  QComboBox* roundingModeComboBox_ = nullptr;
 };

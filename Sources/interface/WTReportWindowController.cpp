@@ -49,11 +49,13 @@ WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWi
     });
     connect(context, &WTObjectContext::objectsDidChange, this, &WTReportWindowController::objectsDidChange);
     if (UserDefaults* defaults = context->userDefaults()) {
-      // A new default rate changes costs without changing a record, so no save follows it; the user's
-      // details show in the report's head.
+      // A new default rate, currency or rounding rule changes what is billed without changing a record,
+      // so no save follows it; the user's details show in the report's head.
       connect(defaults, &UserDefaults::valueChanged, this, [this](const QString& key) {
         static const QLatin1StringView shown[] = {
-            SettingsKeys::kDefaultRate, SettingsKeys::kBillingName, SettingsKeys::kBillingAddress,
+            SettingsKeys::kDefaultRate,      SettingsKeys::kCurrency,
+            SettingsKeys::kRoundingMinutes,  SettingsKeys::kRoundingMode,
+            SettingsKeys::kBillingName,      SettingsKeys::kBillingAddress,
             SettingsKeys::kBillingTaxNumber, SettingsKeys::kBillingPaymentTerms};
         if (std::find(std::begin(shown), std::end(shown), key) != std::end(shown)) refreshWhenSeen();
       });

@@ -1,9 +1,11 @@
 #include "MemoryKeychain.h"
+#include "MoneyFormat.h"
 #include "SyncTestSupport.h"
 #include "UiFixture.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
 
+#include <QComboBox>
 #include <QPlainTextEdit>
 #include <QTabWidget>
 
@@ -199,9 +201,24 @@ TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
 }
 
 // The details for a report's head are stored as each field is left (the address, on several lines, when
-// the focus goes), or when the window closes; an emptied field stores none.
-TEST_F(WTPreferencesWindowTest, TheBillingPageStoresYourDetails) {
+// the focus goes), or when the window closes; an emptied field stores none. The currency is a code ICU
+// knows, in any case; the rounding rule is stored as it is changed.
+TEST_F(WTPreferencesWindowTest, TheBillingPageStoresYourDetailsAndTheBillingDefaults) {
   open();
+  QComboBox* currency = window->currencyComboBox();
+  EXPECT_EQ(std::tuple(currency->currentText(), window->roundingMinutesSpinBox()->text(),
+                       window->roundingModeComboBox()->isEnabled()),
+            std::tuple(MoneyFormat::localeCurrency(), QString("None"), false));
+  for (const auto& [typed, stored, refused] : {std::tuple{"jpy", "JPY", false}, {"EURO", "JPY", true}}) {
+    type(currency->lineEdit(), typed, true);
+    EXPECT_EQ(
+        std::tuple(defaults->stringForKey("WTCurrency"), currency->lineEdit()->property("refused").toBool()),
+        std::tuple(QString(stored), refused))
+        << typed;
+  }
+  window->roundingMinutesSpinBox()->setValue(15);
+  window->roundingModeComboBox()->setCurrentIndex(window->roundingModeComboBox()->findData("up"));
+  emit window->roundingModeComboBox()->activated(window->roundingModeComboBox()->currentIndex());
   window->pages()->setCurrentIndex(window->pages()->indexOf(window->findChild<QWidget*>("billingPage")));
   type(window->billingNameField(), "Ann Smith", true);
   QPlainTextEdit* address = window->billingAddressField();
