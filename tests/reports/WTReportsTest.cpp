@@ -228,7 +228,8 @@ TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
   // What follows a nested loop is guarded by the enclosing loop's variable (an empty loop's end writes).
   const QString text = QStringLiteral(
       "{% for project in projects %}{{ project.name }} {{ project.duration }}m {{ project.cost | decimal }}:"
-      "{% for task in project.tasks %} {{ task.name }} {{ task.duration }}m {{ task.cost | decimal }} "
+      "{% for task in project.tasks %} {{ task.name }} {{ task.items.@count }}/{{ task.children.@count }} "
+      "{{ task.duration }}m {{ task.cost | decimal }} "
       "[{% for item in task.valuableItems %}{{ item.name }};{% /for %}{% if task %}] days{% /if %}"
       "{% for day in task.dailyItems %} {{ day.date | date_format: \"MM-dd\" }}={{ day.duration }}m{% /for %}"
       "{% if task %} months{% /if %}{% for month in task.monthlyItems %} {{ month.date | date_format: \"MM\" "
@@ -238,17 +239,17 @@ TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
       "{{ period.begin | date_format: \"MM-dd\" }}..{{ period.end | date_format: \"MM-dd\" }}{% /if %}");
   const std::pair<const char*, const char*> cases[] = {
       // clang-format off
-      {"2024-03-03..2024-03-03", "Web \"Site\" 135m 135.00: Design 135m 135.00 [Review;Kick \"off\";Edge in;] days "
+      {"2024-03-03..2024-03-03", "Web \"Site\" 135m 135.00: Design 3/1 135m 135.00 [Review;Kick \"off\";Edge in;] days "
                                  "03-03=135m months 03=135.00\ntotal 135.00 client 135.00 03-03..03-03"},
-      {"2024-03-04..2024-03-06", "Web \"Site\" 15m 1,249.50: Design 15m 1,249.50 [Fonts;Edge out;] days 03-04=15m "
-                                 "months 03=1,249.50\nBackend 120m 200.00: API 120m 200.00 [Setup;] days 03-06=120m "
+      {"2024-03-04..2024-03-06", "Web \"Site\" 15m 1,249.50: Design 4/3 15m 1,249.50 [Fonts;Edge out;] days 03-04=15m "
+                                 "months 03=1,249.50\nBackend 120m 200.00: API 1/1 120m 200.00 [Setup;] days 03-06=120m "
                                  "months 03=200.00\ntotal 1,449.50 client 1,449.50 03-04..03-06"},
-      {"last-month", "Web \"Site\" 60m 60.00: Design 60m 60.00 [Sketch;] days 02-10=60m months 02=60.00\n"
+      {"last-month", "Web \"Site\" 60m 60.00: Design 1/1 60m 60.00 [Sketch;] days 02-10=60m months 02=60.00\n"
                      "total 60.00 client 60.00 02-01..02-29"},
       {"2024-01-01..2024-01-31", "total 0.00 client 0.00 01-01..01-31"},
-      {"any", "Web \"Site\" 225m 1,459.50: Design 225m 1,459.50 [Fonts;Edge out;Review;Kick \"off\";Edge in;Eve;"
+      {"any", "Web \"Site\" 225m 1,459.50: Design 9/6 225m 1,459.50 [Fonts;Edge out;Review;Kick \"off\";Edge in;Eve;"
               "Sketch;] days 03-04=15m 03-03=135m 03-02=15m 02-10=60m months 03=1,399.50 02=60.00\nBackend 120m "
-              "200.00: API 120m 200.00 [Setup;] days 03-06=120m months 03=200.00\ntotal 1,659.50 client 1,659.50 "},
+              "200.00: API 1/1 120m 200.00 [Setup;] days 03-06=120m months 03=200.00\ntotal 1,659.50 client 1,659.50 "},
       // clang-format on
   };
   WTReportGenerator generator(projects(), 2);
