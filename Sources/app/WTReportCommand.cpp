@@ -21,7 +21,8 @@ using WTCommandArguments::parse;
 using WTCommandArguments::usage;
 
 constexpr char kReportUsage[] =
-    "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]\n";
+    "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--range RANGE] [--template FILE] "
+    "[--out FILE]\n";
 constexpr char kExportUsage[] =
     "usage: tessal export [--range RANGE] [--project NAME] [--format times|spreadsheet] [--out FILE.csv]\n";
 
@@ -49,10 +50,9 @@ bool reportCommandWritesPDF(const QStringList& arguments) {
 
 int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   QCommandLineParser parser;
-  const QString problem =
-      parse(parser, arguments,
-            {QStringLiteral("project"), QStringLiteral("client"), QStringLiteral("mode"), QStringLiteral("template"),
-             QStringLiteral("out")});
+  const QString problem = parse(parser, arguments,
+                                {QStringLiteral("project"), QStringLiteral("client"), QStringLiteral("mode"),
+                                 QStringLiteral("range"), QStringLiteral("template"), QStringLiteral("out")});
   if (!problem.isEmpty()) return usage(err, kReportUsage, problem);
   const bool byProject = parser.isSet(QStringLiteral("project"));
   if (byProject == parser.isSet(QStringLiteral("client")))
@@ -64,6 +64,10 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
     if (!number || mode < 0 || mode > 3)
       return usage(err, kReportUsage, QStringLiteral("--mode takes 0, 1, 2 or 3"));
   }
+  // The words of the export; the report covers all by default, as the window does.
+  const Result<std::optional<RZDate::Range>> period = WTRangePredicate::boundsForRangeWord(
+      parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("any"));
+  if (!period) return usage(err, kReportUsage, period.error().message);
   const QString outPath = parser.value(QStringLiteral("out"));
   const ReportFormat format = outPath.isEmpty() ? ReportFormat::HTML : formatOf(outPath);
   if (format == ReportFormat::Unknown)
@@ -81,9 +85,11 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
 
   Result<void> written = Result<void>::success();
   if (format == ReportFormat::CSV) {
-    written = WTCSVExport::writeTextAtomically(outPath, WTCSVExport::reportCSV(projects, mode));
+    written =
+        WTCSVExport::writeTextAtomically(outPath, WTCSVExport::reportCSV(projects, mode, period.value()));
   } else {
     WTReportGenerator generator(projects, mode);
+    generator.setPeriod(period.value());
     generator.setLogsErrors(false);  // each is printed below as "error CODE: MESSAGE"
     const WTReport report = generator.render(templatePath);
     if (!report.templateRead) {

@@ -6,9 +6,11 @@
 // The reading commands over the user's store; both work while the desktop copy runs (they open the
 // store read-only and never write it) and need no display.
 //
-//   tessal report (--project NAME | --client NAME) [--mode 0-3] [--template FILE] [--out FILE]
+//   tessal report (--project NAME | --client NAME) [--mode 0-3] [--range RANGE] [--template FILE] [--out
+//   FILE]
 //     The report the report window shows, as HTML on stdout, or written to FILE as HTML (.html, .htm),
-//     PDF (.pdf) or the report's CSV (.csv). A name matching no record, or several, exits 1 naming the
+//     PDF (.pdf) or the report's CSV (.csv), over the billing period RANGE (the export's words; any by
+//     default). A name matching no record, or several, exits 1 naming the
 //     candidates; each template error prints "error CODE: MESSAGE" and exits 1 with nothing written.
 //
 //   tessal export [--range WORD] [--project NAME] [--out FILE]

@@ -177,6 +177,7 @@ int runTemplateCommand(const QStringList& arguments, QTextStream& out, QTextStre
   engine.setDelegate(&printer);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
+  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
   QString result;
   try {
     result = engine.processTemplateInFileAtPath(templatePath, variables);

@@ -23,6 +23,12 @@ inline constexpr QLatin1StringView kRoundingMinutes{"WTRoundingMinutes"};
 inline constexpr QLatin1StringView kRoundingMode{"WTRoundingMode"};
 // Registered as "h" at start; nothing reads it.
 inline constexpr QLatin1StringView kInvoiceUnit{"wtInvoiceUnit"};
+// The user's own details for the head of a report (Preferences › Billing): texts, the address on
+// several lines.
+inline constexpr QLatin1StringView kBillingName{"WTBillingName"};
+inline constexpr QLatin1StringView kBillingAddress{"WTBillingAddress"};
+inline constexpr QLatin1StringView kBillingTaxNumber{"WTBillingTaxNumber"};
+inline constexpr QLatin1StringView kBillingPaymentTerms{"WTBillingPaymentTerms"};
 
 // The report's custom range (registered as the last month) and the range sheet's own pair.
 inline constexpr QLatin1StringView kCustomRangeBegin{"WTCustomRangeBegin"};

@@ -9,18 +9,29 @@
 #include "WTPasswordStore.h"
 #include "WTProject.h"
 #include "WTRateField.h"
+#include "WTRoundingRule.h"
 
 #include <QCheckBox>
+#include <QComboBox>
 #include <QDesktopServices>
 #include <QDialogButtonBox>
+#include <QEvent>
 #include <QFormLayout>
 #include <QGroupBox>
 #include <QHBoxLayout>
 #include <QLabel>
 #include <QLineEdit>
+#include <QPlainTextEdit>
 #include <QPushButton>
 #include <QSpinBox>
+#include <QTabWidget>
 #include <QVBoxLayout>
+
+#include <unicode/ucurr.h>
+#include <unicode/uenum.h>
+
+#include <algorithm>
+#include <memory>
 
 namespace {
 
@@ -28,6 +39,29 @@ constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
 // What the idle check uses when no usable number of minutes is set.
 constexpr int kIdleMinutesWhenUnset = 5;
 constexpr QSize kLightSize(16, 16);
+
+// The ISO 4217 codes in use today, as ICU knows them, each with its name in the user's language.
+QList<std::pair<QString, QString>> currencies() {
+  QList<std::pair<QString, QString>> found;
+  UErrorCode status = U_ZERO_ERROR;
+  const std::unique_ptr<UEnumeration, decltype(&uenum_close)> codes(
+      ucurr_openISOCurrencies(UCURR_COMMON | UCURR_NON_DEPRECATED, &status), &uenum_close);
+  if (U_FAILURE(status)) return found;
+  int32_t length = 0;
+  while (const UChar* code = uenum_unext(codes.get(), &length, &status)) {
+    if (U_FAILURE(status)) break;
+    UBool isChoiceFormat = false;
+    int32_t nameLength = 0;
+    UErrorCode nameStatus = U_ZERO_ERROR;
+    const UChar* name =
+        ucurr_getName(code, nullptr, UCURR_LONG_NAME, &isChoiceFormat, &nameLength, &nameStatus);
+    found.append(
+        {QString(reinterpret_cast<const QChar*>(code), length),
+         U_SUCCESS(nameStatus) ? QString(reinterpret_cast<const QChar*>(name), nameLength) : QString()});
+  }
+  std::sort(found.begin(), found.end());
+  return found;
+}
 
 void markRefused(QLineEdit* field, bool refused, const QString& reason) {
   field->setProperty("refused", refused);
@@ -87,12 +121,17 @@ WTPreferencesWindowController::~WTPreferencesWindowController() {
   // Hiding ends the edit in the focused field, which stores it. That has to happen while this object is
   // still whole: left to QDialog's destructor, the field's editingFinished would reach a half-destroyed one.
   hide();
+  billingAddressField_->removeEventFilter(this);
   for (QObject* child : findChildren<QObject*>())
     disconnect(child, nullptr, this, nullptr);
 }
 
 void WTPreferencesWindowController::buildInterface() {
-  auto* layout = new QVBoxLayout(this);
+  auto* windowLayout = new QVBoxLayout(this);
+  pages_ = new QTabWidget(this);
+  pages_->setObjectName(QStringLiteral("preferencesPages"));
+  auto* general = new QWidget(pages_);
+  auto* layout = new QVBoxLayout(general);
 
   // The account.
   auto* account = new QGroupBox(tr("Sync account"), this);
@@ -168,10 +207,14 @@ void WTPreferencesWindowController::buildInterface() {
       defaultRateField_->fontMetrics().horizontalAdvance(defaultRateField_->placeholderText()) + 16);
   ratesForm->addRow(tr("Default hourly rate:"), defaultRateField_);
   layout->addWidget(rates);
+  layout->addStretch(1);
+  pages_->addTab(general, tr("General"));
+  pages_->addTab(buildBillingPage(), tr("Billing"));
+  windowLayout->addWidget(pages_);
 
   auto* buttons = new QDialogButtonBox(QDialogButtonBox::Close, this);
   buttons->button(QDialogButtonBox::Close)->setObjectName(QStringLiteral("closeButton"));
-  layout->addWidget(buttons);
+  windowLayout->addWidget(buttons);
 
   // Return in a text field ends its editing; only in the password field does it also start syncing.
   for (QPushButton* button : findChildren<QPushButton*>()) {
@@ -202,6 +245,122 @@ void WTPreferencesWindowController::buildInterface() {
           [this] { WTRateField::setRefused(defaultRateField_, {}); });
 }
 
+QWidget* WTPreferencesWindowController::buildBillingPage() {
+  auto* page = new QWidget(pages_);
+  page->setObjectName(QStringLiteral("billingPage"));
+  auto* layout = new QVBoxLayout(page);
+
+  auto* details = new QGroupBox(tr("Your details"), page);
+  auto* form = new QFormLayout(details);
+  auto lineField = [&](const char* name, const QString& label, const QString& placeholder) {
+    auto* field = new QLineEdit(details);
+    field->setObjectName(QLatin1String(name));
+    field->setPlaceholderText(placeholder);
+    form->addRow(label, field);
+    connect(field, &QLineEdit::editingFinished, this, &WTPreferencesWindowController::commitBillingDetails);
+    return field;
+  };
+  billingNameField_ = lineField("billingNameField", tr("Name:"), tr("Your name or your business's"));
+  billingAddressField_ = new QPlainTextEdit(details);
+  billingAddressField_->setObjectName(QStringLiteral("billingAddressField"));
+  billingAddressField_->setPlaceholderText(tr("Street\nPostcode and town\nCountry"));
+  billingAddressField_->setTabChangesFocus(true);
+  billingAddressField_->setFixedHeight(billingAddressField_->fontMetrics().lineSpacing() * 4 + 12);
+  form->addRow(tr("Address:"), billingAddressField_);
+  billingTaxNumberField_ =
+      lineField("billingTaxNumberField", tr("Tax number:"), tr("VAT or tax identification"));
+  billingPaymentTermsField_ =
+      lineField("billingPaymentTermsField", tr("Payment terms:"), tr("Payable within 30 days"));
+  auto* note = new QLabel(tr("Shown at the head of your reports."), details);
+  note->setWordWrap(true);
+  form->addRow(QString(), note);
+  layout->addWidget(details);
+
+  // What a client bills by when it sets nothing of its own.
+  auto* money = new QGroupBox(tr("Billing defaults"), page);
+  auto* moneyForm = new QFormLayout(money);
+  currencyComboBox_ = new QComboBox(money);
+  currencyComboBox_->setObjectName(QStringLiteral("currencyComboBox"));
+  currencyComboBox_->setEditable(true);
+  currencyComboBox_->setInsertPolicy(QComboBox::NoInsert);
+  for (const auto& [code, name] : currencies()) {
+    currencyComboBox_->addItem(code, code);
+    currencyComboBox_->setItemData(currencyComboBox_->count() - 1, name, Qt::ToolTipRole);
+  }
+  currencyComboBox_->setToolTip(
+      tr("The ISO 4217 code of the currency your clients are billed in, unless a "
+         "client has its own"));
+  moneyForm->addRow(tr("Currency:"), currencyComboBox_);
+  auto* roundingRow = new QHBoxLayout;
+  roundingMinutesSpinBox_ = new QSpinBox(money);
+  roundingMinutesSpinBox_->setObjectName(QStringLiteral("roundingMinutesSpinBox"));
+  roundingMinutesSpinBox_->setRange(1, 24 * 60);
+  roundingMinutesSpinBox_->setSpecialValueText(tr("None"));
+  roundingMinutesSpinBox_->setSuffix(tr(" min"));
+  roundingMinutesSpinBox_->setKeyboardTracking(false);
+  roundingMinutesSpinBox_->setAccessibleName(tr("Rounding minutes"));
+  roundingModeComboBox_ = new QComboBox(money);
+  roundingModeComboBox_->setObjectName(QStringLiteral("roundingModeComboBox"));
+  roundingModeComboBox_->addItem(tr("Up"), QStringLiteral("up"));
+  roundingModeComboBox_->addItem(tr("To the nearest"), QStringLiteral("nearest"));
+  roundingModeComboBox_->addItem(tr("Down"), QStringLiteral("down"));
+  roundingModeComboBox_->setAccessibleName(tr("Rounding mode"));
+  roundingRow->addWidget(roundingMinutesSpinBox_);
+  roundingRow->addWidget(roundingModeComboBox_);
+  roundingRow->addStretch(1);
+  moneyForm->addRow(tr("Round time entries to:"), roundingRow);
+  layout->addWidget(money);
+  layout->addStretch(1);
+
+  connect(currencyComboBox_->lineEdit(), &QLineEdit::editingFinished, this,
+          &WTPreferencesWindowController::commitCurrency);
+  connect(currencyComboBox_, &QComboBox::activated, this, &WTPreferencesWindowController::commitCurrency);
+  connect(currencyComboBox_->lineEdit(), &QLineEdit::textEdited, this,
+          [this] { markRefused(currencyComboBox_->lineEdit(), false, {}); });
+  connect(roundingMinutesSpinBox_, &QSpinBox::valueChanged, this, [this](int minutes) {
+    defaults_->setValue(SettingsKeys::kRoundingMinutes, minutes);
+    roundingModeComboBox_->setEnabled(minutes > 1);
+  });
+  connect(roundingModeComboBox_, &QComboBox::activated, this, [this] {
+    defaults_->setValue(SettingsKeys::kRoundingMode, roundingModeComboBox_->currentData().toString());
+  });
+  // A text edit has no end of editing of its own: its text is stored when it loses the focus.
+  billingAddressField_->installEventFilter(this);
+  return page;
+}
+
+bool WTPreferencesWindowController::eventFilter(QObject* watched, QEvent* event) {
+  if (watched == billingAddressField_ && event->type() == QEvent::FocusOut) commitBillingDetails();
+  return QDialog::eventFilter(watched, event);
+}
+
+void WTPreferencesWindowController::commitBillingDetails() {
+  const std::pair<QLatin1StringView, QString> fields[] = {
+      {SettingsKeys::kBillingName, billingNameField_->text()},
+      {SettingsKeys::kBillingAddress, billingAddressField_->toPlainText()},
+      {SettingsKeys::kBillingTaxNumber, billingTaxNumberField_->text()},
+      {SettingsKeys::kBillingPaymentTerms, billingPaymentTermsField_->text()}};
+  for (const auto& [key, typed] : fields) {
+    const QString text = typed.trimmed();
+    if (text == defaults_->stringForKey(key) && defaults_->hasStoredValue(key) == !text.isEmpty()) continue;
+    if (text.isEmpty())
+      defaults_->removeValue(key);
+    else
+      defaults_->setValue(key, text);
+  }
+}
+
+void WTPreferencesWindowController::commitCurrency() {
+  const QString code = currencyComboBox_->currentText().trimmed().toUpper();
+  const int index = currencyComboBox_->findData(code);
+  markRefused(currencyComboBox_->lineEdit(), index < 0,
+              tr("Not a currency: type its ISO 4217 code, such as EUR, USD or JPY"));
+  if (index < 0) return;
+  if (currencyComboBox_->currentText() != code) currencyComboBox_->setCurrentIndex(index);
+  if (code != defaults_->stringForKey(SettingsKeys::kCurrency))
+    defaults_->setValue(SettingsKeys::kCurrency, code);
+}
+
 void WTPreferencesWindowController::loadValues() {
   // The account shows only when it is complete.
   const QString password = passwords_->password();
@@ -223,6 +382,23 @@ void WTPreferencesWindowController::loadValues() {
   stopsOtherTimesCheckBox_->setChecked(defaults_->boolForKey(SettingsKeys::kStopsOtherTimes));
   const std::optional<Decimal> rate = defaults_->decimalForKey(SettingsKeys::kDefaultRate);
   defaultRateField_->setText(rate ? WTRateField::text(*rate) : QString());
+  billingNameField_->setText(defaults_->stringForKey(SettingsKeys::kBillingName));
+  billingAddressField_->setPlainText(defaults_->stringForKey(SettingsKeys::kBillingAddress));
+  billingTaxNumberField_->setText(defaults_->stringForKey(SettingsKeys::kBillingTaxNumber));
+  billingPaymentTermsField_->setText(defaults_->stringForKey(SettingsKeys::kBillingPaymentTerms));
+
+  const QSignalBlocker currencyBlocker(currencyComboBox_);
+  const QSignalBlocker roundingBlocker(roundingMinutesSpinBox_);
+  const QString currency = defaults_->stringForKey(SettingsKeys::kCurrency).trimmed().toUpper();
+  currencyComboBox_->setCurrentIndex(
+      currencyComboBox_->findData(currency.isEmpty() ? MoneyFormat::localeCurrency() : currency));
+  const qint64 rounding = defaults_->integerForKey(SettingsKeys::kRoundingMinutes);
+  roundingMinutesSpinBox_->setValue(int(std::clamp<qint64>(rounding, 1, roundingMinutesSpinBox_->maximum())));
+  const WTRoundingRule::Mode mode =
+      WTRoundingRule::modeFromName(defaults_->stringForKey(SettingsKeys::kRoundingMode))
+          .value_or(WTRoundingRule::Mode::Nearest);
+  roundingModeComboBox_->setCurrentIndex(roundingModeComboBox_->findData(WTRoundingRule::nameOfMode(mode)));
+  roundingModeComboBox_->setEnabled(roundingMinutesSpinBox_->value() > 1);
 }
 
 void WTPreferencesWindowController::showWindow() {
@@ -320,5 +496,7 @@ void WTPreferencesWindowController::hideEvent(QHideEvent* event) {
   // Closing the window ends the editing of the field in hand.
   commitServer();
   commitDefaultRate();
+  commitBillingDetails();
+  commitCurrency();
   QDialog::hideEvent(event);
 }

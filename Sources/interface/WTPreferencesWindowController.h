@@ -6,18 +6,22 @@
 #include <QUrl>
 
 class QCheckBox;
+class QComboBox;
 class QLabel;
 class QLineEdit;
+class QPlainTextEdit;
 class QPushButton;
 class QSpinBox;
+class QTabWidget;
 class RZSyncManager;
 class UserDefaults;
 class WTPasswordStore;
 
-// The preferences window: the sync account (e-mail address and password), the button that starts
+// The preferences window. General: the sync account (e-mail address and password), the button that starts
 // syncing, the sync status as a light and the way to an account on the server's sign-up page; then the
 // server's address, idle handling, whether starting a timer stops the others, and the default hourly
-// rate.
+// rate. Billing: the user's own details for the head of a report (name, address, tax number, payment
+// terms), and what clients bill by unless they set their own: the currency and the rounding rule.
 //
 // The account is stored only by "Start Sync"; the other settings are stored as they are edited (a text
 // field when editing ends, or when the window closes). One window per application, not modal: make it
@@ -61,9 +65,20 @@ class WTPreferencesWindowController : public QDialog {
   QSpinBox* idleTimeSpinBox() const { return idleTimeSpinBox_; }
   QCheckBox* stopsOtherTimesCheckBox() const { return stopsOtherTimesCheckBox_; }
   QLineEdit* defaultRateField() const { return defaultRateField_; }
+  QTabWidget* pages() const { return pages_; }
+  QLineEdit* billingNameField() const { return billingNameField_; }
+  QPlainTextEdit* billingAddressField() const { return billingAddressField_; }
+  QLineEdit* billingTaxNumberField() const { return billingTaxNumberField_; }
+  QLineEdit* billingPaymentTermsField() const { return billingPaymentTermsField_; }
+  // Editable: an ISO 4217 code typed in any case is taken when ICU knows it, anything else refused.
+  QComboBox* currencyComboBox() const { return currencyComboBox_; }
+  // 1 minute (shown as "None") bills the minutes as they are.
+  QSpinBox* roundingMinutesSpinBox() const { return roundingMinutesSpinBox_; }
+  QComboBox* roundingModeComboBox() const { return roundingModeComboBox_; }
 
  protected:
   void hideEvent(QHideEvent* event) override;
+  bool eventFilter(QObject* watched, QEvent* event) override;
 
  private:
   void buildInterface();
@@ -71,6 +86,11 @@ class WTPreferencesWindowController : public QDialog {
   // Stores the text fields' values when they are acceptable; a refused one is marked and not stored.
   void commitServer();
   void commitDefaultRate();
+  QWidget* buildBillingPage();
+  // Stores the billing details as the fields show them (none for an empty field).
+  void commitBillingDetails();
+  // Stores the currency typed or chosen when ICU knows it; marks it refused otherwise.
+  void commitCurrency();
   void updateSignUpButton();
   void passwordDidLoad();
   void updateKeychainNote();
@@ -92,4 +112,12 @@ class WTPreferencesWindowController : public QDialog {
   QSpinBox* idleTimeSpinBox_ = nullptr;
   QCheckBox* stopsOtherTimesCheckBox_ = nullptr;
   QLineEdit* defaultRateField_ = nullptr;
+  QTabWidget* pages_ = nullptr;
+  QLineEdit* billingNameField_ = nullptr;
+  QPlainTextEdit* billingAddressField_ = nullptr;
+  QLineEdit* billingTaxNumberField_ = nullptr;
+  QLineEdit* billingPaymentTermsField_ = nullptr;
+  QComboBox* currencyComboBox_ = nullptr;
+  QSpinBox* roundingMinutesSpinBox_ = nullptr;
+  QComboBox* roundingModeComboBox_ = nullptr;
 };

@@ -7,6 +7,7 @@
 #include "WTItem.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
+#include "WTRangePopUpButton.h"
 #include "WTReportDocumentBuilder.h"
 #include "WTReportPDF.h"
 #include "WTSaveLocation.h"
@@ -48,9 +49,15 @@ WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWi
     });
     connect(context, &WTObjectContext::objectsDidChange, this, &WTReportWindowController::objectsDidChange);
     if (UserDefaults* defaults = context->userDefaults()) {
-      // A new default rate changes costs without changing a record, so no save follows it.
+      // A new default rate, currency or rounding rule changes what is billed without changing a record,
+      // so no save follows it; the user's details show in the report's head.
       connect(defaults, &UserDefaults::valueChanged, this, [this](const QString& key) {
-        if (key == SettingsKeys::kDefaultRate) refreshWhenSeen();
+        static const QLatin1StringView shown[] = {
+            SettingsKeys::kDefaultRate,      SettingsKeys::kCurrency,
+            SettingsKeys::kRoundingMinutes,  SettingsKeys::kRoundingMode,
+            SettingsKeys::kBillingName,      SettingsKeys::kBillingAddress,
+            SettingsKeys::kBillingTaxNumber, SettingsKeys::kBillingPaymentTerms};
+        if (std::find(std::begin(shown), std::end(shown), key) != std::end(shown)) refreshWhenSeen();
       });
     }
     connect(context, &WTObjectContext::didSave, this, [this] {
@@ -114,6 +121,12 @@ void WTReportWindowController::buildInterface() {
   }
   segments_->button(0)->setChecked(true);
   connect(segments_, &QButtonGroup::idClicked, this, [this] { refreshWebContent(); });
+  barLayout->addSpacing(12);
+  rangeButton_ = new WTRangePopUpButton(context_ ? context_->userDefaults() : nullptr, bar);
+  rangeButton_->setToolTip(tr("The period the report covers"));
+  rangeButton_->selectTag(WTRangePredicate::AnyDate);
+  connect(rangeButton_, &WTRangePopUpButton::rangeChosen, this, [this] { refreshWebContent(); });
+  barLayout->addWidget(rangeButton_);
   barLayout->addStretch(1);
   barLayout->setSpacing(6);
 
@@ -279,6 +292,11 @@ void WTReportWindowController::changeEvent(QEvent* event) {
   }
 }
 
+std::optional<RZDate::Range> WTReportWindowController::period() const {
+  return WTRangePredicate::boundsForTag(rangeButton_->selectedTag(), rangeButton_->customRangeBegin(),
+                                        rangeButton_->customRangeEnd());
+}
+
 int WTReportWindowController::mode() const {
   return segments_->checkedId();
 }
@@ -302,6 +320,7 @@ void WTReportWindowController::refreshWebContent() {
   renderWhenSeen_ = false;
   generator_.setProjects(liveProjects());
   generator_.setMode(mode());
+  generator_.setPeriod(period());
   const WTReport report = generator_.render();
   html_ = report.html;
   showTemplateErrors(report);
@@ -375,7 +394,7 @@ void WTReportWindowController::watchUserTemplate() {
 }
 
 Result<void> WTReportWindowController::exportCSVToFile(const QString& path) const {
-  return WTCSVExport::writeTextAtomically(path, WTCSVExport::reportCSV(liveProjects(), mode()));
+  return WTCSVExport::writeTextAtomically(path, WTCSVExport::reportCSV(liveProjects(), mode(), period()));
 }
 
 Result<void> WTReportWindowController::saveHTMLToFile(const QString& path) const {

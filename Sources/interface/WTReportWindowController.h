@@ -19,11 +19,13 @@ class WTClient;
 class WTObject;
 class WTObjectContext;
 class WTProject;
+class WTRangePopUpButton;
 class WTReportDocumentBuilder;
 
 // The report of a set of projects, as the client would receive it: the report template rendered to HTML
-// at one of four levels of detail (whole tasks, every item with a value, items by day, items by month),
-// saved as HTML or PDF, printed, or exported as the report's own CSV.
+// at one of four levels of detail (whole tasks, every item with a value, items by day, items by month)
+// over a billing period chosen as the export chooses its range (any date by default), saved as HTML or
+// PDF, printed, or exported as the report's own CSV.
 //
 // The report follows the data: a save of the store that changed something the report shows renders it
 // again, keeping the place the reader scrolled to, and so do a new default rate and a change to the user's
@@ -53,6 +55,10 @@ class WTReportWindowController : public QWidget {
   int mode() const;
   void setMode(int mode);
 
+  // The billing period chosen, read at the present instant; none for "Any date" (and for a custom range
+  // without both dates).
+  std::optional<RZDate::Range> period() const;
+
   // Renders again and shows the result, keeping the scroll position.
   void refreshWebContent();
   // Whether a long report is still being read into a document for the view.
@@ -61,6 +67,7 @@ class WTReportWindowController : public QWidget {
   QString html() const { return html_; }
   QTextBrowser* webView() const { return webView_; }
   QButtonGroup* segmentedControl() const { return segments_; }
+  WTRangePopUpButton* rangeButton() const { return rangeButton_; }
   // The bar naming the last render's first template error; hidden when there was none.
   QLabel* errorBar() const { return errorBar_; }
 
@@ -120,6 +127,7 @@ class WTReportWindowController : public QWidget {
   QTextBrowser* webView_ = nullptr;
   WTReportDocumentBuilder* documentBuilder_ = nullptr;
   QButtonGroup* segments_ = nullptr;
+  WTRangePopUpButton* rangeButton_ = nullptr;
   QLabel* errorBar_ = nullptr;
   QFileSystemWatcher* templateWatcher_ = nullptr;
   WTSaveLocationChooser chooseSaveLocation_;

@@ -70,26 +70,30 @@ WTItemPredicate predicateForBounds(const RZDate::Range& bounds) {
   };
 }
 
+std::optional<RZDate::Range> boundsForTag(int tag, std::optional<Date> customBegin,
+                                          std::optional<Date> customEnd) {
+  if (tag == Custom) {
+    if (!customBegin || !customEnd) return std::nullopt;
+    return RZDate::Range{RZDate::midnight(*customBegin), RZDate::midnight(RZDate::tomorrow(*customEnd))};
+  }
+  return rangeForTag(tag);
+}
+
 WTItemPredicate predicateForTag(int tag, std::optional<Date> customBegin, std::optional<Date> customEnd) {
   if (tag == AnyDate) return [](const WTItem*) { return true; };
-  if (tag == Custom) {
-    if (!customBegin || !customEnd) return {};
-    return predicateForBounds(
-        {RZDate::midnight(*customBegin), RZDate::midnight(RZDate::tomorrow(*customEnd))});
-  }
-  const std::optional<RZDate::Range> bounds = rangeForTag(tag);
+  const std::optional<RZDate::Range> bounds = boundsForTag(tag, customBegin, customEnd);
   if (!bounds) return {};
   return predicateForBounds(*bounds);
 }
 
-Result<WTItemPredicate> predicateForRangeWord(const QString& word) {
+Result<std::optional<RZDate::Range>> boundsForRangeWord(const QString& word) {
   static const QStringList words = {QStringLiteral("today"),      QStringLiteral("yesterday"),
                                     QStringLiteral("this-week"),  QStringLiteral("last-week"),
                                     QStringLiteral("this-month"), QStringLiteral("last-month"),
                                     QStringLiteral("this-year"),  QStringLiteral("last-year")};
   const qsizetype index = words.indexOf(word);
-  if (index >= 0) return predicateForTag(int(index));
-  if (word == QLatin1String("any")) return predicateForTag(AnyDate);
+  if (index >= 0) return boundsForTag(int(index));
+  if (word == QLatin1String("any")) return std::optional<RZDate::Range>();
   static const QRegularExpression custom(
       QStringLiteral("^(\\d{4}-\\d{2}-\\d{2})\\.\\.(\\d{4}-\\d{2}-\\d{2})$"));
   const QRegularExpressionMatch match = custom.match(word);
@@ -98,11 +102,17 @@ Result<WTItemPredicate> predicateForRangeWord(const QString& word) {
     const std::optional<Date> end = localDay(match.captured(2));
     if (!begin || !end) return Error{1, QStringLiteral("%1: not a date in the calendar").arg(word)};
     if (*end < *begin) return Error{1, QStringLiteral("%1: the range ends before it begins").arg(word)};
-    return predicateForTag(Custom, begin, end);
+    return boundsForTag(Custom, begin, end);
   }
   return Error{1, QStringLiteral("%1: not a range (today, yesterday, this-week, last-week, this-month, "
                                  "last-month, this-year, last-year, any or YYYY-MM-DD..YYYY-MM-DD)")
                       .arg(word)};
+}
+
+Result<WTItemPredicate> predicateForRangeWord(const QString& word) {
+  const Result<std::optional<RZDate::Range>> bounds = boundsForRangeWord(word);
+  if (!bounds) return bounds.error();
+  return bounds.value() ? predicateForBounds(*bounds.value()) : predicateForTag(AnyDate);
 }
 
 QList<WTTime*> timesMatching(const WTObjectContext& context, const WTItemPredicate& predicate,

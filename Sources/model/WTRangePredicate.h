@@ -36,6 +36,15 @@ enum Tag {
   AnyDate = 21,
 };
 
+// The bounds of a menu tag, read at the present instant: the start of the range and the start of the
+// following period (Custom: midnight of `customBegin` to midnight of the day after `customEnd`). None
+// for AnyDate, an unknown tag, and Custom without both dates.
+std::optional<RZDate::Range> boundsForTag(int tag, std::optional<Date> customBegin = {},
+                                          std::optional<Date> customEnd = {});
+
+// The bounds of a range word of the command line (see predicateForRangeWord); none for "any".
+Result<std::optional<RZDate::Range>> boundsForRangeWord(const QString& word);
+
 // The predicate of the items whose dates lie in [bounds[0], bounds[1]], both included.
 WTItemPredicate predicateForBounds(const RZDate::Range& bounds);
 

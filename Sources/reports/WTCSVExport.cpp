@@ -206,20 +206,26 @@ QString escapedString(const QVariant& value) {
   return result;
 }
 
-QString reportCSV(const QList<WTProject*>& projects, int mode) {
+QString reportCSV(const QList<WTProject*>& projects, int mode, const std::optional<RZDate::Range>& period) {
   static const QString patterns[] = {QString(), QStringLiteral("yyyy-MM-dd HH:mm"),
                                      QStringLiteral("yyyy-MM-dd"), QStringLiteral("yyyy-MM")};
+  static const QString lists[] = {QString(), QStringLiteral("valuableItems"), QStringLiteral("dailyItems"),
+                                  QStringLiteral("monthlyItems")};
   const QString pattern = mode >= 0 && mode <= 3 ? patterns[mode] : QString();
   QString out;
-  WTReportGenerator generator;
-  for (const WTProject* project : projects) {
-    for (WTTask* task : project->tasks()) {
+  WTReportGenerator generator(projects, mode);
+  generator.setPeriod(period);
+  // What the template receives: the records, or their views over the period.
+  for (const QVariant& project : generator.variables().value(QStringLiteral("projects")).toList()) {
+    for (const QVariant& task : KeyPath::valueForKeyPath(project, u"tasks").toList()) {
       if (mode == 0) {
-        appendQuotedLine(out,
-                         {project->name(), task->name(), DurationText::stringWithMinutes(task->duration()),
-                          MoneyFormat::format(task->cost())});
+        appendQuotedLine(out, {text(KeyPath::valueForKeyPath(project, u"name")),
+                               text(KeyPath::valueForKeyPath(task, u"name")),
+                               minutes(KeyPath::valueForKeyPath(task, u"duration")),
+                               money(KeyPath::valueForKeyPath(task, u"cost"))});
       }
-      const QVariant items = generator.filteredItemsForTask(task, mode);
+      const QVariant items =
+          mode >= 1 && mode <= 3 ? KeyPath::valueForKeyPath(task, lists[mode]) : QVariant();
       for (const QVariant& entry : items.toList()) {
         const QVariant date = KeyPath::valueForKeyPath(entry, u"date");
         bool ok = false;

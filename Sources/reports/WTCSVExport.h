@@ -27,7 +27,9 @@ QString escapedString(const QVariant& text);
 // The report's CSV at `mode` 0–3: at 0 one line per task (project, task, duration, cost); at 1–3 one line
 // per entry of the report's item lists (project, task, date, duration, cost), dated "yyyy-MM-dd HH:mm",
 // "yyyy-MM-dd" or "yyyy-MM". Projects in the given order, tasks in their own. Empty without projects.
-QString reportCSV(const QList<WTProject*>& projects, int mode);
+// With a `period`, the report's lines over it (see WTReportGenerator::setPeriod).
+QString reportCSV(const QList<WTProject*>& projects, int mode,
+                  const std::optional<RZDate::Range>& period = {});
 
 // Seven columns per entry (project, task, task rate, name, start and end as short dates, minutes),
 // sorted by project name, task title, flat period start and start time.

@@ -2,8 +2,12 @@
 
 #include "Decimal.h"
 #include "DurationText.h"
+#include "GXTemplateEngine.h"
 #include "GXTemplateValue.h"
 #include "MoneyFormat.h"
+
+#include <algorithm>
+#include <optional>
 
 QStringList WTReportFilters::filters() const {
   return {QStringLiteral("digiclock"), QStringLiteral("decimal")};
@@ -23,4 +27,34 @@ QVariant WTReportFilters::filterInvoked(const QString& filter, const QStringList
     return MoneyFormat::format(*number);
   }
   return {};
+}
+
+namespace {
+
+// A value fit for a money filter: a number, not a text that reads as one.
+std::optional<Decimal> number(const QVariant& value) {
+  if (value.typeId() == QMetaType::QString || !GXTemplateValue::answersIntValue(value)) return std::nullopt;
+  return Decimal::fromVariant(value);
+}
+
+bool isCurrencyCode(const QString& text) {
+  return text.size() == 3 && std::all_of(text.begin(), text.end(), [](QChar c) { return c >= u'A' && c <= u'Z'; });
+}
+
+}  // namespace
+
+QStringList WTMoneyFilter::filters() const {
+  return {QStringLiteral("money")};
+}
+
+QVariant WTMoneyFilter::filterInvoked(const QString& filter, const QStringList& args, const QVariant& value) {
+  if (filter != QLatin1String("money")) return {};
+  const std::optional<Decimal> amount = number(value);
+  if (!amount) return {};
+  QString currency;
+  if (!args.isEmpty()) {
+    const QVariant named = engine_ ? engine_->valueForVariable(args.first()) : QVariant();
+    currency = GXTemplateValue::isNil(named) ? args.first() : GXTemplateValue::description(named);
+  }
+  return isCurrencyCode(currency) ? MoneyFormat::format(*amount, currency) : MoneyFormat::format(*amount);
 }

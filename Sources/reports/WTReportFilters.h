@@ -11,3 +11,21 @@ class WTReportFilters : public GXTemplateFilter {
   QStringList filters() const override;
   QVariant filterInvoked(const QString& filter, const QStringList& args, const QVariant& value) override;
 };
+
+class GXTemplateEngine;
+
+// "money: CURRENCY": a number as an amount of CURRENCY, in the user's locale with the currency's minor
+// unit (none for JPY, three for KWD) and no sign. CURRENCY is the key path of a variable of the run
+// (`{{ task.billedCost | money: task.billingCurrency }}`) or an ISO 4217 code as written (`money: EUR`);
+// without one, or when the variable has no value, the amount gets two places, as "decimal" writes it.
+// Anything but a number gives no value. Loaded on each engine that renders a report; the engine must
+// outlive the filter's use.
+class WTMoneyFilter : public GXTemplateFilter {
+ public:
+  explicit WTMoneyFilter(GXTemplateEngine* engine) : engine_(engine) {}
+  QStringList filters() const override;
+  QVariant filterInvoked(const QString& filter, const QStringList& args, const QVariant& value) override;
+
+ private:
+  GXTemplateEngine* engine_;
+};

@@ -3,15 +3,19 @@
 #include "GXTemplateEngine.h"
 #include "ICUTemplateMatcher.h"
 #include "KeyPath.h"
+#include "SettingsKeys.h"
 #include "TessalLogging.h"
+#include "UserDefaults.h"
 #include "WTClient.h"
 #include "WTHTMLFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTItemKindFilter.h"
+#include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTReportFilters.h"
 #include "WTReportLevelMarker.h"
+#include "WTReportPeriod.h"
 #include "WTTask.h"
 
 #include <QDir>
@@ -47,44 +51,99 @@ class ErrorCollector : public GXTemplateEngineDelegate {
 
 }  // namespace
 
+// The report's client as the template reads it: an address that is blank is none, so the head's
+// `{% if client.address %}` holds only for a client with an address (a template takes any text, even an
+// empty one, for true). Every other key is the client's own.
+class WTReportGenerator::ClientVariable final : public KeyValueCoding {
+ public:
+  explicit ClientVariable(const KeyValueCoding* client) : client_(client) {}
+  QVariant valueForKey(const QString& key) const override {
+    QVariant value = client_->valueForKey(key);
+    if (key == QLatin1String("address") && value.toString().trimmed().isEmpty()) return {};
+    return value;
+  }
+
+ private:
+  const KeyValueCoding* client_;
+};
+
+WTReportGenerator::WTReportGenerator() = default;
+
+WTReportGenerator::WTReportGenerator(QList<WTProject*> projects, int mode)
+    : projects_(std::move(projects)), mode_(mode) {}
+
 WTReportGenerator::~WTReportGenerator() = default;
 
+void WTReportGenerator::setPeriod(const std::optional<RZDate::Range>& period) {
+  period_ = period;
+  periodViews_.reset();
+}
+
+WTReportPeriod& WTReportGenerator::periodViews() const {
+  if (!periodViews_) periodViews_ = std::make_unique<WTReportPeriod>(*period_);
+  return *periodViews_;
+}
+
 QVariantMap WTReportGenerator::variables() const {
-  QVariantList projects;
-  QVariant client;
+  WTClient* client = nullptr;  // any one project's
   for (WTProject* project : projects_) {
-    projects.append(KeyPath::variantFromObject(project));
-    if (project->client()) client = KeyPath::variantFromObject(project->client());
+    if (project->client()) client = project->client();
   }
-  return {{QStringLiteral("client"), client},
+  QVariantList projects;
+  const KeyValueCoding* clientRecord = client;
+  if (period_) {
+    periodViews_.reset();  // the records may have changed since the last render
+    WTReportPeriod& views = periodViews();
+    for (WTProject* project : projects_) {
+      if (const KeyValueCoding* view = views.viewOfProject(project))
+        projects.append(KeyPath::variantFromObject(view));
+    }
+    clientRecord = views.viewOfClient(client);
+  } else {
+    for (WTProject* project : projects_) projects.append(KeyPath::variantFromObject(project));
+  }
+  clientVariable_ = clientRecord ? std::make_unique<ClientVariable>(clientRecord) : nullptr;
+  QVariantMap billing;
+  const UserDefaults* defaults = projects_.isEmpty() || !projects_.first()->context()
+                                     ? nullptr
+                                     : projects_.first()->context()->userDefaults();
+  for (const auto& [key, setting] : {std::pair{"name", SettingsKeys::kBillingName},
+                                     {"address", SettingsKeys::kBillingAddress},
+                                     {"taxNumber", SettingsKeys::kBillingTaxNumber},
+                                     {"paymentTerms", SettingsKeys::kBillingPaymentTerms}}) {
+    // None rather than an empty text, which a template's condition would take for a value.
+    const QString text = defaults ? defaults->stringForKey(setting).trimmed() : QString();
+    billing.insert(QLatin1String(key), text.isEmpty() ? QVariant() : QVariant(text));
+  }
+  // The client's, else the projects' (the preferences' without a client).
+  const QVariant currency = client                ? QVariant(client->billingCurrency())
+                            : projects_.isEmpty() ? QVariant()
+                                                  : QVariant(projects_.first()->billingCurrency());
+  return {{QStringLiteral("client"), KeyPath::variantFromObject(clientVariable_.get())},
           {QStringLiteral("projects"), projects},
-          {QStringLiteral("mode"), mode_}};
+          {QStringLiteral("mode"), mode_},
+          {QStringLiteral("period"), period_ ? QVariant(periodViews_->variable()) : QVariant()},
+          {QStringLiteral("billing"), billing},
+          {QStringLiteral("currency"), currency}};
 }
 
 QVariant WTReportGenerator::filteredItemsForTask(WTTask* task, int mode) {
-  if (!task) return {};
-  auto keep = [this](std::vector<std::shared_ptr<WTItemContainer>> groups) {
+  if (!task || mode < 1 || mode > 3) return {};
+  const QList<WTItem*> items =
+      period_ ? periodViews().filtered(task->valuableItems()) : task->valuableItems();
+  if (mode == 1) {
     QVariantList list;
-    list.reserve(qsizetype(groups.size()));
-    for (auto& group : groups) {
-      list.append(KeyPath::variantFromObject(group.get()));
-      groups_.push_back(std::move(group));
-    }
+    for (WTItem* item : items) list.append(KeyPath::variantFromObject(item));
     return list;
-  };
-  switch (mode) {
-    case 1: {
-      QVariantList list;
-      for (WTItem* item : task->valuableItems()) list.append(KeyPath::variantFromObject(item));
-      return list;
-    }
-    case 2:
-      return keep(task->dailyItems());
-    case 3:
-      return keep(task->monthlyItems());
-    default:
-      return {};
   }
+  QVariantList list;
+  for (auto& group : WTItemContainer::containersByKeyPath(
+           mode == 2 ? QStringLiteral("startDate.midnight") : QStringLiteral("startDate.beginOfMonth"),
+           items)) {
+    list.append(KeyPath::variantFromObject(group.get()));
+    groups_.push_back(std::move(group));
+  }
+  return list;
 }
 
 QString WTReportGenerator::userTemplatePath() {
@@ -140,6 +199,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   engine.setDelegate(&collector);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
   engine.loadFilter(std::make_shared<WTReportFilters>());
+  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
   engine.loadFilter(std::make_shared<WTHTMLFilter>());
   engine.loadFilter(std::make_shared<WTItemKindFilter>());
   engine.loadMarker(std::make_shared<WTReportLevelMarker>(&engine, mode_));

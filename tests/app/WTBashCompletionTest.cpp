@@ -73,7 +73,7 @@ TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
   } cases[] = {
       // clang-format off
       {{"st"}, {"start", "status", "stop"}},
-      {{"report", "--"}, {"--client", "--mode", "--out", "--project", "--template"}},
+      {{"report", "--"}, {"--client", "--mode", "--out", "--project", "--range", "--template"}},
       {{"export", "--range", "last-"}, {"last-month", "last-week", "last-year"}},
       {{"export", "--format", ""}, {"spreadsheet", "times"}},
       {{"report", "--mode", ""}, {"0", "1", "2", "3"}},

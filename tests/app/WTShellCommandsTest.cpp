@@ -165,6 +165,7 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
       {"report", "--project", "Hermes", "--template", here.path("missing.txt")},
       {"report", "--project", "Hermes", "--project", "Atlas"}, {"report", "--project", "Hermes", "stray"},
       {"report", "--projects", "Hermes"}, {"export", "--range", "fortnight"}, {"export", "--format", "xlsx"},
+      {"report", "--project", "Hermes", "--range", "fortnight"},
       // clang-format on
   };
   for (const QStringList& arguments : refused) {
@@ -306,6 +307,9 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
   EXPECT_FALSE(QFile::exists(pdfFile + ".part"));
   here.expect({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, 1,
               "");  // a trailing space counts
+  // A billing period of the export's words: 4 March's entry (the one across midnight started on the 3rd).
+  here.expect({"report", "--client", "Acme", "--range", "2026-03-04..2026-03-04", "--out", csvFile}, 0, "");
+  EXPECT_EQ(bytesOf(csvFile), "\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
 
   // The range word reaches the export: 3 March's two entries.
   const Outcome day = here.expect({"export", "--range", "2026-03-03..2026-03-03"}, 0, "");

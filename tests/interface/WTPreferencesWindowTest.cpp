@@ -1,8 +1,13 @@
 #include "MemoryKeychain.h"
+#include "MoneyFormat.h"
 #include "SyncTestSupport.h"
 #include "UiFixture.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
+
+#include <QComboBox>
+#include <QPlainTextEdit>
+#include <QTabWidget>
 
 namespace {
 
@@ -26,7 +31,9 @@ class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
 class WTPreferencesWindowTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword"}) defaults->removeValue(key);
+    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword", "WTBillingName",
+                            "WTBillingAddress", "WTBillingTaxNumber", "WTBillingPaymentTerms"})
+      defaults->removeValue(key);
     manager->syncNetwork()->setCredentialDelegate(&credentials);
     manager->setIntervals({600000, 600000, 600000});
   }
@@ -191,6 +198,50 @@ TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
   EXPECT_EQ(shows(), std::tuple(true, true, 21, true));
   QTest::mouseClick(window->shouldIdleCheckBox(), Qt::LeftButton);
   EXPECT_FALSE(defaults->boolForKey("WTShouldIdle") || window->idleTimeSpinBox()->isEnabled());
+}
+
+// The details for a report's head are stored as each field is left (the address, on several lines, when
+// the focus goes), or when the window closes; an emptied field stores none. The currency is a code ICU
+// knows, in any case; the rounding rule is stored as it is changed.
+TEST_F(WTPreferencesWindowTest, TheBillingPageStoresYourDetailsAndTheBillingDefaults) {
+  open();
+  QComboBox* currency = window->currencyComboBox();
+  EXPECT_EQ(std::tuple(currency->currentText(), window->roundingMinutesSpinBox()->text(),
+                       window->roundingModeComboBox()->isEnabled()),
+            std::tuple(MoneyFormat::localeCurrency(), QString("None"), false));
+  for (const auto& [typed, stored, refused] : {std::tuple{"jpy", "JPY", false}, {"EURO", "JPY", true}}) {
+    type(currency->lineEdit(), typed, true);
+    EXPECT_EQ(
+        std::tuple(defaults->stringForKey("WTCurrency"), currency->lineEdit()->property("refused").toBool()),
+        std::tuple(QString(stored), refused))
+        << typed;
+  }
+  window->roundingMinutesSpinBox()->setValue(15);
+  window->roundingModeComboBox()->setCurrentIndex(window->roundingModeComboBox()->findData("up"));
+  emit window->roundingModeComboBox()->activated(window->roundingModeComboBox()->currentIndex());
+  window->pages()->setCurrentIndex(window->pages()->indexOf(window->findChild<QWidget*>("billingPage")));
+  type(window->billingNameField(), "Ann Smith", true);
+  QPlainTextEdit* address = window->billingAddressField();
+  address->setFocus();
+  QTest::keyClicks(address, "Main St 1");
+  QTest::keyClick(address, Qt::Key_Return);
+  QTest::keyClicks(address, "12345 Town ");
+  type(window->billingTaxNumberField(), "DE123456789");
+  EXPECT_EQ(defaults->stringForKey("WTBillingAddress"), "Main St 1\n12345 Town");
+  type(window->billingPaymentTermsField(), "30 days net");
+  QTest::mouseClick(window->findChild<QPushButton*>("closeButton"), Qt::LeftButton);
+  const char* keys[] = {"WTBillingName", "WTBillingAddress", "WTBillingTaxNumber", "WTBillingPaymentTerms"};
+  QStringList stored;
+  for (const char* key : keys) stored << defaults->stringForKey(key);
+  EXPECT_EQ(stored, QStringList({"Ann Smith", "Main St 1\n12345 Town", "DE123456789", "30 days net"}));
+  open();
+  EXPECT_EQ(
+      QStringList({window->billingNameField()->text(), window->billingAddressField()->toPlainText(),
+                   window->billingTaxNumberField()->text(), window->billingPaymentTermsField()->text()}),
+      stored);
+  window->billingNameField()->clear();
+  type(window->billingNameField(), "  ", true);
+  EXPECT_FALSE(defaults->hasStoredValue("WTBillingName"));
 }
 
 }  // namespace

@@ -222,6 +222,16 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   EXPECT_EQ(QString::fromUtf8(saved.readAll()), window->html());
   const Result<void> refused = window->saveHTMLToFile(dir.filePath("missing/report.html"));
   EXPECT_TRUE(!refused.ok() && refused.error().message.contains("missing/report.html"));
+  // The period chosen covers the report and its lines: February's entry alone, then every one again.
+  WTRangePopUpButton* range = window->rangeButton();
+  EXPECT_EQ(range->selectedTag(), WTRangePredicate::AnyDate);
+  for (const int tag : {WTRangePredicate::LastMonth, WTRangePredicate::AnyDate}) {
+    range->setCurrentIndex(range->findData(tag));
+    emit range->activated(range->currentIndex());
+    ASSERT_TRUE(window->exportCSVToFile(csv).ok());
+    EXPECT_EQ(linesOf(csv).size(), tag == WTRangePredicate::AnyDate ? 3 : 1);
+    EXPECT_EQ(window->html().contains("Website"), tag == WTRangePredicate::AnyDate);
+  }
 
   if (QStandardPaths::findExecutable("pdfinfo").isEmpty()) GTEST_SKIP() << "poppler-utils missing";
   for (int i = 0; i < 200; ++i) {  // two hundred tasks of a day each make many pages

@@ -1,4 +1,5 @@
 #include "Decimal.h"
+#include "GXTemplateEngine.h"
 #include "WTReportFilters.h"
 
 #include <gtest/gtest.h>
@@ -30,6 +31,29 @@ TEST(WTReportFilters, DigiclockWritesMinutesAndDecimalWritesMoneyOfNumbersOnly) 
     EXPECT_EQ(filters.filterInvoked(QString::fromLatin1(c.filter), {}, c.value),
               c.text ? QVariant(QString::fromUtf8(c.text)) : QVariant())
         << c.filter << " of " << c.value.toString().toStdString();
+}
+
+// "money" takes its currency from a variable, else as written; without one, two places as "decimal".
+TEST(WTReportFilters, MoneyWritesAnAmountInTheMinorUnitOfItsCurrency) {
+  UErrorCode status = U_ZERO_ERROR;
+  icu::Locale::setDefault(icu::Locale("en_US"), status);
+  const auto dec = [](const char* text) {
+    return QVariant::fromValue(*Decimal::fromString(QString::fromLatin1(text)));
+  };
+  GXTemplateEngine engine;
+  engine.setObject(QStringLiteral("JPY"), QStringLiteral("currency"));
+  WTMoneyFilter filter(&engine);
+  const struct {
+    QVariant value;
+    QStringList args;
+    const char* text;  // null: no value at all
+  } cases[] = {{dec("1234.5"), {"EUR"}, "1,234.50"},    {dec("1234.5"), {"currency"}, "1,235"},
+               {dec("-1.2345"), {"KWD"}, "-1.235"},     {dec("2.345"), {}, "2.35"},
+               {dec("2.345"), {"client.none"}, "2.35"}, {QStringLiteral("12"), {"EUR"}, nullptr}};
+  for (const auto& c : cases)
+    EXPECT_EQ(filter.filterInvoked(QStringLiteral("money"), c.args, c.value),
+              c.text ? QVariant(QString::fromUtf8(c.text)) : QVariant())
+        << c.value.toString().toStdString() << " " << c.args.join(' ').toStdString();
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include "KeyPath.h"
 #include "LogCapture.h"
+#include "MoneyFormat.h"
 #include "UserLocale.h"
 #include "WTCSVExport.h"
 #include "WTItemContainer.h"
@@ -12,6 +13,7 @@
 #include <QJsonArray>
 #include <QJsonDocument>
 #include <QProcess>
+#include <QRegularExpression>
 #include <QStandardPaths>
 
 #include <algorithm>
@@ -302,6 +304,103 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
   EXPECT_EQ(WTReportGenerator({backend}, 1).render().html.count(QStringLiteral("class=\"item\"")), 3);
   EXPECT_EQ(WTReportGenerator().renderText(QStringLiteral("[{{ missing | html }}]")).html,
             QStringLiteral("[]"));
+}
+
+// A period takes the items starting in it (its end is the next period's), at every level and in every
+// total; without one ("any") the records answer as they always did.
+TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
+  for (const auto& [name, start] : {std::pair{"Edge in", berlin(2024, 3, 3)},
+                                    {"Edge out", berlin(2024, 3, 4)},
+                                    {"Eve", berlin(2024, 3, 2, 23, 45)}})
+    makeTime(design, start, start.addingSeconds(15 * 60))->setName(QString::fromUtf8(name));
+  // What follows a nested loop is guarded by the enclosing loop's variable (an empty loop's end writes).
+  const QString text = QStringLiteral(
+      "{% for project in projects %}{{ project.name }} {{ project.duration }}m {{ project.cost | decimal }}:"
+      "{% for task in project.tasks %} {{ task.name }} {{ task.items.@count }}/{{ task.children.@count }} "
+      "{{ task.duration }}m {{ task.cost | decimal }} "
+      "[{% for item in task.valuableItems %}{{ item.name }};{% /for %}{% if task %}] days{% /if %}"
+      "{% for day in task.dailyItems %} {{ day.date | date_format: \"MM-dd\" }}={{ day.duration }}m{% /for %}"
+      "{% if task %} months{% /if %}{% for month in task.monthlyItems %} {{ month.date | date_format: \"MM\" "
+      "}}="
+      "{{ month.cost | decimal }}{% /for %}{% /for %}{% if project %}\n{% /if %}{% /for %}total "
+      "{{ projects.@sum.cost | decimal }} client {{ client.cost | decimal }} {% if period %}"
+      "{{ period.begin | date_format: \"MM-dd\" }}..{{ period.end | date_format: \"MM-dd\" }}{% /if %}");
+  const std::pair<const char*, const char*> cases[] = {
+      // clang-format off
+      {"2024-03-03..2024-03-03", "Web \"Site\" 135m 135.00: Design 3/1 135m 135.00 [Review;Kick \"off\";Edge in;] days "
+                                 "03-03=135m months 03=135.00\ntotal 135.00 client 135.00 03-03..03-03"},
+      {"2024-03-04..2024-03-06", "Web \"Site\" 15m 1,249.50: Design 4/3 15m 1,249.50 [Fonts;Edge out;] days 03-04=15m "
+                                 "months 03=1,249.50\nBackend 120m 200.00: API 1/1 120m 200.00 [Setup;] days 03-06=120m "
+                                 "months 03=200.00\ntotal 1,449.50 client 1,449.50 03-04..03-06"},
+      {"last-month", "Web \"Site\" 60m 60.00: Design 1/1 60m 60.00 [Sketch;] days 02-10=60m months 02=60.00\n"
+                     "total 60.00 client 60.00 02-01..02-29"},
+      {"2024-01-01..2024-01-31", "total 0.00 client 0.00 01-01..01-31"},
+      {"any", "Web \"Site\" 225m 1,459.50: Design 9/6 225m 1,459.50 [Fonts;Edge out;Review;Kick \"off\";Edge in;Eve;"
+              "Sketch;] days 03-04=15m 03-03=135m 03-02=15m 02-10=60m months 03=1,399.50 02=60.00\nBackend 120m "
+              "200.00: API 1/1 120m 200.00 [Setup;] days 03-06=120m months 03=200.00\ntotal 1,659.50 client 1,659.50 "},
+      // clang-format on
+  };
+  WTReportGenerator generator(projects(), 2);
+  for (const auto& [word, expected] : cases) {
+    const Result<std::optional<RZDate::Range>> period = WTRangePredicate::boundsForRangeWord(word);
+    ASSERT_TRUE(period.ok()) << word;
+    generator.setPeriod(period.value());
+    const WTReport report = generator.renderText(text);
+    EXPECT_TRUE(report.errors.empty()) << word;
+    EXPECT_EQ(report.html.toStdString(), expected) << word;
+  }
+  EXPECT_EQ(WTCSVExport::reportCSV(projects(), 0,
+                                   WTRangePredicate::boundsForRangeWord("2024-03-03..2024-03-03").value()),
+            "\"Web \\\"Site\\\"\",\"Design\",\"02:15\",\"135.00\"\n");
+}
+
+// Three amounts of 138.465 bill 138.47 each: the built-in template's lines add up to its subtotal and
+// total (415.41) at every level, where the exact sum rounded once said 415.40. Its head names both sides.
+TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides) {
+  auto* billed = WTProject::insertNewObject(context.get());
+  billed->setName(QStringLiteral("Billed"));
+  billed->setClient(client);
+  for (int month : {1, 2, 3}) {
+    WTTask* task = makeTask(billed, QStringLiteral("Task %1").arg(month));
+    task->setRate(dec("92.31"));
+    makeTime(task, berlin(2024, month, 5, 9), berlin(2024, month, 5, 10, 30));
+  }
+  defaults->setValue(QStringLiteral("WTBillingName"), QStringLiteral("Ann <Smith>"));
+  defaults->setValue(QStringLiteral("WTBillingAddress"), QStringLiteral("Main St 1\n12345 Town"));
+  defaults->setValue(QStringLiteral("WTBillingPaymentTerms"), QStringLiteral("Due in 30 days"));
+  client->setAddress(QStringLiteral("\n"));  // left blank
+  EXPECT_FALSE(WTReportGenerator({billed}, 0).render().html.contains("class=\"to\""));
+  client->setAddress(QStringLiteral("1 Acme Way\nSpringfield"));
+  // The amounts of the rows of a kind (their last cell), and their sum.
+  const auto amounts = [](const QString& html, const QString& kind) {
+    QStringList cells;
+    Decimal sum;
+    const QRegularExpression row(QStringLiteral("<tr class=\"%1\">.*<td[^>]*>([^<]*)</td></tr>").arg(kind));
+    for (auto match = row.globalMatch(html); match.hasNext();) {
+      cells << match.next().captured(1);
+      sum += Decimal::fromString(QString(cells.last()).remove(u',')).value_or(Decimal(-1000));
+    }
+    return std::pair(cells, MoneyFormat::format(sum).toStdString());
+  };
+  // Over February and March, two of them.
+  const auto period = WTRangePredicate::boundsForRangeWord(QStringLiteral("2024-02-01..2024-03-31")).value();
+  QString html;
+  for (const auto& [range, total] :
+       {std::pair{std::optional<RZDate::Range>(), "415.41"}, {period, "276.94"}}) {
+    for (int mode = 0; mode <= 3; ++mode) {
+      WTReportGenerator generator({billed}, mode);
+      generator.setPeriod(range);
+      html = generator.render().html;
+      const QString lines = mode == 0 ? QStringLiteral("task") : QStringLiteral("item");
+      EXPECT_EQ(amounts(html, lines).first, QStringList(range ? 2 : 3, QStringLiteral("138.47"))) << mode;
+      for (const char* kind : {"task", "item", "subtotal", "total"})
+        EXPECT_EQ(amounts(html, kind).second, mode > 0 || kind != QLatin1String("item") ? total : "0.00")
+            << mode << kind;
+    }
+  }
+  for (const char* text : {"<b>Ann &lt;Smith&gt;</b>", ">Main St 1\n12345 Town</p>",
+                           "<b>Acme</b>\n1 Acme Way\nSpringfield</p>", ">Due in 30 days</p>", ">92.31</td>"})
+    EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
 }
 
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
