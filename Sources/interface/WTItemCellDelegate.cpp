@@ -2,6 +2,7 @@
 
 #include "RZColor.h"
 #include "RZTextMeasure.h"
+#include "WTBudgetBar.h"
 #include "WTImages.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
@@ -141,6 +142,10 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
                    index.data(WTItemsModel::DurationTextRole).toString());
   painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::CostTextRole).toString());
+  if (const QVariant budget = index.data(WTItemsModel::BudgetRole); budget.isValid()) {
+    WTBudgetBar::paint(painter, cell.partRect(WTTableCellView::Part::BudgetBar, row),
+                       budget.value<WTBudgetState>(), option.palette, selected);
+  }
   drawImage(painter, cell.partRect(WTTableCellView::Part::TimerButton, row),
             index.data(WTItemsModel::TimerImageRole).toString());
   if (option.state & QStyle::State_MouseOver) paintHoverBar(painter, row, cell, index);

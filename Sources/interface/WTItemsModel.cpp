@@ -4,6 +4,7 @@
 #include "DurationText.h"
 #include "MoneyFormat.h"
 #include "RZDate.h"
+#include "WTBudgetBar.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
 #include "WTItem.h"
@@ -305,6 +306,8 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
         return task->running();
       case Qt::ToolTipRole:
         return task->buttonTitle();
+      case BudgetRole:
+        return WTBudgetBar::variantOf(task);
       default:
         return {};
     }

@@ -52,6 +52,7 @@ class WTItemsModel : public QAbstractItemModel {
     EndTimeEditRole,
     // Stopped time entries: the duration as DurationEditRole, set by moving the start (the end stays).
     SpentDurationEditRole,
+    BudgetRole,  // tasks with a budget: a WTBudgetState
   };
 
   static const QString kObjectUUIDsType;    // "WTObjectUUIDs"

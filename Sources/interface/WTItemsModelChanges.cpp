@@ -44,7 +44,8 @@ bool isShownKeyOfTask(const QString& key) {
                                      QStringLiteral("cost"),
                                      QStringLiteral("running"),
                                      QStringLiteral("tableImage"),
-                                     QStringLiteral("timerButtonImage")};
+                                     QStringLiteral("timerButtonImage"),
+                                     QStringLiteral("budget")};
   return keys.contains(key);
 }
 

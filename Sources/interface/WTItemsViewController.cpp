@@ -5,6 +5,7 @@
 #include "RZDate.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
+#include "WTBillingDialog.h"
 #include "WTDatePopover.h"
 #include "WTEmptyHint.h"
 #include "WTImages.h"
@@ -210,6 +211,8 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   QPointer<WTOutlineView> outline = outlineView_;
   menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
+  menu->addAction(WTBillingDialog::menuTitle(task), this,
+                  [task, outline] { WTBillingDialog::editBilling(task, outline); });
   return menu;
 }
 

@@ -2,6 +2,7 @@
 
 #include "DurationText.h"
 #include "MoneyFormat.h"
+#include "WTBudgetBar.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTOrderedDiff.h"
@@ -57,7 +58,7 @@ bool isShownKey(const QString& key) {
   static const QSet<QString> keys = {QStringLiteral("duration"),   QStringLiteral("cost"),
                                      QStringLiteral("tableImage"), QStringLiteral("client"),
                                      QStringLiteral("projects"),   QStringLiteral("notes"),
-                                     QStringLiteral("rate")};
+                                     QStringLiteral("rate"),       QStringLiteral("budget")};
   return keys.contains(key);
 }
 
@@ -223,6 +224,8 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
       return object->archived();
     case RunningRole:
       return isRunning(object);
+    case BudgetRole:
+      return WTBudgetBar::variantOf(object);
     case ClientRole:
       if (object->entity() != WTEntity::Project) return {};
       return variantFromObject(static_cast<const WTProject*>(object)->client());

@@ -1,5 +1,14 @@
 #include "WTBudget.h"
 
+#include "MoneyFormat.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <QLocale>
+#include <QObject>
+
+#include <cmath>
+
 namespace WTBudget {
 
 namespace {
@@ -29,6 +38,35 @@ std::optional<Level> crossed(const Decimal& before, const Decimal& after,
 std::optional<double> fraction(const Decimal& billed, const std::optional<Decimal>& budget) {
   if (!measurable(budget)) return std::nullopt;
   return billed.toDouble() / budget->toDouble();
+}
+
+Decimal billed(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Task:
+      return static_cast<const WTTask*>(object)->cost();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->cost();
+    default:
+      return Decimal();
+  }
+}
+
+std::optional<Decimal> budget(const WTObject* object) {
+  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->budget();
+  return std::nullopt;
+}
+
+QString standing(const WTObject* object) {
+  const std::optional<Decimal> limit = budget(object);
+  const Decimal spent = billed(object);
+  const std::optional<double> share = fraction(spent, limit);
+  if (!share) return {};
+  // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached.
+  const QString percent = QLocale().toString(qint64(std::floor(*share * 100.0)));
+  const Decimal left = *limit - spent;
+  const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left))
+                                         : QObject::tr("%1 left").arg(MoneyFormat::format(left));
+  return QObject::tr("%1 % of the budget of %2 · %3").arg(percent, MoneyFormat::format(*limit), rest);
 }
 
 }  // namespace WTBudget

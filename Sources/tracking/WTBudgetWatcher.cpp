@@ -10,22 +10,6 @@ WTBudgetWatcher::WTBudgetWatcher(WTStopwatchUpdater* updater, QObject* parent)
   connect(updater_, &WTStopwatchUpdater::stopwatchDidUpdate, this, &WTBudgetWatcher::check);
 }
 
-Decimal WTBudgetWatcher::billed(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Task:
-      return static_cast<const WTTask*>(object)->cost();
-    case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->cost();
-    default:
-      return Decimal();
-  }
-}
-
-std::optional<Decimal> WTBudgetWatcher::budget(const WTObject* object) {
-  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->budget();
-  return std::nullopt;
-}
-
 void WTBudgetWatcher::check() {
   QList<WTObject*> watched;
   for (WTTime* time : updater_->times()) {
@@ -38,11 +22,11 @@ void WTBudgetWatcher::check() {
   QHash<QString, Decimal> now;
   QList<std::pair<WTObject*, WTBudget::Level>> crossings;
   for (WTObject* object : watched) {
-    const Decimal billedNow = billed(object);
+    const Decimal billedNow = WTBudget::billed(object);
     // A timer just started has nothing to compare with yet: it only sets where the next tick starts.
     const auto before = billed_.constFind(object->uuid());
     if (before != billed_.cend()) {
-      if (const auto level = WTBudget::crossed(*before, billedNow, budget(object)))
+      if (const auto level = WTBudget::crossed(*before, billedNow, WTBudget::budget(object)))
         crossings.append({object, *level});
     }
     now.insert(object->uuid(), billedNow);

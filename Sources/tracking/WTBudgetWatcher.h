@@ -21,10 +21,6 @@ class WTBudgetWatcher : public QObject {
   // `updater` is not owned and must outlive the watcher.
   explicit WTBudgetWatcher(WTStopwatchUpdater* updater, QObject* parent = nullptr);
 
-  // What a task or project bills, and its budget (none for other records).
-  static Decimal billed(const WTObject* object);
-  static std::optional<Decimal> budget(const WTObject* object);
-
  signals:
   void budgetCrossed(WTObject* object, WTBudget::Level level);
 

@@ -57,6 +57,43 @@ TEST_F(WTLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour) {
   expectHighlighted(list.controller.tableView(), list.controller.arrayController()->index(0, 0));
 }
 
+// A budget is a bar under the cost: the palette's highlight within it, amber from 80 %, red past it, the
+// share and what is left in the cost's tip; a changed budget repaints the row.
+TEST_F(WTLookTest, ABudgetBarUnderTheCostTakesItsColourFromTheShareBilled) {
+  WTProject* project = makeProject("Website");
+  project->setRate(Decimal(200));
+  WTTask* task = makeTask(project, "Design");
+  makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));  // half an hour: 100.00
+  ShownOutline shown(context.get(), project, QSize(800, 400));
+  const QColor highlight(10, 90, 200);
+  QPalette palette = shown.outline()->palette();
+  palette.setColor(QPalette::Highlight, highlight);
+  shown.outline()->setPalette(palette);
+  endTurn();
+  shown.outline()->selectionModel()->clearSelection();
+  const QColor base = palette.color(QPalette::Base);
+  const std::tuple<const char*, QColor, const char*> rows[] = {
+      {"200", highlight, "50 % of the budget of 200.00 · 100.00 left"},
+      {"125", QColor(0xe8, 0x9a, 0x00), "80 % of the budget of 125.00 · 25.00 left"},
+      {"99.99", QColor(0xd0, 0x30, 0x30), "100 % of the budget of 99.99 · 0.01 over"},
+      {nullptr, base, ""},
+  };
+  for (const auto& [budget, colour, tip] : rows) {
+    SCOPED_TRACE(budget ? budget : "none");
+    QSignalSpy repainted(shown.controller.treeController(), &QAbstractItemModel::dataChanged);
+    task->setBudget(budget ? std::optional(dec(budget)) : std::nullopt);
+    endTurn();
+    ASSERT_FALSE(repainted.isEmpty());
+    EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), shown.rowOf(task));
+    const QImage image = shown.outline()->viewport()->grab().toImage();
+    const QRect visual = shown.outline()->visualRect(shown.rowOf(task));
+    const QRectF bar = WTTableCellView("WTTask").partRect(
+        WTTableCellView::Part::BudgetBar, QRectF(0, visual.y(), image.width(), visual.height()));
+    EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, int(bar.top()) + 1), colour);
+    EXPECT_EQ(shown.tipAt(shown.centreOf(task, WTTableCellView::Part::Cost)), tip);
+  }
+}
+
 // An empty list says how to add the first row, and forgets it once there is one (the outline paints alike).
 TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
   WTClientsViewController clients(context.get());

@@ -1,5 +1,6 @@
 #include "MemoryKeychain.h"
 #include "UiFixture.h"
+#include "WTBillingDialog.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
 
@@ -104,6 +105,14 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
          dialog.accept();
          return Outcome{acme->storedRate(), dialog.isVisible() && refusedIn(dialog.field(), text)};
        }},
+      {"budget",
+       [&](auto text) {
+         WTBillingDialog dialog(design);
+         dialog.show();
+         type(dialog.budgetField(), text);
+         dialog.accept();
+         return Outcome{design->budget(), dialog.isVisible() && refusedIn(dialog.budgetField(), text)};
+       }},
       {"expense",
        [&](auto text) {
          const bool refused = typeIntoRow(expense, Field::Amount, text);
@@ -121,7 +130,7 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
        }},
   };
   // German takes money typed "1.250,5", American refuses it; a duration is taken as "1:15", never as "1.5".
-  for (const char* field : {"project", "client", "expense", "preferences", "duration"}) {
+  for (const char* field : {"project", "client", "budget", "expense", "preferences", "duration"}) {
     const bool money = std::string(field) != "duration";
     for (const bool refused : {false, true}) {
       SCOPED_TRACE(std::string(field) + (refused ? " refused" : " taken"));
