@@ -1,5 +1,6 @@
 #include "WTStoreSetup.h"
 
+#include "MoneyFormat.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTObjectContext.h"
@@ -28,8 +29,11 @@ QString syncJournalPath() {
 }
 
 void registerDefaults(UserDefaults& defaults) {
-  defaults.registerDefaults(
-      {{SettingsKeys::kInvoiceUnit, QStringLiteral("h")}, {SettingsKeys::kIdleTime, 5}});
+  defaults.registerDefaults({{SettingsKeys::kInvoiceUnit, QStringLiteral("h")},
+                             {SettingsKeys::kIdleTime, 5},
+                             {SettingsKeys::kCurrency, MoneyFormat::localeCurrency()},
+                             {SettingsKeys::kRoundingMinutes, 1},
+                             {SettingsKeys::kRoundingMode, QStringLiteral("nearest")}});
 }
 
 void fillNewStore(WTObjectContext& context) {

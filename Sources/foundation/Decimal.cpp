@@ -368,6 +368,22 @@ std::optional<Decimal> Decimal::fromVariant(const QVariant& value) {
   }
 }
 
+Decimal Decimal::rounded(int places) const {
+  const long long target = -static_cast<long long>(places);
+  if (exponent_ >= target) {
+    // Zeros appended, as long as the coefficient keeps to the precision.
+    const long long grow = exponent_ - target;
+    if (grow > kPrec || (coefficient_ != 0 && digitCount(coefficient_) + grow > kPrec)) return *this;
+    return Decimal(coefficient_ * kPow10[grow], int(target), negative_);
+  }
+  const long long drop = target - exponent_;
+  if (drop > kPrec) return Decimal(0, int(target), negative_);  // below half a unit of the last place
+  const u128 unit = kPow10[drop];
+  u128 kept = coefficient_ / unit;
+  if (coefficient_ % unit >= unit / 2) ++kept;
+  return Decimal(kept, int(target), negative_);
+}
+
 QString Decimal::toString() const {
   char buffer[kPrec + 1];
   char* const end = buffer + sizeof buffer;

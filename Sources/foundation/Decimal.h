@@ -50,6 +50,11 @@ class Decimal {
 
   Decimal& operator+=(const Decimal& other) { return *this = *this + other; }
 
+  // Rounded half away from zero to `places` digits after the point, and written with exactly that many
+  // (12.345 gives 12.35, 12.3 gives 12.30, and with none 12.5 gives 13). A value too large to carry that
+  // many places in 38 digits is left as it is.
+  Decimal rounded(int places) const;
+
   // Compares values, not representations: 12.30 == 12.3, and -0 == 0.
   friend std::strong_ordering operator<=>(const Decimal& a, const Decimal& b);
   friend bool operator==(const Decimal& a, const Decimal& b) { return (a <=> b) == 0; }

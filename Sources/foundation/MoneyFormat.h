@@ -11,6 +11,14 @@
 // away from zero from the exact decimal (never through binary floating point).
 namespace MoneyFormat {
 QString format(const Decimal& amount);
+// The same with the places of `currency`'s minor unit (none for JPY, three for KWD), without its sign.
+QString format(const Decimal& amount, const QString& currency);
+// How many places a currency (ISO 4217 code) bills to, as ICU knows it; 2 for a code it does not know.
+int minorUnitDigits(const QString& currency);
+// The currency of the user's locale (its ISO 4217 code); "USD" where the locale names none.
+QString localeCurrency();
+// `amount` rounded half away from zero to `currency`'s minor unit, exactly (12.345 EUR gives 12.35).
+Decimal billed(const Decimal& amount, const QString& currency);
 // The same in `locale` rather than in the default locale of the first use.
 QString format(const Decimal& amount, const icu::Locale& locale);
 // Money typed by a person, read as TypedNumber::read reads numbers; the locale's currency sign may stand

@@ -13,6 +13,14 @@ inline constexpr QLatin1StringView kIdleTime{"WTIdleTime"};
 inline constexpr QLatin1StringView kStopsOtherTimes{"WTStopsOtherTimes"};
 // The top of rate inheritance, above the built-in rates (a decimal).
 inline constexpr QLatin1StringView kDefaultRate{"WTDefaultRate"};
+// What is billed where a client names no currency of its own: an ISO 4217 code (registered as the
+// locale's currency).
+inline constexpr QLatin1StringView kCurrency{"WTCurrency"};
+// The rounding rule at the top of its inheritance (client, project and task may each set their own):
+// time entries are billed in multiples of kRoundingMinutes (registered as 1, no rounding), rounded by
+// kRoundingMode: "up", "nearest" (a half up; registered) or "down".
+inline constexpr QLatin1StringView kRoundingMinutes{"WTRoundingMinutes"};
+inline constexpr QLatin1StringView kRoundingMode{"WTRoundingMode"};
 // Registered as "h" at start; nothing reads it.
 inline constexpr QLatin1StringView kInvoiceUnit{"wtInvoiceUnit"};
 

@@ -1,23 +1,66 @@
 #include "WTClient.h"
 
+#include "MoneyFormat.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTStoreRecord.h"
 
+#include <algorithm>
+
 WT_ENTITY_CLASS_IMPL(WTClient)
+
+namespace {
+
+// A currency as the client stores it: three letters in capitals, or a null text for none (a null or
+// empty value); none for anything else, which is refused.
+std::optional<QString> currencyCode(const QVariant& value) {
+  if (value.isNull()) return QString();
+  if (value.typeId() != QMetaType::QString) return std::nullopt;
+  const QString code = value.toString().trimmed().toUpper();
+  if (code.isEmpty()) return QString();
+  const bool letters = code.size() == 3 &&
+                       std::all_of(code.begin(), code.end(), [](QChar c) { return c >= u'A' && c <= u'Z'; });
+  return letters ? std::optional<QString>(code) : std::nullopt;
+}
+
+}  // namespace
 
 const WTKeyTable& WTClient::keys() {
   using namespace WTKeys;
   static const WTKeyTable table(
-      &objectKeys(), {
-                         stored("addressBookUID", &WTClient::addressBookUID_, &WTStoreRecord::addressBookUID),
-                         stored("totalsUID", &WTClient::totalsUID_, &WTStoreRecord::totalsUID),
-                         refine("inheritedRate", nullptr, nullptr, {"rate"}),
-                         toMany("projects", WTKeyType::Unordered, &records<&WTClient::projects>),
-                         derived<&WTClient::duration>("duration", {"projects"}),
-                         derived<&WTClient::cost>("cost", {"projects"}),
-                         derived<&WTClient::tableImage>("tableImage", {"archived"}),
-                     });
+      &objectKeys(),
+      {
+          stored("addressBookUID", &WTClient::addressBookUID_, &WTStoreRecord::addressBookUID),
+          stored("totalsUID", &WTClient::totalsUID_, &WTStoreRecord::totalsUID),
+          stored("currency", &WTClient::currency_, &WTStoreRecord::currency,
+                 [](WTObject& object, const QVariant& value) {
+                   const std::optional<QString> code = currencyCode(value);
+                   if (code) static_cast<WTClient&>(object).setCurrency(*code);
+                   return code.has_value();
+                 }),
+          stored("address", &WTClient::address_, &WTStoreRecord::address),
+          stored("roundingMinutes", &WTClient::roundingMinutes_, &WTStoreRecord::roundingMinutes),
+          stored("roundingMode", &WTClient::roundingMode_, &WTStoreRecord::roundingMode,
+                 [](WTObject& object, const QVariant& value) {
+                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
+                   if (mode) static_cast<WTClient&>(object).setRoundingMode(*mode);
+                   return mode.has_value();
+                 }),
+          refine("inheritedRate", nullptr, nullptr, {"rate"}),
+          toMany("projects", WTKeyType::Unordered, &records<&WTClient::projects>),
+          derived<&WTClient::duration>("duration", {"projects"}),
+          derived<&WTClient::cost>("cost", {"projects"}),
+          derived<&WTClient::tableImage>("tableImage", {"archived"}),
+          derived("roundingRule", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    return QVariant(static_cast<const WTClient&>(object).roundingRule().toVariantMap());
+                  },
+                  {"roundingMinutes", "roundingMode"}),
+          derived<&WTClient::billingCurrency>("billingCurrency", {"currency"}),
+          derived<&WTClient::billedDuration>("billedDuration", {"projects", "duration", "roundingRule"}),
+          derived<&WTClient::billedCost>("billedCost",
+                                         {"projects", "cost", "billedDuration", "billingCurrency"}),
+      });
   return table;
 }
 
@@ -26,6 +69,53 @@ void WTClient::setAddressBookUID(const QString& uid) {
 }
 void WTClient::setTotalsUID(const QString& uid) {
   setStoredValue(QStringLiteral("totalsUID"), uid);
+}
+
+void WTClient::setCurrency(const QString& currency) {
+  if (const std::optional<QString> code = currencyCode(currency.isNull() ? QVariant() : QVariant(currency)))
+    setStoredValue(QStringLiteral("currency"), code->isNull() ? QVariant() : QVariant(*code));
+}
+
+void WTClient::setAddress(const QString& address) {
+  setStoredValue(QStringLiteral("address"), address);
+}
+
+std::optional<int> WTClient::roundingMinutes() const {
+  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
+}
+
+void WTClient::setRoundingMinutes(const std::optional<int>& minutes) {
+  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
+}
+
+void WTClient::setRoundingMode(const QString& mode) {
+  if (const std::optional<QString> stored =
+          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
+    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
+}
+
+WTRoundingRule WTClient::roundingRule() const {
+  return context()->billingDefaults().rule.refinedBy(roundingMinutes_, roundingMode_);
+}
+
+QString WTClient::billingCurrency() const {
+  return currency_.isEmpty() ? context()->billingDefaults().currency : currency_;
+}
+
+int WTClient::billedDuration() const {
+  int total = 0;
+  for (const WTProject* project : projects_) total += project->billedDuration();
+  return total;
+}
+
+Decimal WTClient::billedCost() const {
+  Decimal total = Decimal().rounded(MoneyFormat::minorUnitDigits(billingCurrency()));
+  for (const WTProject* project : projects_) total += project->billedCost();
+  return total;
+}
+
+void WTClient::billingDidChange() {
+  announce(QStringLiteral("billedDuration"));
 }
 
 Decimal WTClient::rateFromAbove() const {

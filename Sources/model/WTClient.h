@@ -1,6 +1,7 @@
 #pragma once
 
 #include "WTObject.h"
+#include "WTRoundingRule.h"
 
 #include <functional>
 
@@ -18,6 +19,30 @@ class WTClient final : public WTObject {
   void setTotalsUID(const QString& uid);
 
   const QList<WTProject*>& projects() const { return projects_; }
+
+  // The ISO 4217 code the client is billed in; null to take the preferences' ("WTCurrency").
+  QString currency() const { return currency_; }
+  // Takes a three-letter code (in capitals) or an empty or null text for none; other text changes nothing.
+  void setCurrency(const QString& currency);
+  // Where the client's bills go, as lines of text.
+  QString address() const { return address_; }
+  void setAddress(const QString& address);
+
+  // The rounding rule set on the client itself (0 or none, and a null mode, inherit the preferences').
+  std::optional<int> roundingMinutes() const;
+  void setRoundingMinutes(const std::optional<int>& minutes);
+  QString roundingMode() const { return roundingMode_; }
+  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
+  void setRoundingMode(const QString& mode);
+  // The rule in force: the client's own, else the preferences'.
+  WTRoundingRule roundingRule() const;
+  // `currency`, else the preferences'.
+  QString billingCurrency() const;
+  // The sums of its projects' billed minutes and billed costs.
+  int billedDuration() const;
+  Decimal billedCost() const;
+  // Announces the client's billed figures (a project's or task's rule changed).
+  void billingDidChange();
 
   // Own rate, else "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;
@@ -40,5 +65,9 @@ class WTClient final : public WTObject {
   friend class WTProject;
   QString addressBookUID_;
   QString totalsUID_;
+  QString currency_;
+  QString address_;
+  std::optional<qint64> roundingMinutes_;
+  QString roundingMode_;
   QList<WTProject*> projects_;
 };

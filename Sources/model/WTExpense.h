@@ -13,6 +13,9 @@ class WTExpense final : public WTItem {
   void setExpense(const std::optional<Decimal>& amount);
   Decimal cost() const override { return expense_.value_or(Decimal()); }
   Decimal costAtRate(const Decimal&) const override { return cost(); }
+  Decimal billedCostWith(const WTRoundingRule&, const Decimal&, int places) const override {
+    return cost().rounded(places);
+  }
 
  protected:
   void storedValueDidChange(const QString& key) override;

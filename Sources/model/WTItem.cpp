@@ -1,5 +1,6 @@
 #include "WTItem.h"
 
+#include "MoneyFormat.h"
 #include "WTObjectContext.h"
 #include "WTStoreRecord.h"
 #include "WTTask.h"
@@ -44,6 +45,28 @@ Decimal WTItem::cost() const {
 
 Decimal WTItem::costAtRate(const Decimal& rate) const {
   return timeCost(rate, duration());
+}
+
+QString WTItem::billingCurrency() const {
+  return task_ ? task_->billingCurrency() : context()->billingDefaults().currency;
+}
+
+int WTItem::billedDuration() const {
+  return billedDurationWithRule(task_ ? task_->roundingRule() : context()->billingDefaults().rule);
+}
+
+Decimal WTItem::billedCost() const {
+  if (!task_) return Decimal().rounded(MoneyFormat::minorUnitDigits(billingCurrency()));
+  return billedCostWith(task_->roundingRule(), task_->inheritedRate(),
+                        MoneyFormat::minorUnitDigits(task_->billingCurrency()));
+}
+
+int WTItem::billedDurationWithRule(const WTRoundingRule&) const {
+  return duration();
+}
+
+Decimal WTItem::billedCostWith(const WTRoundingRule& rule, const Decimal& rate, int places) const {
+  return timeCost(rate, billedDurationWithRule(rule)).rounded(places);
 }
 
 Decimal WTItem::timeCost(const Decimal& rate, int minutes) {
@@ -99,6 +122,9 @@ const WTKeyTable& WTItem::itemKeys() {
           derived<&WTItem::duration>("duration"),
           derived<&WTItem::cost>("cost", {"duration"}),
           derived<&WTItem::title>("title"),
+          derived<&WTItem::billingCurrency>("billingCurrency", {"task"}),
+          derived<&WTItem::billedDuration>("billedDuration", {"duration", "task"}),
+          derived<&WTItem::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
       });
   return table;
 }

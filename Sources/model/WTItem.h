@@ -2,6 +2,7 @@
 
 #include "Date.h"
 #include "WTObject.h"
+#include "WTRoundingRule.h"
 
 class WTTask;
 
@@ -34,6 +35,18 @@ class WTItem : public WTObject {
   // never used); none without a task, and the item then costs nothing.
   std::optional<Decimal> rate() const;
   virtual QString title() const { return name(); }
+
+  // What the item bills. A time entry's minutes are rounded by its task's rule; a flat fee's minutes
+  // and an expense are billed as typed; notes and to-dos bill nothing. The cost is the rate times the
+  // billed minutes (an expense's amount), rounded once, half away from zero, to the minor unit of the
+  // currency. A change of the task's rule, rate or currency is announced by the task ("roundingRule",
+  // "rate", "billingCurrency"), not by each of its items.
+  QString billingCurrency() const;
+  int billedDuration() const;
+  Decimal billedCost() const;
+  // The same with what the task resolves once for all its items: its rule, rate and minor unit places.
+  virtual int billedDurationWithRule(const WTRoundingRule& rule) const;
+  virtual Decimal billedCostWith(const WTRoundingRule& rule, const Decimal& rate, int places) const;
 
  protected:
   WTItem(WTEntity entity, WTObjectContext* context) : WTObject(entity, context) {}

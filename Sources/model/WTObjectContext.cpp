@@ -1,5 +1,6 @@
 #include "WTObjectContext.h"
 
+#include "MoneyFormat.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
@@ -16,6 +17,7 @@
 #include <QMetaObject>
 
 #include <algorithm>
+#include <limits>
 
 namespace {
 
@@ -43,8 +45,42 @@ WTObjectContext::WTObjectContext(UserDefaults* defaults, QObject* parent)
   if (defaults_) {
     connect(defaults_, &UserDefaults::valueChanged, this, [this](const QString& key) {
       if (key == SettingsKeys::kDefaultRate) defaultRateDidChange();
+      if (key == SettingsKeys::kCurrency || key == SettingsKeys::kRoundingMinutes ||
+          key == SettingsKeys::kRoundingMode)
+        billingDefaultDidChange(key);
     });
   }
+}
+
+const WTObjectContext::BillingDefaults& WTObjectContext::billingDefaults() const {
+  if (billingDefaults_) return *billingDefaults_;
+  BillingDefaults found;
+  if (defaults_) {
+    found.currency = defaults_->stringForKey(SettingsKeys::kCurrency).trimmed().toUpper();
+    found.rule.minutes = int(std::clamp<qint64>(defaults_->integerForKey(SettingsKeys::kRoundingMinutes), 1,
+                                                std::numeric_limits<int>::max()));
+    found.rule.mode = WTRoundingRule::modeFromName(defaults_->stringForKey(SettingsKeys::kRoundingMode))
+                          .value_or(WTRoundingRule::Mode::Nearest);
+  }
+  if (found.currency.isEmpty()) found.currency = MoneyFormat::localeCurrency();
+  billingDefaults_ = std::move(found);
+  return *billingDefaults_;
+}
+
+void WTObjectContext::billingDefaultDidChange(const QString& key) {
+  billingDefaults_.reset();
+  // Read where nothing above gives one: by every client, projects without one and tasks without a project.
+  const QString announced =
+      key == SettingsKeys::kCurrency ? QStringLiteral("billingCurrency") : QStringLiteral("roundingRule");
+  std::vector<WTObject*> readers(objects_[int(WTEntity::Client)].begin(),
+                                 objects_[int(WTEntity::Client)].end());
+  for (WTObject* project : objects_[int(WTEntity::Project)]) {
+    if (!static_cast<WTProject*>(project)->client()) readers.push_back(project);
+  }
+  for (WTObject* task : objects_[int(WTEntity::Task)]) {
+    if (!static_cast<WTTask*>(task)->project()) readers.push_back(task);
+  }
+  for (WTObject* reader : readers) announce(reader, announced);
 }
 
 void WTObjectContext::defaultRateDidChange() {

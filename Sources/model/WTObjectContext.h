@@ -5,6 +5,7 @@
 #include "WTChangeJournal.h"
 #include "WTEntity.h"
 #include "WTObject.h"
+#include "WTRoundingRule.h"
 #include "WTStore.h"
 #include "WTUndoManager.h"
 
@@ -42,6 +43,15 @@ class WTObjectContext : public QObject {
   static WTObjectContext* resolve(WTObjectContext* context);
 
   UserDefaults* userDefaults() const { return defaults_; }
+
+  // What the preferences bill by where no client, project or task says otherwise: "WTCurrency" (else the
+  // locale's currency) and the rule of "WTRoundingMinutes" and "WTRoundingMode". Read from the settings
+  // once and again only after one of them changed, since every record's billed figures begin here.
+  struct BillingDefaults {
+    QString currency;
+    WTRoundingRule rule;
+  };
+  const BillingDefaults& billingDefaults() const;
 
   // Store. Attaching loads every record of the store into this (empty) context. A context that loads only
   // the timer records sees no other items: it may start and stop timers and save, but must not delete
@@ -142,11 +152,14 @@ class WTObjectContext : public QObject {
   // The user's default rate is where every inherited rate begins: the records that read it announce a
   // new rate, and the costs below them follow.
   void defaultRateDidChange();
+  // The same for the preferences' currency ("billingCurrency") and rule ("roundingRule").
+  void billingDefaultDidChange(const QString& key);
   void uuidChanged(WTObject* object, const QString& oldUuid);
   // Puts the items loaded from the store into the identity map, once.
   void indexItems() const;
 
   UserDefaults* defaults_;
+  mutable std::optional<BillingDefaults> billingDefaults_;
   std::unique_ptr<WTStore> store_;
   WTNullChangeJournal nullJournal_;
   WTChangeJournal* journal_ = &nullJournal_;

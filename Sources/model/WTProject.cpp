@@ -1,5 +1,6 @@
 #include "WTProject.h"
 
+#include "MoneyFormat.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTStoreRecord.h"
@@ -12,26 +13,43 @@ WT_ENTITY_CLASS_IMPL(WTProject)
 const WTKeyTable& WTProject::keys() {
   using namespace WTKeys;
   static const WTKeyTable table(
-      &objectKeys(), {
-                         toOne("client", &WTStoreRecord::clientUuid),
-                         refine("rate", nullptr, nullptr, {"inheritedRate", "client", "client.rate"}),
-                         refine("inheritedRate", nullptr, nullptr, {"rate"}),
-                         toMany("tasks", WTKeyType::Ordered, &records<&WTProject::tasks>,
-                                [](WTObject& object, const QVariant& value) {
-                                  // An ordered list of tasks: each is filed here at its place.
-                                  int index = 0;
-                                  for (const QVariant& element : value.toList()) {
-                                    auto* task = dynamic_cast<WTTask*>(KeyPath::objectFromVariant(element));
-                                    if (task) task->setProject(static_cast<WTProject*>(&object), index++);
-                                  }
-                                  return value.canConvert<QVariantList>();
-                                }),
-                         derived<&WTProject::duration>("duration", {"tasks"}),
-                         derived<&WTProject::cost>("cost", {"duration", "rate"}),
-                         derived<&WTProject::tasksArray>("tasksArray", {"tasks"}),
-                         derived<&WTProject::tableImage>("tableImage", {"archived"}),
-                         derived<&WTProject::running>("running", {"tasks"}),
-                     });
+      &objectKeys(),
+      {
+          toOne("client", &WTStoreRecord::clientUuid),
+          stored("budget", &WTProject::budget_, &WTStoreRecord::budget),
+          stored("roundingMinutes", &WTProject::roundingMinutes_, &WTStoreRecord::roundingMinutes),
+          stored("roundingMode", &WTProject::roundingMode_, &WTStoreRecord::roundingMode,
+                 [](WTObject& object, const QVariant& value) {
+                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
+                   if (mode) static_cast<WTProject&>(object).setRoundingMode(*mode);
+                   return mode.has_value();
+                 }),
+          refine("rate", nullptr, nullptr, {"inheritedRate", "client", "client.rate"}),
+          refine("inheritedRate", nullptr, nullptr, {"rate"}),
+          toMany("tasks", WTKeyType::Ordered, &records<&WTProject::tasks>,
+                 [](WTObject& object, const QVariant& value) {
+                   // An ordered list of tasks: each is filed here at its place.
+                   int index = 0;
+                   for (const QVariant& element : value.toList()) {
+                     auto* task = dynamic_cast<WTTask*>(KeyPath::objectFromVariant(element));
+                     if (task) task->setProject(static_cast<WTProject*>(&object), index++);
+                   }
+                   return value.canConvert<QVariantList>();
+                 }),
+          derived<&WTProject::duration>("duration", {"tasks"}),
+          derived<&WTProject::cost>("cost", {"duration", "rate"}),
+          derived<&WTProject::tasksArray>("tasksArray", {"tasks"}),
+          derived<&WTProject::tableImage>("tableImage", {"archived"}),
+          derived<&WTProject::running>("running", {"tasks"}),
+          derived("roundingRule", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    return QVariant(static_cast<const WTProject&>(object).roundingRule().toVariantMap());
+                  },
+                  {"roundingMinutes", "roundingMode", "client", "client.roundingRule"}),
+          derived<&WTProject::billingCurrency>("billingCurrency", {"client", "client.billingCurrency"}),
+          derived<&WTProject::billedDuration>("billedDuration", {"duration", "roundingRule"}),
+          derived<&WTProject::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
+      });
   return table;
 }
 
@@ -77,6 +95,52 @@ Decimal WTProject::rateFromAbove() const {
 // Here rather than in the setter, so that a rate put back by undo or redo reaches the client too.
 void WTProject::storedValueDidChange(const QString& key) {
   if (key == QLatin1String("rate") && client_) client_->costDidChange();
+  if ((key == QLatin1String("roundingMinutes") || key == QLatin1String("roundingMode")) && client_)
+    client_->billingDidChange();
+}
+
+void WTProject::setBudget(const std::optional<Decimal>& budget) {
+  setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
+}
+
+std::optional<int> WTProject::roundingMinutes() const {
+  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
+}
+
+void WTProject::setRoundingMinutes(const std::optional<int>& minutes) {
+  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
+}
+
+void WTProject::setRoundingMode(const QString& mode) {
+  if (const std::optional<QString> stored =
+          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
+    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
+}
+
+WTRoundingRule WTProject::roundingRule() const {
+  const WTRoundingRule above = client_ ? client_->roundingRule() : context()->billingDefaults().rule;
+  return above.refinedBy(roundingMinutes_, roundingMode_);
+}
+
+QString WTProject::billingCurrency() const {
+  return client_ ? client_->billingCurrency() : context()->billingDefaults().currency;
+}
+
+int WTProject::billedDuration() const {
+  int total = 0;
+  for (const WTTask* task : tasks_) total += task->billedDuration();
+  return total;
+}
+
+Decimal WTProject::billedCost() const {
+  Decimal total = Decimal().rounded(MoneyFormat::minorUnitDigits(billingCurrency()));
+  for (const WTTask* task : tasks_) total += task->billedCost();
+  return total;
+}
+
+void WTProject::billingDidChange() {
+  announce(QStringLiteral("billedDuration"));
+  if (client_) client_->billingDidChange();
 }
 
 int WTProject::duration() const {

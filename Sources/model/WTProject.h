@@ -1,6 +1,7 @@
 #pragma once
 
 #include "WTObject.h"
+#include "WTRoundingRule.h"
 
 #include <functional>
 
@@ -35,6 +36,26 @@ class WTProject final : public WTObject {
   void durationDidChange();
   void costDidChange();
 
+  // Money the project may cost; none for no budget.
+  std::optional<Decimal> budget() const { return budget_; }
+  void setBudget(const std::optional<Decimal>& budget);
+
+  // The rounding rule set on the project itself (0 or none, and a null mode, inherit from the client).
+  std::optional<int> roundingMinutes() const;
+  void setRoundingMinutes(const std::optional<int>& minutes);
+  QString roundingMode() const { return roundingMode_; }
+  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
+  void setRoundingMode(const QString& mode);
+  // The rule in force: the project's own, else its client's, else the preferences'.
+  WTRoundingRule roundingRule() const;
+  // The client's billing currency; the preferences' without a client.
+  QString billingCurrency() const;
+  // The sums of its tasks' billed minutes and billed costs.
+  int billedDuration() const;
+  Decimal billedCost() const;
+  // Announces the billed figures of the project and its client (a task's rule changed).
+  void billingDidChange();
+
   // Whether a timer runs in one of its tasks; announced as "running".
   bool running() const;
   void runningDidChange();
@@ -53,4 +74,7 @@ class WTProject final : public WTObject {
   friend class WTObjectContext;
   WTClient* client_ = nullptr;
   QList<WTTask*> tasks_;
+  std::optional<Decimal> budget_;
+  std::optional<qint64> roundingMinutes_;
+  QString roundingMode_;
 };

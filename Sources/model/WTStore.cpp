@@ -1,5 +1,7 @@
 #include "WTStore.h"
 
+#include "WTStoreRows.h"
+
 #include <QCoreApplication>
 #include <QDir>
 #include <QFile>
@@ -28,34 +30,6 @@ QString tr(const char* text) {
   return QCoreApplication::translate("WTStore", text);
 }
 
-// The columns, in this order in every statement below: binding index = column + 1.
-enum Column {
-  kUuid,
-  kEntity,
-  kName,
-  kNotes,
-  kRate,
-  kColor,
-  kArchived,
-  kAddressBookUID,
-  kTotalsUID,
-  kClientUuid,
-  kProjectUuid,
-  kPosition,
-  kBudget,
-  kTaskUuid,
-  kStartDate,
-  kEndDate,
-  kRunning,
-  kMinutes,
-  kExpense,
-  kCompleted,
-};
-
-#define WT_STORE_COLUMNS                                                                                   \
-  "uuid, entity, name, notes, rate, color, archived, addressBookUID, totalsUID, clientUuid, projectUuid, " \
-  "position, budget, taskUuid, startDate, endDate, running, minutes, expense, completed"
-
 constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
 // Each half is read through its own small index (version 2), so a large store's items are never visited.
 #define WT_STORE_OWNERS "entity IN ('WTClient', 'WTProject', 'WTTask')"
@@ -71,13 +45,15 @@ constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM reco
 // back, though a save mostly changes a name or a date and leaves the uuid and the task as they were. The
 // entity is part of the uuid and never changes.
 constexpr char kReplaceSql[] =
-    "INSERT INTO records (" WT_STORE_COLUMNS
+    "INSERT INTO main.records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
-    "?17, ?18, ?19, ?20) ON CONFLICT(uuid) DO UPDATE SET name = ?3, notes = ?4, rate = ?5, "
-    "color = ?6, archived = ?7, addressBookUID = ?8, totalsUID = ?9, clientUuid = ?10, projectUuid = ?11, "
+    "?17, ?18, ?19, ?20, ?21, ?22, ?23, ?24) ON CONFLICT(uuid) DO UPDATE SET name = ?3, notes = ?4, "
+    "rate = ?5, color = ?6, archived = ?7, addressBookUID = ?8, totalsUID = ?9, clientUuid = ?10, "
+    "projectUuid = ?11, "
     "position = ?12, budget = ?13, taskUuid = ?14, startDate = ?15, endDate = ?16, running = ?17, "
-    "minutes = ?18, expense = ?19, completed = ?20";
-constexpr char kDeleteSql[] = "DELETE FROM records WHERE uuid = ?1";
+    "minutes = ?18, expense = ?19, completed = ?20, currency = ?21, address = ?22, roundingMinutes = ?23, "
+    "roundingMode = ?24";
+constexpr char kDeleteSql[] = "DELETE FROM main.records WHERE uuid = ?1";
 
 #undef WT_STORE_COLUMNS
 
@@ -96,6 +72,27 @@ int addTimerIndexes(sqlite3* db) {
 // Schema version 3: the items by their task, so a report of a few projects reads their items alone.
 int addItemIndex(sqlite3* db) {
   return sqlite3_exec(db, "CREATE INDEX records_items ON records(taskUuid);", nullptr, nullptr, nullptr);
+}
+
+// Schema version 4: a client's currency and address, and the rounding rule of clients, projects and tasks.
+// A project's budget shares the task's column.
+int addBillingColumns(sqlite3* db) {
+  return sqlite3_exec(db,
+                      "ALTER TABLE records ADD COLUMN currency TEXT;"
+                      "ALTER TABLE records ADD COLUMN address TEXT;"
+                      "ALTER TABLE records ADD COLUMN roundingMinutes INTEGER;"
+                      "ALTER TABLE records ADD COLUMN roundingMode TEXT;",
+                      nullptr, nullptr, nullptr);
+}
+
+// A file older than version 4 read without migrating it: a view in the connection's own temporary schema
+// stands in for its table where reading names it unqualified (the temporary schema is searched first) and
+// answers the columns it lacks as NULL. Writing names the table itself, "main.records".
+int addMissingBillingColumns(sqlite3* db) {
+  return sqlite3_exec(db,
+                      "CREATE TEMP VIEW records AS SELECT *, NULL AS currency, NULL AS address, "
+                      "NULL AS roundingMinutes, NULL AS roundingMode FROM main.records",
+                      nullptr, nullptr, nullptr);
 }
 
 // Schema version 1. Money is the decimal's text (exact, with its exponent), dates are seconds since 1970,
@@ -133,7 +130,7 @@ static_assert(kApplicationId == 1416852332);
 // kMigrations[n] takes a file from version n to n + 1. A new schema version appends its step here and
 // raises WTStore::kSchemaVersion; every step runs inside the one migration transaction.
 using Migration = int (*)(sqlite3*);
-constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex};
+constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex, addBillingColumns};
 static_assert(std::size(kMigrations) == WTStore::kSchemaVersion);
 
 // What went wrong, in words for the user, for SQLite's result code.
@@ -239,119 +236,6 @@ int migrate(sqlite3* db, int version) {
   return code;
 }
 
-// ---- Reading rows. The record is reused from row to row: every field is assigned on every row.
-
-void readString(sqlite3_stmt* statement, int column, QString& out) {
-  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, column));
-  if (!text) {
-    out = QString();
-    return;
-  }
-  const int size = sqlite3_column_bytes(statement, column);
-  // fromUtf8 of nothing may give a null string; an empty text must stay distinct from none.
-  out = size == 0 ? QString(QLatin1StringView("")) : QString::fromUtf8(text, size);
-}
-
-// Entity names repeat on every row: share one string per name instead of making one per row.
-void readEntity(sqlite3_stmt* statement, QString& out) {
-  static const std::array<QString, 8> kNames = {QStringLiteral("WTClient"), QStringLiteral("WTProject"),
-                                                QStringLiteral("WTTask"),   QStringLiteral("WTTime"),
-                                                QStringLiteral("WTFlat"),   QStringLiteral("WTExpense"),
-                                                QStringLiteral("WTNote"),   QStringLiteral("WTToDo")};
-  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, kEntity));
-  const int size = sqlite3_column_bytes(statement, kEntity);
-  const QLatin1StringView name(text, text ? size : 0);
-  for (const QString& known : kNames) {
-    if (known == name) {
-      out = known;
-      return;
-    }
-  }
-  readString(statement, kEntity, out);
-}
-
-// False when the column holds text that is not a number.
-bool readDecimal(sqlite3_stmt* statement, int column, std::optional<Decimal>& out) {
-  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, column));
-  if (!text) {
-    out.reset();
-    return true;
-  }
-  const int size = sqlite3_column_bytes(statement, column);
-  std::array<char16_t, 64> wide;
-  if (size <= int(wide.size())) {
-    // Numbers are ASCII; anything else fails to parse either way.
-    for (int i = 0; i < size; ++i) wide[i] = char16_t(static_cast<unsigned char>(text[i]));
-    out = Decimal::fromString(QStringView(wide.data(), size));
-  } else {
-    out = Decimal::fromString(QString::fromUtf8(text, size));
-  }
-  return out.has_value();
-}
-
-std::optional<Date> readDate(sqlite3_stmt* statement, int column) {
-  if (sqlite3_column_type(statement, column) == SQLITE_NULL) return std::nullopt;
-  return Date::fromSeconds(sqlite3_column_double(statement, column));
-}
-
-// ---- Writing rows.
-
-int bindString(sqlite3_stmt* statement, int column, const QString& text) {
-  if (text.isNull()) return sqlite3_bind_null(statement, column + 1);
-  // The records outlive the statement's step, so SQLite may read the text where it is.
-  return sqlite3_bind_text16(statement, column + 1, text.utf16(), int(text.size() * sizeof(char16_t)),
-                             SQLITE_STATIC);
-}
-
-// The decimal's plain text, except that a positive exponent is written out ("12E+2", not "1200") so that
-// the value reads back with its exponent, and a huge exponent does not turn into a million zeros of text.
-QByteArray decimalText(const Decimal& value) {
-  if (value.exponent() <= 0) return value.toString().toUtf8();
-  QString text = value.toString();
-  if (!value.isZero()) text.chop(value.exponent());
-  return text.toUtf8() + "E+" + QByteArray::number(value.exponent());
-}
-
-int bindDecimal(sqlite3_stmt* statement, int column, const std::optional<Decimal>& value) {
-  if (!value) return sqlite3_bind_null(statement, column + 1);
-  const QByteArray text = decimalText(*value);
-  return sqlite3_bind_text(statement, column + 1, text.constData(), int(text.size()), SQLITE_TRANSIENT);
-}
-
-int bindDate(sqlite3_stmt* statement, int column, const std::optional<Date>& value) {
-  if (!value) return sqlite3_bind_null(statement, column + 1);
-  return sqlite3_bind_double(statement, column + 1, value->secondsSince1970());
-}
-
-int bindRecord(sqlite3_stmt* s, const WTStoreRecord& r) {
-  const int codes[] = {
-      bindString(s, kUuid, r.uuid),
-      bindString(s, kEntity, r.entity),
-      bindString(s, kName, r.name),
-      bindString(s, kNotes, r.notes),
-      bindDecimal(s, kRate, r.rate),
-      bindString(s, kColor, r.color),
-      sqlite3_bind_int(s, kArchived + 1, r.archived),
-      bindString(s, kAddressBookUID, r.addressBookUID),
-      bindString(s, kTotalsUID, r.totalsUID),
-      bindString(s, kClientUuid, r.clientUuid),
-      bindString(s, kProjectUuid, r.projectUuid),
-      sqlite3_bind_int(s, kPosition + 1, r.position),
-      bindDecimal(s, kBudget, r.budget),
-      bindString(s, kTaskUuid, r.taskUuid),
-      bindDate(s, kStartDate, r.startDate),
-      bindDate(s, kEndDate, r.endDate),
-      sqlite3_bind_int(s, kRunning + 1, r.running),
-      r.minutes ? sqlite3_bind_int64(s, kMinutes + 1, *r.minutes) : sqlite3_bind_null(s, kMinutes + 1),
-      bindDecimal(s, kExpense, r.expense),
-      sqlite3_bind_int(s, kCompleted + 1, r.completed),
-  };
-  for (int code : codes) {
-    if (code != SQLITE_OK) return code;
-  }
-  return SQLITE_OK;
-}
-
 int stepOnce(sqlite3_stmt* statement) {
   const int code = sqlite3_step(statement);
   sqlite3_reset(statement);
@@ -443,7 +327,9 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     }
     // A current file must also have the shape this version reads and writes.
     const bool current = version == kSchemaVersion || (readOnly && version >= kOldestReadableVersion);
-    if (current && !store->prepareStatements()) return damagedError(path);
+    if (current && version < kSchemaVersion && addMissingBillingColumns(db) != SQLITE_OK)
+      return damagedError(path);
+    if (current && !store->prepareStatements(!readOnly)) return damagedError(path);
   }
   if (readOnly) {
     if (!empty && version < kOldestReadableVersion) {
@@ -477,7 +363,7 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
                    tr("The data file “%1” could not be updated for this version of Tessal: %2.")
                        .arg(path, reason(code))};
     }
-    if (!store->prepareStatements()) return damagedError(path);
+    if (!store->prepareStatements(true)) return damagedError(path);
   }
   return store;
 }
@@ -495,13 +381,17 @@ void WTStore::keepLogOnClose() {
       nullptr);
 }
 
-Result<void> WTStore::prepareStatements() {
+Result<void> WTStore::prepareStatements(bool writing) {
+  // A reader has no writing statements: its save() fails before it begins (an older file could not even
+  // prepare them).
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
-      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
-      {&replace_, kReplaceSql},     {&remove_, kDeleteSql}, {&selectAll_, kSelectAllSql},
-      {&selectTimerRecords_, kSelectTimerRecordsSql},
+      {&selectAll_, kSelectAllSql}, {&selectTimerRecords_, kSelectTimerRecordsSql},
+      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},
+      {&rollback_, "ROLLBACK"},     {&replace_, kReplaceSql},
+      {&remove_, kDeleteSql},
   };
-  for (const auto& [statement, sql] : statements) {
+  for (size_t i = 0; i < (writing ? std::size(statements) : 2); ++i) {
+    const auto& [statement, sql] = statements[i];
     const int code = sqlite3_prepare_v3(db_, sql, -1, SQLITE_PREPARE_PERSISTENT, statement, nullptr);
     if (code != SQLITE_OK) return Error{ReadFailed, reason(code)};
   }
@@ -531,28 +421,7 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, 
   WTStoreRecord record;
   int code;
   while ((code = sqlite3_step(s)) == SQLITE_ROW) {
-    readString(s, kUuid, record.uuid);
-    readEntity(s, record.entity);
-    readString(s, kName, record.name);
-    readString(s, kNotes, record.notes);
-    readString(s, kColor, record.color);
-    record.archived = sqlite3_column_int(s, kArchived) != 0;
-    readString(s, kAddressBookUID, record.addressBookUID);
-    readString(s, kTotalsUID, record.totalsUID);
-    readString(s, kClientUuid, record.clientUuid);
-    readString(s, kProjectUuid, record.projectUuid);
-    record.position = sqlite3_column_int(s, kPosition);
-    readString(s, kTaskUuid, record.taskUuid);
-    record.startDate = readDate(s, kStartDate);
-    record.endDate = readDate(s, kEndDate);
-    record.running = sqlite3_column_int(s, kRunning) != 0;
-    if (sqlite3_column_type(s, kMinutes) == SQLITE_NULL)
-      record.minutes.reset();
-    else
-      record.minutes = sqlite3_column_int64(s, kMinutes);
-    record.completed = sqlite3_column_int(s, kCompleted) != 0;
-    if (!readDecimal(s, kRate, record.rate) || !readDecimal(s, kBudget, record.budget) ||
-        !readDecimal(s, kExpense, record.expense)) {
+    if (!WTStoreRows::readRecord(s, record)) {
       code = SQLITE_CORRUPT;
       break;
     }
@@ -577,14 +446,14 @@ Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStr
                  tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();
   if (damaged_) return Error{Damaged, tr("The data file “%1” is damaged; nothing was written to it.").arg(path_)};
-  if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading before the file had a table
+  if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading
   int code = stepOnce(begin_);
   for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {
-    code = bindRecord(replace_, *record);
+    code = WTStoreRows::bindRecord(replace_, *record);
     if (code == SQLITE_OK) code = stepOnce(replace_);
   }
   for (auto uuid = deletedUuids.begin(); code == SQLITE_OK && uuid != deletedUuids.end(); ++uuid) {
-    code = bindString(remove_, kUuid, *uuid);
+    code = WTStoreRows::bindString(remove_, WTStoreRows::kUuid, *uuid);
     if (code == SQLITE_OK) code = stepOnce(remove_);
   }
   if (code == SQLITE_OK) code = stepOnce(commit_);

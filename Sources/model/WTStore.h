@@ -20,9 +20,9 @@ struct sqlite3_stmt;
 // newer version is refused without being changed in any way.
 class WTStore {
  public:
-  static constexpr int kSchemaVersion = 3;
-  // The oldest version whose rows read as this version's do (later ones only added indexes): a reader
-  // that may not migrate still reads it.
+  static constexpr int kSchemaVersion = 4;
+  // The oldest version a reader that may not migrate still reads: versions 2 and 3 only added indexes,
+  // and the columns version 4 added read as none from an older file.
   static constexpr int kOldestReadableVersion = 1;
 
   enum ErrorCode {
@@ -89,7 +89,7 @@ class WTStore {
  private:
   WTStore(QString path, sqlite3* db);
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly, Check check);
-  Result<void> prepareStatements();
+  Result<void> prepareStatements(bool writing);
   Error writeError(int code) const;
 
   QString path_;

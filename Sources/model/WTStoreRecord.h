@@ -24,6 +24,12 @@ struct WTStoreRecord {
   // WTClient.
   QString addressBookUID;
   QString totalsUID;
+  QString currency;  // ISO 4217 code, null when none
+  QString address;
+
+  // WTClient, WTProject and WTTask.
+  std::optional<qint64> roundingMinutes;
+  QString roundingMode;  // "up", "nearest", "down", null when none
 
   // WTProject.
   QString clientUuid;
@@ -31,7 +37,7 @@ struct WTStoreRecord {
   // WTTask.
   QString projectUuid;
   int position = 0;
-  std::optional<Decimal> budget;
+  std::optional<Decimal> budget;  // WTProject too
 
   // Items.
   QString taskUuid;

@@ -1,5 +1,6 @@
 #include "WTTask.h"
 
+#include "MoneyFormat.h"
 #include "RZDate.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
@@ -36,6 +37,13 @@ const WTKeyTable& WTTask::keys() {
       &objectKeys(),
       {
           stored("budget", &WTTask::budget_, &WTStoreRecord::budget),
+          stored("roundingMinutes", &WTTask::roundingMinutes_, &WTStoreRecord::roundingMinutes),
+          stored("roundingMode", &WTTask::roundingMode_, &WTStoreRecord::roundingMode,
+                 [](WTObject& object, const QVariant& value) {
+                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
+                   if (mode) static_cast<WTTask&>(object).setRoundingMode(*mode);
+                   return mode.has_value();
+                 }),
           toOne("project", &WTStoreRecord::projectUuid),
           refine("rate", nullptr, nullptr, {"project", "project.rate"}),
           refine("inheritedRate", nullptr, nullptr, {"rate"}),
@@ -72,6 +80,14 @@ const WTKeyTable& WTTask::keys() {
           derived<&WTTask::buttonTitle>("buttonTitle", {"running"}),
           derived<&WTTask::timerButtonImage>("timerButtonImage", {"running"}),
           derived<&WTTask::tableImage>("tableImage", {"running"}),
+          derived("roundingRule", WTKeyType::Other,
+                  [](const WTObject& object) {
+                    return QVariant(static_cast<const WTTask&>(object).roundingRule().toVariantMap());
+                  },
+                  {"roundingMinutes", "roundingMode", "project", "project.roundingRule"}),
+          derived<&WTTask::billingCurrency>("billingCurrency", {"project", "project.billingCurrency"}),
+          derived<&WTTask::billedDuration>("billedDuration", {"duration", "roundingRule"}),
+          derived<&WTTask::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
           // The time-entry export reads a task's "title": it is the task's name.
           derived<&WTObject::name>("title"),
       });
@@ -108,6 +124,29 @@ void WTTask::setBudget(const std::optional<Decimal>& budget) {
   setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
 }
 
+std::optional<int> WTTask::roundingMinutes() const {
+  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
+}
+
+void WTTask::setRoundingMinutes(const std::optional<int>& minutes) {
+  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
+}
+
+void WTTask::setRoundingMode(const QString& mode) {
+  if (const std::optional<QString> stored =
+          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
+    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
+}
+
+WTRoundingRule WTTask::roundingRule() const {
+  const WTRoundingRule above = project_ ? project_->roundingRule() : context()->billingDefaults().rule;
+  return above.refinedBy(roundingMinutes_, roundingMode_);
+}
+
+QString WTTask::billingCurrency() const {
+  return project_ ? project_->billingCurrency() : context()->billingDefaults().currency;
+}
+
 WTObject* WTTask::owner() const {
   return project_;
 }
@@ -133,6 +172,9 @@ Decimal WTTask::rateFromAbove() const {
 // Here rather than in the setter, so that a rate put back by undo or redo reaches the totals above too.
 void WTTask::storedValueDidChange(const QString& key) {
   if (key == QLatin1String("rate") && project_) project_->costDidChange();
+  // The task's own billed figures follow through the key dependencies; the project's and client's here.
+  if ((key == QLatin1String("roundingMinutes") || key == QLatin1String("roundingMode")) && project_)
+    project_->billingDidChange();
 }
 
 namespace {
@@ -170,6 +212,33 @@ Decimal WTTask::cost() const {
   Decimal total;
   for (const WTItem* item : items_) total += item->costAtRate(rate);
   if (gTotalsMemo) gTotalsMemo->costs_.insert(this, total);
+  return total;
+}
+
+int WTTask::billedDuration() const {
+  if (gTotalsMemo) {
+    const auto known = gTotalsMemo->billedDurations_.constFind(this);
+    if (known != gTotalsMemo->billedDurations_.cend()) return *known;
+  }
+  const WTRoundingRule rule = roundingRule();
+  int total = 0;
+  for (const WTItem* item : items_) total += item->billedDurationWithRule(rule);
+  if (gTotalsMemo) gTotalsMemo->billedDurations_.insert(this, total);
+  return total;
+}
+
+Decimal WTTask::billedCost() const {
+  if (gTotalsMemo) {
+    const auto known = gTotalsMemo->billedCosts_.constFind(this);
+    if (known != gTotalsMemo->billedCosts_.cend()) return *known;
+  }
+  // What every item of the task bills by, resolved once for all of them.
+  const WTRoundingRule rule = roundingRule();
+  const Decimal rate = inheritedRate();
+  const int places = MoneyFormat::minorUnitDigits(billingCurrency());
+  Decimal total = Decimal().rounded(places);
+  for (const WTItem* item : items_) total += item->billedCostWith(rule, rate, places);
+  if (gTotalsMemo) gTotalsMemo->billedCosts_.insert(this, total);
   return total;
 }
 

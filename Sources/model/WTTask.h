@@ -2,6 +2,7 @@
 
 #include "Date.h"
 #include "WTObject.h"
+#include "WTRoundingRule.h"
 
 #include <QHash>
 #include <QSet>
@@ -29,6 +30,17 @@ class WTTask final : public WTObject {
   std::optional<Decimal> budget() const { return budget_; }
   void setBudget(const std::optional<Decimal>& budget);
 
+  // The rounding rule set on the task itself (0 or none, and a null mode, inherit from the project).
+  std::optional<int> roundingMinutes() const;
+  void setRoundingMinutes(const std::optional<int>& minutes);
+  QString roundingMode() const { return roundingMode_; }
+  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
+  void setRoundingMode(const QString& mode);
+  // The rule in force: the task's own, else its project's, else the preferences'.
+  WTRoundingRule roundingRule() const;
+  // The project's billing currency; the preferences' without a project.
+  QString billingCurrency() const;
+
   // Every item of the task, of every kind, in no particular order.
   const QList<WTItem*>& items() const { return items_; }
   // Takes `items` into this task, each keeping its date. Returns them.
@@ -45,6 +57,9 @@ class WTTask final : public WTObject {
 
   int duration() const;
   Decimal cost() const;
+  // The sums of the items' billed minutes and billed costs (see WTItem::billedCost).
+  int billedDuration() const;
+  Decimal billedCost() const;
 
   // While one lives, each task's duration and cost are worked out once and then remembered. For a
   // report, which reads every task's totals again for its project's subtotal and for the grand total, and
@@ -61,6 +76,8 @@ class WTTask final : public WTObject {
     TotalsMemo* previous_;
     QHash<const WTTask*, int> durations_;
     QHash<const WTTask*, Decimal> costs_;
+    QHash<const WTTask*, int> billedDurations_;
+    QHash<const WTTask*, Decimal> billedCosts_;
   };
 
   // Announce the change upward: task, then project, then client.
@@ -120,6 +137,8 @@ class WTTask final : public WTObject {
 
   WTProject* project_ = nullptr;
   std::optional<Decimal> budget_;
+  std::optional<qint64> roundingMinutes_;
+  QString roundingMode_;
   QList<WTItem*> items_;
   WTItemContainerList cachedChildren_;
   // The last "dailyItems" and "monthlyItems" read by key; valid until the same key is read again.

@@ -17,6 +17,8 @@ class WTTime final : public WTItem {
 
   // Minute boundaries crossed between start and end (now while running), both cut to the minute.
   int duration() const override;
+  // The duration rounded by the rule (a running entry as it stands now).
+  int billedDurationWithRule(const WTRoundingRule& rule) const override { return rule.apply(duration()); }
   // Makes the entry last `minutes` from its start.
   void setDuration(int minutes);
   // Makes the entry last `minutes` up to its end: the start moves. For time already spent, which ends

@@ -118,11 +118,12 @@ Records sampleRecords() {
            WTStoreRecord{.uuid = "C1@WTClient", .entity = "WTClient", .name = "Müller & Söhne ☕ 日本",
                          .notes = "line one\nline two\ttab, \"quoted\"", .rate = decimal(u"85.50"),
                          .color = "#80ff0000", .archived = true, .addressBookUID = "AB-1:ABPerson",
-                         .totalsUID = QString(QLatin1StringView(""))},
+                         .totalsUID = QString(QLatin1StringView("")), .currency = "KWD",
+                         .address = "1 Main St\nSpringfield", .roundingMinutes = 15, .roundingMode = "up"},
            {.uuid = "P1@WTProject", .entity = "WTProject", .name = QString(QLatin1StringView("")),
-            .rate = decimal(u"1E+3"), .clientUuid = "C1@WTClient"},
+            .rate = decimal(u"1E+3"), .roundingMinutes = 0, .clientUuid = "C1@WTClient", .budget = decimal(u"2500.00")},
            {.uuid = "T1@WTTask", .entity = "WTTask", .name = "Design", .rate = decimal(u"0.00"),
-            .projectUuid = "P1@WTProject", .position = 3,
+            .roundingMode = "nearest", .projectUuid = "P1@WTProject", .position = 3,
             .budget = decimal(u"12345678901234567890123456789012345678")},
            {.uuid = "I1@WTTime", .entity = "WTTime", .name = QString::fromUtf16(u"nul \0 inside", 12),
             .taskUuid = "T1@WTTask", .startDate = Date::fromSeconds(1767261600.25),
@@ -265,7 +266,7 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
     EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
-  EXPECT_EQ(shape(path()), QStringList({"3", "wal", "0", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"4", "wal", "0", "3"}));
   const QString folder = dir.filePath(QStringLiteral("Tessal2"));
   auto inMissingFolder = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
   ASSERT_FALSE(inMissingFolder.ok());
@@ -322,7 +323,7 @@ TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWrite
   const WTStoreRecord added = record("N@WTNote", "WTNote", "C@WTClient");
   ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
   expected[added.uuid] = added;
-  EXPECT_EQ(shape(path()), QStringList({"3", "wal", "3", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"4", "wal", "3", "3"}));
 
   auto reader = WTStore::openReadOnly(path());
   ASSERT_TRUE(reader) << reader.error().message.toStdString();
