@@ -70,6 +70,24 @@ QString elided(const QPainter& painter, const QString& text, qreal width) {
   return painter.fontMetrics().elidedText(text, Qt::ElideRight, static_cast<int>(width));
 }
 
+// The billed figures where they differ from the raw ones, small and dimmed at the end of the name's room,
+// right before the duration they stand beside; the name gives up that room.
+void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index, QRectF& name) {
+  const QString text = index.data(WTItemsModel::BilledTextRole).toString();
+  if (text.isEmpty()) return;
+  QFont small = option.font;
+  small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
+  const qreal width = std::min(QFontMetricsF(small).horizontalAdvance(text) + 2.0, name.width() / 2.0);
+  const QRectF billed(name.right() - width, name.y(), width, name.height());
+  painter.save();
+  painter.setFont(small);
+  painter.setPen(dimTextColour(option));
+  painter.drawText(billed, Qt::AlignRight | Qt::AlignVCenter,
+                   painter.fontMetrics().elidedText(text, Qt::ElideLeft, static_cast<int>(width)));
+  painter.restore();
+  name.setRight(billed.left() - 8.0);
+}
+
 }  // namespace
 
 WTItemCellDelegate::WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view)
@@ -129,8 +147,9 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
 
   QFont bold = option.font;
   bold.setBold(true);
+  QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
+  drawBilled(painter, option, index, name);
   painter.setFont(bold);
-  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString title = index.data(WTItemsModel::NameRole).toString();
   painter.setPen(title.isEmpty() ? dimTextColour(option) : textColour(option));
   if (title.isEmpty()) title = tr("Untitled Task");
@@ -221,10 +240,11 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
     QApplication::style()->drawPrimitive(QStyle::PE_IndicatorCheckBox, &check, &painter, view_);
   }
 
+  QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
+  drawBilled(painter, option, index, name);
   QFont nameFont = option.font;
   nameFont.setStrikeOut(completed);
   painter.setFont(nameFont);
-  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString text = index.data(WTItemsModel::NameRole).toString();
   painter.setPen(text.isEmpty() || completed ? dimTextColour(option) : textColour(option));
   if (text.isEmpty()) text = kind == QLatin1String("WTNote") ? tr("Empty note") : tr("No description");

@@ -71,6 +71,21 @@ QString dayTitle(Date day) {
   return RZDate::stringWithPattern(day, cached.pattern);
 }
 
+QString currencyOfTask(const WTTask* task) {
+  return task ? task->billingCurrency() : QString();
+}
+
+// The billed figures beside the raw ones, each only where its text differs from the raw one's.
+QString billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost, const Decimal& billed,
+                   const QString& currency) {
+  QStringList parts;
+  if (durations && durations->first != durations->second)
+    parts.append(DurationText::stringWithMinutes(durations->second));
+  const QString billedCost = MoneyFormat::format(billed, currency);
+  if (billedCost != MoneyFormat::format(cost, currency) || !parts.isEmpty()) parts.append(billedCost);
+  return parts.isEmpty() ? QString() : WTItemsModel::tr("billed %1").arg(parts.join(QStringLiteral(" · ")));
+}
+
 }  // namespace
 
 WTItemsModel::WTItemsModel(WTObjectContext* context, QObject* parent)
@@ -279,7 +294,7 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case DurationTextRole:
         return DurationText::stringWithMinutes(container.duration());
       case CostTextRole:
-        return MoneyFormat::format(container.cost());
+        return MoneyFormat::format(container.cost(), currencyOfTask(container.task()));
       default:
         return {};
     }
@@ -297,7 +312,10 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case DurationTextRole:
         return DurationText::stringWithMinutes(task->duration());
       case CostTextRole:
-        return MoneyFormat::format(task->cost());
+        return MoneyFormat::format(task->cost(), task->billingCurrency());
+      case BilledTextRole:
+        return billedText(std::pair(task->duration(), task->billedDuration()), task->cost(), task->billedCost(),
+                          task->billingCurrency());
       case ImageRole:
         return task->tableImage();
       case TimerImageRole:
@@ -352,7 +370,13 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       return DurationText::stringWithMinutes(item->duration());
     case CostTextRole:
       if (entity != WTEntity::Time && entity != WTEntity::Flat && entity != WTEntity::Expense) return {};
-      return MoneyFormat::format(item->cost());
+      return MoneyFormat::format(item->cost(), item->billingCurrency());
+    case BilledTextRole: {
+      if (entity != WTEntity::Time && entity != WTEntity::Flat && entity != WTEntity::Expense) return {};
+      std::optional<std::pair<int, int>> durations;
+      if (entity != WTEntity::Expense) durations = std::pair(item->duration(), item->billedDuration());
+      return billedText(durations, item->cost(), item->billedCost(), item->billingCurrency());
+    }
     case AmountEditRole:
       if (entity != WTEntity::Expense) return {};
       return TypedNumber::editableText(static_cast<const WTExpense*>(item)->expense().value_or(Decimal()));

@@ -33,7 +33,8 @@ bool isShownKeyOfItem(const QString& key) {
                                      QStringLiteral("duration"),  QStringLiteral("cost"),
                                      QStringLiteral("running"),   QStringLiteral("endDate"),
                                      QStringLiteral("expense"),   QStringLiteral("minutes"),
-                                     QStringLiteral("completed"), QStringLiteral("startDate")};
+                                     QStringLiteral("completed"), QStringLiteral("startDate"),
+                                     QStringLiteral("billedCost"), QStringLiteral("billedDuration")};
   return keys.contains(key);
 }
 
@@ -45,7 +46,9 @@ bool isShownKeyOfTask(const QString& key) {
                                      QStringLiteral("running"),
                                      QStringLiteral("tableImage"),
                                      QStringLiteral("timerButtonImage"),
-                                     QStringLiteral("budget")};
+                                     QStringLiteral("budget"),
+                                     QStringLiteral("billedCost"),
+                                     QStringLiteral("billedDuration")};
   return keys.contains(key);
 }
 
@@ -126,7 +129,10 @@ void WTItemsModel::objectValueDidChange(WTObject* object, const QString& key) {
   if (!project_) return;
   // A rate reaches the cost of every row below the record it is set on: those rows are shown anew at
   // once, day groups included, since no cost of theirs announces itself.
-  if (key == QLatin1String("rate")) {
+  // A rounding rule and a currency are announced, like a rate, by the record they are set on or that
+  // inherits them, not by each item below it.
+  if (key == QLatin1String("rate") || key == QLatin1String("roundingRule") ||
+      key == QLatin1String("billingCurrency")) {
     if (object == project_) {
       markSubtreeChanged(root_.get());
     } else if (project_->client() && object == project_->client()) {

@@ -35,7 +35,7 @@ void WTItemsViewController::refreshHeader() {
   if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
   setElidedText(clientLabel_, client);
   durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
-  totalsLabel_->setText(MoneyFormat::format(project_->cost()));
+  totalsLabel_->setText(MoneyFormat::format(project_->cost(), project_->billingCurrency()));
   rateField_->setPlaceholderText(WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {

@@ -43,18 +43,33 @@ std::optional<double> fraction(const Decimal& billed, const std::optional<Decima
 Decimal billed(const WTObject* object) {
   switch (object->entity()) {
     case WTEntity::Task:
-      return static_cast<const WTTask*>(object)->cost();
+      return static_cast<const WTTask*>(object)->billedCost();
     case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->cost();
+      return static_cast<const WTProject*>(object)->billedCost();
     default:
       return Decimal();
   }
 }
 
 std::optional<Decimal> budget(const WTObject* object) {
-  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->budget();
-  return std::nullopt;
+  switch (object->entity()) {
+    case WTEntity::Task:
+      return static_cast<const WTTask*>(object)->budget();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->budget();
+    default:
+      return std::nullopt;
+  }
 }
+
+namespace {
+
+QString currencyOf(const WTObject* object) {
+  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->billingCurrency();
+  return static_cast<const WTProject*>(object)->billingCurrency();
+}
+
+}  // namespace
 
 QString standing(const WTObject* object) {
   const std::optional<Decimal> limit = budget(object);
@@ -64,9 +79,11 @@ QString standing(const WTObject* object) {
   // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached.
   const QString percent = QLocale().toString(qint64(std::floor(*share * 100.0)));
   const Decimal left = *limit - spent;
-  const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left))
-                                         : QObject::tr("%1 left").arg(MoneyFormat::format(left));
-  return QObject::tr("%1 % of the budget of %2 · %3").arg(percent, MoneyFormat::format(*limit), rest);
+  const QString currency = currencyOf(object);
+  const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left, currency))
+                                         : QObject::tr("%1 left").arg(MoneyFormat::format(left, currency));
+  return QObject::tr("%1 % of the budget of %2 · %3")
+      .arg(percent, MoneyFormat::format(*limit, currency), rest);
 }
 
 }  // namespace WTBudget
