@@ -3,6 +3,7 @@
 #include "WTBillingDialog.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
+#include "WTProjectsViewController.h"
 
 namespace {
 
@@ -216,6 +217,54 @@ TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
   EXPECT_FALSE(acme->storedRate().has_value());
   EXPECT_EQ(filled, 2);
   clients.tableView()->setClickedRow(-1);
+}
+
+// Each row menu opens the billing sheet: a client's currency among the ISO codes, every row's rounding
+// (empty or 0 inherits, and says what); what it cannot take stays in view and nothing is stored.
+TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRefusesInView) {
+  acme->setRoundingMinutes(15);
+  std::unique_ptr<QMenu> taskMenu(controller->taskMenu(design));
+  EXPECT_NE(actionTitled(taskMenu.get(), "Budget and Rounding…"), nullptr);
+  ShownProjects projects(context.get(), QSize(600, 400));
+  EXPECT_NE(actionTitled(projects.controller.rowMenu(), "Budget and Rounding…"), nullptr);
+  WTClientsViewController clients(context.get());
+  EXPECT_NE(actionTitled(clients.rowMenu(), "Currency and Rounding…"), nullptr);
+  // The stored rule (after a client's currency): "JPY 15 up", "none" where it inherits.
+  auto stored = [](const WTObject* object) {
+    const auto text = [](const auto* record) {
+      const std::optional<int> minutes = record->roundingMinutes();
+      const QString mode = record->roundingMode();
+      return (minutes ? QString::number(*minutes) : "none") + ' ' + (mode.isNull() ? "none" : mode);
+    };
+    if (const auto* client = dynamic_cast<const WTClient*>(object))
+      return (client->currency().isNull() ? "none" : client->currency()) + ' ' + text(client);
+    if (const auto* project = dynamic_cast<const WTProject*>(object)) return text(project);
+    return text(static_cast<const WTTask*>(object));
+  };
+  const std::tuple<WTObject*, const char*, const char*, int, bool, const char*> rows[] = {
+      // record, currency typed, minutes typed, mode chosen (0 inherits), refused, stored
+      {acme, "jpy", "15", 1, false, "JPY 15 up"},     {acme, "XYZ", "6", 3, true, "JPY 15 up"},
+      {acme, "", "", 0, false, "none none none"},     {project, nullptr, "6", 3, false, "6 down"},
+      {design, nullptr, "7.5", 2, true, "none none"}, {design, nullptr, "0", 2, false, "none nearest"},
+  };
+  for (const auto& [object, currency, minutes, mode, refused, after] : rows) {
+    SCOPED_TRACE(object->name().toStdString() + ' ' + minutes);
+    WTBillingDialog dialog(object);
+    dialog.show();
+    if (currency) dialog.currencyField()->setCurrentText(currency);
+    dialog.roundingMinutesField()->setText(minutes);
+    dialog.roundingModeField()->setCurrentIndex(mode);
+    dialog.accept();
+    EXPECT_EQ(dialog.isVisible(), refused);
+    QLineEdit* field = currency && std::string(currency) == "XYZ" ? dialog.currencyField()->lineEdit()
+                                                                  : dialog.roundingMinutesField();
+    EXPECT_EQ(refused, refusedIn(field, field->text()));
+    EXPECT_EQ(stored(object), after);
+  }
+  EXPECT_EQ(WTBillingDialog(project).roundingMinutesField()->text(), "6");
+  EXPECT_EQ(WTBillingDialog(design).roundingMinutesField()->placeholderText(), "Inherited: 6");
+  defaults->setValue("WTCurrency", "CHF");
+  EXPECT_EQ(WTBillingDialog(acme).currencyField()->lineEdit()->placeholderText(), "Inherited: CHF");
 }
 
 }  // namespace
