@@ -187,7 +187,7 @@ QRectF WTTableCellView::partRect(Part part, const QRectF& row) const {
       if (!task && id != QLatin1String("Project")) return {};
       // Under the cost's figures, as wide as a four-figure amount and ending with them.
       constexpr qreal kBarWidth = 64.0;
-      return QRectF(costX + kCostWidth - kBarWidth, line.y() + line.height() / 2.0 + 9.0, kBarWidth, 3.0);
+      return QRectF(costX + kCostWidth - kBarWidth, line.y() + line.height() / 2.0 + 10.0, kBarWidth, 3.0);
     }
   }
   return {};

@@ -65,32 +65,52 @@ TEST_F(WTLookTest, ABudgetBarUnderTheCostTakesItsColourFromTheShareBilled) {
   WTTask* task = makeTask(project, "Design");
   makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));  // half an hour: 100.00
   ShownOutline shown(context.get(), project, QSize(800, 400));
+  ShownProjects list(context.get(), QSize(800, 400));
   const QColor highlight(10, 90, 200);
-  QPalette palette = shown.outline()->palette();
-  palette.setColor(QPalette::Highlight, highlight);
-  shown.outline()->setPalette(palette);
+  struct Place {
+    WTObject* record;
+    QAbstractItemView* view;
+    QModelIndex row;
+    const char* cell;
+  };
   endTurn();
-  shown.outline()->selectionModel()->clearSelection();
-  const QColor base = palette.color(QPalette::Base);
-  const std::tuple<const char*, QColor, const char*> rows[] = {
+  const Place places[] = {{task, shown.outline(), shown.rowOf(task), "WTTask"},
+                          {project, list.controller.tableView(),
+                           list.controller.arrayController()->indexOfObject(project), "Project"}};
+  const std::tuple<const char*, std::optional<QColor>, const char*> rows[] = {
       {"200", highlight, "50 % of the budget of 200.00 · 100.00 left"},
       {"125", QColor(0xe8, 0x9a, 0x00), "80 % of the budget of 125.00 · 25.00 left"},
       {"99.99", QColor(0xd0, 0x30, 0x30), "100 % of the budget of 99.99 · 0.01 over"},
-      {nullptr, base, ""},
+      {nullptr, std::nullopt, ""},  // no bar: the row as it is beside it
   };
-  for (const auto& [budget, colour, tip] : rows) {
-    SCOPED_TRACE(budget ? budget : "none");
-    QSignalSpy repainted(shown.controller.treeController(), &QAbstractItemModel::dataChanged);
-    task->setBudget(budget ? std::optional(dec(budget)) : std::nullopt);
-    endTurn();
-    ASSERT_FALSE(repainted.isEmpty());
-    EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), shown.rowOf(task));
-    const QImage image = shown.outline()->viewport()->grab().toImage();
-    const QRect visual = shown.outline()->visualRect(shown.rowOf(task));
-    const QRectF bar = WTTableCellView("WTTask").partRect(
-        WTTableCellView::Part::BudgetBar, QRectF(0, visual.y(), image.width(), visual.height()));
-    EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, int(bar.top()) + 1), colour);
-    EXPECT_EQ(shown.tipAt(shown.centreOf(task, WTTableCellView::Part::Cost)), tip);
+  for (const Place& place : places) {
+    QPalette palette = place.view->palette();
+    palette.setColor(QPalette::Highlight, highlight);
+    place.view->setPalette(palette);
+    place.view->selectionModel()->clearSelection();
+    for (const auto& [budget, colour, tip] : rows) {
+      SCOPED_TRACE(std::string(place.cell) + ' ' + (budget ? budget : "none"));
+      QSignalSpy repainted(place.row.model(), &QAbstractItemModel::dataChanged);
+      const std::optional<Decimal> value = budget ? std::optional(dec(budget)) : std::nullopt;
+      place.record == task ? task->setBudget(value) : project->setBudget(value);
+      endTurn();
+      ASSERT_FALSE(repainted.isEmpty());
+      EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), place.row);
+      const QImage image = place.view->viewport()->grab().toImage();
+      const QRect visual = place.view->visualRect(place.row);
+      const QRectF row(0, visual.y(), image.width(), visual.height());
+      const WTTableCellView cell(place.cell);
+      const QRectF bar = cell.partRect(WTTableCellView::Part::BudgetBar, row);
+      const int y = int(bar.top()) + 1;
+      EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, y),
+                colour.value_or(image.pixelColor(int(bar.left()) - 4, y)));
+      QToolTip::hideText();
+      EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
+      const QPoint cost = cell.partRect(WTTableCellView::Part::Cost, row).center().toPoint();
+      QHelpEvent help(QEvent::ToolTip, cost, place.view->viewport()->mapToGlobal(cost));
+      QApplication::sendEvent(place.view->viewport(), &help);
+      EXPECT_EQ(QToolTip::isVisible() ? QToolTip::text() : QString(), tip);
+    }
   }
 }
 
