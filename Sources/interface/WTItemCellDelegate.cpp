@@ -186,9 +186,13 @@ void WTItemCellDelegate::paintContainer(QPainter& painter, const QStyleOptionVie
   QFont bold = option.font;
   bold.setBold(true);
   bold.setPointSizeF(std::max<qreal>(bold.pointSizeF() - 1.0, 8.0));
+  QRectF title = cell.partRect(WTTableCellView::Part::Name, row);
+  QStyleOptionViewItem onHeader = option;  // the billed figures dimmed white, as on a selected row
+  onHeader.state |= QStyle::State_Selected;
+  onHeader.palette.setColor(QPalette::HighlightedText, Qt::white);
+  drawBilled(painter, onHeader, index, title);
   painter.setFont(bold);
   painter.setPen(Qt::white);
-  const QRectF title = cell.partRect(WTTableCellView::Part::Name, row);
   painter.drawText(title, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::NameRole).toString());
   painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::DurationTextRole).toString());

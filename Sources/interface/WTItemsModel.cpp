@@ -71,10 +71,6 @@ QString dayTitle(Date day) {
   return RZDate::stringWithPattern(day, cached.pattern);
 }
 
-QString currencyOfTask(const WTTask* task) {
-  return task ? task->billingCurrency() : QString();
-}
-
 // The billed figures beside the raw ones, each only where its text differs from the raw one's.
 QString billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost, const Decimal& billed,
                    const QString& currency) {
@@ -294,7 +290,10 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case DurationTextRole:
         return DurationText::stringWithMinutes(container.duration());
       case CostTextRole:
-        return MoneyFormat::format(container.cost(), currencyOfTask(container.task()));
+        return MoneyFormat::format(container.cost(), container.billingCurrency());
+      case BilledTextRole:
+        return billedText(std::pair(container.duration(), container.billedDuration()), container.cost(),
+                          container.billedCost(), container.billingCurrency());
       default:
         return {};
     }

@@ -161,9 +161,11 @@ TEST_F(WTItemsModelTest, RowsShowTheBilledFiguresWhereTheyDifferFromTheRawOnes) 
   model->setProject(project);
   endTurn();
   auto rows = [&] {
-    QStringList shown{QStringLiteral("Design: ") +
-                      model->indexOfObject(design).data(WTItemsModel::DurationTextRole).toString() + ' ' +
-                      model->indexOfObject(design).data(WTItemsModel::BilledTextRole).toString()};
+    const QModelIndex task = model->indexOfObject(design), day = model->indexOfContainerOfItem(seven);
+    QStringList shown{"Design: " + task.data(WTItemsModel::DurationTextRole).toString() + ' ' +
+                          task.data(WTItemsModel::BilledTextRole).toString(),
+                      "day: " + day.data(WTItemsModel::CostTextRole).toString() + ' ' +
+                          day.data(WTItemsModel::BilledTextRole).toString()};
     for (const WTItem* item : design->valuableItems()) {
       const QModelIndex row = model->indexOfObject(item);
       shown << item->name() + ": " + row.data(WTItemsModel::DurationTextRole).toString() + ' ' +
@@ -172,18 +174,20 @@ TEST_F(WTItemsModelTest, RowsShowTheBilledFiguresWhereTheyDifferFromTheRawOnes) 
     }
     return shown;
   };
-  EXPECT_EQ(rows(), QStringList({"Design: 01:23 billed 01:45 · 187.35", "expense:  12.35 ",
-                                 "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 01:00 · 100.00",
-                                 "seven: 00:07 11.67 billed 00:15 · 25.00"}));
+  EXPECT_EQ(rows(),
+            QStringList({"Design: 01:23 billed 01:45 · 187.35", "day: 150.68 billed 01:45 · 187.35",
+                         "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 01:00 · 100.00",
+                         "seven: 00:07 11.67 billed 00:15 · 25.00"}));
   QSignalSpy changed(model.get(), &QAbstractItemModel::dataChanged);
   project->setRoundingMode("nearest");
   endTurn();
   ASSERT_TRUE(std::any_of(changed.begin(), changed.end(), [&](const QList<QVariant>& signal) {
     return signal[0].value<QModelIndex>() == model->indexOfObject(seven);
   }));
-  EXPECT_EQ(rows(), QStringList({"Design: 01:23 billed 01:15 · 137.35", "expense:  12.35 ",
-                                 "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 00:45 · 75.00",
-                                 "seven: 00:07 11.67 billed 00:00 · 0.00"}));
+  EXPECT_EQ(rows(),
+            QStringList({"Design: 01:23 billed 01:15 · 137.35", "day: 150.68 billed 01:15 · 137.35",
+                         "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 00:45 · 75.00",
+                         "seven: 00:07 11.67 billed 00:00 · 0.00"}));
 }
 
 // A drag carries uuids in outline order and whether tasks go with it; where it may land follows.
