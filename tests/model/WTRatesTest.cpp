@@ -273,6 +273,8 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
        "task.billingCurrency task.billedCost project.billedCost client.billedCost !task.billedDuration", "60 60 100"},
       {"preferred rule", {}, [this](Records&) { defaults->setValue("WTRoundingMinutes", 30); }, "task.billedCost client.billedCost", "60 60 100"},
       {"preferred currency", {}, [this](Records&) { defaults->setValue("WTCurrency", "KWD"); }, "task.billedCost client.billingCurrency client.billedCost", "60 60 100"},
+      {"task out of its project", {}, [](Records& r) { r.task->setProject(nullptr); },
+       "client.duration client.billedCost project.billedDuration task.billedCost", "0 60 0"},
       {"entry to another task", {}, [](Records& r) { r.time->setTask(r.other); },
        "task.duration task.children other.duration client.duration", "60 30 100"},
   };
