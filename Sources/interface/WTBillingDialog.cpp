@@ -107,7 +107,8 @@ Parsed<std::optional<int>> parseMinutes(const QString& typed) {
   if (!reading.value || reading.value->isZero()) return {true, std::nullopt, {}};
   const Decimal& minutes = *reading.value;
   if (minutes.isNegative() || !(minutes.rounded(0) == minutes) || minutes > Decimal(24 * 60))
-    return {false, std::nullopt, QObject::tr("Not a rounding: whole minutes from 1 to 1440, or empty to inherit")};
+    return {false, std::nullopt,
+            QObject::tr("Not a rounding: whole minutes from 1 to 1440, or empty to inherit")};
   return {true, int(minutes.toInt64()), {}};
 }
 
@@ -132,7 +133,8 @@ Parsed<QString> parseCurrency(const QString& typed) {
   const QString code = typed.trimmed().toUpper();
   if (code.isEmpty()) return {true, QString(), {}};
   if (!currencyCodes().contains(code))
-    return {false, QString(), QObject::tr("Not a currency: type an ISO 4217 code such as EUR, or leave it empty")};
+    return {false, QString(),
+            QObject::tr("Not a currency: type an ISO 4217 code such as EUR, or leave it empty")};
   return {true, code, {}};
 }
 
@@ -195,7 +197,8 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
     }
   };
   modeField_->addItem(tr("Inherited: %1").arg(modeTitle(above.mode)), QString());
-  for (const auto mode : {WTRoundingRule::Mode::Up, WTRoundingRule::Mode::Nearest, WTRoundingRule::Mode::Down})
+  for (const auto mode :
+       {WTRoundingRule::Mode::Up, WTRoundingRule::Mode::Nearest, WTRoundingRule::Mode::Down})
     modeField_->addItem(modeTitle(mode), WTRoundingRule::nameOfMode(mode));
   modeField_->setCurrentIndex(std::max(0, modeField_->findData(own.mode)));
   auto* rounding = new QHBoxLayout;

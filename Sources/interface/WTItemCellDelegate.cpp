@@ -72,7 +72,8 @@ QString elided(const QPainter& painter, const QString& text, qreal width) {
 
 // The billed figures where they differ from the raw ones, small and dimmed at the end of the name's room,
 // right before the duration they stand beside; the name gives up that room.
-void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index, QRectF& name) {
+void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,
+                QRectF& name) {
   const QString text = index.data(WTItemsModel::BilledTextRole).toString();
   if (text.isEmpty()) return;
   QFont small = option.font;

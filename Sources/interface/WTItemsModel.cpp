@@ -313,8 +313,8 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case CostTextRole:
         return MoneyFormat::format(task->cost(), task->billingCurrency());
       case BilledTextRole:
-        return billedText(std::pair(task->duration(), task->billedDuration()), task->cost(), task->billedCost(),
-                          task->billingCurrency());
+        return billedText(std::pair(task->duration(), task->billedDuration()), task->cost(),
+                          task->billedCost(), task->billingCurrency());
       case ImageRole:
         return task->tableImage();
       case TimerImageRole:

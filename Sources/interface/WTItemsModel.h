@@ -53,8 +53,8 @@ class WTItemsModel : public QAbstractItemModel {
     // Stopped time entries: the duration as DurationEditRole, set by moving the start (the end stays).
     SpentDurationEditRole,
     BudgetRole,  // tasks with a budget: a WTBudgetState
-    // What a task, group or item bills where it differs from the duration and cost shown ("billed 0:15 · 25.00");
-    // empty where they agree.
+    // What a task, group or item bills where it differs from the duration and cost shown ("billed 0:15
+    // · 25.00"); empty where they agree.
     BilledTextRole,
   };
 

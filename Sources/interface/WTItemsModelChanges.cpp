@@ -29,12 +29,11 @@ bool isStructureKeyOfItem(const QString& key) {
 }
 
 bool isShownKeyOfItem(const QString& key) {
-  static const QSet<QString> keys = {QStringLiteral("name"),      QStringLiteral("notes"),
-                                     QStringLiteral("duration"),  QStringLiteral("cost"),
-                                     QStringLiteral("running"),   QStringLiteral("endDate"),
-                                     QStringLiteral("expense"),   QStringLiteral("minutes"),
-                                     QStringLiteral("completed"), QStringLiteral("startDate"),
-                                     QStringLiteral("billedCost"), QStringLiteral("billedDuration")};
+  static const QSet<QString> keys = {
+      QStringLiteral("name"),      QStringLiteral("notes"),      QStringLiteral("duration"),
+      QStringLiteral("cost"),      QStringLiteral("running"),    QStringLiteral("endDate"),
+      QStringLiteral("expense"),   QStringLiteral("minutes"),    QStringLiteral("completed"),
+      QStringLiteral("startDate"), QStringLiteral("billedCost"), QStringLiteral("billedDuration")};
   return keys.contains(key);
 }
 
