@@ -13,10 +13,12 @@
 #include "WTMainWindowController.h"
 #include "WTObject.h"
 #include "WTPasswordStore.h"
+#include "WTProject.h"
 #include "WTSleepMonitor.h"
 #include "WTStatusBarController.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStoreSetup.h"
+#include "WTTask.h"
 
 #include <QDBusConnection>
 
@@ -105,7 +107,11 @@ void WTApplication::linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifie
                                       WTMainWindowController& window) {
   connect(&watcher, &WTBudgetWatcher::budgetCrossed, &notifier,
           [&notifier](WTObject* object, WTBudget::Level level) {
-            const QString name = object->name().isEmpty() ? tr("Untitled") : object->name();
+            QString name = object->name().isEmpty() ? tr("Untitled") : object->name();
+            // A task is named with its project: many projects have a "General".
+            const WTProject* project =
+                object->entity() == WTEntity::Task ? static_cast<WTTask*>(object)->project() : nullptr;
+            if (project) name = tr("%1 › %2").arg(project->name(), name);
             const QString summary = level == WTBudget::Level::Over
                                         ? tr("“%1” is over its budget").arg(name)
                                         : tr("“%1” has used 80 % of its budget").arg(name);

@@ -172,16 +172,19 @@ TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStat
   auto* task = WTTask::insertNewObject(delegate->managedObjectContext());
   task->setName("Design");
   task->setBudget(Decimal(100));
+  task->setProject(WTProject::insertNewObject(delegate->managedObjectContext()));
+  task->project()->setName("Website");
+  task->project()->setRate(Decimal(75));
   auto* time = WTTime::insertNewObject(delegate->managedObjectContext());
   time->setTask(task);
-  time->setEndDate(time->startDate()->addingSeconds(2 * 3600));  // 2 hours at the built-in 75
+  time->setEndDate(time->startDate()->addingSeconds(2 * 3600));  // 2 hours at 75
   EXPECT_EQ(window.findChild<QStatusBar*>("statusLine"), nullptr);
   emit watcher.budgetCrossed(task, WTBudget::Level::Over);
   QStatusBar* line = nullptr;
   EXPECT_TRUE(QTest::qWaitFor([&] { return (line = window.findChild<QStatusBar*>("statusLine")); }));
   ASSERT_TRUE(line && line->isVisible());
   EXPECT_EQ(line->currentMessage(),
-            "“Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
+            "“Website › Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
 }
 
 // Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.
