@@ -57,6 +57,11 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   acme->setRate(Decimal(1250));
   endTurn();
   EXPECT_EQ(field->placeholderText(), "Inherited: 1,250.00");
+  acme->setCurrency("JPY");  // in the places of the client's currency
+  endTurn();
+  EXPECT_EQ(field->placeholderText(), "Inherited: 1,250");
+  acme->setCurrency(QString());
+  endTurn();
   const QMargins margins = field->textMargins();
   EXPECT_LE(field->fontMetrics().horizontalAdvance(field->placeholderText()),
             field->contentsRect().width() - margins.left() - margins.right() - 4);
