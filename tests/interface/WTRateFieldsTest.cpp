@@ -234,23 +234,21 @@ TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRef
   EXPECT_NE(actionTitled(projects.controller.rowMenu(), "Budget and Rounding…"), nullptr);
   WTClientsViewController clients(context.get());
   EXPECT_NE(actionTitled(clients.rowMenu(), "Currency and Rounding…"), nullptr);
-  // The stored rule (after a client's currency): "JPY 15 up", "none" where it inherits.
+  // The stored currency, minutes and mode by key: "JPY 15 up", "none" where it inherits.
   auto stored = [](const WTObject* object) {
-    const auto text = [](const auto* record) {
-      const std::optional<int> minutes = record->roundingMinutes();
-      const QString mode = record->roundingMode();
-      return (minutes ? QString::number(*minutes) : "none") + ' ' + (mode.isNull() ? "none" : mode);
-    };
-    if (const auto* client = dynamic_cast<const WTClient*>(object))
-      return (client->currency().isNull() ? "none" : client->currency()) + ' ' + text(client);
-    if (const auto* project = dynamic_cast<const WTProject*>(object)) return text(project);
-    return text(static_cast<const WTTask*>(object));
+    QStringList values;
+    for (const char* key : {"currency", "roundingMinutes", "roundingMode"})
+      values << object->valueForKey(key).toString();
+    return values.replaceInStrings(QRegularExpression("^$"), "none").join(' ');
   };
   const std::tuple<WTObject*, const char*, const char*, int, bool, const char*> rows[] = {
       // record, currency typed, minutes typed, mode chosen (0 inherits), refused, stored
-      {acme, "jpy", "15", 1, false, "JPY 15 up"},     {acme, "XYZ", "6", 3, true, "JPY 15 up"},
-      {acme, "", "", 0, false, "none none none"},     {project, nullptr, "6", 3, false, "6 down"},
-      {design, nullptr, "7.5", 2, true, "none none"}, {design, nullptr, "0", 2, false, "none nearest"},
+      {acme, "jpy", "15", 1, false, "JPY 15 up"},
+      {acme, "XYZ", "6", 3, true, "JPY 15 up"},
+      {acme, "", "", 0, false, "none none none"},
+      {project, nullptr, "6", 3, false, "none 6 down"},
+      {design, nullptr, "7.5", 2, true, "none none none"},
+      {design, nullptr, "0", 2, false, "none none nearest"},
   };
   for (const auto& [object, currency, minutes, mode, refused, after] : rows) {
     SCOPED_TRACE(object->name().toStdString() + ' ' + minutes);
