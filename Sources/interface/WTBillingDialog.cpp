@@ -254,8 +254,8 @@ void WTBillingDialog::accept() {
   QDialog::accept();
 }
 
-QString WTBillingDialog::menuTitle(const WTObject* object) {
-  return object->entity() == WTEntity::Client ? tr("Currency and Rounding…") : tr("Budget and Rounding…");
+QString WTBillingDialog::menuTitle(WTEntity entity) {
+  return entity == WTEntity::Client ? tr("Currency and Rounding…") : tr("Budget and Rounding…");
 }
 
 void WTBillingDialog::editBilling(WTObject* object, QWidget* parent) {

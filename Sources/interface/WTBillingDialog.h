@@ -1,5 +1,7 @@
 #pragma once
 
+#include "WTEntity.h"
+
 #include <QDialog>
 
 class QComboBox;
@@ -24,9 +26,9 @@ class WTBillingDialog : public QDialog {
 
   void accept() override;
 
-  // The row menu's title for `object`'s sheet: "Currency and Rounding…" for a client, else "Budget and
+  // The row menu's title for the sheet: "Currency and Rounding…" for a client, else "Budget and
   // Rounding…".
-  static QString menuTitle(const WTObject* object);
+  static QString menuTitle(WTEntity entity);
   // Opens the sheet for `object` and waits for it to be closed.
   static void editBilling(WTObject* object, QWidget* parent);
 

@@ -31,7 +31,7 @@ void WTClientsViewController::addRowMenuItems(QMenu* menu) {
   menu->addAction(tr("Set Rate…"), this, [this] {
     if (WTObject* client = clickedObject()) WTRateDialog::editRate(client, tableView());
   });
-  menu->addAction(tr("Currency and Rounding…"), this, [this] {
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Client), this, [this] {
     if (WTObject* client = clickedObject()) WTBillingDialog::editBilling(client, tableView());
   });
   menu->addSeparator();

@@ -211,7 +211,7 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   QPointer<WTOutlineView> outline = outlineView_;
   menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
-  menu->addAction(WTBillingDialog::menuTitle(task), this,
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Task), this,
                   [task, outline] { WTBillingDialog::editBilling(task, outline); });
   return menu;
 }

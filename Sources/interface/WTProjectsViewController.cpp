@@ -105,7 +105,7 @@ void WTProjectsViewController::addRowMenuItems(QMenu* menu) {
   menu->addAction(tr("Open"), this, [this] {
     if (WTObject* project = clickedObject()) openProject(static_cast<WTProject*>(project));
   });
-  menu->addAction(tr("Budget and Rounding…"), this, [this] {
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Project), this, [this] {
     if (WTObject* project = clickedObject()) WTBillingDialog::editBilling(project, tableView());
   });
   menu->addSeparator();
