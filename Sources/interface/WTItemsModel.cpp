@@ -71,17 +71,6 @@ QString dayTitle(Date day) {
   return RZDate::stringWithPattern(day, cached.pattern);
 }
 
-// The billed figures beside the raw ones, each only where its text differs from the raw one's.
-QString billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost, const Decimal& billed,
-                   const QString& currency) {
-  QStringList parts;
-  if (durations && durations->first != durations->second)
-    parts.append(DurationText::stringWithMinutes(durations->second));
-  const QString billedCost = MoneyFormat::format(billed, currency);
-  if (billedCost != MoneyFormat::format(cost, currency) || !parts.isEmpty()) parts.append(billedCost);
-  return parts.isEmpty() ? QString() : WTItemsModel::tr("billed %1").arg(parts.join(QStringLiteral(" · ")));
-}
-
 }  // namespace
 
 WTItemsModel::WTItemsModel(WTObjectContext* context, QObject* parent)
@@ -393,6 +382,16 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
     default:
       return {};
   }
+}
+
+QString WTItemsModel::billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost,
+                                 const Decimal& billed, const QString& currency) {
+  QStringList parts;
+  if (durations && durations->first != durations->second)
+    parts.append(DurationText::stringWithMinutes(durations->second));
+  const QString billedCost = MoneyFormat::format(billed, currency);
+  if (billedCost != MoneyFormat::format(cost, currency) || !parts.isEmpty()) parts.append(billedCost);
+  return parts.isEmpty() ? QString() : tr("billed %1").arg(parts.join(QStringLiteral(" · ")));
 }
 
 QString WTItemsModel::refusalFor(int role, const QString& text) {

@@ -125,6 +125,7 @@ QWidget* WTItemsViewController::loadView() {
   titleFont.setPointSizeF(titleFont.pointSizeF() + 3);
   titleLabel_->setFont(titleFont);
   clientLabel_ = new QLabel(header_);
+  clientLabel_->setObjectName(QStringLiteral("projectClient"));
   clientLabel_->setStyleSheet(QStringLiteral("color: #666;"));
   // A long name gives way to the rate and the totals (shortened, whole in its tip) rather than widening
   // the window or running under them.

@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "RZBackgroundView.h"
 #include "WTClient.h"
+#include "WTItemsModel.h"
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTRateField.h"
@@ -33,6 +34,10 @@ void WTItemsViewController::refreshHeader() {
   setElidedText(titleLabel_, project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
   QString client = project_->client() ? project_->client()->name() : tr("No Client");
   if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
+  const QString billed =
+      WTItemsModel::billedText(std::pair(project_->duration(), project_->billedDuration()), project_->cost(),
+                               project_->billedCost(), project_->billingCurrency());
+  if (!billed.isEmpty()) client += QStringLiteral(" · ") + billed;
   setElidedText(clientLabel_, client);
   durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
   totalsLabel_->setText(MoneyFormat::format(project_->cost(), project_->billingCurrency()));

@@ -172,12 +172,13 @@ TEST_F(WTItemsModelTest, RowsShowTheBilledFiguresWhereTheyDifferFromTheRawOnes) 
                    row.data(WTItemsModel::CostTextRole).toString() + ' ' +
                    row.data(WTItemsModel::BilledTextRole).toString();
     }
+    shown << controller->view()->findChild<QLabel*>("projectClient")->property("fullText").toString();
     return shown;
   };
   EXPECT_EQ(rows(),
             QStringList({"Design: 01:23 billed 01:45 · 187.35", "day: 150.68 billed 01:45 · 187.35",
                          "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 01:00 · 100.00",
-                         "seven: 00:07 11.67 billed 00:15 · 25.00"}));
+                         "seven: 00:07 11.67 billed 00:15 · 25.00", "Acme · billed 01:45 · 187.35"}));
   QSignalSpy changed(model.get(), &QAbstractItemModel::dataChanged);
   project->setRoundingMode("nearest");
   endTurn();
@@ -187,7 +188,7 @@ TEST_F(WTItemsModelTest, RowsShowTheBilledFiguresWhereTheyDifferFromTheRawOnes) 
   EXPECT_EQ(rows(),
             QStringList({"Design: 01:23 billed 01:15 · 137.35", "day: 150.68 billed 01:15 · 137.35",
                          "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 00:45 · 75.00",
-                         "seven: 00:07 11.67 billed 00:00 · 0.00"}));
+                         "seven: 00:07 11.67 billed 00:00 · 0.00", "Acme · billed 01:15 · 137.35"}));
 }
 
 // A drag carries uuids in outline order and whether tasks go with it; where it may land follows.
