@@ -3,17 +3,22 @@
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTAppDelegate.h"
+#include "WTBudgetWatcher.h"
+#include "WTDesktopNotifier.h"
 #include "WTDialogAlertPresenter.h"
 #include "WTDialogTrackingAlertPresenter.h"
 #include "WTIdleSourceChain.h"
 #include "WTImages.h"
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
+#include "WTObject.h"
 #include "WTPasswordStore.h"
+#include "WTProject.h"
 #include "WTSleepMonitor.h"
 #include "WTStatusBarController.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStoreSetup.h"
+#include "WTTask.h"
 
 #include <QDBusConnection>
 
@@ -34,6 +39,7 @@ WTApplication::WTApplication(int& argc, char** argv)
 }
 
 WTApplication::~WTApplication() {
+  budgetWatcher_.reset();
   statusBarController_.reset();
   mainWindowController_.reset();
   delegate_.reset();
@@ -76,6 +82,9 @@ void WTApplication::applicationDidFinishLaunching() {
   statusBarController_ = std::make_unique<WTStatusBarController>(delegate_->managedObjectContext(), updater);
   linkStatusBar(*statusBarController_, *window);
   statusBarController_->activateStatusMenu();
+  budgetWatcher_ = std::make_unique<WTBudgetWatcher>(updater);
+  notifier_ = std::make_unique<WTDesktopNotifier>(QDBusConnection::sessionBus());
+  linkBudgetNotices(*budgetWatcher_, *notifier_, *window);
   // Only now, with the window and the store up, and only for an account: the keyring may prompt, and is
   // asked in the background. A password an earlier version kept in the settings file moves into it.
   delegate_->passwordStore()->load();
@@ -92,6 +101,26 @@ void WTApplication::linkStatusBar(WTStatusBarController& statusBar, WTMainWindow
   };
   connect(&statusBar, &WTStatusBarController::trayAvailabilityChanged, &window, followTray);
   followTray(statusBar.isShowingIcon());
+}
+
+void WTApplication::linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifier& notifier,
+                                      WTMainWindowController& window) {
+  connect(&watcher, &WTBudgetWatcher::budgetCrossed, &notifier,
+          [&notifier](WTObject* object, WTBudget::Level level) {
+            QString name = object->name().isEmpty() ? tr("Untitled") : object->name();
+            // A task is named with its project: many projects have a "General".
+            const WTProject* project =
+                object->entity() == WTEntity::Task ? static_cast<WTTask*>(object)->project() : nullptr;
+            if (project) name = tr("%1 › %2").arg(project->name(), name);
+            const QString summary = level == WTBudget::Level::Over
+                                        ? tr("“%1” is over its budget").arg(name)
+                                        : tr("“%1” has used 80 % of its budget").arg(name);
+            notifier.notify(summary, WTBudget::standing(object));
+          });
+  connect(&notifier, &WTDesktopNotifier::notShown, &window,
+          [&window](const QString& summary, const QString& body) {
+            window.showNotice(tr("%1 — %2").arg(summary, body));
+          });
 }
 
 bool WTApplication::applicationShouldHandleReopen(bool) {

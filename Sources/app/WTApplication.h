@@ -7,6 +7,8 @@
 class QMainWindow;
 class UserDefaults;
 class WTAppDelegate;
+class WTBudgetWatcher;
+class WTDesktopNotifier;
 class WTDialogAlertPresenter;
 class WTIdleSource;
 class WTLauncherEntry;
@@ -41,6 +43,10 @@ class WTApplication : public QApplication {
   // Makes the window follow the tray: with one, closing the window leaves Tessal in the tray; without,
   // the toolbar's running-time button opens the tray's list. Both ways lead to the window and to Quit.
   static void linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window);
+  // Says when a running timer takes a task or project past 80 % or past its budget: through the
+  // desktop's notifications, on the window's status line where they are not shown.
+  static void linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifier& notifier,
+                                WTMainWindowController& window);
 
  private:
   std::unique_ptr<UserDefaults> defaults_;
@@ -53,4 +59,6 @@ class WTApplication : public QApplication {
   std::unique_ptr<WTAppDelegate> delegate_;
   std::unique_ptr<WTMainWindowController> mainWindowController_;
   std::unique_ptr<WTStatusBarController> statusBarController_;
+  std::unique_ptr<WTBudgetWatcher> budgetWatcher_;
+  std::unique_ptr<WTDesktopNotifier> notifier_;
 };

@@ -26,6 +26,7 @@
 #include <QCloseEvent>
 #include <QMenuBar>
 #include <QScreen>
+#include <QStatusBar>
 #include <QStyle>
 #include <QToolBar>
 #include <QToolButton>
@@ -473,6 +474,18 @@ void WTMainWindowController::setRunningTimeButtonVisible(bool visible) {
 
 void WTMainWindowController::setRunningTime(const QString& label) {
   runningTimeButton_->setText(label.isEmpty() ? tr("Timers") : label);
+}
+
+void WTMainWindowController::showNotice(const QString& text) {
+  QStatusBar* line = statusBar();
+  if (!line->property("followsNotices").toBool()) {
+    line->setProperty("followsNotices", true);
+    line->setObjectName(QStringLiteral("statusLine"));
+    connect(line, &QStatusBar::messageChanged, line,
+            [line](const QString& shown) { line->setVisible(!shown.isEmpty()); });
+  }
+  line->showMessage(text, kNoticeMilliseconds);
+  line->show();
 }
 
 void WTMainWindowController::closeEvent(QCloseEvent* event) {

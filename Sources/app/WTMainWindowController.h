@@ -89,6 +89,10 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void setRunningTimeButtonVisible(bool visible);
   void setRunningTime(const QString& label);
   QToolButton* runningTimeButton() const { return runningTimeButton_; }
+  // A notice on the status line under the lists, shown while it stands (the line is hidden without
+  // one); it takes no focus and ends no edit.
+  void showNotice(const QString& text);
+  static constexpr int kNoticeMilliseconds = 10 * 60 * 1000;
 
   WTProjectsViewController* projectsViewController() const { return projectsViewController_; }
   WTClientsViewController* clientsViewController() const { return clientsViewController_; }

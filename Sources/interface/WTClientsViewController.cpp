@@ -1,5 +1,6 @@
 #include "WTClientsViewController.h"
 
+#include "WTBillingDialog.h"
 #include "WTClient.h"
 #include "WTListView.h"
 #include "WTObjectContext.h"
@@ -29,6 +30,9 @@ void WTClientsViewController::addObject() {
 void WTClientsViewController::addRowMenuItems(QMenu* menu) {
   menu->addAction(tr("Set Rate…"), this, [this] {
     if (WTObject* client = clickedObject()) WTRateDialog::editRate(client, tableView());
+  });
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Client), this, [this] {
+    if (WTObject* client = clickedObject()) WTBillingDialog::editBilling(client, tableView());
   });
   menu->addSeparator();
 }

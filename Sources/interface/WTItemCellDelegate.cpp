@@ -2,6 +2,7 @@
 
 #include "RZColor.h"
 #include "RZTextMeasure.h"
+#include "WTBudgetBar.h"
 #include "WTImages.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
@@ -69,6 +70,25 @@ QString elided(const QPainter& painter, const QString& text, qreal width) {
   return painter.fontMetrics().elidedText(text, Qt::ElideRight, static_cast<int>(width));
 }
 
+// The billed figures where they differ from the raw ones, small and dimmed at the end of the name's room,
+// right before the duration they stand beside; the name gives up that room.
+void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QModelIndex& index,
+                QRectF& name) {
+  const QString text = index.data(WTItemsModel::BilledTextRole).toString();
+  if (text.isEmpty()) return;
+  QFont small = option.font;
+  small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
+  const qreal width = std::min(QFontMetricsF(small).horizontalAdvance(text) + 2.0, name.width() / 2.0);
+  const QRectF billed(name.right() - width, name.y(), width, name.height());
+  painter.save();
+  painter.setFont(small);
+  painter.setPen(dimTextColour(option));
+  painter.drawText(billed, Qt::AlignRight | Qt::AlignVCenter,
+                   painter.fontMetrics().elidedText(text, Qt::ElideLeft, static_cast<int>(width)));
+  painter.restore();
+  name.setRight(billed.left() - 8.0);
+}
+
 }  // namespace
 
 WTItemCellDelegate::WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view)
@@ -128,8 +148,9 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
 
   QFont bold = option.font;
   bold.setBold(true);
+  QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
+  drawBilled(painter, option, index, name);
   painter.setFont(bold);
-  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString title = index.data(WTItemsModel::NameRole).toString();
   painter.setPen(title.isEmpty() ? dimTextColour(option) : textColour(option));
   if (title.isEmpty()) title = tr("Untitled Task");
@@ -141,6 +162,10 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
                    index.data(WTItemsModel::DurationTextRole).toString());
   painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::CostTextRole).toString());
+  if (const QVariant budget = index.data(WTItemsModel::BudgetRole); budget.isValid()) {
+    WTBudgetBar::paint(painter, cell.partRect(WTTableCellView::Part::BudgetBar, row),
+                       budget.value<WTBudgetState>(), option.palette, selected);
+  }
   drawImage(painter, cell.partRect(WTTableCellView::Part::TimerButton, row),
             index.data(WTItemsModel::TimerImageRole).toString());
   if (option.state & QStyle::State_MouseOver) paintHoverBar(painter, row, cell, index);
@@ -162,9 +187,13 @@ void WTItemCellDelegate::paintContainer(QPainter& painter, const QStyleOptionVie
   QFont bold = option.font;
   bold.setBold(true);
   bold.setPointSizeF(std::max<qreal>(bold.pointSizeF() - 1.0, 8.0));
+  QRectF title = cell.partRect(WTTableCellView::Part::Name, row);
+  QStyleOptionViewItem onHeader = option;  // the billed figures dimmed white, as on a selected row
+  onHeader.state |= QStyle::State_Selected;
+  onHeader.palette.setColor(QPalette::HighlightedText, Qt::white);
+  drawBilled(painter, onHeader, index, title);
   painter.setFont(bold);
   painter.setPen(Qt::white);
-  const QRectF title = cell.partRect(WTTableCellView::Part::Name, row);
   painter.drawText(title, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::NameRole).toString());
   painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
                    index.data(WTItemsModel::DurationTextRole).toString());
@@ -216,10 +245,11 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
     QApplication::style()->drawPrimitive(QStyle::PE_IndicatorCheckBox, &check, &painter, view_);
   }
 
+  QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
+  drawBilled(painter, option, index, name);
   QFont nameFont = option.font;
   nameFont.setStrikeOut(completed);
   painter.setFont(nameFont);
-  const QRectF name = cell.partRect(WTTableCellView::Part::Name, row);
   QString text = index.data(WTItemsModel::NameRole).toString();
   painter.setPen(text.isEmpty() || completed ? dimTextColour(option) : textColour(option));
   if (text.isEmpty()) text = kind == QLatin1String("WTNote") ? tr("Empty note") : tr("No description");

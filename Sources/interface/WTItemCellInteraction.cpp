@@ -1,5 +1,6 @@
 #include "WTItemCellDelegate.h"
 
+#include "WTBudgetBar.h"
 #include "WTItemsModel.h"
 #include "WTItemsViewController.h"
 #include "WTNotesTextView.h"
@@ -240,6 +241,8 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
     case Part::Cost:
       if (index.data(WTItemsModel::KindRole).toString() == QLatin1String("WTExpense"))
         text = tr("Amount — double-click to change it");
+      else if (const QVariant budget = index.data(WTItemsModel::BudgetRole); budget.isValid())
+        text = budget.value<WTBudgetState>().text;
       break;
     default:
       break;

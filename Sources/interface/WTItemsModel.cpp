@@ -4,6 +4,7 @@
 #include "DurationText.h"
 #include "MoneyFormat.h"
 #include "RZDate.h"
+#include "WTBudgetBar.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
 #include "WTItem.h"
@@ -278,7 +279,10 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case DurationTextRole:
         return DurationText::stringWithMinutes(container.duration());
       case CostTextRole:
-        return MoneyFormat::format(container.cost());
+        return MoneyFormat::format(container.cost(), container.billingCurrency());
+      case BilledTextRole:
+        return billedText(std::pair(container.duration(), container.billedDuration()), container.cost(),
+                          container.billedCost(), container.billingCurrency());
       default:
         return {};
     }
@@ -296,7 +300,10 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       case DurationTextRole:
         return DurationText::stringWithMinutes(task->duration());
       case CostTextRole:
-        return MoneyFormat::format(task->cost());
+        return MoneyFormat::format(task->cost(), task->billingCurrency());
+      case BilledTextRole:
+        return billedText(std::pair(task->duration(), task->billedDuration()), task->cost(),
+                          task->billedCost(), task->billingCurrency());
       case ImageRole:
         return task->tableImage();
       case TimerImageRole:
@@ -305,6 +312,8 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
         return task->running();
       case Qt::ToolTipRole:
         return task->buttonTitle();
+      case BudgetRole:
+        return WTBudgetBar::variantOf(task);
       default:
         return {};
     }
@@ -349,7 +358,13 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
       return DurationText::stringWithMinutes(item->duration());
     case CostTextRole:
       if (entity != WTEntity::Time && entity != WTEntity::Flat && entity != WTEntity::Expense) return {};
-      return MoneyFormat::format(item->cost());
+      return MoneyFormat::format(item->cost(), item->billingCurrency());
+    case BilledTextRole: {
+      if (entity != WTEntity::Time && entity != WTEntity::Flat && entity != WTEntity::Expense) return {};
+      std::optional<std::pair<int, int>> durations;
+      if (entity != WTEntity::Expense) durations = std::pair(item->duration(), item->billedDuration());
+      return billedText(durations, item->cost(), item->billedCost(), item->billingCurrency());
+    }
     case AmountEditRole:
       if (entity != WTEntity::Expense) return {};
       return TypedNumber::editableText(static_cast<const WTExpense*>(item)->expense().value_or(Decimal()));
@@ -367,6 +382,16 @@ QVariant WTItemsModel::data(const QModelIndex& index, int role) const {
     default:
       return {};
   }
+}
+
+QString WTItemsModel::billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost,
+                                 const Decimal& billed, const QString& currency) {
+  QStringList parts;
+  if (durations && durations->first != durations->second)
+    parts.append(DurationText::stringWithMinutes(durations->second));
+  const QString billedCost = MoneyFormat::format(billed, currency);
+  if (billedCost != MoneyFormat::format(cost, currency) || !parts.isEmpty()) parts.append(billedCost);
+  return parts.isEmpty() ? QString() : tr("billed %1").arg(parts.join(QStringLiteral(" · ")));
 }
 
 QString WTItemsModel::refusalFor(int role, const QString& text) {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Date.h"
+#include "Decimal.h"
 #include "WTItem.h"
 
 #include <QAbstractItemModel>
@@ -11,6 +12,7 @@
 
 #include <memory>
 #include <optional>
+#include <utility>
 #include <vector>
 
 class QMimeData;
@@ -52,6 +54,10 @@ class WTItemsModel : public QAbstractItemModel {
     EndTimeEditRole,
     // Stopped time entries: the duration as DurationEditRole, set by moving the start (the end stays).
     SpentDurationEditRole,
+    BudgetRole,  // tasks with a budget: a WTBudgetState
+    // What a task, group or item bills where it differs from the duration and cost shown ("billed 0:15
+    // · 25.00"); empty where they agree.
+    BilledTextRole,
   };
 
   static const QString kObjectUUIDsType;    // "WTObjectUUIDs"
@@ -96,6 +102,10 @@ class WTItemsModel : public QAbstractItemModel {
   bool hasChildren(const QModelIndex& parent = QModelIndex()) const override;
   QVariant data(const QModelIndex& index, int role = Qt::DisplayRole) const override;
   bool setData(const QModelIndex& index, const QVariant& value, int role = Qt::EditRole) override;
+  // "billed 0:15 · 25.00": the billed duration where it differs from the raw one, and the billed cost
+  // where its text or the duration differs (raw durations first, billed second); empty where all agree.
+  static QString billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost,
+                            const Decimal& billed, const QString& currency);
   // Why `text` set under `role` (a duration or an amount) would be refused, for the person who typed
   // it; empty when it would be taken.
   static QString refusalFor(int role, const QString& text);

@@ -29,11 +29,11 @@ bool isStructureKeyOfItem(const QString& key) {
 }
 
 bool isShownKeyOfItem(const QString& key) {
-  static const QSet<QString> keys = {QStringLiteral("name"),      QStringLiteral("notes"),
-                                     QStringLiteral("duration"),  QStringLiteral("cost"),
-                                     QStringLiteral("running"),   QStringLiteral("endDate"),
-                                     QStringLiteral("expense"),   QStringLiteral("minutes"),
-                                     QStringLiteral("completed"), QStringLiteral("startDate")};
+  static const QSet<QString> keys = {
+      QStringLiteral("name"),      QStringLiteral("notes"),      QStringLiteral("duration"),
+      QStringLiteral("cost"),      QStringLiteral("running"),    QStringLiteral("endDate"),
+      QStringLiteral("expense"),   QStringLiteral("minutes"),    QStringLiteral("completed"),
+      QStringLiteral("startDate"), QStringLiteral("billedCost"), QStringLiteral("billedDuration")};
   return keys.contains(key);
 }
 
@@ -44,7 +44,10 @@ bool isShownKeyOfTask(const QString& key) {
                                      QStringLiteral("cost"),
                                      QStringLiteral("running"),
                                      QStringLiteral("tableImage"),
-                                     QStringLiteral("timerButtonImage")};
+                                     QStringLiteral("timerButtonImage"),
+                                     QStringLiteral("budget"),
+                                     QStringLiteral("billedCost"),
+                                     QStringLiteral("billedDuration")};
   return keys.contains(key);
 }
 
@@ -125,7 +128,10 @@ void WTItemsModel::objectValueDidChange(WTObject* object, const QString& key) {
   if (!project_) return;
   // A rate reaches the cost of every row below the record it is set on: those rows are shown anew at
   // once, day groups included, since no cost of theirs announces itself.
-  if (key == QLatin1String("rate")) {
+  // A rounding rule and a currency are announced, like a rate, by the record they are set on or that
+  // inherits them, not by each item below it.
+  if (key == QLatin1String("rate") || key == QLatin1String("roundingRule") ||
+      key == QLatin1String("billingCurrency")) {
     if (object == project_) {
       markSubtreeChanged(root_.get());
     } else if (project_->client() && object == project_->client()) {

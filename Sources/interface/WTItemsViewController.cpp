@@ -5,6 +5,7 @@
 #include "RZDate.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
+#include "WTBillingDialog.h"
 #include "WTDatePopover.h"
 #include "WTEmptyHint.h"
 #include "WTImages.h"
@@ -124,6 +125,7 @@ QWidget* WTItemsViewController::loadView() {
   titleFont.setPointSizeF(titleFont.pointSizeF() + 3);
   titleLabel_->setFont(titleFont);
   clientLabel_ = new QLabel(header_);
+  clientLabel_->setObjectName(QStringLiteral("projectClient"));
   clientLabel_->setStyleSheet(QStringLiteral("color: #666;"));
   // A long name gives way to the rate and the totals (shortened, whole in its tip) rather than widening
   // the window or running under them.
@@ -210,6 +212,8 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   QPointer<WTOutlineView> outline = outlineView_;
   menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Task), this,
+                  [task, outline] { WTBillingDialog::editBilling(task, outline); });
   return menu;
 }
 

@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "RZBackgroundView.h"
 #include "WTClient.h"
+#include "WTItemsModel.h"
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTRateField.h"
@@ -33,9 +34,13 @@ void WTItemsViewController::refreshHeader() {
   setElidedText(titleLabel_, project_->name().isEmpty() ? tr("Untitled Project") : project_->name());
   QString client = project_->client() ? project_->client()->name() : tr("No Client");
   if (project_->archived()) client += QStringLiteral(" — ") + tr("Archived");
+  const QString billed =
+      WTItemsModel::billedText(std::pair(project_->duration(), project_->billedDuration()), project_->cost(),
+                               project_->billedCost(), project_->billingCurrency());
+  if (!billed.isEmpty()) client += QStringLiteral(" · ") + billed;
   setElidedText(clientLabel_, client);
   durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
-  totalsLabel_->setText(MoneyFormat::format(project_->cost()));
+  totalsLabel_->setText(MoneyFormat::format(project_->cost(), project_->billingCurrency()));
   rateField_->setPlaceholderText(WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {

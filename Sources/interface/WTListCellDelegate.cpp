@@ -1,6 +1,7 @@
 #include "WTListCellDelegate.h"
 
 #include "RZColor.h"
+#include "WTBudgetBar.h"
 #include "WTImages.h"
 #include "WTListView.h"
 #include "WTObjectListModel.h"
@@ -12,6 +13,7 @@
 #include <QLineEdit>
 #include <QMouseEvent>
 #include <QPainter>
+#include <QToolTip>
 
 WTListCellDelegate::WTListCellDelegate(const QString& identifier, QObject* parent)
     : QStyledItemDelegate(parent), cell_(identifier) {}
@@ -78,6 +80,10 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
                     index.data(WTObjectListModel::DurationTextRole).toString());
   painter->drawText(cell_.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
                     index.data(WTObjectListModel::CostTextRole).toString());
+  if (const QVariant budget = index.data(WTObjectListModel::BudgetRole); budget.isValid()) {
+    WTBudgetBar::paint(*painter, cell_.partRect(WTTableCellView::Part::BudgetBar, row),
+                       budget.value<WTBudgetState>(), option.palette, selected);
+  }
 
   // The right-clicked row is ringed while its menu is open.
   const auto* list = qobject_cast<const WTListView*>(parent());
@@ -130,6 +136,19 @@ void WTListCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptio
                                               const QModelIndex&) const {
   editor->setGeometry(
       cell_.partRect(WTTableCellView::Part::Name, option.rect).toRect().adjusted(-3, -1, 3, 1));
+}
+
+bool WTListCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
+                                   const QStyleOptionViewItem& option, const QModelIndex& index) {
+  // Over the cost of a row with a budget, the tip says where the budget stands.
+  const QVariant budget = index.data(WTObjectListModel::BudgetRole);
+  if (event->type() == QEvent::ToolTip && budget.isValid() &&
+      cell_.partAt(event->pos(), option.rect, false) == WTTableCellView::Part::Cost) {
+    QToolTip::showText(event->globalPos(), budget.value<WTBudgetState>().text, view,
+                       cell_.partRect(WTTableCellView::Part::Cost, option.rect).toRect());
+    return true;
+  }
+  return QStyledItemDelegate::helpEvent(event, view, option, index);
 }
 
 bool WTListCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,

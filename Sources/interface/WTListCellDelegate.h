@@ -27,6 +27,8 @@ class WTListCellDelegate : public QStyledItemDelegate {
   void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
 
  protected:
+  bool helpEvent(QHelpEvent* event, QAbstractItemView* view, const QStyleOptionViewItem& option,
+                 const QModelIndex& index) override;
   bool editorEvent(QEvent* event, QAbstractItemModel* model, const QStyleOptionViewItem& option,
                    const QModelIndex& index) override;
 

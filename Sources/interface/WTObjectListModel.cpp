@@ -2,6 +2,7 @@
 
 #include "DurationText.h"
 #include "MoneyFormat.h"
+#include "WTBudgetBar.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTOrderedDiff.h"
@@ -33,6 +34,17 @@ Decimal costOf(const WTObject* object) {
   }
 }
 
+QString currencyOf(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Client:
+      return static_cast<const WTClient*>(object)->billingCurrency();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->billingCurrency();
+    default:
+      return {};
+  }
+}
+
 QString imageOf(const WTObject* object) {
   switch (object->entity()) {
     case WTEntity::Client:
@@ -57,7 +69,8 @@ bool isShownKey(const QString& key) {
   static const QSet<QString> keys = {QStringLiteral("duration"),   QStringLiteral("cost"),
                                      QStringLiteral("tableImage"), QStringLiteral("client"),
                                      QStringLiteral("projects"),   QStringLiteral("notes"),
-                                     QStringLiteral("rate")};
+                                     QStringLiteral("rate"),       QStringLiteral("budget"),
+                                     QStringLiteral("billedCost"), QStringLiteral("billingCurrency")};
   return keys.contains(key);
 }
 
@@ -206,23 +219,28 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
         return client ? client->name() : tr("No Client");
       }
       if (object->entity() == WTEntity::Client) {
-        // The rate the client's work is billed at, its own or the one it inherits.
-        const auto count = static_cast<const WTClient*>(object)->projects().size();
-        return tr("%1 · %2 an hour")
-            .arg(count == 1 ? tr("1 project") : tr("%1 projects").arg(count),
-                 MoneyFormat::format(object->inheritedRate()));
+        // The rate the client's work is billed at, its own or the one it inherits, and the currency it
+        // is billed in where it is the client's own.
+        const auto* client = static_cast<const WTClient*>(object);
+        const auto count = client->projects().size();
+        const QString projects = count == 1 ? tr("1 project") : tr("%1 projects").arg(count);
+        const QString rate = MoneyFormat::format(object->inheritedRate(), client->billingCurrency());
+        if (client->currency().isEmpty()) return tr("%1 · %2 an hour").arg(projects, rate);
+        return tr("%1 · %2 %3 an hour").arg(projects, rate, client->currency());
       }
       return {};
     case DurationTextRole:
       return DurationText::stringWithMinutes(durationOf(object));
     case CostTextRole:
-      return MoneyFormat::format(costOf(object));
+      return MoneyFormat::format(costOf(object), currencyOf(object));
     case ImageRole:
       return imageOf(object);
     case ArchivedRole:
       return object->archived();
     case RunningRole:
       return isRunning(object);
+    case BudgetRole:
+      return WTBudgetBar::variantOf(object);
     case ClientRole:
       if (object->entity() != WTEntity::Project) return {};
       return variantFromObject(static_cast<const WTProject*>(object)->client());

@@ -32,6 +32,7 @@ class WTObjectListModel : public QAbstractListModel {
     ArchivedRole,
     ClientRole,   // projects: the client (WTObject* as quintptr), settable
     RunningRole,  // projects: whether a timer runs in it
+    BudgetRole,   // projects with a budget: a WTBudgetState
   };
 
   // `context` is not owned and must outlive the model.

@@ -1,5 +1,6 @@
 #include "WTProjectsViewController.h"
 
+#include "WTBillingDialog.h"
 #include "WTClient.h"
 #include "WTItemsViewController.h"
 #include "WTListView.h"
@@ -103,6 +104,9 @@ void WTProjectsViewController::partActivated(const QModelIndex& index, WTTableCe
 void WTProjectsViewController::addRowMenuItems(QMenu* menu) {
   menu->addAction(tr("Open"), this, [this] {
     if (WTObject* project = clickedObject()) openProject(static_cast<WTProject*>(project));
+  });
+  menu->addAction(WTBillingDialog::menuTitle(WTEntity::Project), this, [this] {
+    if (WTObject* project = clickedObject()) WTBillingDialog::editBilling(project, tableView());
   });
   menu->addSeparator();
 }

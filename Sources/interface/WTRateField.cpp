@@ -20,7 +20,9 @@ const char* const kRefusedProperty = "rateRefused";
 }  // namespace
 
 QString placeholder(const WTObject* object) {
-  return QObject::tr("Inherited: %1").arg(MoneyFormat::format(object->rateFromAbove()));
+  // In the places of the currency the record bills in (every client, project and task answers it).
+  const QString currency = object->valueForKey(QStringLiteral("billingCurrency")).toString();
+  return QObject::tr("Inherited: %1").arg(MoneyFormat::format(object->rateFromAbove(), currency));
 }
 
 Parsed parse(const QString& typed) {

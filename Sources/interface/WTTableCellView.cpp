@@ -183,6 +183,12 @@ QRectF WTTableCellView::partRect(Part part, const QRectF& row) const {
     case Part::Notes:
       if (!hasNotesField()) return {};
       return notesFrame_.translated(row.x(), row.y());
+    case Part::BudgetBar: {
+      if (!task && id != QLatin1String("Project")) return {};
+      // Under the cost's figures, as wide as a four-figure amount and ending with them.
+      constexpr qreal kBarWidth = 64.0;
+      return QRectF(costX + kCostWidth - kBarWidth, line.y() + line.height() / 2.0 + 10.0, kBarWidth, 3.0);
+    }
   }
   return {};
 }

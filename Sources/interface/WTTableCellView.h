@@ -38,6 +38,7 @@ class WTTableCellView {
     DateButton,
     NotesButton,
     Notes,
+    BudgetBar,  // tasks and projects: under the cost
   };
 
   explicit WTTableCellView(const QString& identifier);

@@ -1,5 +1,7 @@
 #include "AppFixture.h"
 #include "RZSyncManager.h"
+#include "WTBudgetWatcher.h"
+#include "WTDesktopNotifier.h"
 #include "WTItemsModel.h"
 #include "WTPreferencesWindowController.h"
 #include "WTStatusBarController.h"
@@ -7,6 +9,7 @@
 #include "WTStopwatchUpdater.h"
 #include "WTTrackingAlert.h"
 
+#include <QStatusBar>
 #include <QToolButton>
 
 // Each test gets its own data and settings folders.
@@ -155,6 +158,33 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
     ASSERT_EQ(stored.fetch<WTTime>().size(), 1);
     EXPECT_EQ(stored.fetch<WTTime>().first()->running(), sessionEnds);
   }
+}
+
+// Where the desktop shows no notifications, a budget notice stands on the window's status line.
+TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStatusLine) {
+  AnsweringPresenter asking;
+  auto delegate = makeDelegate();
+  WTMainWindowController window(*delegate);
+  WTBudgetWatcher watcher(delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr));
+  WTDesktopNotifier notifier(QDBusConnection("never-connected"));
+  WTApplication::linkBudgetNotices(watcher, notifier, window);
+  window.show();
+  auto* task = WTTask::insertNewObject(delegate->managedObjectContext());
+  task->setName("Design");
+  task->setBudget(Decimal(100));
+  task->setProject(WTProject::insertNewObject(delegate->managedObjectContext()));
+  task->project()->setName("Website");
+  task->project()->setRate(Decimal(75));
+  auto* time = WTTime::insertNewObject(delegate->managedObjectContext());
+  time->setTask(task);
+  time->setEndDate(time->startDate()->addingSeconds(2 * 3600));  // 2 hours at 75
+  EXPECT_EQ(window.findChild<QStatusBar*>("statusLine"), nullptr);
+  emit watcher.budgetCrossed(task, WTBudget::Level::Over);
+  QStatusBar* line = nullptr;
+  EXPECT_TRUE(QTest::qWaitFor([&] { return (line = window.findChild<QStatusBar*>("statusLine")); }));
+  ASSERT_TRUE(line && line->isVisible());
+  EXPECT_EQ(line->currentMessage(),
+            "“Website › Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
 }
 
 // Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.

@@ -145,6 +145,52 @@ TEST_F(WTItemsModelTest, ARunningTimersTickRepaintsOnlyItsRowItsGroupAndItsTask)
   EXPECT_EQ(changed.count(), 0);
 }
 
+// Beside the raw figures, a row shows what it bills where that differs; a rule changed later shows at once.
+TEST_F(WTItemsModelTest, RowsShowTheBilledFiguresWhereTheyDifferFromTheRawOnes) {
+  auto* client = makeClient("Acme");
+  client->setRate(Decimal(100));
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
+  project->setClient(client);
+  auto* seven = makeItem<WTTime>(design, "seven", at(2024, 3, 14, 8));
+  seven->setDuration(7);
+  auto* long46 = makeItem<WTTime>(design, "long", at(2024, 3, 14, 9));
+  long46->setDuration(46);
+  makeItem<WTFlat>(design, "flat", at(2024, 3, 14, 10))->setMinutes(30);
+  makeItem<WTExpense>(design, "expense", at(2024, 3, 14, 11))->setExpense(dec("12.345"));
+  model->setProject(project);
+  endTurn();
+  auto rows = [&] {
+    const QModelIndex task = model->indexOfObject(design), day = model->indexOfContainerOfItem(seven);
+    QStringList shown{"Design: " + task.data(WTItemsModel::DurationTextRole).toString() + ' ' +
+                          task.data(WTItemsModel::BilledTextRole).toString(),
+                      "day: " + day.data(WTItemsModel::CostTextRole).toString() + ' ' +
+                          day.data(WTItemsModel::BilledTextRole).toString()};
+    for (const WTItem* item : design->valuableItems()) {
+      const QModelIndex row = model->indexOfObject(item);
+      shown << item->name() + ": " + row.data(WTItemsModel::DurationTextRole).toString() + ' ' +
+                   row.data(WTItemsModel::CostTextRole).toString() + ' ' +
+                   row.data(WTItemsModel::BilledTextRole).toString();
+    }
+    shown << controller->view()->findChild<QLabel*>("projectClient")->property("fullText").toString();
+    return shown;
+  };
+  EXPECT_EQ(rows(),
+            QStringList({"Design: 01:23 billed 01:45 · 187.35", "day: 150.68 billed 01:45 · 187.35",
+                         "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 01:00 · 100.00",
+                         "seven: 00:07 11.67 billed 00:15 · 25.00", "Acme · billed 01:45 · 187.35"}));
+  QSignalSpy changed(model.get(), &QAbstractItemModel::dataChanged);
+  project->setRoundingMode("nearest");
+  endTurn();
+  ASSERT_TRUE(std::any_of(changed.begin(), changed.end(), [&](const QList<QVariant>& signal) {
+    return signal[0].value<QModelIndex>() == model->indexOfObject(seven);
+  }));
+  EXPECT_EQ(rows(),
+            QStringList({"Design: 01:23 billed 01:15 · 137.35", "day: 150.68 billed 01:15 · 137.35",
+                         "expense:  12.35 ", "flat: 00:30 50.00 ", "long: 00:46 76.67 billed 00:45 · 75.00",
+                         "seven: 00:07 11.67 billed 00:00 · 0.00", "Acme · billed 01:15 · 137.35"}));
+}
+
 // A drag carries uuids in outline order and whether tasks go with it; where it may land follows.
 TEST_F(WTItemsModelTest, DragsCarryUuidsInOutlineOrderAndLandOnlyWhereTheyFit) {
   auto* todo = makeItem<WTToDo>(design, "todo", at(2024, 3, 10));

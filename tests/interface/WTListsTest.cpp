@@ -48,6 +48,13 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_TRUE(changed.count() >= 1 && clientChanged.count() >= 1);
   EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.00|folder_32_dis||true");  // no timer runs in it: no tip
   EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00|admin_2_32||false");
+  changed.clear();
+  clientChanged.clear();
+  client->setCurrency("KWD");  // three places, and the code where it is the client's own
+  endTurn();
+  EXPECT_TRUE(changed.count() >= 1 && clientChanged.count() >= 1);
+  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.000|folder_32_dis||true");
+  EXPECT_EQ(shows(clientRow), "1 project · 120.000 KWD an hour|00:30|60.000|admin_2_32||false");
 }
 
 // The filtered list follows changes row by row, and lists an archived project while its timer runs.

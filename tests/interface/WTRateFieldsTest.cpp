@@ -1,7 +1,9 @@
 #include "MemoryKeychain.h"
 #include "UiFixture.h"
+#include "WTBillingDialog.h"
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
+#include "WTProjectsViewController.h"
 
 namespace {
 
@@ -55,6 +57,11 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   acme->setRate(Decimal(1250));
   endTurn();
   EXPECT_EQ(field->placeholderText(), "Inherited: 1,250.00");
+  acme->setCurrency("JPY");  // in the places of the client's currency
+  endTurn();
+  EXPECT_EQ(field->placeholderText(), "Inherited: 1,250");
+  acme->setCurrency(QString());
+  endTurn();
   const QMargins margins = field->textMargins();
   EXPECT_LE(field->fontMetrics().horizontalAdvance(field->placeholderText()),
             field->contentsRect().width() - margins.left() - margins.right() - 4);
@@ -104,6 +111,14 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
          dialog.accept();
          return Outcome{acme->storedRate(), dialog.isVisible() && refusedIn(dialog.field(), text)};
        }},
+      {"budget",
+       [&](auto text) {
+         WTBillingDialog dialog(design);
+         dialog.show();
+         type(dialog.budgetField(), text);
+         dialog.accept();
+         return Outcome{design->budget(), dialog.isVisible() && refusedIn(dialog.budgetField(), text)};
+       }},
       {"expense",
        [&](auto text) {
          const bool refused = typeIntoRow(expense, Field::Amount, text);
@@ -121,7 +136,7 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
        }},
   };
   // German takes money typed "1.250,5", American refuses it; a duration is taken as "1:15", never as "1.5".
-  for (const char* field : {"project", "client", "expense", "preferences", "duration"}) {
+  for (const char* field : {"project", "client", "budget", "expense", "preferences", "duration"}) {
     const bool money = std::string(field) != "duration";
     for (const bool refused : {false, true}) {
       SCOPED_TRACE(std::string(field) + (refused ? " refused" : " taken"));
@@ -207,6 +222,52 @@ TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
   EXPECT_FALSE(acme->storedRate().has_value());
   EXPECT_EQ(filled, 2);
   clients.tableView()->setClickedRow(-1);
+}
+
+// Each row menu opens the billing sheet: a client's currency among the ISO codes, every row's rounding
+// (empty or 0 inherits, and says what); what it cannot take stays in view and nothing is stored.
+TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRefusesInView) {
+  acme->setRoundingMinutes(15);
+  std::unique_ptr<QMenu> taskMenu(controller->taskMenu(design));
+  EXPECT_NE(actionTitled(taskMenu.get(), "Budget and Rounding…"), nullptr);
+  ShownProjects projects(context.get(), QSize(600, 400));
+  EXPECT_NE(actionTitled(projects.controller.rowMenu(), "Budget and Rounding…"), nullptr);
+  WTClientsViewController clients(context.get());
+  EXPECT_NE(actionTitled(clients.rowMenu(), "Currency and Rounding…"), nullptr);
+  // The stored currency, minutes and mode by key: "JPY 15 up", "none" where it inherits.
+  auto stored = [](const WTObject* object) {
+    QStringList values;
+    for (const char* key : {"currency", "roundingMinutes", "roundingMode"})
+      values << object->valueForKey(key).toString();
+    return values.replaceInStrings(QRegularExpression("^$"), "none").join(' ');
+  };
+  const std::tuple<WTObject*, const char*, const char*, int, bool, const char*> rows[] = {
+      // record, currency typed, minutes typed, mode chosen (0 inherits), refused, stored
+      {acme, "jpy", "15", 1, false, "JPY 15 up"},
+      {acme, "XYZ", "6", 3, true, "JPY 15 up"},
+      {acme, "", "", 0, false, "none none none"},
+      {project, nullptr, "6", 3, false, "none 6 down"},
+      {design, nullptr, "7.5", 2, true, "none none none"},
+      {design, nullptr, "0", 2, false, "none none nearest"},
+  };
+  for (const auto& [object, currency, minutes, mode, refused, after] : rows) {
+    SCOPED_TRACE(object->name().toStdString() + ' ' + minutes);
+    WTBillingDialog dialog(object);
+    dialog.show();
+    if (currency) dialog.currencyField()->setCurrentText(currency);
+    dialog.roundingMinutesField()->setText(minutes);
+    dialog.roundingModeField()->setCurrentIndex(mode);
+    dialog.accept();
+    EXPECT_EQ(dialog.isVisible(), refused);
+    QLineEdit* field = currency && std::string(currency) == "XYZ" ? dialog.currencyField()->lineEdit()
+                                                                  : dialog.roundingMinutesField();
+    EXPECT_EQ(refused, refusedIn(field, field->text()));
+    EXPECT_EQ(stored(object), after);
+  }
+  EXPECT_EQ(WTBillingDialog(project).roundingMinutesField()->text(), "6");
+  EXPECT_EQ(WTBillingDialog(design).roundingMinutesField()->placeholderText(), "Inherited: 6");
+  defaults->setValue("WTCurrency", "CHF");
+  EXPECT_EQ(WTBillingDialog(acme).currencyField()->lineEdit()->placeholderText(), "Inherited: CHF");
 }
 
 }  // namespace

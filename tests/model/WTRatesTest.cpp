@@ -1,4 +1,5 @@
 #include "ModelFixture.h"
+#include "WTBudget.h"
 
 #include "UserLocale.h"
 #include "WTItemContainer.h"
@@ -307,4 +308,28 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
                   .arg(r.client->cost().toDouble()),
               after);
   }
+}
+
+// The lines are 80 % (reached) and 100 % (passed); a step across both names the higher one, going down
+// names none, and without a budget above zero nothing is measured.
+TEST(WTBudgetTest, LevelsAndTheLineAStepCrosses) {
+  using L = WTBudget::Level;
+  const std::tuple<const char*, const char*, const char*, std::optional<L>, std::optional<L>> rows[] = {
+      // billed before, after, budget; level after; line crossed
+      {"0", "79.99", "100", L::Within, {}},
+      {"79.99", "80", "100", L::Warning, L::Warning},
+      {"80", "100", "100", L::Warning, {}},
+      {"100", "100.01", "100", L::Over, L::Over},
+      {"10", "150", "100", L::Over, L::Over},
+      {"150", "10", "100", L::Within, {}},
+      {"0.0007", "0.0008", "0.001", L::Warning, L::Warning},
+      {"0", "5", "0", {}, {}},
+      {"0", "5", "-1", {}, {}},
+  };
+  for (const auto& [before, after, budget, level, crossed] : rows) {
+    SCOPED_TRACE(std::string(before) + " → " + after + " of " + budget);
+    EXPECT_EQ(WTBudget::level(dec(after), dec(budget)), level);
+    EXPECT_EQ(WTBudget::crossed(dec(before), dec(after), dec(budget)), crossed);
+  }
+  EXPECT_EQ(WTBudget::level(dec("1000"), std::nullopt), std::nullopt);
 }

@@ -4,8 +4,10 @@
 #include <QDBusContext>
 #include <QDBusMessage>
 #include <QList>
+#include <QMutex>
 #include <QObject>
 #include <QString>
+#include <QStringList>
 #include <QVariantMap>
 
 #include <atomic>
@@ -61,4 +63,31 @@ class LauncherListener : public QObject {
     uris.append(uri);
     properties.append(props);
   }
+};
+
+// The desktop's notification service; keeps "summary | body" of every notice it took.
+class FakeNotifications : public QObject, protected QDBusContext {
+  Q_OBJECT
+  Q_CLASSINFO("D-Bus Interface", "org.freedesktop.Notifications")
+ public:
+  std::atomic<FakeMode> mode{FakeMode::Answer};
+  QStringList taken() const {
+    const QMutexLocker lock(&mutex_);
+    return taken_;
+  }
+
+ public slots:
+  uint Notify(const QString&, uint, const QString&, const QString& summary, const QString& body,
+              const QStringList&, const QVariantMap&, int) {
+    if (mode == FakeMode::Error) sendErrorReply(QDBusError::Failed, QStringLiteral("no notices"));
+    if (mode == FakeMode::Silent) setDelayedReply(true);
+    if (mode != FakeMode::Answer) return 0;
+    const QMutexLocker lock(&mutex_);
+    taken_.append(summary + " | " + body);
+    return uint(taken_.size());
+  }
+
+ private:
+  mutable QMutex mutex_;
+  QStringList taken_;
 };

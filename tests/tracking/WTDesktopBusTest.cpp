@@ -1,6 +1,7 @@
 #include "FakeDesktopServices.h"
 #include "PrivateBus.h"
 #include "TrackingFixture.h"
+#include "WTDesktopNotifier.h"
 #include "WTLauncherEntry.h"
 #include "WTSleepMonitor.h"
 
@@ -114,6 +115,42 @@ TEST_F(DesktopBusTest, LauncherEntryCarriesTheNumberOfRunningTimersAndIsSentOnly
   EXPECT_EQ(heard(3), "application://tessal.desktop 0 false false");
   waitForBus([&] { return listener.uris.size() >= 4; }, 100);
   EXPECT_EQ(listener.uris.size(), 3);
+}
+
+// A notice goes to the notification service when one answers in time; otherwise it comes back, for the
+// window, without the caller ever waiting.
+TEST_F(DesktopBusTest, NoticesGoToTheNotificationServiceOrComeBack) {
+  FakeNotifications service;
+  serve(service, "org.freedesktop.Notifications", "/org/freedesktop/Notifications");
+  const std::tuple<const char*, FakeMode, QDBusConnection, const char*> rows[] = {
+      {"answers", FakeMode::Answer, PrivateBus::instance().connect(), "shown"},
+      {"errs", FakeMode::Error, PrivateBus::instance().connect(), "not shown"},
+      {"hangs", FakeMode::Silent, PrivateBus::instance().connect(), "not shown"},
+      {"no bus", FakeMode::Answer, QDBusConnection("never-connected"), "not shown"},
+  };
+  for (const auto& [name, mode, bus, outcome] : rows) {
+    SCOPED_TRACE(name);
+    service.mode = mode;
+    WTDesktopNotifier notifier(bus, 300);
+    QStringList said;
+    QObject::connect(&notifier, &WTDesktopNotifier::shown, [&](const QString& s) { said << "shown " + s; });
+    QObject::connect(&notifier, &WTDesktopNotifier::notShown,
+                     [&](const QString& s) { said << "not shown " + s; });
+    QElapsedTimer waited;
+    waited.start();
+    notifier.notify(name, "Body");
+    EXPECT_LT(waited.elapsed(), 100) << "nothing waits for the service";
+    EXPECT_TRUE(said.isEmpty());
+    EXPECT_TRUE(waitForBus([&] { return !said.isEmpty(); }, 2000));
+    EXPECT_EQ(said, QStringList{QStringLiteral("%1 %2").arg(outcome, name)});
+  }
+  EXPECT_EQ(service.taken(), QStringList{"answers | Body"});
+  service.mode = FakeMode::Answer;
+  PrivateBus::instance().disconnectAll();  // the service is gone: the bus answers for it
+  WTDesktopNotifier nobody(PrivateBus::instance().connect(), 2000);
+  QSignalSpy back(&nobody, &WTDesktopNotifier::notShown);
+  nobody.notify("Gone", "Body");
+  EXPECT_TRUE(waitForBus([&] { return back.count() == 1; }, 1000)) << "well before the timeout";
 }
 
 }  // namespace

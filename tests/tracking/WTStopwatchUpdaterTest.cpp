@@ -1,5 +1,6 @@
 #include "LogCapture.h"
 #include "TrackingFixture.h"
+#include "WTBudgetWatcher.h"
 #include "WTRecentTasks.h"
 
 #include <QSignalSpy>
@@ -293,6 +294,34 @@ TEST_F(TrackingTest, TheListHoldsFiveTasksRunningFirstThenTheLatestTrackedAndFol
   EXPECT_EQ(announced, 1);
   EXPECT_EQ(names(), QStringList({"T1", "T0", "T4", "T9", "T8"}))
       << "a stopped task moves down to its latest end";
+}
+
+// A running timer's ticks say once when they take its task past 80 % and past the whole budget.
+TEST_F(TrackingTest, TicksSayOnceWhenATimerTakesATaskPastItsBudgetLines) {
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setRate(dec("60"));  // a minute bills 1.00
+  WTTask* task = makeTask(project);
+  task->setBudget(dec("100"));
+  WTBudgetWatcher watcher(updater.get());
+  QStringList said;
+  QObject::connect(&watcher, &WTBudgetWatcher::budgetCrossed, [&](WTObject* object, WTBudget::Level level) {
+    said.append(QStringLiteral("%1 %2").arg(object->entityName()).arg(int(level)));
+  });
+  startTimer(task, clockNow.addingSeconds(-79 * 60));
+  updater->start();
+  settle();
+  EXPECT_TRUE(said.isEmpty()) << "a timer just started has no tick before to compare with";
+  for (int minute = 0; minute < 25; ++minute) {  // 80 at the first, 101 at the 22nd
+    advance(60);
+    updater->update();
+  }
+  EXPECT_EQ(said, (QStringList{"WTTask 1", "WTTask 2"}));
+  said.clear();
+  task->setBudget(dec("110"));  // back under the whole: passing it again is said again
+  updater->update();
+  advance(7 * 60);  // 104 → 111
+  updater->update();
+  EXPECT_EQ(said, QStringList{"WTTask 2"});
 }
 
 }  // namespace

@@ -1,0 +1,89 @@
+#include "WTBudget.h"
+
+#include "MoneyFormat.h"
+#include "WTProject.h"
+#include "WTTask.h"
+
+#include <QLocale>
+#include <QObject>
+
+#include <cmath>
+
+namespace WTBudget {
+
+namespace {
+
+bool measurable(const std::optional<Decimal>& budget) {
+  return budget && *budget > Decimal();
+}
+
+}  // namespace
+
+std::optional<Level> level(const Decimal& billed, const std::optional<Decimal>& budget) {
+  if (!measurable(budget)) return std::nullopt;
+  if (billed > *budget) return Level::Over;
+  // 80 % compared exactly: billed × 5 against budget × 4.
+  if (billed * Decimal(5) >= *budget * Decimal(4)) return Level::Warning;
+  return Level::Within;
+}
+
+std::optional<Level> crossed(const Decimal& before, const Decimal& after,
+                             const std::optional<Decimal>& budget) {
+  const std::optional<Level> from = level(before, budget);
+  const std::optional<Level> to = level(after, budget);
+  if (!from || !to || *to <= *from) return std::nullopt;
+  return to;
+}
+
+std::optional<double> fraction(const Decimal& billed, const std::optional<Decimal>& budget) {
+  if (!measurable(budget)) return std::nullopt;
+  return billed.toDouble() / budget->toDouble();
+}
+
+Decimal billed(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Task:
+      return static_cast<const WTTask*>(object)->billedCost();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->billedCost();
+    default:
+      return Decimal();
+  }
+}
+
+std::optional<Decimal> budget(const WTObject* object) {
+  switch (object->entity()) {
+    case WTEntity::Task:
+      return static_cast<const WTTask*>(object)->budget();
+    case WTEntity::Project:
+      return static_cast<const WTProject*>(object)->budget();
+    default:
+      return std::nullopt;
+  }
+}
+
+namespace {
+
+QString currencyOf(const WTObject* object) {
+  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->billingCurrency();
+  return static_cast<const WTProject*>(object)->billingCurrency();
+}
+
+}  // namespace
+
+QString standing(const WTObject* object) {
+  const std::optional<Decimal> limit = budget(object);
+  const Decimal spent = billed(object);
+  const std::optional<double> share = fraction(spent, limit);
+  if (!share) return {};
+  // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached.
+  const QString percent = QLocale().toString(qint64(std::floor(*share * 100.0)));
+  const Decimal left = *limit - spent;
+  const QString currency = currencyOf(object);
+  const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left, currency))
+                                         : QObject::tr("%1 left").arg(MoneyFormat::format(left, currency));
+  return QObject::tr("%1 % of the budget of %2 · %3")
+      .arg(percent, MoneyFormat::format(*limit, currency), rest);
+}
+
+}  // namespace WTBudget

@@ -1,0 +1,35 @@
+#pragma once
+
+#include "Decimal.h"
+
+#include <QString>
+
+#include <optional>
+
+class WTObject;
+
+// How much of a task's or project's budget is billed, and the moment a running timer takes it past a
+// warning line. Without a budget above zero there is nothing to measure.
+namespace WTBudget {
+
+// Within: below 80 %; Warning: from 80 % up to the whole budget; Over: past it.
+enum class Level { Within, Warning, Over };
+
+std::optional<Level> level(const Decimal& billed, const std::optional<Decimal>& budget);
+
+// The level reached going from `before` to `after` when it is above the one `before` stood at (Over,
+// when a single step passes both lines); none otherwise, and none going down.
+std::optional<Level> crossed(const Decimal& before, const Decimal& after,
+                             const std::optional<Decimal>& budget);
+
+// billed / budget (1.0 is the whole budget), for drawing; none without a budget.
+std::optional<double> fraction(const Decimal& billed, const std::optional<Decimal>& budget);
+
+// What a task or project bills, and its budget; nothing for other records.
+Decimal billed(const WTObject* object);
+std::optional<Decimal> budget(const WTObject* object);
+// Where `object` stands, for people: "72 % of the budget of 1,000.00 · 280.00 left" ("… · 40.00 over"
+// past it); empty without a budget.
+QString standing(const WTObject* object);
+
+}  // namespace WTBudget
