@@ -16,6 +16,7 @@
 #include <QHBoxLayout>
 #include <QLabel>
 #include <QLineEdit>
+#include <QPlainTextEdit>
 #include <QVBoxLayout>
 
 #include <unicode/ucurr.h>
@@ -152,6 +153,13 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
 
   if (object->entity() == WTEntity::Client) {
     const auto* client = static_cast<const WTClient*>(object);
+    addressField_ = new QPlainTextEdit(client->address(), this);
+    addressField_->setObjectName(QStringLiteral("addressField"));
+    addressField_->setTabChangesFocus(true);
+    addressField_->setPlaceholderText(tr("Street, town, country: shown in the head of a report"));
+    // Four lines of an address without a scroll bar, not a page.
+    addressField_->setFixedHeight(addressField_->fontMetrics().lineSpacing() * 5);
+    form->addRow(tr("Address:"), addressField_);
     currencyField_ = new QComboBox(this);
     currencyField_->setObjectName(QStringLiteral("currencyField"));
     currencyField_->setEditable(true);
@@ -248,6 +256,11 @@ void WTBillingDialog::accept() {
   if (currencyField_) {
     auto* client = static_cast<WTClient*>(object_);
     if (client->currency() != currency.value) client->setCurrency(currency.value);
+    // Trailing blank lines are what a return at the end leaves, not part of the address.
+    QString address = addressField_->toPlainText();
+    while (address.endsWith(u'\n') || address.endsWith(u' ')) address.chop(1);
+    if (client->address() != address && !(address.isEmpty() && client->address().isNull()))
+      client->setAddress(address);
   }
   if (budgetField_ && WTBudget::budget(object_) != budget.value) setBudget(object_, budget.value);
   setRounding(object_, {minutes.value, modeField_->currentData().toString()});
@@ -255,7 +268,7 @@ void WTBillingDialog::accept() {
 }
 
 QString WTBillingDialog::menuTitle(WTEntity entity) {
-  return entity == WTEntity::Client ? tr("Currency and Rounding…") : tr("Budget and Rounding…");
+  return entity == WTEntity::Client ? tr("Address, Currency and Rounding…") : tr("Budget and Rounding…");
 }
 
 void WTBillingDialog::editBilling(WTObject* object, QWidget* parent) {

@@ -224,8 +224,8 @@ TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
   clients.tableView()->setClickedRow(-1);
 }
 
-// Each row menu opens the billing sheet: a client's currency among the ISO codes, every row's rounding
-// (empty or 0 inherits, and says what); what it cannot take stays in view and nothing is stored.
+// Each row menu opens the billing sheet: a client's address and currency among the ISO codes, every row's
+// rounding (empty or 0 inherits, and says what); what it cannot take stays in view and nothing is stored.
 TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRefusesInView) {
   acme->setRoundingMinutes(15);
   std::unique_ptr<QMenu> taskMenu(controller->taskMenu(design));
@@ -233,19 +233,20 @@ TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRef
   ShownProjects projects(context.get(), QSize(600, 400));
   EXPECT_NE(actionTitled(projects.controller.rowMenu(), "Budget and Rounding…"), nullptr);
   WTClientsViewController clients(context.get());
-  EXPECT_NE(actionTitled(clients.rowMenu(), "Currency and Rounding…"), nullptr);
+  EXPECT_NE(actionTitled(clients.rowMenu(), "Address, Currency and Rounding…"), nullptr);
   // The stored currency, minutes and mode by key: "JPY 15 up", "none" where it inherits.
-  auto stored = [](const WTObject* object) {
+  auto stored = [this](const WTObject* object) {
     QStringList values;
-    for (const char* key : {"currency", "roundingMinutes", "roundingMode"})
-      values << object->valueForKey(key).toString();
+    for (const char* key : {"currency", "roundingMinutes", "roundingMode", "address"})
+      if (key != std::string("address") || object == acme) values << object->valueForKey(key).toString();
     return values.replaceInStrings(QRegularExpression("^$"), "none").join(' ');
   };
   const std::tuple<WTObject*, const char*, const char*, int, bool, const char*> rows[] = {
-      // record, currency typed, minutes typed, mode chosen (0 inherits), refused, stored
-      {acme, "jpy", "15", 1, false, "JPY 15 up"},
-      {acme, "XYZ", "6", 3, true, "JPY 15 up"},
-      {acme, "", "", 0, false, "none none none"},
+      // record, currency typed (and for a client the address typed after a '|'), minutes typed, mode
+      // chosen (0 inherits), refused, stored
+      {acme, "jpy|Bahnhofstr. 1\n8001 Zürich\n\n", "15", 1, false, "JPY 15 up Bahnhofstr. 1\n8001 Zürich"},
+      {acme, "XYZ|Elsewhere", "6", 3, true, "JPY 15 up Bahnhofstr. 1\n8001 Zürich"},
+      {acme, "|", "", 0, false, "none none none none"},
       {project, nullptr, "6", 3, false, "none 6 down"},
       {design, nullptr, "7.5", 2, true, "none none none"},
       {design, nullptr, "0", 2, false, "none none nearest"},
@@ -254,13 +255,18 @@ TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRef
     SCOPED_TRACE(object->name().toStdString() + ' ' + minutes);
     WTBillingDialog dialog(object);
     dialog.show();
-    if (currency) dialog.currencyField()->setCurrentText(currency);
+    if (currency) {
+      const QStringList typed = QString::fromUtf8(currency).split('|');
+      dialog.currencyField()->setCurrentText(typed[0]);
+      dialog.addressField()->setPlainText(typed[1]);
+    }
     dialog.roundingMinutesField()->setText(minutes);
     dialog.roundingModeField()->setCurrentIndex(mode);
     dialog.accept();
     EXPECT_EQ(dialog.isVisible(), refused);
-    QLineEdit* field = currency && std::string(currency) == "XYZ" ? dialog.currencyField()->lineEdit()
-                                                                  : dialog.roundingMinutesField();
+    QLineEdit* field = currency && std::string(currency).starts_with("XYZ")
+                           ? dialog.currencyField()->lineEdit()
+                           : dialog.roundingMinutesField();
     EXPECT_EQ(refused, refusedIn(field, field->text()));
     EXPECT_EQ(stored(object), after);
   }
