@@ -11,6 +11,7 @@
 #include "WTPasswordStore.h"
 #include "WTQtKeychain.h"
 #include "WTReportCommand.h"
+#include "WTReportPDF.h"
 #include "WTSingleInstance.h"
 #include "WTStoreWriterLock.h"
 #include "WTTemplateCommand.h"
@@ -19,6 +20,7 @@
 #include <QDir>
 #include <QEventLoop>
 #include <QGuiApplication>
+#include <QTextDocument>
 #include <QTextStream>
 
 #include <memory>
@@ -134,7 +136,15 @@ std::optional<int> runDesktopCommand(int argc, char** argv) {
   app->setApplicationName(QStringLiteral("Tessal"));
   app->setOrganizationName(QStringLiteral("Tessal"));
   QTextStream out(stdout), err(stderr);
-  if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
+  if (command == QLatin1String("report")) {
+    return runReportCommand(
+        arguments, out, err, [](const QString& html, const QString& title, const QString& path) {
+          QTextDocument document;
+          document.setHtml(html);
+          document.setMetaInformation(QTextDocument::DocumentTitle, title);
+          return WTReportPDF::write(document, QStringLiteral("Report — %1").arg(title), path);
+        });
+  }
   if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
   if (command == QLatin1String("template")) return runTemplateCommand(arguments, out, err);
   return runSync(arguments, out, err);

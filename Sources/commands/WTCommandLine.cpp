@@ -1,5 +1,6 @@
 #include "WTCommandLine.h"
 
+#include "WTReportCommand.h"
 #include "WTTimerCommands.h"
 #include "WTTrackCommand.h"
 
@@ -104,8 +105,14 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
     std::printf("tessal %s\n", TESSAL_VERSION);
     return 0;
   }
-  if (isDesktopCommand(command)) return std::nullopt;
-  if (!isTrackingCommand(command)) {
+  QStringList arguments;
+  for (int i = 2; i < argc; ++i) arguments.append(QString::fromLocal8Bit(argv[i]));
+  // A report or an export reads the store and writes text: here, without the desktop's libraries to
+  // load, unless a report is to be laid out as a PDF.
+  const bool readsHere = command == QLatin1String("export") ||
+                         (command == QLatin1String("report") && !reportCommandWritesPDF(arguments));
+  if (isDesktopCommand(command) && !readsHere) return std::nullopt;
+  if (!isTrackingCommand(command) && !readsHere) {
     if (desktopArgumentsValid(argc, argv)) return std::nullopt;
     return usageError(argv[1]);
   }
@@ -114,10 +121,10 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
   app.setApplicationName(QStringLiteral("Tessal"));
   app.setOrganizationName(QStringLiteral("Tessal"));
   QTextStream out(stdout), err(stderr);
+  if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
+  if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
   // Their output is for people and scripts: the journal's and the store's diary stays out of it.
   QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
-  QStringList arguments;
-  for (int i = 2; i < argc; ++i) arguments.append(QString::fromLocal8Bit(argv[i]));
   if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);
   if (command == QLatin1String("list")) return runListCommand(arguments, out, err);
   return runTrackCommand(command, arguments, out, err);

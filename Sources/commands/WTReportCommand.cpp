@@ -5,12 +5,10 @@
 #include "WTProject.h"
 #include "WTRangePredicate.h"
 #include "WTReportGenerator.h"
-#include "WTReportPDF.h"
 #include "WTStoreSnapshot.h"
 
 #include <QCommandLineParser>
 #include <QFileInfo>
-#include <QTextDocument>
 
 #include <optional>
 
@@ -48,7 +46,8 @@ bool reportCommandWritesPDF(const QStringList& arguments) {
   return false;
 }
 
-int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
+int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err,
+                     const WTReportPDFWriter& writePDF) {
   QCommandLineParser parser;
   const QString problem = parse(parser, arguments,
                                 {QStringLiteral("project"), QStringLiteral("client"), QStringLiteral("mode"),
@@ -108,11 +107,10 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
     }
     if (format == ReportFormat::HTML) {
       written = WTCSVExport::writeTextAtomically(outPath, report.html);
+    } else if (writePDF) {
+      written = writePDF(report.html, title, outPath);
     } else {
-      QTextDocument document;
-      document.setHtml(report.html);
-      document.setMetaInformation(QTextDocument::DocumentTitle, title);
-      written = WTReportPDF::write(document, QStringLiteral("Report — %1").arg(title), outPath);
+      return failure(err, QStringLiteral("%1: this program cannot write a PDF").arg(outPath));
     }
   }
   if (!written) return failure(err, written.error().message);

@@ -1,7 +1,11 @@
 #pragma once
 
+#include "Result.h"
+
 #include <QStringList>
 #include <QTextStream>
+
+#include <functional>
 
 // The reading commands over the user's store; both work while the desktop copy runs (they open the
 // store read-only and never write it) and need no display.
@@ -18,7 +22,13 @@
 //     this-year, last-year, any (the default) or YYYY-MM-DD..YYYY-MM-DD) as CSV, on stdout or in FILE.
 //
 // Both exit 2 with a usage line for arguments they do not understand.
-int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err);
+//
+// Laying a PDF out takes a GUI library, which the lean `tessal` does not load: it hands a report for a
+// PDF to the desktop executable, whose `writePDF` turns the HTML into the file.
+using WTReportPDFWriter =
+    std::function<Result<void>(const QString& html, const QString& title, const QString& path)>;
+int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err,
+                     const WTReportPDFWriter& writePDF = {});
 int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err);
 
 // Whether these arguments of `tessal report` ask for a PDF, which needs a (display-less) GUI application
