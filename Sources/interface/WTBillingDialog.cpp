@@ -33,56 +33,9 @@ void setBudget(WTObject* object, const std::optional<Decimal>& budget) {
   if (object->entity() == WTEntity::Project) static_cast<WTProject*>(object)->setBudget(budget);
 }
 
-// The rounding of clients, projects and tasks alike.
-struct Rounding {
-  std::optional<int> minutes;
-  QString mode;
-};
-
-Rounding roundingOf(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Client: {
-      const auto* client = static_cast<const WTClient*>(object);
-      return {client->roundingMinutes(), client->roundingMode()};
-    }
-    case WTEntity::Project: {
-      const auto* project = static_cast<const WTProject*>(object);
-      return {project->roundingMinutes(), project->roundingMode()};
-    }
-    default: {
-      const auto* task = static_cast<const WTTask*>(object);
-      return {task->roundingMinutes(), task->roundingMode()};
-    }
-  }
-}
-
-// The rule the record takes when it sets none itself.
-WTRoundingRule ruleAbove(const WTObject* object) {
-  const WTRoundingRule preferences = object->context()->billingDefaults().rule;
-  if (object->entity() == WTEntity::Project) {
-    const WTClient* client = static_cast<const WTProject*>(object)->client();
-    return client ? client->roundingRule() : preferences;
-  }
-  if (object->entity() == WTEntity::Task) {
-    const WTProject* project = static_cast<const WTTask*>(object)->project();
-    return project ? project->roundingRule() : preferences;
-  }
-  return preferences;
-}
-
-void setRounding(WTObject* object, const Rounding& rounding) {
-  const auto set = [&](auto* record) {
-    if (record->roundingMinutes() != rounding.minutes) record->setRoundingMinutes(rounding.minutes);
-    if (record->roundingMode() != rounding.mode) record->setRoundingMode(rounding.mode);
-  };
-  switch (object->entity()) {
-    case WTEntity::Client:
-      return set(static_cast<WTClient*>(object));
-    case WTEntity::Project:
-      return set(static_cast<WTProject*>(object));
-    default:
-      return set(static_cast<WTTask*>(object));
-  }
+// The sheet is opened for clients, projects and tasks: the records that set a rounding rule.
+WTBillingRecord* billingRecord(WTObject* object) {
+  return static_cast<WTBillingRecord*>(object);
 }
 
 template <class T>
@@ -184,13 +137,14 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
     form->addRow(tr("Budget (empty for none):"), budgetField_);
   }
 
-  const Rounding own = roundingOf(object);
-  const WTRoundingRule above = ruleAbove(object);
+  const WTBillingRecord* record = billingRecord(object);
+  const WTRoundingRule above = record->roundingRuleFromAbove();
   minutesField_ = new QLineEdit(this);
   minutesField_->setObjectName(QStringLiteral("roundingMinutesField"));
   minutesField_->setAlignment(Qt::AlignRight);
   minutesField_->setPlaceholderText(tr("Inherited: %1").arg(above.minutes));
-  if (own.minutes.value_or(0) > 0) minutesField_->setText(QLocale().toString(*own.minutes));
+  if (record->roundingMinutes().value_or(0) > 0)
+    minutesField_->setText(QLocale().toString(*record->roundingMinutes()));
   clearsRefusal(minutesField_);
   modeField_ = new QComboBox(this);
   modeField_->setObjectName(QStringLiteral("roundingModeField"));
@@ -208,7 +162,7 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
   for (const auto mode :
        {WTRoundingRule::Mode::Up, WTRoundingRule::Mode::Nearest, WTRoundingRule::Mode::Down})
     modeField_->addItem(modeTitle(mode), WTRoundingRule::nameOfMode(mode));
-  modeField_->setCurrentIndex(std::max(0, modeField_->findData(own.mode)));
+  modeField_->setCurrentIndex(std::max(0, modeField_->findData(record->roundingMode())));
   auto* rounding = new QHBoxLayout;
   rounding->addWidget(minutesField_, 1);
   rounding->addWidget(new QLabel(tr("minutes,"), this));
@@ -263,7 +217,10 @@ void WTBillingDialog::accept() {
       client->setAddress(address);
   }
   if (budgetField_ && WTBudget::budget(object_) != budget.value) setBudget(object_, budget.value);
-  setRounding(object_, {minutes.value, modeField_->currentData().toString()});
+  WTBillingRecord* record = billingRecord(object_);
+  if (record->roundingMinutes() != minutes.value) record->setRoundingMinutes(minutes.value);
+  if (const QString mode = modeField_->currentData().toString(); record->roundingMode() != mode)
+    record->setRoundingMode(mode);
   QDialog::accept();
 }
 

@@ -28,7 +28,7 @@ std::optional<QString> currencyCode(const QVariant& value) {
 const WTKeyTable& WTClient::keys() {
   using namespace WTKeys;
   static const WTKeyTable table(
-      &objectKeys(),
+      &billingKeys(),
       {
           stored("addressBookUID", &WTClient::addressBookUID_, &WTStoreRecord::addressBookUID),
           stored("totalsUID", &WTClient::totalsUID_, &WTStoreRecord::totalsUID),
@@ -39,23 +39,11 @@ const WTKeyTable& WTClient::keys() {
                    return code.has_value();
                  }),
           stored("address", &WTClient::address_, &WTStoreRecord::address),
-          stored("roundingMinutes", &WTClient::roundingMinutes_, &WTStoreRecord::roundingMinutes),
-          stored("roundingMode", &WTClient::roundingMode_, &WTStoreRecord::roundingMode,
-                 [](WTObject& object, const QVariant& value) {
-                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
-                   if (mode) static_cast<WTClient&>(object).setRoundingMode(*mode);
-                   return mode.has_value();
-                 }),
           refine("inheritedRate", nullptr, nullptr, {"rate"}),
           toMany("projects", WTKeyType::Unordered, &records<&WTClient::projects>),
           derived<&WTClient::duration>("duration", {"projects"}),
           derived<&WTClient::cost>("cost", {"projects"}),
           derived<&WTClient::tableImage>("tableImage", {"archived"}),
-          derived("roundingRule", WTKeyType::Other,
-                  [](const WTObject& object) {
-                    return QVariant(static_cast<const WTClient&>(object).roundingRule().toVariantMap());
-                  },
-                  {"roundingMinutes", "roundingMode"}),
           derived<&WTClient::billingCurrency>("billingCurrency", {"currency"}),
           derived<&WTClient::billedDuration>("billedDuration", {"projects", "duration", "roundingRule"}),
           derived<&WTClient::billedCost>("billedCost",
@@ -78,24 +66,6 @@ void WTClient::setCurrency(const QString& currency) {
 
 void WTClient::setAddress(const QString& address) {
   setStoredValue(QStringLiteral("address"), address);
-}
-
-std::optional<int> WTClient::roundingMinutes() const {
-  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
-}
-
-void WTClient::setRoundingMinutes(const std::optional<int>& minutes) {
-  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
-}
-
-void WTClient::setRoundingMode(const QString& mode) {
-  if (const std::optional<QString> stored =
-          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
-    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
-}
-
-WTRoundingRule WTClient::roundingRule() const {
-  return context()->billingDefaults().rule.refinedBy(roundingMinutes_, roundingMode_);
 }
 
 QString WTClient::billingCurrency() const {

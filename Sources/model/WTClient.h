@@ -1,17 +1,16 @@
 #pragma once
 
-#include "WTObject.h"
-#include "WTRoundingRule.h"
+#include "WTBillingRecord.h"
 
 #include <functional>
 
 class WTProject;
 
 // A client: owns projects (unordered). Its rate tops the inheritance chain below the user's default.
-class WTClient final : public WTObject {
+class WTClient final : public WTBillingRecord {
   WT_ENTITY_CLASS(WTClient, Client)
  public:
-  explicit WTClient(WTObjectContext* context) : WTObject(WTEntity::Client, context) {}
+  explicit WTClient(WTObjectContext* context) : WTBillingRecord(WTEntity::Client, context) {}
 
   QString addressBookUID() const { return addressBookUID_; }
   void setAddressBookUID(const QString& uid);
@@ -28,14 +27,6 @@ class WTClient final : public WTObject {
   QString address() const { return address_; }
   void setAddress(const QString& address);
 
-  // The rounding rule set on the client itself (0 or none, and a null mode, inherit the preferences').
-  std::optional<int> roundingMinutes() const;
-  void setRoundingMinutes(const std::optional<int>& minutes);
-  QString roundingMode() const { return roundingMode_; }
-  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
-  void setRoundingMode(const QString& mode);
-  // The rule in force: the client's own, else the preferences'.
-  WTRoundingRule roundingRule() const;
   // `currency`, else the preferences'.
   QString billingCurrency() const;
   // The sums of its projects' billed minutes and billed costs.
@@ -67,7 +58,5 @@ class WTClient final : public WTObject {
   QString totalsUID_;
   QString currency_;
   QString address_;
-  std::optional<qint64> roundingMinutes_;
-  QString roundingMode_;
   QList<WTProject*> projects_;
 };

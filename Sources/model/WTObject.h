@@ -159,6 +159,7 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   static const WTKeyTable& objectKeys();
 
   friend class WTObjectContext;
+  friend class WTBillingRecord;
   friend class WTClient;
   friend class WTProject;
   friend class WTTask;

@@ -13,17 +13,10 @@ WT_ENTITY_CLASS_IMPL(WTProject)
 const WTKeyTable& WTProject::keys() {
   using namespace WTKeys;
   static const WTKeyTable table(
-      &objectKeys(),
+      &billingKeys(),
       {
           toOne("client", &WTStoreRecord::clientUuid),
           stored("budget", &WTProject::budget_, &WTStoreRecord::budget),
-          stored("roundingMinutes", &WTProject::roundingMinutes_, &WTStoreRecord::roundingMinutes),
-          stored("roundingMode", &WTProject::roundingMode_, &WTStoreRecord::roundingMode,
-                 [](WTObject& object, const QVariant& value) {
-                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
-                   if (mode) static_cast<WTProject&>(object).setRoundingMode(*mode);
-                   return mode.has_value();
-                 }),
           refine("rate", nullptr, nullptr, {"inheritedRate", "client", "client.rate"}),
           refine("inheritedRate", nullptr, nullptr, {"rate"}),
           toMany("tasks", WTKeyType::Ordered, &records<&WTProject::tasks>,
@@ -41,11 +34,8 @@ const WTKeyTable& WTProject::keys() {
           derived<&WTProject::tasksArray>("tasksArray", {"tasks"}),
           derived<&WTProject::tableImage>("tableImage", {"archived"}),
           derived<&WTProject::running>("running", {"tasks"}),
-          derived("roundingRule", WTKeyType::Other,
-                  [](const WTObject& object) {
-                    return QVariant(static_cast<const WTProject&>(object).roundingRule().toVariantMap());
-                  },
-                  {"roundingMinutes", "roundingMode", "client", "client.roundingRule"}),
+          refine("roundingRule", nullptr, nullptr,
+                 {"roundingMinutes", "roundingMode", "client", "client.roundingRule"}),
           derived<&WTProject::billingCurrency>("billingCurrency", {"client", "client.billingCurrency"}),
           derived<&WTProject::billedDuration>("billedDuration", {"duration", "roundingRule"}),
           derived<&WTProject::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
@@ -103,23 +93,8 @@ void WTProject::setBudget(const std::optional<Decimal>& budget) {
   setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
 }
 
-std::optional<int> WTProject::roundingMinutes() const {
-  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
-}
-
-void WTProject::setRoundingMinutes(const std::optional<int>& minutes) {
-  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
-}
-
-void WTProject::setRoundingMode(const QString& mode) {
-  if (const std::optional<QString> stored =
-          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
-    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
-}
-
-WTRoundingRule WTProject::roundingRule() const {
-  const WTRoundingRule above = client_ ? client_->roundingRule() : context()->billingDefaults().rule;
-  return above.refinedBy(roundingMinutes_, roundingMode_);
+WTRoundingRule WTProject::roundingRuleFromAbove() const {
+  return client_ ? client_->roundingRule() : WTBillingRecord::roundingRuleFromAbove();
 }
 
 QString WTProject::billingCurrency() const {

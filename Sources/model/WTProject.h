@@ -1,7 +1,6 @@
 #pragma once
 
-#include "WTObject.h"
-#include "WTRoundingRule.h"
+#include "WTBillingRecord.h"
 
 #include <functional>
 
@@ -9,10 +8,10 @@ class WTClient;
 class WTTask;
 
 // A project: belongs to a client (or none) and owns its tasks in the user's order.
-class WTProject final : public WTObject {
+class WTProject final : public WTBillingRecord {
   WT_ENTITY_CLASS(WTProject, Project)
  public:
-  explicit WTProject(WTObjectContext* context) : WTObject(WTEntity::Project, context) {}
+  explicit WTProject(WTObjectContext* context) : WTBillingRecord(WTEntity::Project, context) {}
 
   WTClient* client() const { return client_; }
   void setClient(WTClient* client);
@@ -40,14 +39,8 @@ class WTProject final : public WTObject {
   std::optional<Decimal> budget() const { return budget_; }
   void setBudget(const std::optional<Decimal>& budget);
 
-  // The rounding rule set on the project itself (0 or none, and a null mode, inherit from the client).
-  std::optional<int> roundingMinutes() const;
-  void setRoundingMinutes(const std::optional<int>& minutes);
-  QString roundingMode() const { return roundingMode_; }
-  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
-  void setRoundingMode(const QString& mode);
-  // The rule in force: the project's own, else its client's, else the preferences'.
-  WTRoundingRule roundingRule() const;
+  // Its client's rule; the preferences' without a client.
+  WTRoundingRule roundingRuleFromAbove() const override;
   // The client's billing currency; the preferences' without a client.
   QString billingCurrency() const;
   // The sums of its tasks' billed minutes and billed costs.
@@ -75,6 +68,4 @@ class WTProject final : public WTObject {
   WTClient* client_ = nullptr;
   QList<WTTask*> tasks_;
   std::optional<Decimal> budget_;
-  std::optional<qint64> roundingMinutes_;
-  QString roundingMode_;
 };

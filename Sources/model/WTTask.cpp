@@ -34,16 +34,9 @@ QVariant groupsVariant(const WTItemContainerList& list) {
 const WTKeyTable& WTTask::keys() {
   using namespace WTKeys;
   static const WTKeyTable table(
-      &objectKeys(),
+      &billingKeys(),
       {
           stored("budget", &WTTask::budget_, &WTStoreRecord::budget),
-          stored("roundingMinutes", &WTTask::roundingMinutes_, &WTStoreRecord::roundingMinutes),
-          stored("roundingMode", &WTTask::roundingMode_, &WTStoreRecord::roundingMode,
-                 [](WTObject& object, const QVariant& value) {
-                   const std::optional<QString> mode = WTRoundingRule::storedMode(value);
-                   if (mode) static_cast<WTTask&>(object).setRoundingMode(*mode);
-                   return mode.has_value();
-                 }),
           toOne("project", &WTStoreRecord::projectUuid),
           refine("rate", nullptr, nullptr, {"project", "project.rate"}),
           refine("inheritedRate", nullptr, nullptr, {"rate"}),
@@ -80,11 +73,8 @@ const WTKeyTable& WTTask::keys() {
           derived<&WTTask::buttonTitle>("buttonTitle", {"running"}),
           derived<&WTTask::timerButtonImage>("timerButtonImage", {"running"}),
           derived<&WTTask::tableImage>("tableImage", {"running"}),
-          derived("roundingRule", WTKeyType::Other,
-                  [](const WTObject& object) {
-                    return QVariant(static_cast<const WTTask&>(object).roundingRule().toVariantMap());
-                  },
-                  {"roundingMinutes", "roundingMode", "project", "project.roundingRule"}),
+          refine("roundingRule", nullptr, nullptr,
+                 {"roundingMinutes", "roundingMode", "project", "project.roundingRule"}),
           derived<&WTTask::billingCurrency>("billingCurrency", {"project", "project.billingCurrency"}),
           derived<&WTTask::billedDuration>("billedDuration", {"duration", "roundingRule"}),
           derived<&WTTask::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
@@ -124,23 +114,8 @@ void WTTask::setBudget(const std::optional<Decimal>& budget) {
   setStoredValue(QStringLiteral("budget"), budget ? QVariant::fromValue(*budget) : QVariant());
 }
 
-std::optional<int> WTTask::roundingMinutes() const {
-  return roundingMinutes_ ? std::optional<int>(int(*roundingMinutes_)) : std::nullopt;
-}
-
-void WTTask::setRoundingMinutes(const std::optional<int>& minutes) {
-  setStoredValue(QStringLiteral("roundingMinutes"), minutes ? QVariant(qint64(*minutes)) : QVariant());
-}
-
-void WTTask::setRoundingMode(const QString& mode) {
-  if (const std::optional<QString> stored =
-          WTRoundingRule::storedMode(mode.isNull() ? QVariant() : QVariant(mode)))
-    setStoredValue(QStringLiteral("roundingMode"), stored->isNull() ? QVariant() : QVariant(*stored));
-}
-
-WTRoundingRule WTTask::roundingRule() const {
-  const WTRoundingRule above = project_ ? project_->roundingRule() : context()->billingDefaults().rule;
-  return above.refinedBy(roundingMinutes_, roundingMode_);
+WTRoundingRule WTTask::roundingRuleFromAbove() const {
+  return project_ ? project_->roundingRule() : WTBillingRecord::roundingRuleFromAbove();
 }
 
 QString WTTask::billingCurrency() const {

@@ -1,8 +1,7 @@
 #pragma once
 
 #include "Date.h"
-#include "WTObject.h"
-#include "WTRoundingRule.h"
+#include "WTBillingRecord.h"
 
 #include <QHash>
 #include <QSet>
@@ -18,10 +17,10 @@ class WTTime;
 using WTItemContainerList = std::vector<std::shared_ptr<WTItemContainer>>;
 
 // A task of a project: owns its items of every kind, sums them and runs their timers.
-class WTTask final : public WTObject {
+class WTTask final : public WTBillingRecord {
   WT_ENTITY_CLASS(WTTask, Task)
  public:
-  explicit WTTask(WTObjectContext* context) : WTObject(WTEntity::Task, context) {}
+  explicit WTTask(WTObjectContext* context) : WTBillingRecord(WTEntity::Task, context) {}
   ~WTTask() override;
 
   WTProject* project() const { return project_; }
@@ -30,14 +29,8 @@ class WTTask final : public WTObject {
   std::optional<Decimal> budget() const { return budget_; }
   void setBudget(const std::optional<Decimal>& budget);
 
-  // The rounding rule set on the task itself (0 or none, and a null mode, inherit from the project).
-  std::optional<int> roundingMinutes() const;
-  void setRoundingMinutes(const std::optional<int>& minutes);
-  QString roundingMode() const { return roundingMode_; }
-  // "up", "nearest", "down", or a null text to inherit; other text changes nothing.
-  void setRoundingMode(const QString& mode);
-  // The rule in force: the task's own, else its project's, else the preferences'.
-  WTRoundingRule roundingRule() const;
+  // Its project's rule; the preferences' without a project.
+  WTRoundingRule roundingRuleFromAbove() const override;
   // The project's billing currency; the preferences' without a project.
   QString billingCurrency() const;
 
@@ -137,8 +130,6 @@ class WTTask final : public WTObject {
 
   WTProject* project_ = nullptr;
   std::optional<Decimal> budget_;
-  std::optional<qint64> roundingMinutes_;
-  QString roundingMode_;
   QList<WTItem*> items_;
   WTItemContainerList cachedChildren_;
   // The last "dailyItems" and "monthlyItems" read by key; valid until the same key is read again.
