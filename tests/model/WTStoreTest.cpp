@@ -127,7 +127,7 @@ Records sampleRecords() {
             .budget = decimal(u"12345678901234567890123456789012345678")},
            {.uuid = "I1@WTTime", .entity = "WTTime", .name = QString::fromUtf16(u"nul \0 inside", 12),
             .taskUuid = "T1@WTTask", .startDate = Date::fromSeconds(1767261600.25),
-            .endDate = Date::fromSeconds(1767265200.75), .running = true},
+            .endDate = Date::fromSeconds(1767265200.75), .running = true, .importId = "toggl:3f2a"},
            {.uuid = "I2@WTFlat", .entity = "WTFlat", .taskUuid = "T1@WTTask",
             .startDate = Date::fromSeconds(-86400.5), .minutes = 0},
            {.uuid = "I3@WTExpense", .entity = "WTExpense", .rate = decimal(u"0.0000000000000000000001"),
@@ -266,7 +266,7 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
     EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
-  EXPECT_EQ(shape(path()), QStringList({"4", "wal", "0", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"5", "wal", "0", "3"}));
   const QString folder = dir.filePath(QStringLiteral("Tessal2"));
   auto inMissingFolder = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
   ASSERT_FALSE(inMissingFolder.ok());
@@ -323,7 +323,7 @@ TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWrite
   const WTStoreRecord added = record("N@WTNote", "WTNote", "C@WTClient");
   ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
   expected[added.uuid] = added;
-  EXPECT_EQ(shape(path()), QStringList({"4", "wal", "3", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"5", "wal", "3", "3"}));
 
   auto reader = WTStore::openReadOnly(path());
   ASSERT_TRUE(reader) << reader.error().message.toStdString();
