@@ -208,6 +208,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
 
     const qint64 minutes = minutesOf(row->start, *row->end);
     client.total.minutes += minutes;
+    client.total.priced = client.total.priced || (row->billable && row->rate);
     if (row->billable && row->rate)
       client.total.money +=
           Decimal::divide(*row->rate * Decimal(std::int64_t(minutes)), Decimal(60)).value_or(Decimal());
@@ -287,10 +288,13 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
                   counted(plan.tasks.reused, "task", "tasks"));
   out += QStringLiteral("Already there: %1\n").arg(counted(plan.alreadyThere, "entry", "entries"));
   for (const WTImportPlan::ClientTotal& total : plan.totals) {
-    out += QStringLiteral("  %1  %2  %3%4\n")
-               .arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
-                    DurationText::stringWithMinutes(int(total.minutes)), total.money.rounded(2).toString(),
-                    total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
+    out += QStringLiteral("  %1  %2").arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
+                                          DurationText::stringWithMinutes(int(total.minutes)));
+    if (total.priced) {
+      out += QStringLiteral("  %1%2").arg(total.money.rounded(2).toString(),
+                                          total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
+    }
+    out += QLatin1Char('\n');
   }
   for (const QString& note : plan.notes) out += QStringLiteral("Note: %1\n").arg(note);
   if (!plan.running.empty()) {

@@ -25,6 +25,7 @@ struct WTImportPlan {
     QString client;
     qint64 minutes = 0;
     Decimal money;
+    bool priced = false;  // whether the file gives a rate for any of the client's entries
     QString currency;
   };
   std::vector<ClientTotal> totals;  // in the order of the file
