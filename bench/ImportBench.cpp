@@ -36,7 +36,8 @@ class ImportInstallation {
     environment.insert("XDG_CONFIG_HOME", home_.filePath("config"));
     environment.insert("XDG_RUNTIME_DIR", home_.filePath("runtime"));
     environment.insert("TZ", "Europe/Berlin");
-    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "DBUS_SESSION_BUS_ADDRESS"}) environment.remove(name);
+    for (const char* name : {"DISPLAY", "WAYLAND_DISPLAY", "DBUS_SESSION_BUS_ADDRESS"})
+      environment.remove(name);
     process.setProcessEnvironment(environment);
     process.start(QString::fromUtf8(TESSAL_EXE), arguments);
     return process.waitForFinished(120000) && process.exitStatus() == QProcess::NormalExit &&
@@ -45,25 +46,28 @@ class ImportInstallation {
 
  private:
   ImportInstallation() {
-    for (const char* sub : {"data/Tessal2", "config", "runtime"}) QDir(home_.path()).mkpath(QString::fromLatin1(sub));
+    for (const char* sub : {"data/Tessal2", "config", "runtime"})
+      QDir(home_.path()).mkpath(QString::fromLatin1(sub));
     QFile::setPermissions(home_.filePath("runtime"), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
     QFile out(file());
     out.open(QIODevice::WriteOnly);
-    QByteArray text = "User,Email,Client,Project,Task,Description,Billable,Start date,Start time,End date,End time,"
-                      "Duration,Tags,Amount (EUR)\n";
+    QByteArray text =
+        "User,Email,Client,Project,Task,Description,Billable,Start date,Start time,End date,End time,"
+        "Duration,Tags,Amount (EUR)\n";
     const QDateTime first(QDate(2020, 1, 1), QTime(8, 0), QTimeZone("Europe/Berlin"));
     for (int i = 0; i < kRows; ++i) {
       const QDateTime start = first.addSecs(qint64(i) * 3600);
       const QDateTime end = start.addSecs(45 * 60);
-      text += QStringLiteral("Ana,ana@example.org,Client %1,Project %2,Task %3,\"Work, item %4\",%5,%6,%7,%8,%9,"
-                             "00:45:00,web,60.00\n")
+      text += QStringLiteral(
+                  "Ana,ana@example.org,Client %1,Project %2,Task %3,\"Work, item %4\",%5,%6,%7,%8,%9,"
+                  "00:45:00,web,60.00\n")
                   .arg(i % 20)
                   .arg(i % 100)
                   .arg(i % 400)
                   .arg(i)
                   .arg(i % 10 ? "Yes" : "No")
-                  .arg(start.toString(u"yyyy-MM-dd"), start.toString(u"HH:mm:ss"), end.toString(u"yyyy-MM-dd"),
-                       end.toString(u"HH:mm:ss"))
+                  .arg(start.toString(u"yyyy-MM-dd"), start.toString(u"HH:mm:ss"),
+                       end.toString(u"yyyy-MM-dd"), end.toString(u"HH:mm:ss"))
                   .toUtf8();
       if (text.size() > (1 << 20)) {
         out.write(text);

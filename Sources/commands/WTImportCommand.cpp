@@ -60,11 +60,13 @@ Parsed parse(const QStringList& arguments) {
     parsed.zoneGiven = true;
     parsed.options.zone = QTimeZone(parser.value(kZone).toUtf8());
     if (!parsed.options.zone.isValid())
-      parsed.problem = QStringLiteral("--tz takes a zone such as Europe/Berlin, not '%1'").arg(parser.value(kZone));
+      parsed.problem =
+          QStringLiteral("--tz takes a zone such as Europe/Berlin, not '%1'").arg(parser.value(kZone));
   }
   if (parser.isSet(kTags)) {
     parsed.options.tags = parser.value(kTags).split(u',');
-    static const QStringList fields = {QStringLiteral("client"), QStringLiteral("project"), QStringLiteral("task")};
+    static const QStringList fields = {QStringLiteral("client"), QStringLiteral("project"),
+                                       QStringLiteral("task")};
     for (const QString& field : parsed.options.tags) {
       if (!fields.contains(field) || parsed.options.tags.count(field) > 1)
         parsed.problem = QStringLiteral("--tags takes client, project and task, each once, not '%1'")
@@ -132,10 +134,11 @@ WTCommandOutcome run(WTObjectContext& context, const QStringList& arguments, con
     return {0, out + QStringLiteral("Nothing was changed (--dry-run)\n"), {}};
   }
   const WTImportPlan plan = WTImport::apply(context, imported, options);
-  return {0,
-          WTImport::preview(imported, plan, parsed.options.zone) +
-              QStringLiteral("Imported %1 %2\n").arg(plan.entries).arg(plan.entries == 1 ? "entry" : "entries"),
-          {}};
+  return {
+      0,
+      WTImport::preview(imported, plan, parsed.options.zone) +
+          QStringLiteral("Imported %1 %2\n").arg(plan.entries).arg(plan.entries == 1 ? "entry" : "entries"),
+      {}};
 }
 
 }  // namespace WTImportCommand

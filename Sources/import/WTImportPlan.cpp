@@ -6,6 +6,9 @@
 #include "WTProject.h"
 #include "WTTask.h"
 #include "WTTime.h"
+#include "WTUndoManager.h"
+
+#include <QCoreApplication>
 
 #include <QSet>
 #include <QTimeZone>
@@ -159,8 +162,9 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
   std::map<QString, ClientNode> nodes;
   std::vector<ClientNode*> order;
   std::vector<std::pair<const WTImportRow*, TaskNode*>> entries;
-  std::vector<WTImportRow> stopped;  // running rows given their end
-  stopped.reserve(file.rows.size());
+  std::vector<WTImportRow> stopped;  // running rows given their end; never moved, as rows point into it
+  stopped.reserve(
+      size_t(std::count_if(file.rows.begin(), file.rows.end(), [](const auto& row) { return !row.end; })));
   for (const WTImportRow& original : file.rows) {
     const WTImportRow* row = &original;
     if (!row->end) {
@@ -271,6 +275,9 @@ WTImportPlan plan(const WTObjectContext& context, const WTImportFile& file, cons
 }
 
 WTImportPlan apply(WTObjectContext& context, const WTImportFile& file, const Options& options) {
+  // Made in one turn of the event loop, the whole import is one step of the desktop's undo.
+  const WTUndoManager::NamedStep step(context.undoManager(),
+                                      QCoreApplication::translate("WTImport", "Import"));
   return run(context, file, options, true);
 }
 
@@ -288,11 +295,13 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
                   counted(plan.tasks.reused, "task", "tasks"));
   out += QStringLiteral("Already there: %1\n").arg(counted(plan.alreadyThere, "entry", "entries"));
   for (const WTImportPlan::ClientTotal& total : plan.totals) {
-    out += QStringLiteral("  %1  %2").arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
-                                          DurationText::stringWithMinutes(int(total.minutes)));
+    out += QStringLiteral("  %1  %2")
+               .arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
+                    DurationText::stringWithMinutes(int(total.minutes)));
     if (total.priced) {
-      out += QStringLiteral("  %1%2").arg(total.money.rounded(2).toString(),
-                                          total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
+      out += QStringLiteral("  %1%2").arg(
+          total.money.rounded(2).toString(),
+          total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
     }
     out += QLatin1Char('\n');
   }

@@ -142,15 +142,10 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   EXPECT_EQ(here.out({"add", "Review", "10:15-11:00", "--date", "2026-03-05"}, auckland),
             "Added Hermes › Review  2026-03-05 10:15–11:00  00:45\n");
   here.expect({"log", "--range", "2026-03-05..2026-03-05"}, 0, "2026-03-05  10:15–11:00", auckland);
-  const QString file = here.file("in.csv", "Client,Project,Description,Start date,Start time,Duration
-"
-                                           "acme,atlas,Sketch,2026-03-06,09:00,1:00:00
-");
-  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks
-Already there: 0 entries
-", auckland);
-  here.expect({"import", file}, 0, "Already there: 1 entry
-");
+  const QString file = here.file("in.csv", "Client,Project,Description,Start date,Start time,Duration\n"
+                                           "acme,atlas,Sketch,2026-03-06,09:00,1:00:00\n");
+  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks\nAlready there: 0 entries\n", auckland);
+  here.expect({"import", file}, 0, "Already there: 1 entry\n", auckland);
   here.expect({"log", "--range", "2026-03-06..2026-03-06"}, 0, "2026-03-06  09:00–10:00  Atlas › Default Task", auckland);
   EXPECT_EQ(times(), 6);
   EXPECT_EQ(desktop->state(), QProcess::Running);

@@ -53,6 +53,14 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
   EXPECT_EQ(plan.totals[0].money, Decimal(150));
 
   WTImport::apply(*context, file, {});
+  // One step of undo takes the whole import back, and redo brings it again.
+  WTUndoManager& undo = context->undoManager();
+  undo.closeGroup();
+  EXPECT_EQ(undo.undoActionName(), QStringLiteral("Import"));
+  undo.undo();
+  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+  EXPECT_EQ(context->fetch<WTTask>().size(), 1);
+  undo.redo();
   saveAndReopen();
   ASSERT_EQ(context->fetch<WTClient>().size(), 1);
   WTTime* call = entryNamed(QStringLiteral("Call\nwith client"));
