@@ -127,9 +127,9 @@ WTCommandOutcome run(WTObjectContext& context, const QStringList& arguments, con
     if (!imported.problems.empty()) {
       return {1, out,
               QStringLiteral("tessal: %1: %2 cannot be read; nothing was imported\n")
-                  .arg(parsed.file, imported.problems.size() == 1
+                  .arg(parsed.file, imported.problemCount() == 1
                                         ? QStringLiteral("1 row")
-                                        : QStringLiteral("%1 rows").arg(imported.problems.size()))};
+                                        : QStringLiteral("%1 rows").arg(imported.problemCount()))};
     }
     return {0, out + QStringLiteral("Nothing was changed (--dry-run)\n"), {}};
   }

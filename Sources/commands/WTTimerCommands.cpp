@@ -1,9 +1,9 @@
 #include "WTTimerCommands.h"
 
 #include "DurationText.h"
-#include "WTImportCommand.h"
 #include "RZDate.h"
 #include "WTClient.h"
+#include "WTImportCommand.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTStoreSnapshot.h"
@@ -379,7 +379,8 @@ WTCommandOutcome answer(WTObjectContext& context, const QJsonObject& request) {
   for (const QJsonValue& argument : request.value(QStringLiteral("arguments")).toArray())
     arguments.append(argument.toString());
   if (!changesData(command))
-    return {2, {}, QStringLiteral("tessal: the running Tessal carries out only start, stop, add and import\n")};
+    return {
+        2, {}, QStringLiteral("tessal: the running Tessal carries out only start, stop, add and import\n")};
   if (std::optional<WTCommandOutcome> problem = checkArguments(command, arguments)) return *problem;
   const QTimeZone zone(request.value(QStringLiteral("zone")).toString().toUtf8());
   return run(context, command, arguments, zone.isValid() ? zone : QTimeZone::systemTimeZone());

@@ -92,6 +92,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   const QString journalFile = WTStoreSetup::syncJournalPath();
   RZSyncTrack journal(journalFile);
   context.setChangeJournal(&journal);
+  // Nothing here is ever undone: an import of many entries would only hold every step in memory.
+  context.undoManager().disableRegistration();
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {

@@ -43,7 +43,18 @@ struct WTImportProblem {
 struct WTImportFile {
   QString format;
   std::vector<WTImportRow> rows;
+  // The first kProblemsKept rows that cannot be read, and how many more there are: a file of garbage
+  // holds memory no longer than a file of entries.
+  static constexpr size_t kProblemsKept = 1000;
   std::vector<WTImportProblem> problems;
+  qint64 moreProblems = 0;
+  void addProblem(qint64 line, const QString& reason) {
+    if (problems.size() < kProblemsKept)
+      problems.push_back({line, reason});
+    else
+      ++moreProblems;
+  }
+  qint64 problemCount() const { return qint64(problems.size()) + moreProblems; }
   QString mapping;  // how the format's fields were placed, when that is a choice worth telling
 };
 

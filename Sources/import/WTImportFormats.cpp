@@ -112,7 +112,15 @@ struct Header {
   explicit Header(const QStringList& fields) : names(fields) {
     for (qsizetype i = 0; i < fields.size(); ++i) index.insert(folded(fields[i]), i);
   }
+  // Looked up once per column name: every row asks again.
   qsizetype column(const char* name) const {
+    const auto cached = cache_.constFind(name);
+    if (cached != cache_.constEnd()) return *cached;
+    const qsizetype found = find(name);
+    cache_.insert(name, found);
+    return found;
+  }
+  qsizetype find(const char* name) const {
     if (!*name) return -1;
     const QString wanted = folded(QString::fromUtf8(name));
     if (wanted.endsWith(u'(')) {
@@ -122,6 +130,8 @@ struct Header {
     }
     return index.value(wanted, -1);
   }
+  mutable QHash<const char*, qsizetype> cache_;
+
   QString currencyIn(const char* name) const {
     const qsizetype at = column(name);
     if (at < 0 || !QString::fromUtf8(name).endsWith(u'(')) return QString();
@@ -369,7 +379,7 @@ Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
       row->line = reader.line();
       file.rows.push_back(std::move(*row));
     } else {
-      file.problems.push_back({reader.line(), problem});
+      file.addProblem(reader.line(), problem);
     }
   }
   return file;
@@ -513,23 +523,21 @@ class TimewarriorReader : public nlohmann::json_sax<nlohmann::json> {
     row.line = line_;
     const std::optional<Date> start = instant(entry_.value(QStringLiteral("start")));
     if (!start) {
-      file_.problems.push_back(
-          {line_,
-           QStringLiteral("the start “%1” cannot be read").arg(entry_.value(QStringLiteral("start")))});
+      file_.addProblem(
+          line_, QStringLiteral("the start “%1” cannot be read").arg(entry_.value(QStringLiteral("start"))));
       return;
     }
     row.start = *start;
     if (entry_.contains(QStringLiteral("end"))) {
       row.end = instant(entry_.value(QStringLiteral("end")));
       if (!row.end) {
-        file_.problems.push_back(
-            {line_, QStringLiteral("the end “%1” cannot be read").arg(entry_.value(QStringLiteral("end")))});
+        file_.addProblem(
+            line_, QStringLiteral("the end “%1” cannot be read").arg(entry_.value(QStringLiteral("end"))));
         return;
       }
       if (*row.end < row.start) {
-        file_.problems.push_back(
-            {line_, QStringLiteral("the entry ends (%1) before it starts (%2)")
-                        .arg(when(*row.end, options_.zone), when(row.start, options_.zone))});
+        file_.addProblem(line_, QStringLiteral("the entry ends (%1) before it starts (%2)")
+                                    .arg(when(*row.end, options_.zone), when(row.start, options_.zone)));
         return;
       }
     } else {

@@ -318,6 +318,7 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
     out += QStringLiteral("Rows that cannot be read:\n");
     for (const WTImportProblem& problem : file.problems)
       out += QStringLiteral("  line %1: %2\n").arg(problem.line).arg(problem.reason);
+    if (file.moreProblems > 0) out += QStringLiteral("  and %1 more\n").arg(file.moreProblems);
   }
   return out;
 }

@@ -142,11 +142,14 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   EXPECT_EQ(here.out({"add", "Review", "10:15-11:00", "--date", "2026-03-05"}, auckland),
             "Added Hermes › Review  2026-03-05 10:15–11:00  00:45\n");
   here.expect({"log", "--range", "2026-03-05..2026-03-05"}, 0, "2026-03-05  10:15–11:00", auckland);
-  const QString file = here.file("in.csv", "Client,Project,Description,Start date,Start time,Duration\n"
-                                           "acme,atlas,Sketch,2026-03-06,09:00,1:00:00\n");
-  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks\nAlready there: 0 entries\n", auckland);
+  const QString file = here.file("in.csv",
+                                 "Client,Project,Description,Start date,Start time,Duration\n"
+                                 "acme,atlas,Sketch,2026-03-06,09:00,1:00:00\n");
+  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks\nAlready there: 0 entries\n",
+              auckland);
   here.expect({"import", file}, 0, "Already there: 1 entry\n", auckland);
-  here.expect({"log", "--range", "2026-03-06..2026-03-06"}, 0, "2026-03-06  09:00–10:00  Atlas › Default Task", auckland);
+  here.expect({"log", "--range", "2026-03-06..2026-03-06"}, 0,
+              "2026-03-06  09:00–10:00  Atlas › Default Task", auckland);
   EXPECT_EQ(times(), 6);
   EXPECT_EQ(desktop->state(), QProcess::Running);
   desktop->kill();
@@ -233,8 +236,10 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
 // An import is previewed, made once, and refused whole (the store file as it was) for one bad row.
 TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
   const QByteArray header = "Client,Project,Task,Description,Billable,Start date,Start time,Duration\n";
-  const QString good = here.file("good.csv", header + "ACME,atlas,design,Sketch,Yes,2026-03-04,09:00,1:30:00\n"
-                                                      ",Zeus,,\"Plan, \"\"big\"\"\",No,2026-03-04,11:00,0:30:00\n");
+  const QString good =
+      here.file("good.csv", header +
+                                "ACME,atlas,design,Sketch,Yes,2026-03-04,09:00,1:30:00\n"
+                                ",Zeus,,\"Plan, \"\"big\"\"\",No,2026-03-04,11:00,0:30:00\n");
   const QString bad = here.file("bad.csv", header + ",Zeus,,Late,Yes,2026-03-05,25:00,1:00:00\n");
   const struct {
     QStringList arguments;
@@ -254,7 +259,8 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
     const QByteArray journal = bytesOf(here.journalPath());
     here.expect(c.arguments, c.code, c.says);
     if (c.code != 0 || c.arguments.contains("--dry-run")) {
-      EXPECT_EQ(bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal"), store) << c.says.toStdString();
+      EXPECT_EQ(bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal"), store)
+          << c.says.toStdString();
       EXPECT_EQ(bytesOf(here.journalPath()), journal);
     }
   }

@@ -130,8 +130,9 @@ struct Refusal {
   const char* name;
   QByteArray content;
   const char* format;
-  const char* error;  // empty: read, with `rows` entries
+  const char* error;  // empty: read, with `rows` entries and `problems` rows that cannot be read
   int rows;
+  int problems = 0;
 };
 
 class ImportRefusalTest : public testing::TestWithParam<Refusal> {};
@@ -151,11 +152,14 @@ TEST_P(ImportRefusalTest, RefusesOrReads) {
   } else {
     ASSERT_TRUE(read.ok()) << read.error().message.toStdString();
     EXPECT_EQ(read.value().rows.size(), size_t(refusal.rows));
-    EXPECT_TRUE(read.value().problems.empty());
+    EXPECT_EQ(read.value().problemCount(), refusal.problems);
+    EXPECT_EQ(read.value().problems.size(), std::min<size_t>(refusal.problems, WTImportFile::kProblemsKept));
   }
 }
 
 const QByteArray kTogglHeader = "Client,Project,Task,Description,Billable,Start date,Start time,Duration\r\n";
+const QByteArray kGoodRow = ",P,,ok,Yes,2024-01-01,10:00,1:00:00\n";
+const QByteArray kBadRow = ",P,,bad,Yes,someday,10:00,1:00:00\n";
 
 INSTANTIATE_TEST_SUITE_P(
     Files, ImportRefusalTest,
@@ -192,7 +196,8 @@ INSTANTIATE_TEST_SUITE_P(
         Refusal{"Semicolons",
                 "Client;Project;Task;Description;Billable;Start date;Start time;Duration\n"
                 ";P;;\"a;b\";Yes;2024-01-01;10:00;1:00:00\n",
-                "", "", 1}),
+                "", "", 1},
+        Refusal{"ManyBadRows", kTogglHeader + kGoodRow + kBadRow.repeated(1500), "", "", 1, 1500}),
     [](const testing::TestParamInfo<Refusal>& info) { return std::string(info.param.name); });
 
 }  // namespace
