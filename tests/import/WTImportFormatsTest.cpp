@@ -188,6 +188,8 @@ INSTANTIATE_TEST_SUITE_P(
                 "line 2: a quoted field is never closed", 0},
         Refusal{"LongLine", kTogglHeader + QByteArray(2 << 20, 'x'), "",
                 "line 2 is longer than 1048576 bytes", 0},
+        Refusal{"LongJSON", "[{\"annotation\": \"" + QByteArray(2 << 20, 'x') + "\"}]", "",
+                "line 1: an entry longer than 1048576 bytes", 0},
         Refusal{"BrokenJSON", "[{\"start\": \"20231001T103000Z\",\n\"tags\": [}]", "",
                 "line 2: the JSON cannot be read", 0},
         Refusal{"BOMAndCRLF",
