@@ -380,7 +380,7 @@ Decimal Decimal::rounded(int places) const {
   if (drop > kPrec) return Decimal(0, int(target), negative_);  // below half a unit of the last place
   const u128 unit = kPow10[drop];
   u128 kept = coefficient_ / unit;
-  if (coefficient_ % unit >= unit / 2) ++kept;
+  if (coefficient_ - kept * unit >= unit / 2) ++kept;  // the remainder, without a second division
   return Decimal(kept, int(target), negative_);
 }
 

@@ -130,6 +130,10 @@ QString format(const Decimal& amount, const QString& currency) {
   return Formatter(icu::Locale::getDefault(), places).format(amount);
 }
 
+QString format(const Decimal& amount, const QString& currency, const icu::Locale& locale) {
+  return Formatter(locale, minorUnitDigits(currency)).format(amount);
+}
+
 int minorUnitDigits(const QString& currency) {
   thread_local QHash<QString, int> known;
   const auto found = known.constFind(currency);

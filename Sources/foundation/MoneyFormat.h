@@ -13,6 +13,12 @@ namespace MoneyFormat {
 QString format(const Decimal& amount);
 // The same with the places of `currency`'s minor unit (none for JPY, three for KWD), without its sign.
 QString format(const Decimal& amount, const QString& currency);
+// A code written out ("JPY") is a currency, not a locale's name.
+inline QString format(const Decimal& amount, const char* currency) {
+  return format(amount, QString::fromLatin1(currency));
+}
+// The same in `locale`.
+QString format(const Decimal& amount, const QString& currency, const icu::Locale& locale);
 // How many places a currency (ISO 4217 code) bills to, as ICU knows it; 2 for a code it does not know.
 int minorUnitDigits(const QString& currency);
 // The currency of the user's locale (its ISO 4217 code); "USD" where the locale names none.

@@ -3,6 +3,7 @@
 #include <QMetaMethod>
 #include <QSet>
 
+#include "MoneyFormat.h"
 #include "RZDate.h"
 #include "WTItem.h"
 #include "WTTask.h"
@@ -137,6 +138,56 @@ Decimal WTItemContainer::cost() const {
   return total;
 }
 
+QString WTItemContainer::billingCurrency() const {
+  if (task_) return task_->billingCurrency();
+  return items_.isEmpty() ? QString() : items_.first()->billingCurrency();
+}
+
+namespace {
+
+// The rule, rate and places of one task, worked out again only when the next item is of another task.
+struct TaskBilling {
+  const WTTask* task = nullptr;
+  WTRoundingRule rule;
+  Decimal rate;
+  int places = 2;
+
+  const TaskBilling& of(const WTTask* itemTask) {
+    if (itemTask == task) return *this;
+    task = itemTask;
+    rule = task->roundingRule();
+    rate = task->inheritedRate();
+    places = MoneyFormat::minorUnitDigits(task->billingCurrency());
+    return *this;
+  }
+};
+
+}  // namespace
+
+int WTItemContainer::billedDuration() const {
+  int total = 0;
+  TaskBilling billing;
+  for (const WTItem* item : items_) {
+    total +=
+        item->task() ? item->billedDurationWithRule(billing.of(item->task()).rule) : item->billedDuration();
+  }
+  return total;
+}
+
+Decimal WTItemContainer::billedCost() const {
+  Decimal total = Decimal().rounded(MoneyFormat::minorUnitDigits(billingCurrency()));
+  TaskBilling billing;
+  for (const WTItem* item : items_) {
+    if (!item->task()) {
+      total += item->billedCost();
+      continue;
+    }
+    const TaskBilling& task = billing.of(item->task());
+    total += item->billedCostWith(task.rule, task.rate, task.places);
+  }
+  return total;
+}
+
 void WTItemContainer::setItems(QList<WTItem*> items) {
   stopObserving();
   items_ = std::move(items);
@@ -163,7 +214,9 @@ void WTItemContainer::startObserving() {
   observers_.reserve(items_.size());
   for (WTItem* item : items_) {
     observers_.push_back(context_->addObserver(item, QString(), [this](WTObject*, const QString& key) {
-      if (key == QLatin1String("duration") || key == QLatin1String("cost")) emit valueChanged(key);
+      if (key == QLatin1String("duration") || key == QLatin1String("cost") ||
+          key == QLatin1String("billedDuration") || key == QLatin1String("billedCost"))
+        emit valueChanged(key);
     }));
   }
 }
@@ -198,6 +251,9 @@ QVariant WTItemContainer::valueForKey(const QString& key) const {
   if (key == QLatin1String("task")) return task_ ? KeyPath::variantFromObject(task_) : QVariant();
   if (key == QLatin1String("duration")) return duration();
   if (key == QLatin1String("cost")) return QVariant::fromValue(cost());
+  if (key == QLatin1String("billedDuration")) return billedDuration();
+  if (key == QLatin1String("billedCost")) return QVariant::fromValue(billedCost());
+  if (key == QLatin1String("billingCurrency")) return billingCurrency();
   if (key == QLatin1String("title")) return title();
   if (key == QLatin1String("itemNames")) {
     // None rather than an empty text, which a template's condition would take for a value.

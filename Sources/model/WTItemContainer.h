@@ -21,9 +21,9 @@ class WTTask;
 // day or month. Never stored; made afresh whenever a task's groups or a report are rebuilt. It keeps
 // an identity of date and task so the outline can find the same group again after a rebuild.
 //
-// While it holds items and someone listens to valueChanged, it observes their duration and cost and
-// re-announces them as its own, so a running entry's minutes reach the group's total. Groups nobody
-// listens to (those of a report, made by the ten thousand) cost no observers.
+// While it holds items and someone listens to valueChanged, it observes their duration and cost (raw and
+// billed) and re-announces them as its own, so a running entry's minutes reach the group's total. Groups
+// nobody listens to (those of a report, made by the ten thousand) cost no observers.
 class WTItemContainer : public QObject, public KeyValueCoding {
   Q_OBJECT
  public:
@@ -56,6 +56,11 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   QVariantMap uuid() const;
   int duration() const;
   Decimal cost() const;
+  // What its items bill, each by its own task's rule, rate and currency (see WTItem::billedCost); the
+  // currency is its task's, or its first item's for a group that spans tasks.
+  QString billingCurrency() const;
+  int billedDuration() const;
+  Decimal billedCost() const;
 
   const QList<WTItem*>& items() const { return items_; }
   const QList<WTItem*>& children() const { return items_; }
@@ -72,7 +77,8 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   QVariant valueForKey(const QString& key) const override;
 
  signals:
-  // "duration" or "cost" of the group changed because one of its items' did.
+  // "duration", "cost", "billedDuration" or "billedCost" of the group changed because one of its items'
+  // did (a rule, rate or currency changed above is announced by the task, not by its groups).
   void valueChanged(const QString& key);
 
  protected:

@@ -334,6 +334,8 @@ void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int old
   for (WTObject* owner : {oldOwner, newOwner == oldOwner ? nullptr : newOwner}) {
     if (!owner) continue;
     announce(owner, inverse);
+    // A project's totals follow its tasks, raw and billed, and the client's the project's.
+    if (owner->entity() == WTEntity::Project) static_cast<WTProject*>(owner)->durationDidChange();
     // A task's totals follow its items; the chain goes on up to project and client.
     if (owner->entity() != WTEntity::Task) continue;
     auto* task = static_cast<WTTask*>(owner);

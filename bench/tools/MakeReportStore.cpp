@@ -3,11 +3,14 @@
 // 2025 (one every 25 minutes, never overlapping) and nothing else, the rest spread over the other clients
 // and the five years.
 //
-//   tessal_make_report_store STORE_PATH TIMEWARRIOR_DB_FOLDER
+// With --rules every client bills time entries rounded up to 15 minutes.
+//
+//   tessal_make_report_store STORE_PATH TIMEWARRIOR_DB_FOLDER [--rules]
 #include "Date.h"
 #include "Decimal.h"
 #include "WTStore.h"
 
+#include <QByteArray>
 #include <QDateTime>
 #include <QDir>
 #include <QFile>
@@ -36,8 +39,9 @@ WTStoreRecord named(const QString& uuid, const QString& entity, const QString& n
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc != 3) {
-    std::fputs("usage: tessal_make_report_store STORE_PATH TIMEWARRIOR_DB_FOLDER\n", stderr);
+  const bool rules = argc == 4 && QByteArray(argv[3]) == "--rules";
+  if (argc != 3 && !rules) {
+    std::fputs("usage: tessal_make_report_store STORE_PATH TIMEWARRIOR_DB_FOLDER [--rules]\n", stderr);
     return 2;
   }
   const QString storePath = QString::fromLocal8Bit(argv[1]);
@@ -56,6 +60,10 @@ int main(int argc, char** argv) {
     WTStoreRecord client = named(QStringLiteral("C%1@WTClient").arg(c), QStringLiteral("WTClient"),
                                  c == 0 ? QStringLiteral("Northwind") : QStringLiteral("Client %1").arg(c));
     client.rate = Decimal::fromString(u"90");
+    if (rules) {
+      client.roundingMinutes = 15;
+      client.roundingMode = QStringLiteral("up");
+    }
     records.push_back(client);
   }
   for (int p = 0; p < kProjects; ++p) {

@@ -63,6 +63,7 @@ std::optional<Decimal> apply(const std::string& op, const Decimal& a, const Deci
   if (op == "add") return a + b;
   if (op == "sub") return a - b;
   if (op == "mul") return a * b;
+  if (op == "round") return a.rounded(int(b.toInt64()));  // to b places
   return Decimal::divide(a, b);
 }
 
@@ -99,7 +100,7 @@ TEST_P(DecimalVectorTest, AgreesWithPythonsDecimalModule) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Decimal, DecimalVectorTest,
-                         ::testing::Values("add", "sub", "mul", "div", "parse", "cmp"));
+                         ::testing::Values("add", "sub", "mul", "div", "parse", "cmp", "round"));
 
 // The forms people and files write; below the smallest exponent digits round away, half away from zero.
 TEST(DecimalTest, ParsesNumbersAsWrittenAndKeepsTheirExponent) {

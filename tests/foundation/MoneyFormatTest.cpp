@@ -9,15 +9,18 @@
 #include <array>
 #include <random>
 #include <string>
+#include <tuple>
 #include <vector>
 
 namespace {
 
-// What ICU's own formatter writes for "#,##0.00", half away from zero, in `locale`.
-QString byIcu(const QString& plain, const icu::Locale& locale) {
+// What ICU's own formatter writes for "#,##0.00" (or another number of places), half away from zero, in
+// `locale`.
+QString byIcu(const QString& plain, const icu::Locale& locale, int places = 2) {
   UErrorCode status = U_ZERO_ERROR;
-  icu::DecimalFormat format(icu::UnicodeString(u"#,##0.00"), icu::DecimalFormatSymbols(locale, status),
-                            status);
+  const std::u16string pattern = u"#,##0" + (places > 0 ? u"." + std::u16string(size_t(places), u'0') : u"");
+  icu::DecimalFormat format(icu::UnicodeString(pattern.data(), int32_t(pattern.size())),
+                            icu::DecimalFormatSymbols(locale, status), status);
   format.setRoundingMode(icu::DecimalFormat::kRoundHalfUp);
   const QByteArray digits = plain.toLatin1();
   icu::UnicodeString text;
@@ -55,6 +58,10 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
       SCOPED_TRACE(std::string(name) + ' ' + amount.toStdString());
       const QString written = MoneyFormat::format(*decimal, locale);
       EXPECT_EQ(written, byIcu(decimal->toString(), locale));
+      // A currency's places: EUR's are the two above, JPY has none and KWD three.
+      for (const auto& [currency, places] : {std::pair{"EUR", 2}, {"JPY", 0}, {"KWD", 3}})
+        EXPECT_EQ(MoneyFormat::format(*decimal, currency, locale), byIcu(decimal->toString(), locale, places))
+            << currency;
       // What is shown reads back to the cent; an editor's exact text as the amount with its places.
       const std::optional<Decimal> cents =
           Decimal::fromString(byIcu(decimal->toString(), icu::Locale("en_US_POSIX")).remove(u','));
@@ -65,6 +72,36 @@ TEST(MoneyFormat, EveryAmountReadsAsIcuWritesItInEveryLocale) {
       EXPECT_TRUE(*exact.value == *decimal && exact.value->exponent() == std::min(decimal->exponent(), 0))
           << exact.value->toString().toStdString();
     }
+  }
+}
+
+// ICU's minor units; what is billed is rounded half away from zero to them, and shown with them.
+TEST(MoneyFormat, CurrenciesBillToTheirMinorUnit) {
+  const UserLocale user("en_US");
+  // clang-format off
+  const std::tuple<const char*, int, const char*, const char*, const char*> rows[] = {
+      // currency, places, amount, billed, shown
+      {"EUR", 2, "12.345", "12.35", "12.35"}, {"USD", 2, "1234.5", "1234.50", "1,234.50"},
+      {"JPY", 0, "1234.5", "1235", "1,235"}, {"JPY", 0, "-2.5", "-3", "-3"},
+      {"KWD", 3, "0.0005", "0.001", "0.001"}, {"KWD", 3, "16.6666", "16.667", "16.667"},
+      {"kwd", 3, "1", "1.000", "1.000"}, {"XQQ", 2, "0.125", "0.13", "0.13"}, {"", 2, "7", "7.00", "7.00"},
+      {"EURO", 2, "0.005", "0.01", "0.01"}};
+  // clang-format on
+  for (const auto& [currency, places, amount, billed, shown] : rows) {
+    SCOPED_TRACE(std::string(currency) + ' ' + amount);
+    EXPECT_EQ(MoneyFormat::minorUnitDigits(currency), places);
+    const Decimal value = *Decimal::fromString(QString::fromLatin1(amount));
+    EXPECT_EQ(MoneyFormat::billed(value, currency).toString(), billed);
+    EXPECT_EQ(MoneyFormat::format(value, currency), shown);
+  }
+  for (const auto& [locale, currency] : {std::pair{"de_DE", "EUR"},
+                                         {"ja_JP", "JPY"},
+                                         {"en_US", "USD"},
+                                         {"de_CH", "CHF"},
+                                         {"ar_KW", "KWD"},
+                                         {"en", "USD"}}) {
+    const UserLocale there(locale);
+    EXPECT_EQ(MoneyFormat::localeCurrency(), currency) << locale;
   }
 }
 

@@ -98,13 +98,20 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   client->setRate(dec("120.00"));
   client->setColor(QColor(10, 20, 30, 40));
   client->setArchived(true);
+  client->setCurrency("KWD");
+  client->setAddress("1 Main St\nSpringfield");
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
   auto* project = WTProject::insertNewObject(context.get());
   project->setClient(client);
+  project->setBudget(dec("2500.00"));
+  project->setRoundingMinutes(6);
   WTTask* first = makeTask(project, "first");
   WTTask* second = makeTask(project, "second");
   makeTask(project, "third");
   project->moveTask(project->tasks()[2], 0);
   second->setBudget(dec("1000.50"));
+  second->setRoundingMode("down");
   second->setNotes("notes\nwith lines");
   const Date start = Date::fromSeconds(1767000000.25);
   makeTime(first, start, start.addingSeconds(3600));
@@ -115,6 +122,8 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   const QMap<QString, QString> before = storedValues(*context);
   EXPECT_EQ(before.value(client->uuid() + ".rate"), "120.00");
   EXPECT_EQ(before.value(client->uuid() + ".color"), "#280a141e");
+  EXPECT_EQ(before.value(project->uuid() + ".budget") + before.value(second->uuid() + ".roundingMode"),
+            "2500.00down");
   EXPECT_GE(before.size(), 9 * 6);  // nine records, each with at least the six keys every record keeps
 
   saveAndReopen();
@@ -123,6 +132,8 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   ASSERT_EQ(tasks.size(), 3);
   EXPECT_EQ(tasks[0]->name() + tasks[1]->name() + tasks[2]->name(), "thirdfirstsecond");
   EXPECT_TRUE(tasks[0]->running());
+  EXPECT_EQ(tasks[2]->roundingRule(), (WTRoundingRule{6, WTRoundingRule::Mode::Down}));
+  EXPECT_EQ(tasks[2]->billingCurrency(), "KWD");
   EXPECT_FALSE(context->hasChanges());
 }
 
@@ -228,6 +239,15 @@ TEST_F(WTObjectContextTest, SettingByKeyRefusesWrongKinds) {
   EXPECT_TRUE(expense->expense()->isIdenticalTo(dec("7.10")) && expense->task() == task);
   EXPECT_TRUE(expense->setValue("task", QVariant()));
   EXPECT_TRUE(expense->task() == nullptr && task->items().isEmpty());
+  // A currency is three letters, taken in capitals; a rounding mode one of three words.
+  auto* client = WTClient::insertNewObject(context.get());
+  EXPECT_EQ(
+      QList<bool>({client->setValue("currency", "kwd"), client->setValue("currency", "EURO"),
+                   client->setValue("currency", 978), task->setValue("roundingMode", "up"),
+                   task->setValue("roundingMode", "sideways"), task->setValue("roundingMinutes", "six")}),
+      QList<bool>({true, false, false, true, false, false}));
+  EXPECT_EQ(client->currency() + ' ' + task->roundingMode(), "KWD up");
+  EXPECT_TRUE(client->setValue("currency", QString()) && client->currency().isNull());
 }
 
 // An item deleted before any lookup still leaves the file; an identity deleted and made again is kept.

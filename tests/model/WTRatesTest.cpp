@@ -1,7 +1,11 @@
 #include "ModelFixture.h"
 
+#include "UserLocale.h"
+#include "WTItemContainer.h"
+
 #include <functional>
 #include <map>
+#include <utility>
 
 class WTRatesTest : public ModelTest {};
 
@@ -86,6 +90,142 @@ TEST_F(WTRatesTest, ItemCostsAndSumsUpToClients) {
   EXPECT_EQ(exact->cost().toString(), "3.3333333333333333333333333333333333334");
 }
 
+// Each time entry is billed by the rule in force for its task, worked out anew on every read; the raw
+// minutes stay. Entries of 0, 7, 46, 5 and 14 minutes, one running for 7, and a flat fee of 7 minutes.
+TEST_F(WTRatesTest, RoundingRulesBillEachTimeEntryAndAreInheritedLikeRates) {
+  // Rules as "minutes mode", either part alone, or "-" for none: preferences, client, project, task.
+  const std::tuple<const char*, const char*, const char*, const char*, const char*> rows[] = {
+      {"-", "-", "-", "-", "0 7 46 5 14 7 7"},
+      {"-", "15 up", "-", "-", "0 15 60 15 15 15 7"},
+      {"-", "15 down", "-", "-", "0 0 45 0 0 0 7"},
+      {"-", "10 nearest", "-", "-", "0 10 50 10 10 10 7"},  // a half goes up
+      {"-", "15 up", "6", "-", "0 12 48 6 18 12 7"},
+      {"-", "15 up", "6 down", "30", "0 0 30 0 0 0 7"},
+      {"15 up", "-", "-", "-", "0 15 60 15 15 15 7"},
+      {"15 up", "1", "-", "-", "0 7 46 5 14 7 7"},
+      {"15 nearest", "-", "-", "up", "0 15 60 15 15 15 7"},
+      {"15 up", "-", "-", "0 nearest", "0 0 45 0 15 0 7"}};
+  setNow(berlin(2026, 3, 2, 12, 7));
+  for (const auto& [preferences, clientRule, projectRule, taskRule, billed] : rows) {
+    SCOPED_TRACE(std::string(preferences) + " / " + clientRule + " / " + projectRule + " / " + taskRule);
+    auto* client = WTClient::insertNewObject(context.get());
+    auto* project = WTProject::insertNewObject(context.get());
+    project->setClient(client);
+    WTTask* task = makeTask(project);
+    const Date start = berlin(2026, 3, 2, 9);
+    QList<WTItem*> items;
+    for (int minutes : {0, 7, 46, 5, 14}) items << makeTime(task, start, start.addingSeconds(minutes * 60.0));
+    auto* running = makeItem<WTTime>(task, berlin(2026, 3, 2, 12));
+    running->setRunning(true);
+    auto* flat = makeItem<WTFlat>(task, start);
+    flat->setMinutes(7);
+    items << running << flat;
+    // The rules come after the entries: nothing billed before is kept.
+    const QStringList preference = QString::fromLatin1(preferences).split(' ');
+    defaults->setValue("WTRoundingMinutes", preference[0] == "-" ? QVariant() : QVariant(preference[0]));
+    defaults->setValue("WTRoundingMode",
+                       preference.value(1).isEmpty() ? QVariant() : QVariant(preference[1]));
+    for (const auto& [record, rule] :
+         {std::pair<WTObject*, const char*>{client, clientRule}, {project, projectRule}, {task, taskRule}}) {
+      for (const QString& part : QString::fromLatin1(rule).split(' ')) {
+        if (part == "-") continue;
+        bool number = false;
+        const int minutes = part.toInt(&number);
+        EXPECT_TRUE(number ? record->setValue("roundingMinutes", minutes)
+                           : record->setValue("roundingMode", part));
+      }
+    }
+    QStringList minutes;
+    int sum = 0;
+    for (const WTItem* item : items) {
+      minutes << QString::number(item->billedDuration());
+      sum += item->billedDuration();
+    }
+    EXPECT_EQ(minutes.join(' '), billed);
+    EXPECT_EQ((std::vector{task->billedDuration(), project->billedDuration(), client->billedDuration()}),
+              (std::vector{sum, sum, sum}));
+    EXPECT_EQ(task->duration(), 0 + 7 + 46 + 5 + 14 + 7 + 7);
+  }
+
+  // A task moved to another project takes that project's rule, and a rule changed later bills at once.
+  auto* upToFifteen = WTProject::insertNewObject(context.get());
+  auto* downToSix = WTProject::insertNewObject(context.get());
+  upToFifteen->setRoundingMinutes(15);
+  upToFifteen->setRoundingMode("up");
+  downToSix->setRoundingMinutes(6);
+  downToSix->setRoundingMode("down");
+  WTTask* task = makeTask(upToFifteen);
+  makeTime(task, berlin(2026, 3, 3, 9), berlin(2026, 3, 3, 9, 46));
+  EXPECT_EQ(task->billedDuration(), 60);
+  KeyCounter billed(*context, task, "billedDuration");
+  task->setProject(downToSix);
+  EXPECT_EQ(task->billedDuration(), 42);
+  EXPECT_GT(std::exchange(billed.count, 0), 0);
+  downToSix->setRoundingMinutes(20);
+  EXPECT_EQ(task->billedDuration(), 40);
+  EXPECT_GT(billed.count, 0);
+}
+
+// Each item's cost is rounded once to the minor unit of its client's currency (else the preferences'), so
+// the lines of every level add up to the level above to the last place: items, day groups, tasks,
+// projects, client. Flat fees and expenses are billed as typed.
+TEST_F(WTRatesTest, BilledCostsRoundEachItemOnceAndAddUpAtEveryLevel) {
+  const UserLocale user("en_US");
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setRate(dec("100"));
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
+  auto* projectA = WTProject::insertNewObject(context.get());
+  auto* projectB = WTProject::insertNewObject(context.get());
+  projectA->setClient(client);
+  projectB->setClient(client);
+  projectB->setRate(dec("70"));
+  projectB->setRoundingMinutes(1);
+  WTTask* a = makeTask(projectA);
+  WTTask* b = makeTask(projectB);
+  const Date monday = berlin(2026, 4, 6, 9), tuesday = berlin(2026, 4, 7, 9);
+  QList<WTItem*> items = {makeTime(a, monday, monday.addingSeconds(7 * 60)),
+                          makeTime(a, tuesday, tuesday.addingSeconds(46 * 60)),
+                          makeItem<WTExpense>(a, monday),
+                          makeItem<WTFlat>(a, tuesday),
+                          makeTime(b, monday, monday.addingSeconds(60)),
+                          makeTime(b, tuesday, tuesday.addingSeconds(20 * 60)),
+                          makeItem<WTNote>(b, monday)};
+  static_cast<WTExpense*>(items[2])->setExpense(dec("12.3456"));
+  static_cast<WTFlat*>(items[3])->setMinutes(10);
+  // The client's currency and the preferences'; billed per item, then the client's total.
+  const std::tuple<const char*, const char*, const char*> rows[] = {
+      {"", "", "USD 25.00 100.00 12.35 16.67 1.17 23.33 0.00 | 178.52"},  // the locale's
+      {"KWD", "", "KWD 25.000 100.000 12.346 16.667 1.167 23.333 0.000 | 178.513"},
+      {"JPY", "KWD", "JPY 25 100 12 17 1 23 0 | 178"},
+      {"", "KWD", "KWD 25.000 100.000 12.346 16.667 1.167 23.333 0.000 | 178.513"},
+      {"eur", "", "EUR 25.00 100.00 12.35 16.67 1.17 23.33 0.00 | 178.52"}};
+  for (const auto& [currency, preference, expected] : rows) {
+    SCOPED_TRACE(std::string(currency) + " / " + preference);
+    client->setCurrency(QString::fromLatin1(currency));
+    defaults->setValue("WTCurrency", *preference ? QVariant(preference) : QVariant());
+    QStringList billed = {client->billingCurrency()};
+    Decimal sum;
+    for (const WTItem* item : items) {
+      billed << item->billedCost().toString();
+      sum += item->billedCost();
+      EXPECT_EQ(item->billingCurrency(), client->billingCurrency());
+    }
+    EXPECT_EQ(billed.join(' ') + " | " + client->billedCost().toString(), expected);
+    Decimal groups;
+    for (const auto& group : WTItemContainer::containersByKeyPath("startDate.midnight", QList<WTTask*>{a, b}))
+      groups += group->billedCost();
+    EXPECT_EQ((std::vector{a->billedCost() + b->billedCost(), projectA->billedCost() + projectB->billedCost(),
+                           client->billedCost(), groups}),
+              (std::vector{sum, sum, sum, sum}));
+  }
+  // The exact cost stays beside it: 7 + 46 minutes at 100, 10 at 100, 21 at 70, and the expense.
+  EXPECT_EQ(client->cost(),
+            dec("100") * *Decimal::divide(63, 60) + dec("70") * *Decimal::divide(21, 60) + dec("12.3456"));
+  EXPECT_EQ(a->billedDuration() + b->billedDuration(), 15 + 60 + 10 + 1 + 20);
+  EXPECT_EQ(client->duration(), 7 + 46 + 10 + 1 + 20);
+}
+
 TEST_F(WTRatesTest, TimeEntriesCountMinuteBoundariesCrossed) {
   WTTask* task = makeTask();
   const std::tuple<Date, Date, int> cases[] = {
@@ -109,18 +249,31 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
   struct Records { WTClient* client; WTProject* project; WTTask *task, *other; WTFlat* flat; WTTime* time; WTExpense* expense; };
   const auto undo = [this](Records&) { context->undoManager().undo(); };
   const auto startEarlier = [](Records& r) { r.time->setStartDate(r.time->startDate()->addingSeconds(-900)); };
-  const char* const allTotals = "client.cost project.cost task.cost client.duration project.duration task.duration";
+  const char* const allTotals = "client.cost project.cost task.cost client.duration project.duration task.duration "
+                                "client.billedCost project.billedDuration task.billedCost";
   // Rows: first, change, record.key announcements (!: never made), client and task minutes, client cost.
   struct Case { const char* name; std::function<void(Records&)> prepare, change; const char *announced, *after; };
   const Case cases[] = {
       {"flat fee minutes", {}, [](Records& r) { r.flat->setMinutes(45); }, allTotals, "75 75 125"},
       {"entry start", {}, startEarlier, allTotals, "75 75 125"},
       {"entry start undone", startEarlier, undo, "time.duration client.cost client.duration task.duration", "60 60 100"},
-      {"task rate undone", [](Records& r) { r.task->setRate(dec("60")); }, undo, "client.cost project.cost task.cost", "60 60 100"},
+      {"task rate undone", [](Records& r) { r.task->setRate(dec("60")); }, undo, "client.cost project.cost task.cost client.billedCost task.billedCost", "60 60 100"},
       {"project rate undone", [](Records& r) { r.project->setRate(dec("60")); }, undo, "client.cost project.cost task.cost", "60 60 100"},
       {"expense", {}, [](Records& r) { r.expense->setExpense(dec("19.99")); }, "client.cost task.cost !client.duration !task.duration", "60 60 119.99"},
       {"client rate", {}, [](Records& r) { r.client->setRate(dec("130")); },
        "task.rate task.inheritedRate task.cost project.inheritedRate client.cost", "60 60 130"},
+      // A rule or a currency bills anew what is there: the raw totals stay.
+      {"task rule", {}, [](Records& r) { r.task->setRoundingMinutes(45); },
+       "task.billedDuration task.billedCost project.billedCost client.billedDuration client.billedCost !task.duration !client.cost", "60 60 100"},
+      {"task rule undone", [](Records& r) { r.task->setRoundingMode("up"); }, undo, "task.billedCost project.billedCost client.billedCost", "60 60 100"},
+      {"project rule", {}, [](Records& r) { r.project->setRoundingMode("down"); }, "task.roundingRule task.billedCost project.billedCost client.billedCost", "60 60 100"},
+      {"client rule", {}, [](Records& r) { r.client->setRoundingMinutes(20); }, "task.billedDuration project.billedDuration client.billedCost", "60 60 100"},
+      {"client currency", {}, [](Records& r) { r.client->setCurrency("JPY"); },
+       "task.billingCurrency task.billedCost project.billedCost client.billedCost !task.billedDuration", "60 60 100"},
+      {"preferred rule", {}, [this](Records&) { defaults->setValue("WTRoundingMinutes", 30); }, "task.billedCost client.billedCost", "60 60 100"},
+      {"preferred currency", {}, [this](Records&) { defaults->setValue("WTCurrency", "KWD"); }, "task.billedCost client.billingCurrency client.billedCost", "60 60 100"},
+      {"task out of its project", {}, [](Records& r) { r.task->setProject(nullptr); },
+       "client.duration client.billedCost project.billedDuration task.billedCost", "0 60 0"},
       {"entry to another task", {}, [](Records& r) { r.time->setTask(r.other); },
        "task.duration task.children other.duration client.duration", "60 30 100"},
   };

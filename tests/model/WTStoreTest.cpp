@@ -289,47 +289,67 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   EXPECT_TRUE(store->save(values(sampleRecords()), {}).ok());
 }
 
-// Reports open the store beside the running application: readers see what it saved and change nothing.
-TEST_F(WTStoreTest, AVersionOneFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSaved) {
-  RawDatabase(path()).exec(
-      "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
-      " rate TEXT, color TEXT, archived INTEGER NOT NULL DEFAULT 0, addressBookUID TEXT, totalsUID TEXT,"
-      " clientUuid TEXT, projectUuid TEXT, position INTEGER NOT NULL DEFAULT 0, budget TEXT, taskUuid TEXT,"
-      " startDate REAL, endDate REAL, running INTEGER NOT NULL DEFAULT 0, minutes INTEGER, expense TEXT,"
-      " completed INTEGER NOT NULL DEFAULT 0);"
-      "PRAGMA application_id = 1416852332; PRAGMA user_version = 1;"
-      "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
-      " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
-      "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
-      " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
-  // clang-format off
+// Reports open the store beside the running application: readers see what it saved and change nothing. Files
+// of version 1 (the first), 3 (before the billing columns) and 4 (before importId) keep their data.
+TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSaved) {
+  for (const int version : {1, 3, 4}) {
+    SCOPED_TRACE(version);
+    removeFiles();
+    RawDatabase(path()).exec(
+        "CREATE TABLE records (uuid TEXT PRIMARY KEY NOT NULL, entity TEXT NOT NULL, name TEXT, notes TEXT,"
+        " rate TEXT, color TEXT, archived INTEGER NOT NULL DEFAULT 0, addressBookUID TEXT, totalsUID TEXT,"
+        " clientUuid TEXT, projectUuid TEXT, position INTEGER NOT NULL DEFAULT 0, budget TEXT, taskUuid TEXT,"
+        " startDate REAL, endDate REAL, running INTEGER NOT NULL DEFAULT 0, minutes INTEGER, expense TEXT,"
+        " completed INTEGER NOT NULL DEFAULT 0);"
+        "PRAGMA application_id = 1416852332;");
+    RawDatabase(path()).exec(version == 1
+                                 ? "PRAGMA user_version = 1;"
+                                 : "CREATE INDEX records_owners ON records(entity) WHERE entity IN "
+                                   "('WTClient', 'WTProject', 'WTTask'); CREATE INDEX records_running ON "
+                                   "records(uuid) WHERE running <> 0; CREATE INDEX records_items ON "
+                                   "records(taskUuid); PRAGMA user_version = 3;");
+    if (version == 4)
+      RawDatabase(path()).exec(
+          "ALTER TABLE records ADD COLUMN currency TEXT; ALTER TABLE records ADD COLUMN address TEXT;"
+          "ALTER TABLE records ADD COLUMN roundingMinutes INTEGER;"
+          "ALTER TABLE records ADD COLUMN roundingMode TEXT;"
+          "PRAGMA user_version = 4;");
+    RawDatabase(path()).exec(
+        "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
+        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
+        "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
+        " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
+    // clang-format off
   Records expected = {
       {"C@WTClient", {.uuid = "C@WTClient", .entity = "WTClient", .name = "Acme", .rate = decimal(u"80.00"),
                       .color = "#ff112233", .archived = true}},
       {"F@WTFlat", {.uuid = "F@WTFlat", .entity = "WTFlat", .taskUuid = "T@WTTask",
                     .startDate = Date::fromSeconds(1700000000.5), .minutes = 90, .expense = decimal(u"-0.10"),
                     .completed = true}}};
-  // clang-format on
-  const QByteArray before = fileBytes(path());
-  {
+    // clang-format on
+    const QByteArray before = fileBytes(path());
+    {
+      auto reader = WTStore::openReadOnly(path());
+      ASSERT_TRUE(reader) << reader.error().message.toStdString();
+      expectSameRecords(loadAll(*reader.value()), expected);
+    }
+    EXPECT_EQ(fileBytes(path()), before);
+    auto writer = open();
+    ASSERT_TRUE(writer);
+    expectSameRecords(loadAll(*writer), expected);
+    WTStoreRecord added = record("N@WTClient", "WTClient");
+    added.currency = "JPY";
+    added.roundingMinutes = 6;
+    ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
+    expected[added.uuid] = added;
+    EXPECT_EQ(shape(path()), QStringList({"5", "wal", "3", "3"}));
+
     auto reader = WTStore::openReadOnly(path());
     ASSERT_TRUE(reader) << reader.error().message.toStdString();
     expectSameRecords(loadAll(*reader.value()), expected);
+    expectError(reader.value()->save({record("x@WTNote", "WTNote")}, {}), WTStore::WriteFailed);
+    EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
   }
-  EXPECT_EQ(fileBytes(path()), before);
-  auto writer = open();
-  ASSERT_TRUE(writer);
-  expectSameRecords(loadAll(*writer), expected);
-  const WTStoreRecord added = record("N@WTNote", "WTNote", "C@WTClient");
-  ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
-  expected[added.uuid] = added;
-  EXPECT_EQ(shape(path()), QStringList({"5", "wal", "3", "3"}));
-
-  auto reader = WTStore::openReadOnly(path());
-  ASSERT_TRUE(reader) << reader.error().message.toStdString();
-  expectSameRecords(loadAll(*reader.value()), expected);
-  expectError(reader.value()->save({record("x@WTNote", "WTNote")}, {}), WTStore::WriteFailed);
-  EXPECT_TRUE(writer->save({record("later@WTNote", "WTNote")}, {}).ok());  // the writer goes on saving
 }
 
 TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {

@@ -203,6 +203,11 @@ class Simulation {
         if (auto* expense = dynamic_cast<WTExpense*>(object)) expense->setExpense(std::nullopt);
         if (auto* flat = dynamic_cast<WTFlat*>(object)) flat->setMinutes(std::nullopt);
         if (auto* time = dynamic_cast<WTTime*>(object)) time->setEndDate(std::nullopt);
+        if (auto* owner = dynamic_cast<WTClient*>(object)) owner->setCurrency(roll(2) ? "JPY" : QString());
+        if (auto* project = dynamic_cast<WTProject*>(object))
+          project->setBudget(roll(2) ? std::optional(money()) : std::nullopt);
+        if (!WTEntities::isItem(object->entity()))  // a rule, or none
+          object->setValue("roundingMinutes", roll(2) ? QVariant(roll(30)) : QVariant());
       }
       if (change == 5) object->setArchived(roll(2) == 1);
     } else if (WTItem* item = kind == 6 ? anyItem(client) : nullptr) {  // item values

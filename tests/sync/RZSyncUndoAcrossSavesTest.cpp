@@ -3,10 +3,13 @@
 
 #include "ServerTestSupport.h"
 #include "SyncTestSupport.h"
+#include "WTClient.h"
 #include "WTItem.h"
 #include "WTProject.h"
 #include "WTTask.h"
 #include "WTTime.h"
+
+#include <map>
 
 using synctest::SyncClient;
 
@@ -53,14 +56,24 @@ class RZSyncUndoAcrossSavesWithServer : public ::testing::Test {
   }
 };
 
-// Undo, redo, and undoing a deletion the server kept for good all reach the other device.
+// Undo, redo, and undoing a deletion the server kept for good all reach the other device, each record with
+// every key it has.
 TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   auto* task = make<WTTask>("Design");
   task->setProject(make<WTProject>("Atlas"));
   a->context->processPendingChanges();
+  // clang-format off
+  const std::map<WTEntity, QVariantMap> billing = {
+      {WTEntity::Client, {{"currency", "JPY"}, {"address", "1 Main St"}, {"roundingMinutes", 15}, {"roundingMode", "up"}}},
+      {WTEntity::Project, {{"budget", "2500.50"}, {"roundingMode", "down"}}},
+      {WTEntity::Task, {{"roundingMinutes", 6}}}};
+  // clang-format on
   for (WTEntity entity : WTEntities::kAll) {
     WTObject* record = a->context->insertNewObject(entity);
     record->setName(QStringLiteral("one ") + WTEntities::name(entity));
+    const QVariantMap values = billing.count(entity) ? billing.at(entity) : QVariantMap();
+    for (const auto& [key, value] : values.asKeyValueRange())
+      EXPECT_TRUE(record->setValue(key, value)) << key.toStdString();
     if (entity == WTEntity::Task) static_cast<WTTask*>(record)->setProject(task->project());
     if (WTEntities::isItem(entity)) static_cast<WTItem*>(record)->setTask(task);
     a->context->processPendingChanges();
@@ -68,6 +81,10 @@ TEST_F(RZSyncUndoAcrossSavesWithServer, AnotherDeviceFollowsUndoAfterTheSave) {
   const qsizetype count = madeHere().size();
   undoOrRedoThenSync(0, true);
   ASSERT_EQ(b->context->count(), 2 + count);
+  expectSameStores();
+  const QList<WTClient*> clients = b->context->fetch<WTClient>();
+  ASSERT_EQ(clients.size(), 1);
+  EXPECT_EQ(clients[0]->billingCurrency() + ' ' + clients[0]->address(), "JPY 1 Main St");
   undoOrRedoThenSync(count, true);
   ASSERT_EQ(b->context->count(), 2);  // only the project and task the records are filed under
   undoOrRedoThenSync(count, false);
