@@ -240,8 +240,9 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
       here.file("good.csv", header +
                                 "ACME,atlas,design,Sketch,Yes,2026-03-04,09:00,1:30:00\n"
                                 ",Zeus,,\"Plan, \"\"big\"\"\",No,2026-03-04,11:00,0:30:00\n");
-  const QString bad = here.file("bad.csv", header + ",Zeus,,Early,Yes,2026-03-05,08:00,1:00:00\n"
-                                                    ",Zeus,,Late,Yes,2026-03-05,25:00,1:00:00\n");
+  const QString bad = here.file("bad.csv", header +
+                                               ",Zeus,,Early,Yes,2026-03-05,08:00,1:00:00\n"
+                                               ",Zeus,,Late,Yes,2026-03-05,25:00,1:00:00\n");
   const struct {
     QStringList arguments;
     int code;
