@@ -10,6 +10,7 @@
 #include "WTExportController.h"
 #include "WTHelpDialogs.h"
 #include "WTImages.h"
+#include "WTImportPlan.h"
 #include "WTItemsViewController.h"
 #include "WTNavigationController.h"
 #include "WTObject.h"
@@ -24,10 +25,16 @@
 #include <QActionGroup>
 #include <QApplication>
 #include <QCloseEvent>
+#include <QFile>
+#include <QFileDialog>
+#include <QFileInfo>
 #include <QMenuBar>
+#include <QMessageBox>
+#include <QPushButton>
 #include <QScreen>
 #include <QStatusBar>
 #include <QStyle>
+#include <QTimeZone>
 #include <QToolBar>
 #include <QToolButton>
 #include <QVBoxLayout>
@@ -187,9 +194,11 @@ void WTMainWindowController::buildActions() {
   file->addSeparator();
   file->addAction(tr("&Save"), QKeySequence::Save, [this] { delegate_.saveAction(); });
   file->addSeparator();
-  QAction* exportAction = file->addAction(tr("&Export…"), QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_E), this,
-                                          &WTMainWindowController::exportData);
+  QAction* exportAction = file->addAction(tr("&Export…"), QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_E),
+                                          this, &WTMainWindowController::exportData);
   exportAction->setObjectName(QStringLiteral("export"));
+  file->addAction(tr("&Import…"), this, &WTMainWindowController::importData)
+      ->setObjectName(QStringLiteral("import"));
   file->addSeparator();
   file->addAction(tr("&Quit"), QKeySequence::Quit, this, &WTMainWindowController::quit);
 
@@ -283,14 +292,63 @@ bool WTMainWindowController::confirmDeletion(const QString& question, const QStr
 
 WTProject* WTMainWindowController::selectedProject() const {
   // The projects stack answers whichever stack is on screen: an open project, else the selected row.
-  WTViewController* top = projectsNavigationController_ ? projectsNavigationController_->topViewController() : nullptr;
+  WTViewController* top =
+      projectsNavigationController_ ? projectsNavigationController_->topViewController() : nullptr;
   if (auto* items = qobject_cast<WTItemsViewController*>(top)) return items->project();
   return dynamic_cast<WTProject*>(projectsViewController_->selectedObject());
 }
 
 WTExportController* WTMainWindowController::exportData() {
-  auto* dialog = new WTExportController(delegate_.managedObjectContext(), [this] { return selectedProject(); }, this);
+  auto* dialog = new WTExportController(
+      delegate_.managedObjectContext(), [this] { return selectedProject(); }, this);
   dialog->setAttribute(Qt::WA_DeleteOnClose);
+  dialog->open();
+  return dialog;
+}
+
+void WTMainWindowController::importData() {
+  const QString path = QFileDialog::getOpenFileName(
+      this, tr("Import"), QString(), tr("Exports of time trackers (*.csv *.json);;All files (*)"));
+  if (!path.isEmpty()) importFile(path);
+}
+
+QMessageBox* WTMainWindowController::importFile(const QString& path) {
+  auto* dialog = new QMessageBox(this);
+  dialog->setAttribute(Qt::WA_DeleteOnClose);
+  dialog->setWindowTitle(tr("Import"));
+  QFile file(path);
+  WTImportFormats::Options options;
+  options.zone = QTimeZone::systemTimeZone();
+  options.fileTime = Date::fromQDateTime(QFileInfo(path).lastModified());
+  Result<WTImportFile> read = file.open(QIODevice::ReadOnly)
+                                  ? WTImportFormats::read(file, options)
+                                  : Result<WTImportFile>(Error{1, file.errorString()});
+  if (!read) {
+    dialog->setIcon(QMessageBox::Warning);
+    dialog->setText(tr("“%1” cannot be imported: %2").arg(QFileInfo(path).fileName(), read.error().message));
+    dialog->setStandardButtons(QMessageBox::Close);
+    dialog->open();
+    return dialog;
+  }
+  auto imported = std::make_shared<WTImportFile>(std::move(read.value()));
+  WTObjectContext* context = delegate_.managedObjectContext();
+  const WTImportPlan plan = WTImport::plan(*context, *imported, {});
+  dialog->setText(
+      imported->problems.empty()
+          ? tr("Import %n entries from “%1”?", nullptr, plan.entries).arg(QFileInfo(path).fileName())
+          : tr("“%1” has rows that cannot be read; nothing is imported.").arg(QFileInfo(path).fileName()));
+  dialog->setInformativeText(WTImport::preview(*imported, plan, options.zone));
+  if (!imported->problems.empty() || plan.entries == 0) {
+    dialog->setIcon(imported->problems.empty() ? QMessageBox::Information : QMessageBox::Warning);
+    dialog->setStandardButtons(QMessageBox::Close);
+  } else {
+    QPushButton* import = dialog->addButton(tr("Import"), QMessageBox::AcceptRole);
+    import->setObjectName(QStringLiteral("import"));
+    dialog->addButton(QMessageBox::Cancel);
+    dialog->setDefaultButton(import);
+    connect(import, &QPushButton::clicked, this,
+            [context, imported] { WTImport::apply(*context, *imported, {}); });
+  }
   dialog->open();
   return dialog;
 }
@@ -462,8 +520,9 @@ WTPreferencesWindowController* WTMainWindowController::showPreferences() {
 
 void WTMainWindowController::quit() {
   quitting_ = true;
-  const bool closed = isVisible() ? close() : (delegate_.applicationShouldTerminate() ==
-                                               WTAppDelegate::TerminateReply::TerminateNow);
+  const bool closed =
+      isVisible() ? close()
+                  : (delegate_.applicationShouldTerminate() == WTAppDelegate::TerminateReply::TerminateNow);
   quitting_ = false;
   if (closed) QApplication::quit();
 }

@@ -15,6 +15,7 @@ class UserDefaults;
 class WTAppDelegate;
 class WTClientsViewController;
 class WTExportController;
+class QMessageBox;
 class WTNavigationController;
 class WTPreferencesWindowController;
 class WTProject;
@@ -61,6 +62,11 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   WTProject* selectedProject() const;
   // File › Export…: the time-entry export dialog, over the window.
   WTExportController* exportData();
+  // File › Import…: asks for a file, then importFile().
+  void importData();
+  // What importing `path` makes, in a dialog over the window (its rows that cannot be read instead, and
+  // no import); its Import button makes it all, one step of undo. The dialog is returned open.
+  QMessageBox* importFile(const QString& path);
   // Pops the visible stack, unless only its root is left.
   void goBack();
 

@@ -13,7 +13,7 @@
 namespace {
 
 constexpr char kUsage[] =
-    "usage: tessal [start|stop|add|status|log|list|report|export|template|sync] [ARGS...]\n"
+    "usage: tessal [start|stop|add|status|log|list|import|report|export|template|sync] [ARGS...]\n"
     "       (tessal --help tells more)\n";
 
 constexpr char kHelp[] =
@@ -38,6 +38,10 @@ constexpr char kHelp[] =
     "  tessal list tasks|projects|clients [--project NAME] [--client NAME] [--qualified]\n"
     "                                                the names there are, one a line; qualified, tasks are\n"
     "                                                PROJECT › TASK, which start and stop take too\n"
+    "  tessal import FILE [--format NAME] [--dry-run] [--tz ZONE] [--stop-running] [--tags FIELDS]\n"
+    "                                                import another tracker's export (toggl, clockify,\n"
+    "                                                timewarrior, kimai, tessal): what it makes, then one\n"
+    "                                                save for all of it; never the same entry twice\n"
     "  tessal report (--project NAME | --client NAME) [--mode 0-3] [--range RANGE] [--template FILE]\n"
     "                [--out FILE]                    a report as HTML on stdout, or in FILE as .html, .pdf "
     "or .csv\n"
@@ -57,7 +61,7 @@ constexpr char kHelp[] =
     "  tessal --help                                 show this text\n"
     "  tessal --version                              show the version\n"
     "\n"
-    "While the desktop application runs, start, stop and add are carried out by it.\n"
+    "While the desktop application runs, start, stop, add and import are carried out by it.\n"
     "The desktop application also takes Qt's own options (-platform NAME, -style NAME, -session ID, ...).\n"
     "Data: $XDG_DATA_HOME/Tessal2/Tessal.sqlite; settings: $XDG_CONFIG_HOME/Tessal/Tessal.conf.\n";
 

@@ -158,7 +158,7 @@ QString describeProject(const WTProject* project) {
 }
 
 bool sameName(const QString& a, const QString& b) {
-  return a.compare(b, Qt::CaseInsensitive) == 0;
+  return WTObject::sameName(a, b);
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 #include "DurationText.h"
 #include "RZDate.h"
 #include "WTClient.h"
+#include "WTImportCommand.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTStoreSnapshot.h"
@@ -23,8 +24,10 @@ const QString kStart = QStringLiteral("start");
 const QString kStop = QStringLiteral("stop");
 const QString kStatus = QStringLiteral("status");
 const QString kAdd = QStringLiteral("add");
+const QString kImport = QStringLiteral("import");
 
 QString usageLine(const QString& command) {
+  if (command == kImport) return WTImportCommand::usageLine();
   if (command == kStart)
     return QStringLiteral("usage: tessal start TASK [--project NAME] [--client NAME] [--create]\n");
   if (command == kStop) return QStringLiteral("usage: tessal stop [TASK] [--project NAME] [--client NAME]\n");
@@ -319,7 +322,11 @@ WTCommandOutcome WTCommandOutcome::fromJson(const QJsonObject& json) {
 namespace WTTimerCommands {
 
 bool changesData(const QString& command) {
-  return command == kStart || command == kStop || command == kAdd;
+  return command == kStart || command == kStop || command == kAdd || command == kImport;
+}
+
+bool readsEveryRecord(const QString& command) {
+  return command == kImport;
 }
 
 bool isTimerCommand(const QString& command) {
@@ -327,12 +334,14 @@ bool isTimerCommand(const QString& command) {
 }
 
 std::optional<WTCommandOutcome> checkArguments(const QString& command, const QStringList& arguments) {
-  const Arguments parsed = parse(command, arguments);
-  if (parsed.problem.isEmpty()) return std::nullopt;
-  return WTCommandOutcome{2, {}, QStringLiteral("tessal: %1\n%2").arg(parsed.problem, usageLine(command))};
+  const QString problem =
+      command == kImport ? WTImportCommand::problem(arguments) : parse(command, arguments).problem;
+  if (problem.isEmpty()) return std::nullopt;
+  return WTCommandOutcome{2, {}, QStringLiteral("tessal: %1\n%2").arg(problem, usageLine(command))};
 }
 
 bool createsRecords(const QString& command, const QStringList& arguments) {
+  if (command == kImport) return WTImportCommand::makesRecords(arguments);
   return changesData(command) && parse(command, arguments).create;
 }
 
@@ -342,6 +351,7 @@ QString taskWithItems(const QString& command, const QStringList& arguments) {
 
 WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments,
                      const QTimeZone& zone) {
+  if (command == kImport) return WTImportCommand::run(context, arguments, zone);
   const Arguments parsed = parse(command, arguments);
   Q_ASSERT(parsed.problem.isEmpty());
   if (command == kStart) return start(context, parsed);
@@ -356,8 +366,10 @@ WTCommandOutcome run(WTObjectContext& context, const QString& command, const QSt
 
 QJsonObject request(const QString& command, const QStringList& arguments) {
   // Times of day are the shell's: its zone travels with them.
+  // The desktop copy runs in a folder of its own: a file to import is named whole.
+  const QStringList sent = command == kImport ? WTImportCommand::absolute(arguments) : arguments;
   return {{QStringLiteral("command"), command},
-          {QStringLiteral("arguments"), QJsonArray::fromStringList(arguments)},
+          {QStringLiteral("arguments"), QJsonArray::fromStringList(sent)},
           {QStringLiteral("zone"), QString::fromUtf8(QTimeZone::systemTimeZoneId())}};
 }
 
@@ -367,7 +379,8 @@ WTCommandOutcome answer(WTObjectContext& context, const QJsonObject& request) {
   for (const QJsonValue& argument : request.value(QStringLiteral("arguments")).toArray())
     arguments.append(argument.toString());
   if (!changesData(command))
-    return {2, {}, QStringLiteral("tessal: the running Tessal carries out only start, stop and add\n")};
+    return {
+        2, {}, QStringLiteral("tessal: the running Tessal carries out only start, stop, add and import\n")};
   if (std::optional<WTCommandOutcome> problem = checkArguments(command, arguments)) return *problem;
   const QTimeZone zone(request.value(QStringLiteral("zone")).toString().toUtf8());
   return run(context, command, arguments, zone.isValid() ? zone : QTimeZone::systemTimeZone());

@@ -38,10 +38,15 @@ struct WTCommandOutcome {
 //     Stops every running entry, or the named task's.
 //   status [--json]
 //     Each running entry as "PROJECT › TASK  H:MM" and the total; exit 0 while something runs, else 1.
+//   import FILE ...
+//     Another tracker's export into the store (WTImportCommand.h).
 namespace WTTimerCommands {
 
-// start, stop and add change the store; status only reads it.
+// start, stop, add and import change the store; status only reads it.
 bool changesData(const QString& command);
+// Whether the command needs every record read (import finds what a former import made), not only the
+// timers.
+bool readsEveryRecord(const QString& command);
 bool isTimerCommand(const QString& command);
 // Whether the (checked) arguments may make records, and so a store where there is none yet.
 bool createsRecords(const QString& command, const QStringList& arguments);

@@ -75,7 +75,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
   if (!store) return failure(err, store.error().message);
   store.value()->keepLogOnClose();
-  WTStore::Records which = WTStore::Records::Timers;
+  WTStore::Records which =
+      WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;
   QStringList tasks;
   if (const QString name = WTTimerCommands::taskWithItems(command, arguments); !name.isNull()) {
     Result<QStringList> named = tasksNamed(*store.value(), name);
@@ -91,6 +92,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   const QString journalFile = WTStoreSetup::syncJournalPath();
   RZSyncTrack journal(journalFile);
   context.setChangeJournal(&journal);
+  // Nothing here is ever undone: an import of many entries would only hold every step in memory.
+  context.undoManager().disableRegistration();
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {
@@ -108,6 +111,14 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
 int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out,
                        QTextStream& err) {
   const QString storePath = WTStoreSetup::storePath();
+  // What an import would make, told before there is any data: against none, and nothing is made.
+  if (!QFileInfo::exists(storePath) && WTTimerCommands::readsEveryRecord(command) &&
+      !WTTimerCommands::createsRecords(command, arguments)) {
+    UserDefaults defaults;
+    WTStoreSetup::registerDefaults(defaults);
+    WTObjectContext context(&defaults);
+    return print(WTTimerCommands::run(context, command, arguments), out, err);
+  }
   // The lock lives beside the store: a command that may make the store makes its folder first.
   if (WTTimerCommands::createsRecords(command, arguments)) QDir().mkpath(QFileInfo(storePath).path());
   WTStoreWriterLock lock(storePath);

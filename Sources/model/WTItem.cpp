@@ -99,6 +99,7 @@ const WTKeyTable& WTItem::itemKeys() {
       &objectKeys(),
       {
           stored("startDate", &WTItem::startDate_, &WTStoreRecord::startDate),
+          stored("importId", &WTItem::importId_, &WTStoreRecord::importId),
           toOne("task", &WTStoreRecord::taskUuid),
           refine("rate", &read<&WTItem::rate>),
           // Read and set as a date, but not stored: the sync takes a value for it as it comes.
@@ -127,4 +128,8 @@ const WTKeyTable& WTItem::itemKeys() {
           derived<&WTItem::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
       });
   return table;
+}
+
+void WTItem::setImportId(const QString& importId) {
+  setStoredValue(QStringLiteral("importId"), importId);
 }

@@ -24,6 +24,10 @@ class WTItem : public WTObject {
   std::optional<Date> date() const { return startDate_; }
   // Books the item on another date; a time entry keeps its time of day and length.
   virtual void setDate(const std::optional<Date>& date);
+  // Where an imported item came from ("toggl:…"): a second import of the same file knows it. Null when
+  // the item was made here.
+  QString importId() const { return importId_; }
+  void setImportId(const QString& importId);
 
   // Whole minutes this item stands for; 0 for kinds that are not time.
   virtual int duration() const { return 0; }
@@ -63,4 +67,5 @@ class WTItem : public WTObject {
   friend class WTTask;
   WTTask* task_ = nullptr;
   std::optional<Date> startDate_;
+  QString importId_;
 };

@@ -58,6 +58,9 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
 
   QString name() const { return name_; }
   void setName(const QString& name);
+  // Whether two names name the same record where a person types one (the commands, an import): without
+  // regard to case.
+  static bool sameName(const QString& a, const QString& b) { return a.compare(b, Qt::CaseInsensitive) == 0; }
   QString notes() const { return notes_; }
   void setNotes(const QString& notes);
   // The colour: a QColor where the GUI module is loaded (the desktop, reports), the store's text

@@ -47,12 +47,12 @@ constexpr char kSelectItemsOfTasksSql[] = "SELECT " WT_STORE_COLUMNS " FROM reco
 constexpr char kReplaceSql[] =
     "INSERT INTO main.records (" WT_STORE_COLUMNS
     ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, "
-    "?17, ?18, ?19, ?20, ?21, ?22, ?23, ?24) ON CONFLICT(uuid) DO UPDATE SET name = ?3, notes = ?4, "
+    "?17, ?18, ?19, ?20, ?21, ?22, ?23, ?24, ?25) ON CONFLICT(uuid) DO UPDATE SET name = ?3, notes = ?4, "
     "rate = ?5, color = ?6, archived = ?7, addressBookUID = ?8, totalsUID = ?9, clientUuid = ?10, "
     "projectUuid = ?11, "
     "position = ?12, budget = ?13, taskUuid = ?14, startDate = ?15, endDate = ?16, running = ?17, "
     "minutes = ?18, expense = ?19, completed = ?20, currency = ?21, address = ?22, roundingMinutes = ?23, "
-    "roundingMode = ?24";
+    "roundingMode = ?24, importId = ?25";
 constexpr char kDeleteSql[] = "DELETE FROM main.records WHERE uuid = ?1";
 
 #undef WT_STORE_COLUMNS
@@ -85,13 +85,21 @@ int addBillingColumns(sqlite3* db) {
                       nullptr, nullptr, nullptr);
 }
 
-// A file older than version 4 read without migrating it: a view in the connection's own temporary schema
+// Schema version 5: where an imported item came from, so that importing the same file again adds nothing.
+int addImportColumn(sqlite3* db) {
+  return sqlite3_exec(db, "ALTER TABLE records ADD COLUMN importId TEXT;", nullptr, nullptr, nullptr);
+}
+
+// A file older than version 5 read without migrating it: a view in the connection's own temporary schema
 // stands in for its table where reading names it unqualified (the temporary schema is searched first) and
 // answers the columns it lacks as NULL. Writing names the table itself, "main.records".
-int addMissingBillingColumns(sqlite3* db) {
+int addMissingBillingColumns(sqlite3* db, qint64 version) {
   return sqlite3_exec(db,
-                      "CREATE TEMP VIEW records AS SELECT *, NULL AS currency, NULL AS address, "
-                      "NULL AS roundingMinutes, NULL AS roundingMode FROM main.records",
+                      version < 4
+                          ? "CREATE TEMP VIEW records AS SELECT *, NULL AS currency, NULL AS address, "
+                            "NULL AS roundingMinutes, NULL AS roundingMode, NULL AS importId "
+                            "FROM main.records"
+                          : "CREATE TEMP VIEW records AS SELECT *, NULL AS importId FROM main.records",
                       nullptr, nullptr, nullptr);
 }
 
@@ -130,7 +138,8 @@ static_assert(kApplicationId == 1416852332);
 // kMigrations[n] takes a file from version n to n + 1. A new schema version appends its step here and
 // raises WTStore::kSchemaVersion; every step runs inside the one migration transaction.
 using Migration = int (*)(sqlite3*);
-constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex, addBillingColumns};
+constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex, addBillingColumns,
+                                     addImportColumn};
 static_assert(std::size(kMigrations) == WTStore::kSchemaVersion);
 
 // What went wrong, in words for the user, for SQLite's result code.
@@ -258,12 +267,12 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path, Check check) {
-  if (!QFileInfo::exists(path))
-    return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
+  if (!QFileInfo::exists(path)) return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
   return open(path, nullptr, true, check);
 }
 
-Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly, Check check) {
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly,
+                                               Check check) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -315,8 +324,8 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     const bool checkBeforeSaving =
         check == Check::WholeFileBeforeSaving && !readOnly && version == kSchemaVersion;
     if (checkBeforeSaving) {
-      store->damageCheck_ = std::async(std::launch::async, wholeFileIsDamaged, path,
-                                       vfs ? std::string(vfs) : std::string());
+      store->damageCheck_ =
+          std::async(std::launch::async, wholeFileIsDamaged, path, vfs ? std::string(vfs) : std::string());
     } else if (check != Check::Header) {
       bool damaged = false;
       code = checkWholeFile(db, &damaged);
@@ -327,7 +336,7 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     }
     // A current file must also have the shape this version reads and writes.
     const bool current = version == kSchemaVersion || (readOnly && version >= kOldestReadableVersion);
-    if (current && version < kSchemaVersion && addMissingBillingColumns(db) != SQLITE_OK)
+    if (current && version < kSchemaVersion && addMissingBillingColumns(db, version) != SQLITE_OK)
       return damagedError(path);
     if (current && !store->prepareStatements(!readOnly)) return damagedError(path);
   }
@@ -375,7 +384,8 @@ void WTStore::keepLogOnClose() {
       db_,
       [](void*, sqlite3* db, const char* name, int frames) {
         if (frames >= 1000) sqlite3_wal_checkpoint(db, name);
-        if (frames > kLogFramesKeptOnClose) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
+        if (frames > kLogFramesKeptOnClose)
+          sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
         return SQLITE_OK;
       },
       nullptr);
@@ -445,7 +455,8 @@ Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStr
     return Error{WriteFailed,
                  tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();
-  if (damaged_) return Error{Damaged, tr("The data file “%1” is damaged; nothing was written to it.").arg(path_)};
+  if (damaged_)
+    return Error{Damaged, tr("The data file “%1” is damaged; nothing was written to it.").arg(path_)};
   if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading
   int code = stepOnce(begin_);
   for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {

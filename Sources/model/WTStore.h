@@ -20,7 +20,7 @@ struct sqlite3_stmt;
 // newer version is refused without being changed in any way.
 class WTStore {
  public:
-  static constexpr int kSchemaVersion = 4;
+  static constexpr int kSchemaVersion = 5;
   // The oldest version a reader that may not migrate still reads: versions 2 and 3 only added indexes,
   // and the columns version 4 added read as none from an older file.
   static constexpr int kOldestReadableVersion = 1;

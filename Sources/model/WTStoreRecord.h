@@ -47,6 +47,7 @@ struct WTStoreRecord {
   std::optional<qint64> minutes;   // WTFlat
   std::optional<Decimal> expense;  // WTExpense
   bool completed = false;          // WTToDo
+  QString importId;                // where an imported item came from, null when typed here
 
   friend bool operator==(const WTStoreRecord&, const WTStoreRecord&) = default;
 };

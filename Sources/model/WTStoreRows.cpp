@@ -128,6 +128,7 @@ int bindRecord(sqlite3_stmt* s, const WTStoreRecord& r) {
       r.roundingMinutes ? sqlite3_bind_int64(s, kRoundingMinutes + 1, *r.roundingMinutes)
                         : sqlite3_bind_null(s, kRoundingMinutes + 1),
       bindString(s, kRoundingMode, r.roundingMode),
+      bindString(s, kImportId, r.importId),
   };
   for (int code : codes) {
     if (code != SQLITE_OK) return code;
@@ -157,6 +158,7 @@ bool readRecord(sqlite3_stmt* s, WTStoreRecord& record) {
   readString(s, kAddress, record.address);
   record.roundingMinutes = readInteger(s, kRoundingMinutes);
   readString(s, kRoundingMode, record.roundingMode);
+  readString(s, kImportId, record.importId);
   return readDecimal(s, kRate, record.rate) && readDecimal(s, kBudget, record.budget) &&
          readDecimal(s, kExpense, record.expense);
 }

@@ -35,12 +35,14 @@ enum Column {
   kAddress,
   kRoundingMinutes,
   kRoundingMode,
+  // Version 5.
+  kImportId,
 };
 
 #define WT_STORE_COLUMNS                                                                                   \
   "uuid, entity, name, notes, rate, color, archived, addressBookUID, totalsUID, clientUuid, projectUuid, " \
   "position, budget, taskUuid, startDate, endDate, running, minutes, expense, completed, currency, "       \
-  "address, roundingMinutes, roundingMode"
+  "address, roundingMinutes, roundingMode, importId"
 
 // Binds a text (null stays NULL) to `column`'s parameter; SQLite reads it where it is, so the text must
 // outlive the statement's step.

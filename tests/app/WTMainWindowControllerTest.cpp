@@ -7,6 +7,7 @@
 #include <QAbstractButton>
 #include <QButtonGroup>
 #include <QMessageBox>
+#include <QPushButton>
 #include <QScreen>
 #include <QTimer>
 
@@ -231,6 +232,29 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   exporter->reject();
   window->saveLastSelectedProject(2);
   EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 2);
+}
+
+// File › Import… shows what it makes first, then makes it as one step of undo; a file with a bad row
+// imports nothing.
+TEST_F(WTMainWindowControllerTest, TheImportPreviewsThenMakesItAllAsOneStep) {
+  open();
+  ASSERT_NE(action("import"), nullptr);
+  WTObjectContext* context = delegate->managedObjectContext();
+  QMessageBox* refused = window->importFile(QStringLiteral(TESSAL_TEST_DATA_DIR "/import/kimai.csv"));
+  EXPECT_TRUE(refused->informativeText().contains("line 5: the start time “nine” cannot be read"));
+  EXPECT_EQ(refused->buttons().size(), 1);
+  refused->reject();
+  QMessageBox* dialog = window->importFile(QStringLiteral(TESSAL_TEST_DATA_DIR "/import/toggl-import.csv"));
+  EXPECT_TRUE(dialog->isVisible());
+  EXPECT_TRUE(dialog->informativeText().contains("New: 1 client, 1 project, 1 task, 1 entry"));
+  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+  dialog->findChild<QPushButton*>("import")->click();
+  ASSERT_EQ(context->fetch<WTTime>().size(), 1);
+  EXPECT_EQ(context->fetch<WTTime>().first()->task()->project()->client()->name(), "Acme");
+  context->undoManager().closeGroup();
+  action("undo")->trigger();
+  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+  EXPECT_TRUE(context->fetch<WTClient>().isEmpty());
 }
 
 // The window registers a custom range; it fits the screen and comes back where it was.

@@ -142,7 +142,15 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
   EXPECT_EQ(here.out({"add", "Review", "10:15-11:00", "--date", "2026-03-05"}, auckland),
             "Added Hermes › Review  2026-03-05 10:15–11:00  00:45\n");
   here.expect({"log", "--range", "2026-03-05..2026-03-05"}, 0, "2026-03-05  10:15–11:00", auckland);
-  EXPECT_EQ(times(), 5);
+  const QString file = here.file("in.csv",
+                                 "Client,Project,Description,Start date,Start time,Duration\n"
+                                 "acme,atlas,Sketch,2026-03-06,09:00,1:00:00\n");
+  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks\nAlready there: 0 entries\n",
+              auckland);
+  here.expect({"import", file}, 0, "Already there: 1 entry\n", auckland);
+  here.expect({"log", "--range", "2026-03-06..2026-03-06"}, 0,
+              "2026-03-06  09:00–10:00  Atlas › Default Task", auckland);
+  EXPECT_EQ(times(), 6);
   EXPECT_EQ(desktop->state(), QProcess::Running);
   desktop->kill();
   desktop->waitForFinished();
@@ -166,6 +174,9 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
       {"report", "--project", "Hermes", "--project", "Atlas"}, {"report", "--project", "Hermes", "stray"},
       {"report", "--projects", "Hermes"}, {"export", "--range", "fortnight"}, {"export", "--format", "xlsx"},
       {"report", "--project", "Hermes", "--range", "fortnight"},
+      {"import"}, {"import", "a.csv", "b.csv"},
+      {"import", "a.csv", "--tz", "Mars/Base"}, {"import", "a.csv", "--format", "harvest"},
+      {"import", "a.csv", "--tags", "project,project"},
       // clang-format on
   };
   for (const QStringList& arguments : refused) {
@@ -222,6 +233,45 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
                 .size(),
             1);
   EXPECT_EQ(context->fetch<WTTime>([](const WTTime* time) { return time->name() == "Call"; }).size(), 1);
+}
+
+// An import is previewed, made once, and refused whole (the store file as it was) for one bad row.
+TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
+  const QByteArray header = "Client,Project,Task,Description,Billable,Start date,Start time,Duration\n";
+  const QString good =
+      here.file("good.csv", header +
+                                "ACME,atlas,design,Sketch,Yes,2026-03-04,09:00,1:30:00\n"
+                                ",Zeus,,\"Plan, \"\"big\"\"\",No,2026-03-04,11:00,0:30:00\n");
+  const QString bad = here.file("bad.csv", header +
+                                               ",Zeus,,Early,Yes,2026-03-05,08:00,1:00:00\n"
+                                               ",Zeus,,Late,Yes,2026-03-05,25:00,1:00:00\n");
+  const struct {
+    QStringList arguments;
+    int code;
+    QString says;
+  } cases[] = {
+      // clang-format off
+      {{"import", good, "--dry-run"}, 0, "A toggl file\nNew: 0 clients, 1 project, 1 task, 2 entries\nFound: 1 client, 1 project, 1 task\nAlready there: 0 entries\n  ACME  01:30\n  (no client)  00:30\nNothing was changed (--dry-run)\n"},
+      {{"import", bad}, 1, "tessal: " + bad + ": 1 row cannot be read; nothing was imported\n"},
+      {{"import", here.path("missing.csv")}, 1, "cannot read " + here.path("missing.csv")},
+      {{"import", good}, 0, "Imported 2 entries\n"},
+      {{"import", good}, 0, "Already there: 2 entries\n"},
+      // clang-format on
+  };
+  for (const auto& c : cases) {
+    const QByteArray store = bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal");
+    const QByteArray journal = bytesOf(here.journalPath());
+    here.expect(c.arguments, c.code, c.says);
+    if (c.code != 0 || c.arguments.contains("--dry-run")) {
+      EXPECT_EQ(bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal"), store)
+          << c.says.toStdString();
+      EXPECT_EQ(bytesOf(here.journalPath()), journal);
+    }
+  }
+  here.expect({"log", "--range", "2026-03-04..2026-03-04"}, 0,
+              "2026-03-04  09:00–10:30  Atlas › Design  01:30  120.00\n"
+              "2026-03-04  11:00–11:30  Zeus › Default Task  00:30");
+  EXPECT_TRUE(bytesOf(here.journalPath()).contains("importId"));
 }
 
 TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {

@@ -127,7 +127,7 @@ Records sampleRecords() {
             .budget = decimal(u"12345678901234567890123456789012345678")},
            {.uuid = "I1@WTTime", .entity = "WTTime", .name = QString::fromUtf16(u"nul \0 inside", 12),
             .taskUuid = "T1@WTTask", .startDate = Date::fromSeconds(1767261600.25),
-            .endDate = Date::fromSeconds(1767265200.75), .running = true},
+            .endDate = Date::fromSeconds(1767265200.75), .running = true, .importId = "toggl:3f2a"},
            {.uuid = "I2@WTFlat", .entity = "WTFlat", .taskUuid = "T1@WTTask",
             .startDate = Date::fromSeconds(-86400.5), .minutes = 0},
            {.uuid = "I3@WTExpense", .entity = "WTExpense", .rate = decimal(u"0.0000000000000000000001"),
@@ -266,7 +266,7 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
     EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
-  EXPECT_EQ(shape(path()), QStringList({"4", "wal", "0", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"5", "wal", "0", "3"}));
   const QString folder = dir.filePath(QStringLiteral("Tessal2"));
   auto inMissingFolder = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
   ASSERT_FALSE(inMissingFolder.ok());
@@ -290,9 +290,9 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
 }
 
 // Reports open the store beside the running application: readers see what it saved and change nothing. Files
-// of version 1 (the first) and 3 (before the billing columns) keep their data.
+// of version 1 (the first), 3 (before the billing columns) and 4 (before importId) keep their data.
 TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSaved) {
-  for (const int version : {1, 3}) {
+  for (const int version : {1, 3, 4}) {
     SCOPED_TRACE(version);
     removeFiles();
     RawDatabase(path()).exec(
@@ -308,6 +308,12 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
                                    "('WTClient', 'WTProject', 'WTTask'); CREATE INDEX records_running ON "
                                    "records(uuid) WHERE running <> 0; CREATE INDEX records_items ON "
                                    "records(taskUuid); PRAGMA user_version = 3;");
+    if (version == 4)
+      RawDatabase(path()).exec(
+          "ALTER TABLE records ADD COLUMN currency TEXT; ALTER TABLE records ADD COLUMN address TEXT;"
+          "ALTER TABLE records ADD COLUMN roundingMinutes INTEGER;"
+          "ALTER TABLE records ADD COLUMN roundingMode TEXT;"
+          "PRAGMA user_version = 4;");
     RawDatabase(path()).exec(
         "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
         " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
@@ -336,7 +342,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     added.roundingMinutes = 6;
     ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
     expected[added.uuid] = added;
-    EXPECT_EQ(shape(path()), QStringList({"4", "wal", "3", "3"}));
+    EXPECT_EQ(shape(path()), QStringList({"5", "wal", "3", "3"}));
 
     auto reader = WTStore::openReadOnly(path());
     ASSERT_TRUE(reader) << reader.error().message.toStdString();

@@ -1,0 +1,617 @@
+#include "WTCSVReader.h"
+#include "WTImportFile.h"
+
+#include <QCryptographicHash>
+#include <QHash>
+#include <QIODevice>
+#include <QRegularExpression>
+
+#include <nlohmann/json.hpp>
+
+namespace WTImportFormats {
+namespace {
+
+// The columns a CSV format names; an empty name is a column the format lacks. A name ending in '('
+// matches a header that starts with it and carries the currency in the parentheses.
+struct CSVFormat {
+  const char* name;
+  const char* client;
+  const char* project;
+  const char* task;
+  const char* description;
+  const char* billable;
+  const char* tags;
+  const char* notes;
+  const char* startDate;
+  const char* startTime;
+  const char* endDate;
+  const char* endTime;
+  const char* duration;
+  const char* rate;
+  const char* amount;
+  const char* currency;
+  const char* kind;
+  std::vector<const char*> required;
+};
+
+const CSVFormat kToggl{"toggl",
+                       "Client",
+                       "Project",
+                       "Task",
+                       "Description",
+                       "Billable",
+                       "Tags",
+                       "",
+                       "Start date",
+                       "Start time",
+                       "End date",
+                       "End time",
+                       "Duration",
+                       "",
+                       "Amount (",
+                       "",
+                       "",
+                       {"Project", "Description", "Start date", "Start time", "Duration"}};
+const CSVFormat kClockify{
+    "clockify",
+    "Client",
+    "Project",
+    "Task",
+    "Description",
+    "Billable",
+    "Tags",
+    "",
+    "Start Date",
+    "Start Time",
+    "End Date",
+    "End Time",
+    "Duration (h)",
+    "Billable Rate (",
+    "",
+    "",
+    "",
+    {"Project", "Client", "Description", "Start Date", "Start Time", "End Date", "End Time"}};
+const CSVFormat kKimai{
+    "kimai",
+    "customer name",
+    "project name",
+    "activity name",
+    "description",
+    "billable",
+    "tags",
+    "",
+    "date",
+    "begin",
+    "",
+    "end",
+    "duration",
+    "hourly_rate",
+    "",
+    "currency",
+    "",
+    {"date", "begin", "end", "customer name", "project name", "activity name", "description"}};
+const CSVFormat kTessal{
+    "tessal",   "client", "project",
+    "task",     "name",   "",
+    "",         "notes",  "date",
+    "start",    "",       "end",
+    "duration", "rate",   "",
+    "currency", "kind",   {"client", "project", "task", "kind", "name", "date", "start", "end"}};
+
+const CSVFormat* const kCSVFormats[] = {&kToggl, &kClockify, &kKimai, &kTessal};
+
+QString folded(const QString& header) {
+  return header.trimmed().toCaseFolded();
+}
+
+// Where each of a format's columns is in the file's header, and the currency a header carries.
+struct Header {
+  QHash<QString, qsizetype> index;  // by folded name
+  QStringList names;
+
+  explicit Header(const QStringList& fields) : names(fields) {
+    for (qsizetype i = 0; i < fields.size(); ++i) index.insert(folded(fields[i]), i);
+  }
+  // Looked up once per column name: every row asks again.
+  qsizetype column(const char* name) const {
+    const auto cached = cache_.constFind(name);
+    if (cached != cache_.constEnd()) return *cached;
+    const qsizetype found = find(name);
+    cache_.insert(name, found);
+    return found;
+  }
+  qsizetype find(const char* name) const {
+    if (!*name) return -1;
+    const QString wanted = folded(QString::fromUtf8(name));
+    if (wanted.endsWith(u'(')) {
+      for (qsizetype i = 0; i < names.size(); ++i)
+        if (folded(names[i]).startsWith(wanted)) return i;
+      return -1;
+    }
+    return index.value(wanted, -1);
+  }
+  mutable QHash<const char*, qsizetype> cache_;
+
+  QString currencyIn(const char* name) const {
+    const qsizetype at = column(name);
+    if (at < 0 || !QString::fromUtf8(name).endsWith(u'(')) return QString();
+    const QString header = names[at].trimmed();
+    const qsizetype open = header.lastIndexOf(u'(');
+    return header.mid(open + 1).chopped(header.endsWith(u')') ? 1 : 0).trimmed().toUpper();
+  }
+};
+
+// Columns that only one format has: a header with one of them is that format's, and a column it lacks
+// is named rather than the file taken for another format.
+bool marked(const Header& header, const CSVFormat& format) {
+  static const QHash<QString, std::vector<const char*>> markers = {
+      {QStringLiteral("toggl"), {"Duration", "Amount ("}},
+      {QStringLiteral("clockify"), {"Duration (h)", "Duration (decimal)", "Billable Rate ("}},
+      {QStringLiteral("kimai"), {"activity name", "customer name", "hourly_rate"}},
+      {QStringLiteral("tessal"), {"billed duration", "kind"}}};
+  for (const char* name : markers.value(QString::fromUtf8(format.name)))
+    if (header.column(name) >= 0) return true;
+  return false;
+}
+
+qsizetype requiredPresent(const Header& header, const CSVFormat& format) {
+  return std::count_if(format.required.begin(), format.required.end(),
+                       [&](const char* name) { return header.column(name) >= 0; });
+}
+
+std::optional<QDate> parseDate(const QString& text) {
+  static const QRegularExpression iso(QStringLiteral("^(\\d{4})-(\\d{1,2})-(\\d{1,2})$"));
+  static const QRegularExpression dotted(QStringLiteral("^(\\d{1,2})[.-](\\d{1,2})[.-](\\d{4})$"));
+  static const QRegularExpression slashed(QStringLiteral("^(\\d{1,2})/(\\d{1,2})/(\\d{4})$"));
+  const QString trimmed = text.trimmed();
+  QDate date;
+  if (const auto m = iso.match(trimmed); m.hasMatch()) {
+    date = QDate(m.captured(1).toInt(), m.captured(2).toInt(), m.captured(3).toInt());
+  } else if (const auto m = dotted.match(trimmed); m.hasMatch()) {
+    date = QDate(m.captured(3).toInt(), m.captured(2).toInt(), m.captured(1).toInt());
+  } else if (const auto m = slashed.match(trimmed); m.hasMatch()) {
+    // Month first, as the hosted trackers' American default writes it; a first number past 12 can
+    // only be a day.
+    const int first = m.captured(1).toInt(), second = m.captured(2).toInt(), year = m.captured(3).toInt();
+    date = first > 12 ? QDate(year, second, first) : QDate(year, first, second);
+  }
+  if (!date.isValid()) return std::nullopt;
+  return date;
+}
+
+// "13:30", "13:30:15", "1:30 PM", "01:30:00 pm".
+std::optional<QTime> parseTime(const QString& text) {
+  static const QRegularExpression pattern(
+      QStringLiteral("^(\\d{1,2}):(\\d{2})(?::(\\d{2}))?\\s*(?:([AaPp])\\.?[Mm]\\.?)?$"));
+  const auto m = pattern.match(text.trimmed());
+  if (!m.hasMatch()) return std::nullopt;
+  int hour = m.captured(1).toInt();
+  const QString half = m.captured(4).toLower();
+  if (!half.isEmpty()) {
+    if (hour < 1 || hour > 12) return std::nullopt;
+    hour = hour % 12 + (half == u"p" ? 12 : 0);
+  }
+  const QTime time(hour, m.captured(2).toInt(), m.captured(3).toInt());
+  if (!time.isValid()) return std::nullopt;
+  return time;
+}
+
+// "1:20:00" or "1:20" as seconds.
+std::optional<qint64> parseDuration(const QString& text) {
+  static const QRegularExpression pattern(QStringLiteral("^(\\d+):(\\d{2})(?::(\\d{2}))?$"));
+  const auto m = pattern.match(text.trimmed());
+  if (!m.hasMatch()) return std::nullopt;
+  return m.captured(1).toLongLong() * 3600 + m.captured(2).toLongLong() * 60 + m.captured(3).toLongLong();
+}
+
+// A number as a spreadsheet or a locale writes it: "1,234.50", "1.234,50", "50,00", with a currency
+// sign or code around it.
+std::optional<Decimal> parseNumber(const QString& text) {
+  QString digits;
+  for (QChar c : text)
+    if (c.isDigit() || c == u'.' || c == u',' || c == u'-') digits.append(c);
+  if (digits.isEmpty()) return std::nullopt;
+  const qsizetype comma = digits.lastIndexOf(u','), point = digits.lastIndexOf(u'.');
+  if (comma > point) {
+    digits.remove(u'.');
+    digits.replace(u',', u'.');
+  } else {
+    digits.remove(u',');
+  }
+  return Decimal::fromString(digits);
+}
+
+std::optional<bool> parseFlag(const QString& text) {
+  const QString word = text.trimmed().toCaseFolded();
+  if (word.isEmpty() || word == u"yes" || word == u"true" || word == u"1" || word == u"billable") return true;
+  if (word == u"no" || word == u"false" || word == u"0" || word == u"non-billable") return false;
+  return std::nullopt;
+}
+
+QStringList splitTags(const QString& text) {
+  QStringList tags;
+  for (const QString& tag : text.split(u',', Qt::SkipEmptyParts))
+    if (!tag.trimmed().isEmpty()) tags.append(tag.trimmed());
+  return tags;
+}
+
+// Formats without ids of their own: the entry's own fields, so that the same entry read again is known.
+QString hashedId(const QString& format, const WTImportRow& row) {
+  const QString key = QStringList{row.client, row.project, row.task, row.name,
+                                  QString::number(qint64(row.start.secondsSince1970()))}
+                          .join(QChar(0x1f));
+  return format + u':' +
+         QString::fromLatin1(QCryptographicHash::hash(key.toUtf8(), QCryptographicHash::Sha1).toHex());
+}
+
+Date at(const QDate& day, const QTime& time, const QTimeZone& zone) {
+  return Date::fromQDateTime(QDateTime(day, time, zone));
+}
+
+QString when(const Date& date, const QTimeZone& zone) {
+  return date.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd HH:mm");
+}
+
+// One CSV record as an entry, or the reason it is none.
+std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& header,
+                                      const QStringList& fields, const Options& options, QString& problem) {
+  const auto value = [&](const char* name) {
+    const qsizetype column = header.column(name);
+    return column >= 0 && column < fields.size() ? fields[column].trimmed() : QString();
+  };
+  WTImportRow row;
+  if (format.kind[0] && !value(format.kind).isEmpty() && value(format.kind) != u"time") {
+    problem = QStringLiteral("only time entries are imported, not a %1").arg(value(format.kind));
+    return std::nullopt;
+  }
+  row.client = value(format.client);
+  row.project = value(format.project);
+  row.task = value(format.task);
+  row.name = value(format.description);
+  row.notes = value(format.notes);
+  row.tags = splitTags(value(format.tags));
+  const std::optional<bool> billable = parseFlag(value(format.billable));
+  if (!billable) {
+    problem = QStringLiteral("“%1” is neither yes nor no").arg(value(format.billable));
+    return std::nullopt;
+  }
+  row.billable = *billable;
+
+  const QString startDay = value(format.startDate);
+  const std::optional<QDate> day = parseDate(startDay);
+  if (!day) {
+    problem = QStringLiteral("the date “%1” cannot be read").arg(startDay);
+    return std::nullopt;
+  }
+  const std::optional<QTime> startTime = parseTime(value(format.startTime));
+  if (!startTime) {
+    problem = QStringLiteral("the start time “%1” cannot be read").arg(value(format.startTime));
+    return std::nullopt;
+  }
+  row.start = at(*day, *startTime, options.zone);
+  const QString durationText = value(format.duration);
+  const std::optional<qint64> duration = parseDuration(durationText);
+  const QString endText = value(format.endTime);
+  if (!endText.isEmpty()) {
+    const std::optional<QTime> endTime = parseTime(endText);
+    const QString endDayText = value(format.endDate);
+    const std::optional<QDate> endDay = endDayText.isEmpty() ? day : parseDate(endDayText);
+    if (!endTime || !endDay) {
+      problem = QStringLiteral("the end “%1 %2” cannot be read").arg(endDayText, endText).trimmed();
+      return std::nullopt;
+    }
+    row.end = at(*endDay, *endTime, options.zone);
+    // Tessal's own file writes one date: an end earlier in the day is on the next.
+    if (&format == &kTessal && *row.end < row.start) row.end = at(endDay->addDays(1), *endTime, options.zone);
+  } else if (duration && header.column(format.endTime) < 0) {
+    row.end = row.start.addingSeconds(double(*duration));
+  } else {
+    row.lastKnown =
+        duration ? std::optional<Date>(row.start.addingSeconds(double(*duration))) : options.fileTime;
+  }
+  if (row.end && *row.end < row.start) {
+    problem = QStringLiteral("the entry ends (%1) before it starts (%2)")
+                  .arg(when(*row.end, options.zone), when(row.start, options.zone));
+    return std::nullopt;
+  }
+
+  if (format.rate[0] && !value(format.rate).isEmpty()) {
+    row.rate = parseNumber(value(format.rate));
+    if (!row.rate) {
+      problem = QStringLiteral("the rate “%1” cannot be read").arg(value(format.rate));
+      return std::nullopt;
+    }
+  } else if (format.amount[0] && !value(format.amount).isEmpty() && row.end && row.billable) {
+    // The amount over the hours: the rate the tracker billed, to the cent.
+    const std::optional<Decimal> amount = parseNumber(value(format.amount));
+    const double seconds = row.end->secondsSince1970() - row.start.secondsSince1970();
+    if (!amount) {
+      problem = QStringLiteral("the amount “%1” cannot be read").arg(value(format.amount));
+      return std::nullopt;
+    }
+    if (seconds >= 60)
+      row.rate = Decimal::divide(*amount * Decimal(3600), *Decimal::fromDouble(seconds))
+                     .value_or(Decimal())
+                     .rounded(2);
+  }
+  row.currency = format.currency[0] ? value(format.currency).toUpper()
+                                    : header.currencyIn(format.rate[0] ? format.rate : format.amount);
+  row.importId = hashedId(QString::fromUtf8(format.name), row);
+  return row;
+}
+
+Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
+  WTCSVReader reader(device);
+  QStringList fields;
+  const WTCSVReader::Status status = reader.next(fields);
+  if (status == WTCSVReader::Status::Failed) return Error{1, reader.error()};
+  if (status == WTCSVReader::Status::End) return Error{1, QStringLiteral("the file is empty")};
+  const Header header(fields);
+  const CSVFormat* format = nullptr;
+  for (const CSVFormat* candidate : kCSVFormats) {
+    if (!options.format.isEmpty()) {
+      if (options.format == QLatin1String(candidate->name)) format = candidate;
+    } else if (marked(header, *candidate) &&
+               (!format || requiredPresent(header, *candidate) > requiredPresent(header, *format))) {
+      format = candidate;
+    }
+  }
+  if (!format) {
+    return Error{1, options.format.isEmpty()
+                        ? QStringLiteral("the file is none of the formats Tessal imports (%1)")
+                              .arg(names().join(QStringLiteral(", ")))
+                        : QStringLiteral("there is no format named “%1”; the formats are %2")
+                              .arg(options.format, names().join(QStringLiteral(", ")))};
+  }
+  for (const char* name : format->required) {
+    if (header.column(name) < 0)
+      return Error{1, QStringLiteral("line 1: the header lacks the column “%1” of a %2 file")
+                          .arg(QString::fromUtf8(name), QString::fromUtf8(format->name))};
+  }
+  WTImportFile file;
+  file.format = QString::fromUtf8(format->name);
+  for (;;) {
+    const WTCSVReader::Status next = reader.next(fields);
+    if (next == WTCSVReader::Status::Failed) return Error{1, reader.error()};
+    if (next == WTCSVReader::Status::End) break;
+    QString problem;
+    if (std::optional<WTImportRow> row = readRecord(*format, header, fields, options, problem)) {
+      row->line = reader.line();
+      file.rows.push_back(std::move(*row));
+    } else {
+      file.addProblem(reader.line(), problem);
+    }
+  }
+  return file;
+}
+
+// The JSON array streams through an iterator that counts lines and stops an entry past its bounds.
+struct JSONSource {
+  QIODevice& device;
+  QByteArray buffer;
+  qsizetype position = 0;
+  qint64 line = 1;
+  qint64 entryBytes = 0;
+  bool tooLong = false;
+
+  int get() {
+    if (position >= buffer.size()) {
+      buffer = device.read(64 * 1024);
+      position = 0;
+      if (buffer.isEmpty()) return -1;
+    }
+    if (++entryBytes > WTCSVReader::kMaxRecordBytes) {
+      tooLong = true;
+      return -1;
+    }
+    const char c = buffer.at(position++);
+    if (c == '\n') ++line;
+    return static_cast<unsigned char>(c);
+  }
+};
+
+class JSONIterator {
+ public:
+  using iterator_category = std::input_iterator_tag;
+  using value_type = char;
+  using difference_type = std::ptrdiff_t;
+  using pointer = const char*;
+  using reference = const char&;
+
+  JSONIterator() = default;
+  explicit JSONIterator(JSONSource* source) : source_(source) { current_ = source_->get(); }
+  const char& operator*() const {
+    value_ = char(current_);
+    return value_;
+  }
+  JSONIterator& operator++() {
+    current_ = source_->get();
+    return *this;
+  }
+  JSONIterator operator++(int) {
+    JSONIterator before = *this;
+    ++*this;
+    return before;
+  }
+  bool operator==(const JSONIterator& other) const { return atEnd() == other.atEnd(); }
+  bool operator!=(const JSONIterator& other) const { return !(*this == other); }
+
+ private:
+  bool atEnd() const { return !source_ || current_ < 0; }
+  JSONSource* source_ = nullptr;
+  int current_ = -1;
+  mutable char value_ = 0;
+};
+
+// The entries of `timew export`, one object at a time: nothing but the entry being read is held.
+class TimewarriorReader : public nlohmann::json_sax<nlohmann::json> {
+ public:
+  TimewarriorReader(JSONSource& source, const Options& options, WTImportFile& file)
+      : source_(source), options_(options), file_(file) {}
+
+  bool null() override { return scalar(QString()); }
+  bool boolean(bool) override { return scalar(QString()); }
+  bool number_integer(number_integer_t value) override { return scalar(QString::number(value)); }
+  bool number_unsigned(number_unsigned_t value) override { return scalar(QString::number(value)); }
+  bool number_float(number_float_t value, const string_t&) override { return scalar(QString::number(value)); }
+  bool string(string_t& value) override { return scalar(QString::fromStdString(value)); }
+  bool binary(binary_t&) override { return scalar(QString()); }
+  bool key(string_t& value) override {
+    key_ = QString::fromStdString(value);
+    return true;
+  }
+  bool start_object(std::size_t) override {
+    if (depth_ == 0) return refuse();
+    if (depth_ == 1) {
+      entry_ = {};
+      tags_.clear();
+      line_ = source_.line;
+    }
+    ++depth_;
+    return true;
+  }
+  bool end_object() override {
+    if (--depth_ == 1) finishEntry();
+    return true;
+  }
+  bool start_array(std::size_t) override {
+    ++depth_;
+    inTags_ = depth_ == 3 && key_ == u"tags";
+    return true;
+  }
+  bool end_array() override {
+    --depth_;
+    inTags_ = false;
+    return true;
+  }
+  bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception&) override {
+    error_ = source_.tooLong ? QStringLiteral("line %1: an entry longer than %2 bytes")
+                                   .arg(line_)
+                                   .arg(WTCSVReader::kMaxRecordBytes)
+                             : QStringLiteral("line %1: the JSON cannot be read").arg(source_.line);
+    return false;
+  }
+
+  QString error() const { return error_; }
+
+ private:
+  bool refuse() {
+    error_ = QStringLiteral("the file is none of the formats Tessal imports (%1)")
+                 .arg(names().join(QStringLiteral(", ")));
+    return false;
+  }
+  bool scalar(const QString& value) {
+    if (depth_ == 0) return refuse();
+    if (inTags_)
+      tags_.append(value);
+    else if (depth_ == 2)
+      entry_.insert(key_, value);
+    return true;
+  }
+  void finishEntry() {
+    source_.entryBytes = 0;
+    static const QRegularExpression stamp(QStringLiteral("^(\\d{8})T(\\d{6})Z$"));
+    auto instant = [](const QString& text) -> std::optional<Date> {
+      const auto m = stamp.match(text);
+      if (!m.hasMatch()) return std::nullopt;
+      const QDateTime date(QDate::fromString(m.captured(1), u"yyyyMMdd"),
+                           QTime::fromString(m.captured(2), u"HHmmss"), QTimeZone::utc());
+      if (!date.isValid()) return std::nullopt;
+      return Date::fromQDateTime(date);
+    };
+    WTImportRow row;
+    row.line = line_;
+    const std::optional<Date> start = instant(entry_.value(QStringLiteral("start")));
+    if (!start) {
+      file_.addProblem(
+          line_, QStringLiteral("the start “%1” cannot be read").arg(entry_.value(QStringLiteral("start"))));
+      return;
+    }
+    row.start = *start;
+    if (entry_.contains(QStringLiteral("end"))) {
+      row.end = instant(entry_.value(QStringLiteral("end")));
+      if (!row.end) {
+        file_.addProblem(
+            line_, QStringLiteral("the end “%1” cannot be read").arg(entry_.value(QStringLiteral("end"))));
+        return;
+      }
+      if (*row.end < row.start) {
+        file_.addProblem(line_, QStringLiteral("the entry ends (%1) before it starts (%2)")
+                                    .arg(when(*row.end, options_.zone), when(row.start, options_.zone)));
+        return;
+      }
+    } else {
+      row.lastKnown = options_.fileTime;
+    }
+    // The leading tags name what the mapping says; the rest become the entry's name.
+    QStringList rest = tags_;
+    for (const QString& field : options_.tags) {
+      const QString tag = rest.isEmpty() ? QString() : rest.takeFirst();
+      if (field == u"client")
+        row.client = tag;
+      else if (field == u"project")
+        row.project = tag;
+      else if (field == u"task")
+        row.task = tag;
+    }
+    row.name = rest.join(QStringLiteral(", "));
+    row.notes = entry_.value(QStringLiteral("annotation"));
+    // Its ids count back from the newest entry and change with every new one: the start is what lasts.
+    row.importId = QStringLiteral("timewarrior:") + QString::number(qint64(row.start.secondsSince1970()));
+    file_.rows.push_back(std::move(row));
+  }
+
+  JSONSource& source_;
+  const Options& options_;
+  WTImportFile& file_;
+  int depth_ = 0;
+  bool inTags_ = false;
+  qint64 line_ = 0;
+  QString key_;
+  QHash<QString, QString> entry_;
+  QStringList tags_;
+  QString error_;
+};
+
+Result<WTImportFile> readTimewarrior(QIODevice& device, const Options& options) {
+  WTImportFile file;
+  file.format = QStringLiteral("timewarrior");
+  file.mapping = QStringLiteral("the first tags are the entry's %1; the others its name")
+                     .arg(options.tags.join(QStringLiteral(", ")));
+  JSONSource source{device, {}, 0, 1, 0, false};
+  TimewarriorReader reader(source, options, file);
+  const bool parsed = nlohmann::json::sax_parse(JSONIterator(&source), JSONIterator(), &reader,
+                                                nlohmann::json::input_format_t::json, true);
+  if (!parsed) return Error{1, reader.error()};
+  return file;
+}
+
+// The first character that is not blank (past a byte order mark): '[' begins a JSON array.
+int firstCharacter(QIODevice& device) {
+  const QByteArray start = device.peek(4096);
+  qsizetype i = start.startsWith("\xEF\xBB\xBF") ? 3 : 0;
+  while (i < start.size() && QChar::isSpace(uchar(start.at(i)))) ++i;
+  return i < start.size() ? uchar(start.at(i)) : -1;
+}
+
+}  // namespace
+
+const QStringList& names() {
+  static const QStringList all = {QStringLiteral("toggl"), QStringLiteral("clockify"),
+                                  QStringLiteral("timewarrior"), QStringLiteral("kimai"),
+                                  QStringLiteral("tessal")};
+  return all;
+}
+
+Result<WTImportFile> read(QIODevice& device, const Options& options) {
+  if (!options.format.isEmpty() && !names().contains(options.format))
+    return Error{2, QStringLiteral("there is no format named “%1”; the formats are %2")
+                        .arg(options.format, names().join(QStringLiteral(", ")))};
+  const int first = firstCharacter(device);
+  if (first < 0) return Error{1, QStringLiteral("the file is empty")};
+  if (options.format == u"timewarrior" || (options.format.isEmpty() && first == '['))
+    return readTimewarrior(device, options);
+  return readCSV(device, options);
+}
+
+}  // namespace WTImportFormats

@@ -1,0 +1,326 @@
+#include "WTImportPlan.h"
+
+#include "DurationText.h"
+#include "WTClient.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
+#include "WTUndoManager.h"
+
+#include <QCoreApplication>
+
+#include <QSet>
+#include <QTimeZone>
+
+#include <map>
+
+namespace WTImport {
+namespace {
+
+const QString kDefaultTask = QStringLiteral("Default Task");
+// Where an entry of no project goes: a task needs one.
+const QString kNoProject = QStringLiteral("No Project");
+
+struct TaskNode {
+  QString name;
+  WTTask* existing = nullptr;
+  WTTask* made = nullptr;
+  std::vector<const WTImportRow*> rows;
+  WTTask* task() const { return existing ? existing : made; }
+};
+
+struct ProjectNode {
+  QString name;
+  WTProject* existing = nullptr;
+  WTProject* made = nullptr;
+  std::map<QString, TaskNode> tasks;  // by folded name
+  WTProject* project() const { return existing ? existing : made; }
+};
+
+struct ClientNode {
+  QString name;  // empty: the projects have no client
+  WTClient* existing = nullptr;
+  WTClient* made = nullptr;
+  std::map<QString, ProjectNode> projects;
+  WTImportPlan::ClientTotal total;
+  WTClient* client() const { return existing ? existing : made; }
+};
+
+template <class T>
+T* named(const QList<T*>& candidates, const QString& name) {
+  for (T* candidate : candidates)
+    if (WTObject::sameName(candidate->name(), name)) return candidate;
+  return nullptr;
+}
+
+// The time an entry covers, in whole minutes as Tessal counts them.
+qint64 minutesOf(const Date& start, const Date& end) {
+  return qint64(end.secondsSince1970() / 60) - qint64(start.secondsSince1970() / 60);
+}
+
+// The rate every row of `rows` that has one shares; none when they have none or differ, with `varies`.
+std::optional<Decimal> sharedRate(const std::vector<const WTImportRow*>& rows, bool& varies) {
+  std::optional<Decimal> shared;
+  varies = false;
+  for (const WTImportRow* row : rows) {
+    if (!row->rate || !row->billable) continue;
+    if (shared && *shared != *row->rate) varies = true;
+    if (!shared) shared = row->rate;
+  }
+  if (varies) return std::nullopt;
+  return shared;
+}
+
+// Gives `object` the rate unless it is in force there already; a record the import did not make keeps its
+// own rate, and the rate goes to the level below.
+bool placeRate(WTObject* object, bool made, const Decimal& rate) {
+  if (object->inheritedRate() == rate) return true;
+  if (!made) return false;
+  object->setRate(rate);
+  return true;
+}
+
+std::vector<const WTImportRow*> rowsOf(const ProjectNode& project) {
+  std::vector<const WTImportRow*> rows;
+  for (const auto& [key, task] : project.tasks) rows.insert(rows.end(), task.rows.begin(), task.rows.end());
+  return rows;
+}
+
+std::vector<const WTImportRow*> rowsOf(const ClientNode& client) {
+  std::vector<const WTImportRow*> rows;
+  for (const auto& [key, project] : client.projects) {
+    const std::vector<const WTImportRow*> more = rowsOf(project);
+    rows.insert(rows.end(), more.begin(), more.end());
+  }
+  return rows;
+}
+
+// The rate of most of the rows: a task bills one rate for all its entries.
+Decimal commonestRate(const std::vector<const WTImportRow*>& rows) {
+  std::map<QString, std::pair<int, Decimal>> counts;
+  for (const WTImportRow* row : rows) {
+    if (!row->rate || !row->billable) continue;
+    auto& [count, rate] = counts[row->rate->toString()];
+    ++count;
+    rate = *row->rate;
+  }
+  std::pair<int, Decimal> best{0, Decimal()};
+  for (const auto& [text, entry] : counts)
+    if (entry.first > best.first) best = entry;
+  return best.second;
+}
+
+QString taskLabel(const WTImportRow& row) {
+  return QStringLiteral("%1 › %2").arg(row.project.isEmpty() ? kNoProject : row.project,
+                                       row.task.isEmpty() ? kDefaultTask : row.task);
+}
+
+// The rates the file gives, each set at the highest level across which it holds.
+void placeRates(ClientNode& client, WTImportPlan& plan) {
+  bool varies = false;
+  const std::optional<Decimal> clientRate = sharedRate(rowsOf(client), varies);
+  if (!clientRate && !varies) return;
+  if (clientRate && client.client() && placeRate(client.client(), client.made, *clientRate)) return;
+  for (auto& [projectKey, project] : client.projects) {
+    const std::optional<Decimal> projectRate = sharedRate(rowsOf(project), varies);
+    if (!projectRate && !varies) continue;
+    if (projectRate && placeRate(project.project(), project.made, *projectRate)) continue;
+    for (auto& [taskKey, task] : project.tasks) {
+      const std::optional<Decimal> taskRate = sharedRate(task.rows, varies);
+      if (!taskRate && !varies) continue;
+      const Decimal rate = taskRate ? *taskRate : commonestRate(task.rows);
+      const QString label = taskLabel(*task.rows.front());
+      if (varies)
+        plan.notes.append(QStringLiteral("the entries of %1 have several rates; the task bills %2")
+                              .arg(label, rate.toString()));
+      if (!placeRate(task.task(), task.made, rate))
+        plan.notes.append(QStringLiteral("%1 keeps its rate %2; the file gives %3")
+                              .arg(label, task.task()->inheritedRate().toString(), rate.toString()));
+    }
+  }
+}
+
+QString notesFor(const WTImportRow& row) {
+  QStringList lines;
+  if (!row.notes.isEmpty()) lines.append(row.notes);
+  if (!row.tags.isEmpty()) lines.append(QStringLiteral("Tags: %1").arg(row.tags.join(QStringLiteral(", "))));
+  // Tessal bills every entry: the mark keeps what the other tracker knew.
+  if (!row.billable) lines.append(QStringLiteral("Not billable"));
+  return lines.join(u'\n');
+}
+
+WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Options& options, bool make) {
+  WTImportPlan plan;
+  QSet<QString> present;
+  for (const WTTime* time : context.fetch<WTTime>())
+    if (!time->importId().isNull()) present.insert(time->importId());
+
+  const QList<WTClient*> clients = context.fetch<WTClient>();
+  const QList<WTProject*> loneProjects =
+      context.fetch<WTProject>([](const WTProject* project) { return !project->client(); });
+  std::map<QString, ClientNode> nodes;
+  std::vector<ClientNode*> order;
+  std::vector<std::pair<const WTImportRow*, TaskNode*>> entries;
+  std::vector<WTImportRow> stopped;  // running rows given their end; never moved, as rows point into it
+  stopped.reserve(
+      size_t(std::count_if(file.rows.begin(), file.rows.end(), [](const auto& row) { return !row.end; })));
+  for (const WTImportRow& original : file.rows) {
+    const WTImportRow* row = &original;
+    if (!row->end) {
+      if (!options.stopRunning || !row->lastKnown) {
+        plan.running.push_back(row);
+        continue;
+      }
+      stopped.push_back(*row);
+      stopped.back().end = std::max(*row->lastKnown, row->start);
+      row = &stopped.back();
+    }
+    if (present.contains(row->importId)) {
+      ++plan.alreadyThere;
+      continue;
+    }
+    present.insert(row->importId);
+
+    auto [clientIt, newClient] = nodes.try_emplace(row->client.toCaseFolded());
+    ClientNode& client = clientIt->second;
+    if (newClient) {
+      client.name = row->client;
+      client.total.client = row->client;
+      if (!row->client.isEmpty()) client.existing = named(clients, row->client);
+      order.push_back(&client);
+    }
+    const QString projectName = row->project.isEmpty() ? kNoProject : row->project;
+    auto [projectIt, newProject] = client.projects.try_emplace(projectName.toCaseFolded());
+    ProjectNode& project = projectIt->second;
+    if (newProject) {
+      project.name = projectName;
+      if (client.existing)
+        project.existing = named(client.existing->projects(), projectName);
+      else if (row->client.isEmpty())
+        project.existing = named(loneProjects, projectName);
+    }
+    const QString taskName = row->task.isEmpty() ? kDefaultTask : row->task;
+    auto [taskIt, newTask] = project.tasks.try_emplace(taskName.toCaseFolded());
+    TaskNode& task = taskIt->second;
+    if (newTask) {
+      task.name = taskName;
+      if (project.existing) task.existing = named(project.existing->tasks(), taskName);
+    }
+    task.rows.push_back(row);
+    entries.emplace_back(row, &task);
+
+    const qint64 minutes = minutesOf(row->start, *row->end);
+    client.total.minutes += minutes;
+    client.total.priced = client.total.priced || (row->billable && row->rate);
+    if (row->billable && row->rate)
+      client.total.money +=
+          Decimal::divide(*row->rate * Decimal(std::int64_t(minutes)), Decimal(60)).value_or(Decimal());
+    if (client.total.currency.isEmpty()) client.total.currency = row->currency;
+  }
+
+  for (ClientNode* client : order) {
+    plan.totals.push_back(client->total);
+    if (!client->name.isEmpty()) ++(client->existing ? plan.clients.reused : plan.clients.created);
+    for (auto& [projectKey, project] : client->projects) {
+      ++(project.existing ? plan.projects.reused : plan.projects.created);
+      for (auto& [taskKey, task] : project.tasks) ++(task.existing ? plan.tasks.reused : plan.tasks.created);
+    }
+  }
+  plan.entries = int(entries.size());
+  if (!make) return plan;
+
+  for (ClientNode* client : order) {
+    if (!client->name.isEmpty() && !client->existing) {
+      client->made = WTClient::insertNewObject(&context);
+      client->made->setName(client->name);
+      if (!client->total.currency.isEmpty()) client->made->setCurrency(client->total.currency);
+    }
+    for (auto& [projectKey, project] : client->projects) {
+      if (!project.existing) {
+        project.made = WTProject::insertNewObject(&context);
+        project.made->setName(project.name);
+        project.made->setClient(client->client());
+      }
+      for (auto& [taskKey, task] : project.tasks) {
+        if (task.existing) continue;
+        task.made = WTTask::insertNewObject(&context);
+        task.made->setName(task.name);
+        task.made->setProject(project.project());
+      }
+    }
+    placeRates(*client, plan);
+  }
+  for (const auto& [row, node] : entries) {
+    auto* time = WTTime::insertNewObject(&context);
+    time->setTask(node->task());
+    time->setStartDate(row->start);
+    time->setEndDate(row->end);
+    if (!row->name.isEmpty()) time->setName(row->name);
+    if (const QString notes = notesFor(*row); !notes.isEmpty()) time->setNotes(notes);
+    time->setImportId(row->importId);
+  }
+  return plan;
+}
+
+QString counted(int count, const char* one, const char* many) {
+  return QStringLiteral("%1 %2").arg(count).arg(QLatin1String(count == 1 ? one : many));
+}
+
+}  // namespace
+
+WTImportPlan plan(const WTObjectContext& context, const WTImportFile& file, const Options& options) {
+  // Nothing is made when planning: the context is only read.
+  return run(const_cast<WTObjectContext&>(context), file, options, false);
+}
+
+WTImportPlan apply(WTObjectContext& context, const WTImportFile& file, const Options& options) {
+  // Made in one turn of the event loop, the whole import is one step of the desktop's undo.
+  const WTUndoManager::NamedStep step(context.undoManager(),
+                                      QCoreApplication::translate("WTImport", "Import"));
+  return run(context, file, options, true);
+}
+
+QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZone& zone) {
+  QString out = QStringLiteral("A %1 file").arg(file.format);
+  if (!file.mapping.isEmpty()) out += QStringLiteral(" (%1)").arg(file.mapping);
+  out += QLatin1Char('\n');
+  out += QStringLiteral("New: %1, %2, %3, %4\n")
+             .arg(counted(plan.clients.created, "client", "clients"),
+                  counted(plan.projects.created, "project", "projects"),
+                  counted(plan.tasks.created, "task", "tasks"), counted(plan.entries, "entry", "entries"));
+  out += QStringLiteral("Found: %1, %2, %3\n")
+             .arg(counted(plan.clients.reused, "client", "clients"),
+                  counted(plan.projects.reused, "project", "projects"),
+                  counted(plan.tasks.reused, "task", "tasks"));
+  out += QStringLiteral("Already there: %1\n").arg(counted(plan.alreadyThere, "entry", "entries"));
+  for (const WTImportPlan::ClientTotal& total : plan.totals) {
+    out += QStringLiteral("  %1  %2")
+               .arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
+                    DurationText::stringWithMinutes(int(total.minutes)));
+    if (total.priced) {
+      out += QStringLiteral("  %1%2").arg(
+          total.money.rounded(2).toString(),
+          total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
+    }
+    out += QLatin1Char('\n');
+  }
+  for (const QString& note : plan.notes) out += QStringLiteral("Note: %1\n").arg(note);
+  if (!plan.running.empty()) {
+    out += QStringLiteral("Running when the file was written, left out (--stop-running imports them):\n");
+    for (const WTImportRow* row : plan.running)
+      out +=
+          QStringLiteral("  line %1: %2, since %3\n")
+              .arg(row->line)
+              .arg(taskLabel(*row), row->start.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd HH:mm"));
+  }
+  if (!file.problems.empty()) {
+    out += QStringLiteral("Rows that cannot be read:\n");
+    for (const WTImportProblem& problem : file.problems)
+      out += QStringLiteral("  line %1: %2\n").arg(problem.line).arg(problem.reason);
+    if (file.moreProblems > 0) out += QStringLiteral("  and %1 more\n").arg(file.moreProblems);
+  }
+  return out;
+}
+
+}  // namespace WTImport

@@ -1,0 +1,137 @@
+#include "ModelFixture.h"
+#include "WTImportPlan.h"
+
+#include <QBuffer>
+#include <QFile>
+
+namespace {
+
+class ImportPlanTest : public ModelTest {
+ protected:
+  static WTImportFile read(QIODevice& device) {
+    WTImportFormats::Options options;
+    options.zone = QTimeZone("Europe/Berlin");
+    Result<WTImportFile> file = WTImportFormats::read(device, options);
+    EXPECT_TRUE(file.ok()) << file.error().message.toStdString();
+    return file.ok() ? file.value() : WTImportFile();
+  }
+  static WTImportFile sample(const char* name) {
+    QFile file(QStringLiteral(TESSAL_TEST_DATA_DIR "/import/") + QLatin1String(name));
+    EXPECT_TRUE(file.open(QIODevice::ReadOnly));
+    return read(file);
+  }
+  static QString path(const WTTime* time) {
+    const WTTask* task = time->task();
+    return QStringLiteral("%1/%2/%3")
+        .arg(task->project()->client()->name(), task->project()->name(), task->name());
+  }
+  WTTime* entryNamed(const QString& name) {
+    const QList<WTTime*> times =
+        context->fetch<WTTime>([&](const WTTime* time) { return time->name() == name; });
+    return times.size() == 1 ? times.first() : nullptr;
+  }
+};
+
+TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdits) {
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setName(QStringLiteral("ACME"));
+  auto* project = WTProject::insertNewObject(context.get());
+  project->setName(QStringLiteral("website"));
+  project->setClient(client);
+  makeTask(project, QStringLiteral("design"));
+  saveAndReopen();
+
+  const WTImportFile file = sample("toggl.csv");
+  const WTImportPlan plan = WTImport::plan(*context, file, {});
+  EXPECT_FALSE(context->hasChanges());
+  EXPECT_EQ(
+      std::tuple(plan.clients.created, plan.clients.reused, plan.projects.created, plan.projects.reused,
+                 plan.tasks.created, plan.tasks.reused, plan.entries, plan.alreadyThere, plan.running.size()),
+      std::tuple(0, 1, 0, 1, 1, 1, 2, 0, size_t(1)));
+  ASSERT_EQ(plan.totals.size(), size_t(1));
+  EXPECT_EQ(plan.totals[0].minutes, 225);
+  EXPECT_EQ(plan.totals[0].money, Decimal(150));
+
+  WTImport::apply(*context, file, {});
+  // One step of undo takes the whole import back, and redo brings it again.
+  WTUndoManager& undo = context->undoManager();
+  undo.closeGroup();
+  EXPECT_EQ(undo.undoActionName(), QStringLiteral("Import"));
+  undo.undo();
+  EXPECT_TRUE(context->fetch<WTTime>().isEmpty());
+  EXPECT_EQ(context->fetch<WTTask>().size(), 1);
+  undo.redo();
+  saveAndReopen();
+  ASSERT_EQ(context->fetch<WTClient>().size(), 1);
+  WTTime* call = entryNamed(QStringLiteral("Call\nwith client"));
+  ASSERT_TRUE(call);
+  EXPECT_EQ(path(call), QStringLiteral("ACME/website/Default Task"));
+  EXPECT_EQ(call->notes(), QStringLiteral("Not billable"));
+  EXPECT_EQ(call->duration(), 45);
+  WTTime* header = entryNamed(QStringLiteral("Header, \"hero\" image"));
+  ASSERT_TRUE(header);
+  EXPECT_EQ(path(header), QStringLiteral("ACME/website/design"));
+  EXPECT_EQ(header->notes(), QStringLiteral("Tags: web, design"));
+  header->setName(QStringLiteral("Edited here"));
+  saveAndReopen();
+
+  // Again, now with the running entry stopped where it had got to: only that one is new.
+  const WTImportPlan again = WTImport::apply(*context, file, {.stopRunning = true});
+  EXPECT_EQ(std::tuple(again.entries, again.alreadyThere, again.tasks.created, again.projects.created),
+            std::tuple(1, 2, 1, 1));
+  saveAndReopen();
+  EXPECT_TRUE(entryNamed(QStringLiteral("Edited here")));
+  EXPECT_EQ(context->fetch<WTTime>().size(), 3);
+  WTTime* running = entryNamed(QStringLiteral("Running thing"));
+  ASSERT_TRUE(running);
+  EXPECT_FALSE(running->running());
+  EXPECT_EQ(running->duration(), 30);
+
+  WTImport::apply(*context, file, {.stopRunning = true});
+  EXPECT_FALSE(context->hasChanges());
+}
+
+// Each rate lands on the highest level across which the file keeps it, and nowhere it would be inherited
+// anyway; a client that was there keeps its own rate.
+TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
+  auto* five = WTClient::insertNewObject(context.get());
+  five->setName(QStringLiteral("Five"));
+  five->setRate(Decimal(50));
+  QByteArray content =
+      "client,project,task,kind,name,date,start,end,duration,billed duration,rate,amount,currency,notes\n"
+      "One,A,x,time,e1,2024-01-01,09:00,10:00,,,80,,EUR,\n"
+      "One,B,y,time,e2,2024-01-01,10:00,11:00,,,80,,EUR,\n"
+      "Two,C,x,time,e3,2024-01-01,09:00,10:00,,,80,,,\n"
+      "Two,D,x,time,e4,2024-01-01,09:00,10:00,,,90,,,\n"
+      "Two,D,y,time,e5,2024-01-01,10:00,11:00,,,90,,,\n"
+      "Three,E,x,time,e6,2024-01-01,09:00,10:00,,,70,,,\n"
+      "Three,E,y,time,e7,2024-01-01,10:00,11:00,,,60,,,\n"
+      "Three,E,y,time,e8,2024-01-01,11:00,12:00,,,,,,\n"
+      "Four,G,x,time,e9,2024-01-01,09:00,10:00,,,100,,,\n"
+      "Five,F,x,time,e10,2024-01-01,09:00,10:00,,,60,,,\n";
+  QBuffer buffer(&content);
+  buffer.open(QIODevice::ReadOnly);
+  WTImport::apply(*context, read(buffer), {});
+  QStringList rates;
+  const auto rate = [](const WTObject* object) {
+    return object->storedRate() ? object->storedRate()->toString() : QStringLiteral("-");
+  };
+  QList<WTClient*> clients = context->fetch<WTClient>();
+  std::sort(clients.begin(), clients.end(), [](auto* a, auto* b) { return a->name() < b->name(); });
+  for (const WTClient* client : clients) {
+    QString line = client->name() + u' ' + rate(client);
+    for (const WTProject* project : client->projects()) {
+      line += QStringLiteral(" | %1 %2").arg(project->name(), rate(project));
+      for (const WTTask* task : project->tasks())
+        line += QStringLiteral(" %1 %2").arg(task->name(), rate(task));
+    }
+    rates.append(line);
+  }
+  EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four - | G - x -", "One 80 | A - x - | B - y -",
+                                "Three - | E - x 70 y 60", "Two - | C 80 x - | D 90 x - y -"}));
+  EXPECT_EQ(clients[0]->storedRate(), Decimal(50));
+  const QStringList currencies = {clients[2]->currency(), clients[4]->currency()};
+  EXPECT_EQ(currencies, QStringList({"EUR", QString()}));
+}
+
+}  // namespace
