@@ -2,6 +2,7 @@
 
 #include "MoneyFormat.h"
 #include "WTClient.h"
+#include "WTBudget.h"
 #include "WTObjectContext.h"
 #include "WTStoreRecord.h"
 #include "WTTask.h"
@@ -38,6 +39,10 @@ const WTKeyTable& WTProject::keys() {
                  {"roundingMinutes", "roundingMode", "client", "client.roundingRule"}),
           derived<&WTProject::billingCurrency>("billingCurrency", {"client", "client.billingCurrency"}),
           derived<&WTProject::billedDuration>("billedDuration", {"duration", "roundingRule"}),
+          // Where the billed cost stands against the budget, for a report: empty without a budget.
+          derived("budgetStanding", WTKeyType::Text,
+                  [](const WTObject& object) { return QVariant(WTBudget::standing(&object)); },
+                  {"budget", "billedCost"}),
           derived<&WTProject::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
       });
   return table;

@@ -5,6 +5,7 @@
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTItemContainer.h"
+#include "WTBudget.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTStoreRecord.h"
@@ -77,6 +78,10 @@ const WTKeyTable& WTTask::keys() {
                  {"roundingMinutes", "roundingMode", "project", "project.roundingRule"}),
           derived<&WTTask::billingCurrency>("billingCurrency", {"project", "project.billingCurrency"}),
           derived<&WTTask::billedDuration>("billedDuration", {"duration", "roundingRule"}),
+          // Where the billed cost stands against the budget, for a report: empty without a budget.
+          derived("budgetStanding", WTKeyType::Text,
+                  [](const WTObject& object) { return QVariant(WTBudget::standing(&object)); },
+                  {"budget", "billedCost"}),
           derived<&WTTask::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
           // The time-entry export reads a task's "title": it is the task's name.
           derived<&WTObject::name>("title"),

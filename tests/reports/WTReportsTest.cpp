@@ -355,7 +355,8 @@ TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
 }
 
 // Three amounts of 138.465 bill 138.47 each: the built-in template's lines add up to its subtotal and
-// total (415.41) at every level, where the exact sum rounded once said 415.40. Its head names both sides.
+// total (415.41) at every level, where the exact sum rounded once said 415.40. Its head names both sides;
+// a budget's line is the whole record's, in a period too.
 TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides) {
   auto* billed = WTProject::insertNewObject(context.get());
   billed->setName(QStringLiteral("Billed"));
@@ -364,7 +365,9 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
     WTTask* task = makeTask(billed, QStringLiteral("Task %1").arg(month));
     task->setRate(dec("92.31"));
     makeTime(task, berlin(2024, month, 5, 9), berlin(2024, month, 5, 10, 30));
+    if (month == 1) task->setBudget(dec("100"));
   }
+  billed->setBudget(dec("500"));
   defaults->setValue(QStringLiteral("WTBillingName"), QStringLiteral("Ann <Smith>"));
   defaults->setValue(QStringLiteral("WTBillingAddress"), QStringLiteral("Main St 1\n12345 Town"));
   defaults->setValue(QStringLiteral("WTBillingPaymentTerms"), QStringLiteral("Due in 30 days"));
@@ -398,9 +401,14 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
             << mode << kind;
     }
   }
-  for (const char* text : {"<b>Ann &lt;Smith&gt;</b>", ">Main St 1\n12345 Town</p>",
-                           "<b>Acme</b>\n1 Acme Way\nSpringfield</p>", ">Due in 30 days</p>", ">92.31</td>"})
+  for (const char* text :
+       {"<b>Ann &lt;Smith&gt;</b>", ">Main St 1\n12345 Town</p>", "<b>Acme</b>\n1 Acme Way\nSpringfield</p>",
+        ">Due in 30 days</p>", ">92.31</td>", ">Budget: 83 % of the budget of 500.00 · 84.59 left</td>"})
     EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
+  // Task 1 is outside the period: its budget's line shows in the report over every date.
+  html = WTReportGenerator({billed}, 0).render().html;
+  EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 138 % of the budget of 100.00 · 38.47 over</td>")))
+      << html.toStdString();
 }
 
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
