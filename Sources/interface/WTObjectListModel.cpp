@@ -12,39 +12,6 @@
 
 namespace {
 
-int durationOf(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Client:
-      return static_cast<const WTClient*>(object)->duration();
-    case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->duration();
-    default:
-      return 0;
-  }
-}
-
-Decimal costOf(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Client:
-      return static_cast<const WTClient*>(object)->cost();
-    case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->cost();
-    default:
-      return Decimal();
-  }
-}
-
-QString currencyOf(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Client:
-      return static_cast<const WTClient*>(object)->billingCurrency();
-    case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->billingCurrency();
-    default:
-      return {};
-  }
-}
-
 QString imageOf(const WTObject* object) {
   switch (object->entity()) {
     case WTEntity::Client:
@@ -230,9 +197,10 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
       }
       return {};
     case DurationTextRole:
-      return DurationText::stringWithMinutes(durationOf(object));
+      return DurationText::stringWithMinutes(static_cast<const WTBillingRecord*>(object)->duration());
     case CostTextRole:
-      return MoneyFormat::format(costOf(object), currencyOf(object));
+      return MoneyFormat::format(static_cast<const WTBillingRecord*>(object)->cost(),
+                                 static_cast<const WTBillingRecord*>(object)->billingCurrency());
     case ImageRole:
       return imageOf(object);
     case ArchivedRole:

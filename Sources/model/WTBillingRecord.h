@@ -23,6 +23,14 @@ class WTBillingRecord : public WTObject {
   // What the record inherits while it sets nothing itself: its owner's rule, else the preferences'.
   virtual WTRoundingRule roundingRuleFromAbove() const;
 
+  // The sums over the items under the record: raw minutes and cost, and what is billed of them (each
+  // item's billed amount rounded once, in the currency of the record's client, else the preferences').
+  virtual int duration() const = 0;
+  virtual Decimal cost() const = 0;
+  virtual QString billingCurrency() const = 0;
+  virtual int billedDuration() const = 0;
+  virtual Decimal billedCost() const = 0;
+
  protected:
   using WTObject::WTObject;
   // objectKeys() and the rule's stored keys; "roundingRule" depends on the record's own keys, and a

@@ -41,14 +41,8 @@ std::optional<double> fraction(const Decimal& billed, const std::optional<Decima
 }
 
 Decimal billed(const WTObject* object) {
-  switch (object->entity()) {
-    case WTEntity::Task:
-      return static_cast<const WTTask*>(object)->billedCost();
-    case WTEntity::Project:
-      return static_cast<const WTProject*>(object)->billedCost();
-    default:
-      return Decimal();
-  }
+  const bool budgeted = object->entity() == WTEntity::Task || object->entity() == WTEntity::Project;
+  return budgeted ? static_cast<const WTBillingRecord*>(object)->billedCost() : Decimal();
 }
 
 std::optional<Decimal> budget(const WTObject* object) {
@@ -62,15 +56,6 @@ std::optional<Decimal> budget(const WTObject* object) {
   }
 }
 
-namespace {
-
-QString currencyOf(const WTObject* object) {
-  if (object->entity() == WTEntity::Task) return static_cast<const WTTask*>(object)->billingCurrency();
-  return static_cast<const WTProject*>(object)->billingCurrency();
-}
-
-}  // namespace
-
 QString standing(const WTObject* object) {
   const std::optional<Decimal> limit = budget(object);
   const Decimal spent = billed(object);
@@ -79,7 +64,7 @@ QString standing(const WTObject* object) {
   // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached.
   const QString percent = QLocale().toString(qint64(std::floor(*share * 100.0)));
   const Decimal left = *limit - spent;
-  const QString currency = currencyOf(object);
+  const QString currency = static_cast<const WTBillingRecord*>(object)->billingCurrency();
   const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left, currency))
                                          : QObject::tr("%1 left").arg(MoneyFormat::format(left, currency));
   return QObject::tr("%1 % of the budget of %2 · %3")

@@ -28,10 +28,10 @@ class WTClient final : public WTBillingRecord {
   void setAddress(const QString& address);
 
   // `currency`, else the preferences'.
-  QString billingCurrency() const;
+  QString billingCurrency() const override;
   // The sums of its projects' billed minutes and billed costs.
-  int billedDuration() const;
-  Decimal billedCost() const;
+  int billedDuration() const override;
+  Decimal billedCost() const override;
   // Announces the client's billed figures (a project's or task's rule changed).
   void billingDidChange();
 
@@ -40,8 +40,8 @@ class WTClient final : public WTBillingRecord {
   // What a client bills without a rate of its own while the user has set no default: 100.
   static Decimal builtInRate() { return Decimal(100); }
 
-  int duration() const;
-  Decimal cost() const;
+  int duration() const override;
+  Decimal cost() const override;
   void durationDidChange();
   void costDidChange();
 

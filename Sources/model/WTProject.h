@@ -30,8 +30,8 @@ class WTProject final : public WTBillingRecord {
   // What a project without a client bills, with no rate of its own and no default set: 50.
   static Decimal builtInRate() { return Decimal(50); }
 
-  int duration() const;
-  Decimal cost() const;
+  int duration() const override;
+  Decimal cost() const override;
   void durationDidChange();
   void costDidChange();
 
@@ -42,10 +42,10 @@ class WTProject final : public WTBillingRecord {
   // Its client's rule; the preferences' without a client.
   WTRoundingRule roundingRuleFromAbove() const override;
   // The client's billing currency; the preferences' without a client.
-  QString billingCurrency() const;
+  QString billingCurrency() const override;
   // The sums of its tasks' billed minutes and billed costs.
-  int billedDuration() const;
-  Decimal billedCost() const;
+  int billedDuration() const override;
+  Decimal billedCost() const override;
   // Announces the billed figures of the project and its client (a task's rule changed).
   void billingDidChange();
 

@@ -32,7 +32,7 @@ class WTTask final : public WTBillingRecord {
   // Its project's rule; the preferences' without a project.
   WTRoundingRule roundingRuleFromAbove() const override;
   // The project's billing currency; the preferences' without a project.
-  QString billingCurrency() const;
+  QString billingCurrency() const override;
 
   // Every item of the task, of every kind, in no particular order.
   const QList<WTItem*>& items() const { return items_; }
@@ -48,11 +48,11 @@ class WTTask final : public WTBillingRecord {
   // What a task without a project bills, with no rate of its own and no default set: 75.
   static Decimal builtInRate() { return Decimal(75); }
 
-  int duration() const;
-  Decimal cost() const;
+  int duration() const override;
+  Decimal cost() const override;
   // The sums of the items' billed minutes and billed costs (see WTItem::billedCost).
-  int billedDuration() const;
-  Decimal billedCost() const;
+  int billedDuration() const override;
+  Decimal billedCost() const override;
 
   // While one lives, each task's duration and cost are worked out once and then remembered. For a
   // report, which reads every task's totals again for its project's subtotal and for the grand total, and
