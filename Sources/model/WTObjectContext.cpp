@@ -14,6 +14,7 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <QMetaMethod>
 #include <QMetaObject>
 
 #include <algorithm>
@@ -388,15 +389,26 @@ Result<void> WTObjectContext::save() {
   }
 
   // A project whose task order changed rewrites the positions of all its tasks.
-  std::unordered_set<WTObject*> rows(written.begin(), written.end());
-  for (WTObject* object : written) {
+  std::vector<WTObject*> rows = std::move(written);
+  std::unordered_set<WTObject*> reordered;
+  for (size_t i = 0, changed = rows.size(); i < changed; ++i) {
+    WTObject* object = rows[i];
     if (object->entity() != WTEntity::Project || !object->changedKeys_.contains(QLatin1String("tasks")))
       continue;
-    for (WTTask* task : static_cast<WTProject*>(object)->tasks()) rows.insert(task);
+    for (WTTask* task : static_cast<WTProject*>(object)->tasks()) {
+      if (!inserted_.count(task) && !updated_.count(task) && reordered.insert(task).second)
+        rows.push_back(task);
+    }
   }
-  std::vector<WTStoreRecord> records(rows.size());
-  size_t index = 0;
-  for (WTObject* object : rows) object->writeRecord(records[index++]);
+  // One row at a time: a save of many records never holds all their rows at once.
+  auto next = rows.begin();
+  WTStoreRecord record;
+  const WTStore::RecordSource records = [&]() -> const WTStoreRecord* {
+    if (next == rows.end()) return nullptr;
+    record = WTStoreRecord();
+    (*next++)->writeRecord(record);
+    return &record;
+  };
 
   QStringList deletedUuids;
   if (!deleted_.empty()) indexItems();
@@ -519,6 +531,9 @@ void WTObjectContext::removeObserver(ObserverId id) {
 }
 
 void WTObjectContext::announce(WTObject* object, const QString& key) {
+  // Nobody to tell (a command, an import of many records): the dependent keys need not be found.
+  static const QMetaMethod valueDidChange = QMetaMethod::fromSignal(&WTObjectContext::objectValueDidChange);
+  if (observers_.isEmpty() && !isSignalConnected(valueDidChange)) return;
   std::vector<std::pair<WTObject*, QString>> seen;
   announceClosure(object, key, seen);
 }
