@@ -381,13 +381,6 @@ Result<void> WTObjectContext::save() {
         return Error{2, tr("A %1 without identity cannot be saved.").arg(object->entityName())};
     }
   }
-  // The journal that records nothing is not worth the changed values of every record (a merge saves
-  // thousands with it).
-  if (journal_ != &nullJournal_) {
-    for (WTObject* object : written) object->willSave();
-    for (WTObject* object : deleted_) object->willSave();
-  }
-
   // A project whose task order changed rewrites the positions of all its tasks.
   std::vector<WTObject*> rows = std::move(written);
   std::unordered_set<WTObject*> reordered;
@@ -419,6 +412,15 @@ Result<void> WTObjectContext::save() {
 
   Result<void> result = store_->save(records, deletedUuids);
   if (!result) return result;
+  // Told once the rows are in the file, so that a large save never holds its rows' cache and the
+  // journal's copy of every value at once. The journal that records nothing is not worth the changed
+  // values of every record (a merge saves thousands with it).
+  if (journal_ != &nullJournal_) {
+    for (WTObject* object : rows) {
+      if (!reordered.count(object)) object->willSave();
+    }
+    for (WTObject* object : deleted_) object->willSave();
+  }
 
   for (WTObject* object : rows) {
     object->persisted_ = true;

@@ -490,7 +490,12 @@ Result<void> WTStore::save(const RecordSource& records, const QStringList& delet
   // The statements must not keep pointers into the caller's records.
   sqlite3_clear_bindings(replace_);
   sqlite3_clear_bindings(remove_);
-  if (!nameless && code == SQLITE_OK) return {};
+  if (!nameless && code == SQLITE_OK) {
+    // What the save wrote is in the file and its log now: the cache a large save filled goes back, and
+    // the next save reads the pages it needs through the map.
+    sqlite3_db_release_memory(db_);
+    return {};
+  }
   // Some errors end the transaction by themselves; whatever is left of it is undone.
   if (!sqlite3_get_autocommit(db_)) stepOnce(rollback_);
   if (nameless) return namelessError();

@@ -152,6 +152,25 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
     out.append("null");
     return;
   }
+  if (value.metaType() == QMetaType::fromType<ObjectOfObjects>()) {
+    const QMap<QString, QVariantMap>& members = *value.value<ObjectOfObjects>().members;
+    if (members.isEmpty()) {
+      out.append("{}");
+      return;
+    }
+    out.append('{');
+    for (auto it = members.begin(); it != members.end(); ++it) {
+      if (it != members.begin()) out.append(',');
+      newline(out, style, depth + 1);
+      writeString(out, it.key());
+      out.append(style == Style::Pretty ? ": " : ":");
+      writeValue(out, QVariant(it.value()), style, depth + 1, spill);
+      if (spill && out.size() >= kSpillBytes) (*spill)(out);
+    }
+    newline(out, style, depth);
+    out.append('}');
+    return;
+  }
   if (value.metaType() == QMetaType::fromType<Decimal>()) {
     out.append(value.value<Decimal>().toString().toLatin1());
     return;

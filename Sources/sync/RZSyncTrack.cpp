@@ -122,7 +122,11 @@ void RZSyncTrack::load(const QString& path) {
 Result<void> RZSyncTrack::writeToFile(const QString& path) const {
   QVariantMap top;
   top.insert(QStringLiteral("iteration"), iteration_);
-  top.insert(QStringLiteral("track"), dictionary());
+  // The sections as they are, not copied: the same text as dictionary() gives.
+  top.insert(QStringLiteral("track"),
+             QVariantMap{{kInserted, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&inserted_})},
+                         {kUpdated, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&updated_})},
+                         {kDeleted, QVariant(deleted_)}});
 
   const QByteArray target = QFile::encodeName(path);
   QByteArray temporary = target + ".XXXXXX";
