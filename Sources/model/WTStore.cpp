@@ -452,8 +452,8 @@ Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStr
                   [](const WTStoreRecord& record) { return record.uuid.isEmpty(); }))
     return namelessError();
   auto next = records.begin();
-  return save([&]() -> const WTStoreRecord* { return next == records.end() ? nullptr : &*next++; },
-              deletedUuids);
+  return saveFrom([&]() -> const WTStoreRecord* { return next == records.end() ? nullptr : &*next++; },
+                  deletedUuids);
 }
 
 Error WTStore::namelessError() const {
@@ -461,7 +461,7 @@ Error WTStore::namelessError() const {
                tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
 }
 
-Result<void> WTStore::save(const RecordSource& records, const QStringList& deletedUuids) {
+Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& deletedUuids) {
   // Deleting "" would silently remove nothing.
   if (deletedUuids.contains(QString())) return namelessError();
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();

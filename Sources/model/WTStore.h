@@ -88,7 +88,7 @@ class WTStore {
   // The same, with the records handed out one at a time (none: no more), each valid until the next is
   // asked for: a save of many records never holds all their rows at once.
   using RecordSource = std::function<const WTStoreRecord*()>;
-  Result<void> save(const RecordSource& records, const QStringList& deletedUuids);
+  Result<void> saveFrom(const RecordSource& records, const QStringList& deletedUuids);
 
  private:
   WTStore(QString path, sqlite3* db);
