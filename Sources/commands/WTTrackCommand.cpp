@@ -89,14 +89,16 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   WTObjectContext context(&defaults);
   const Result<void> loaded = context.attachStore(std::move(store.value()), which, tasks);
   if (!loaded) return failure(err, loaded.error().message);
-  const QString journalFile = WTStoreSetup::syncJournalPath();
-  RZSyncTrack journal(journalFile);
-  context.setChangeJournal(&journal);
   // Nothing here is ever undone: an import of many entries would only hold every step in memory.
   context.undoManager().disableRegistration();
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {
+    // Only a save reports to the journal: a command that changes nothing (an import of what is there
+    // already) never reads it.
+    const QString journalFile = WTStoreSetup::syncJournalPath();
+    RZSyncTrack journal(journalFile);
+    context.setChangeJournal(&journal);
     const Result<void> saved = context.save();
     context.setChangeJournal(nullptr);
     if (!saved) return failure(err, saved.error().message);

@@ -13,8 +13,10 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <QRandomGenerator>
 #include <QUuid>
 
+#include <array>
 #include <type_traits>
 
 namespace {
@@ -323,7 +325,14 @@ void WTObject::awakeFromInsert() {
 
 void WTObject::assignNewIdentity() {
   // The entity can be read back from the identity.
-  const QString unique = QUuid::createUuid().toString(QUuid::WithoutBraces).toUpper();
+  // A random (version 4) UUID from the securely seeded generator: the system's own is asked once per
+  // identity otherwise, and an import makes a hundred thousand.
+  std::array<quint32, 4> words;
+  QRandomGenerator::global()->fillRange(words.data(), qsizetype(words.size()));
+  QByteArray bytes(reinterpret_cast<const char*>(words.data()), sizeof(words));
+  bytes[6] = char((bytes[6] & 0x0f) | 0x40);
+  bytes[8] = char((bytes[8] & 0x3f) | 0x80);
+  const QString unique = QUuid::fromRfc4122(bytes).toString(QUuid::WithoutBraces).toUpper();
   setUuid(unique + u'@' + entityName());
 }
 

@@ -14,6 +14,7 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <QMetaMethod>
 #include <QMetaObject>
 
 #include <algorithm>
@@ -380,23 +381,27 @@ Result<void> WTObjectContext::save() {
         return Error{2, tr("A %1 without identity cannot be saved.").arg(object->entityName())};
     }
   }
-  // The journal that records nothing is not worth the changed values of every record (a merge saves
-  // thousands with it).
-  if (journal_ != &nullJournal_) {
-    for (WTObject* object : written) object->willSave();
-    for (WTObject* object : deleted_) object->willSave();
-  }
-
   // A project whose task order changed rewrites the positions of all its tasks.
-  std::unordered_set<WTObject*> rows(written.begin(), written.end());
-  for (WTObject* object : written) {
+  std::vector<WTObject*> rows = std::move(written);
+  std::unordered_set<WTObject*> reordered;
+  for (size_t i = 0, changed = rows.size(); i < changed; ++i) {
+    WTObject* object = rows[i];
     if (object->entity() != WTEntity::Project || !object->changedKeys_.contains(QLatin1String("tasks")))
       continue;
-    for (WTTask* task : static_cast<WTProject*>(object)->tasks()) rows.insert(task);
+    for (WTTask* task : static_cast<WTProject*>(object)->tasks()) {
+      if (!inserted_.count(task) && !updated_.count(task) && reordered.insert(task).second)
+        rows.push_back(task);
+    }
   }
-  std::vector<WTStoreRecord> records(rows.size());
-  size_t index = 0;
-  for (WTObject* object : rows) object->writeRecord(records[index++]);
+  // One row at a time: a save of many records never holds all their rows at once.
+  auto next = rows.begin();
+  WTStoreRecord record;
+  const WTStore::RecordSource records = [&]() -> const WTStoreRecord* {
+    if (next == rows.end()) return nullptr;
+    record = WTStoreRecord();
+    (*next++)->writeRecord(record);
+    return &record;
+  };
 
   QStringList deletedUuids;
   if (!deleted_.empty()) indexItems();
@@ -405,16 +410,22 @@ Result<void> WTObjectContext::save() {
     if (!byUuid_.contains(object->uuid_)) deletedUuids.append(object->uuid_);
   }
 
-  Result<void> result = store_->save(records, deletedUuids);
+  Result<void> result = store_->saveFrom(records, deletedUuids);
   if (!result) return result;
-
+  // Told once the rows are in the file, so that a large save never holds its rows' cache and the
+  // journal's copy of every value at once. The journal that records nothing is not worth the changed
+  // values of every record (a merge saves thousands with it).
+  // Each record's changed keys go as soon as the journal has its values.
+  const bool journaled = journal_ != &nullJournal_;
   for (WTObject* object : rows) {
+    if (journaled && !reordered.count(object)) object->willSave();
     object->persisted_ = true;
-    object->changedKeys_.clear();
+    object->changedKeys_ = QStringList();
   }
   for (WTObject* object : deleted_) {
+    if (journaled) object->willSave();
     object->persisted_ = false;
-    object->changedKeys_.clear();
+    object->changedKeys_ = QStringList();
   }
   inserted_.clear();
   updated_.clear();
@@ -519,6 +530,9 @@ void WTObjectContext::removeObserver(ObserverId id) {
 }
 
 void WTObjectContext::announce(WTObject* object, const QString& key) {
+  // Nobody to tell (a command, an import of many records): the dependent keys need not be found.
+  static const QMetaMethod valueDidChange = QMetaMethod::fromSignal(&WTObjectContext::objectValueDidChange);
+  if (observers_.isEmpty() && !isSignalConnected(valueDidChange)) return;
   std::vector<std::pair<WTObject*, QString>> seen;
   announceClosure(object, key, seen);
 }

@@ -23,7 +23,7 @@ class UserDefaults;
 
 // The one object graph of the application: every record lives here, in memory, found by identity. A
 // store file (WTStore) mirrors it; save() writes what changed since the last save in one transaction
-// and reports each record to the change journal on the way.
+// and then reports each record to the change journal.
 //
 // Changes are announced synchronously to observers of (record, key), with every key that depends on the
 // changed one, and once per event-loop turn as objectsDidChange (which also closes the undo group).
@@ -101,8 +101,9 @@ class WTObjectContext : public QObject {
 
   // Saving.
   bool hasChanges() const;
-  // Writes every change since the last save in one transaction, reporting each record to the journal.
-  // On failure nothing is forgotten: the changes stay and the next save tries again.
+  // Writes every change since the last save in one transaction, then reports each record to the journal.
+  // On failure nothing is forgotten and nothing is journaled: the changes stay and the next save tries
+  // again.
   Result<void> save();
 
   // Undo and redo of whole event-loop turns.

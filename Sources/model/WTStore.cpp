@@ -446,33 +446,58 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, 
 }
 
 Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids) {
-  // A row without identity could never be found, replaced or removed again, and deleting "" would
-  // silently remove nothing: refuse the whole save before the file is touched.
-  const bool nameless = deletedUuids.contains(QString()) ||
-                        std::any_of(records.begin(), records.end(),
-                                    [](const WTStoreRecord& record) { return record.uuid.isEmpty(); });
-  if (nameless)
-    return Error{WriteFailed,
-                 tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
+  // A row without identity could never be found, replaced or removed again: refuse the whole save
+  // before the file is touched.
+  if (std::any_of(records.begin(), records.end(),
+                  [](const WTStoreRecord& record) { return record.uuid.isEmpty(); }))
+    return namelessError();
+  auto next = records.begin();
+  return saveFrom([&]() -> const WTStoreRecord* { return next == records.end() ? nullptr : &*next++; },
+                  deletedUuids);
+}
+
+Error WTStore::namelessError() const {
+  return Error{WriteFailed,
+               tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
+}
+
+Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& deletedUuids) {
+  // Deleting "" would silently remove nothing.
+  if (deletedUuids.contains(QString())) return namelessError();
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();
   if (damaged_)
     return Error{Damaged, tr("The data file “%1” is damaged; nothing was written to it.").arg(path_)};
   if (!begin_) return writeError(SQLITE_READONLY);  // opened for reading
   int code = stepOnce(begin_);
-  for (auto record = records.begin(); code == SQLITE_OK && record != records.end(); ++record) {
+  bool nameless = false;
+  while (code == SQLITE_OK) {
+    const WTStoreRecord* record = records();
+    if (!record) break;
+    // Found on the way: the transaction is undone below, and the file stays as it was.
+    if (record->uuid.isEmpty()) {
+      nameless = true;
+      break;
+    }
     code = WTStoreRows::bindRecord(replace_, *record);
     if (code == SQLITE_OK) code = stepOnce(replace_);
   }
-  for (auto uuid = deletedUuids.begin(); code == SQLITE_OK && uuid != deletedUuids.end(); ++uuid) {
+  for (auto uuid = deletedUuids.begin(); !nameless && code == SQLITE_OK && uuid != deletedUuids.end();
+       ++uuid) {
     code = WTStoreRows::bindString(remove_, WTStoreRows::kUuid, *uuid);
     if (code == SQLITE_OK) code = stepOnce(remove_);
   }
-  if (code == SQLITE_OK) code = stepOnce(commit_);
+  if (!nameless && code == SQLITE_OK) code = stepOnce(commit_);
   // The statements must not keep pointers into the caller's records.
   sqlite3_clear_bindings(replace_);
   sqlite3_clear_bindings(remove_);
-  if (code == SQLITE_OK) return {};
+  if (!nameless && code == SQLITE_OK) {
+    // What the save wrote is in the file and its log now: the cache a large save filled goes back, and
+    // the next save reads the pages it needs through the map.
+    sqlite3_db_release_memory(db_);
+    return {};
+  }
   // Some errors end the transaction by themselves; whatever is left of it is undone.
   if (!sqlite3_get_autocommit(db_)) stepOnce(rollback_);
+  if (nameless) return namelessError();
   return writeError(code);
 }

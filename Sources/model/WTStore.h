@@ -85,12 +85,17 @@ class WTStore {
   // Writes the given records (inserted or replaced whole) and removes the deleted ones, all in one
   // transaction: after a failure nothing of this save is in the file and the store stays usable.
   Result<void> save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids);
+  // The same, with the records handed out one at a time (none: no more), each valid until the next is
+  // asked for: a save of many records never holds all their rows at once.
+  using RecordSource = std::function<const WTStoreRecord*()>;
+  Result<void> saveFrom(const RecordSource& records, const QStringList& deletedUuids);
 
  private:
   WTStore(QString path, sqlite3* db);
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly, Check check);
   Result<void> prepareStatements(bool writing);
   Error writeError(int code) const;
+  Error namelessError() const;
 
   QString path_;
   sqlite3* db_ = nullptr;

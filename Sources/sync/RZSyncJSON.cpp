@@ -97,9 +97,15 @@ void writeString(QByteArray& out, const QString& text) {
   static const char kHex[] = "0123456789abcdef";
   const QByteArray utf8 = text.toUtf8();
   out.append('"');
-  for (const char c : utf8) {
-    const auto byte = static_cast<unsigned char>(c);
-    switch (c) {
+  // Runs of bytes that need no escape go in whole: most text is nothing but such a run.
+  const char* run = utf8.constData();
+  const char* const end = run + utf8.size();
+  for (const char* at = run; at != end; ++at) {
+    const auto byte = static_cast<unsigned char>(*at);
+    if (byte >= 0x20 && byte != 0x7f && byte != '"' && byte != '\\') continue;
+    out.append(run, at - run);
+    run = at + 1;
+    switch (*at) {
       case '"':
         out.append("\\\"");
         break;
@@ -122,27 +128,47 @@ void writeString(QByteArray& out, const QString& text) {
         out.append("\\f");
         break;
       default:
-        if (byte < 0x20 || byte == 0x7f) {
-          out.append("\\u00");
-          out.append(kHex[byte >> 4]);
-          out.append(kHex[byte & 0xf]);
-        } else {
-          out.append(c);
-        }
+        out.append("\\u00");
+        out.append(kHex[byte >> 4]);
+        out.append(kHex[byte & 0xf]);
     }
   }
+  out.append(run, end - run);
   out.append('"');
 }
 
 void newline(QByteArray& out, Style style, int depth) {
   if (style == Style::Compact) return;
   out.append('\n');
-  out.append(QByteArray(depth * 2, ' '));
+  out.append(qsizetype(depth) * 2, ' ');
 }
 
-void writeValue(QByteArray& out, const QVariant& value, Style style, int depth) {
+// Hands what is written so far on once it has grown past this, between two members of a container.
+constexpr qsizetype kSpillBytes = 1 << 20;
+
+void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
+                const Spill* spill = nullptr) {
   if (!value.isValid() || value.isNull()) {
     out.append("null");
+    return;
+  }
+  if (value.metaType() == QMetaType::fromType<ObjectOfObjects>()) {
+    const QMap<QString, QVariantMap>& members = *value.value<ObjectOfObjects>().members;
+    if (members.isEmpty()) {
+      out.append("{}");
+      return;
+    }
+    out.append('{');
+    for (auto it = members.begin(); it != members.end(); ++it) {
+      if (it != members.begin()) out.append(',');
+      newline(out, style, depth + 1);
+      writeString(out, it.key());
+      out.append(style == Style::Pretty ? ": " : ":");
+      writeValue(out, QVariant(it.value()), style, depth + 1, spill);
+      if (spill && out.size() >= kSpillBytes) (*spill)(out);
+    }
+    newline(out, style, depth);
+    out.append('}');
     return;
   }
   if (value.metaType() == QMetaType::fromType<Decimal>()) {
@@ -170,7 +196,8 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth) 
         newline(out, style, depth + 1);
         writeString(out, it.key());
         out.append(style == Style::Pretty ? ": " : ":");
-        writeValue(out, it.value(), style, depth + 1);
+        writeValue(out, it.value(), style, depth + 1, spill);
+        if (spill && out.size() >= kSpillBytes) (*spill)(out);
       }
       newline(out, style, depth);
       out.append('}');
@@ -189,7 +216,8 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth) 
         if (!first) out.append(',');
         first = false;
         newline(out, style, depth + 1);
-        writeValue(out, element, style, depth + 1);
+        writeValue(out, element, style, depth + 1, spill);
+        if (spill && out.size() >= kSpillBytes) (*spill)(out);
       }
       newline(out, style, depth);
       out.append(']');
@@ -247,6 +275,13 @@ QByteArray write(const QVariant& value, Style style) {
   QByteArray out;
   writeValue(out, value, style, 0);
   return out;
+}
+
+void write(const QVariant& value, Style style, const Spill& spill) {
+  QByteArray out;
+  out.reserve(kSpillBytes + kSpillBytes / 4);
+  writeValue(out, value, style, 0, &spill);
+  spill(out);
 }
 
 bool sameValue(const QVariant& a, const QVariant& b) {

@@ -2,9 +2,11 @@
 
 #include <QByteArray>
 #include <QByteArrayView>
+#include <QMap>
 #include <QString>
 #include <QVariant>
 
+#include <functional>
 #include <optional>
 
 // JSON for the change journal and the sync protocol, exact for money: a number with a fraction or an
@@ -33,6 +35,16 @@ enum class Style {
 // double (through its shortest decimal text; NaN and infinities become null). Any other type is
 // written as its text when it converts to one, else as null.
 QByteArray write(const QVariant& value, Style style = Style::Pretty);
+// An object of objects written in place, as the QVariantMap holding the same would be (a journal's
+// sections are not copied into one to be written).
+struct ObjectOfObjects {
+  const QMap<QString, QVariantMap>* members = nullptr;
+};
+
+// The same text handed to `spill` piece by piece as it is written (a large journal never lies in memory
+// whole): each call takes what the buffer holds and leaves it empty.
+using Spill = std::function<void(QByteArray& bytes)>;
+void write(const QVariant& value, Style style, const Spill& spill);
 
 // Whether two values are the same JSON text (so 12.30 and 12.3 differ, as a server would see them).
 bool sameValue(const QVariant& a, const QVariant& b);
@@ -41,3 +53,5 @@ bool sameValue(const QVariant& a, const QVariant& b);
 bool isContainer(const QVariant& value);
 
 }  // namespace RZSyncJSON
+
+Q_DECLARE_METATYPE(RZSyncJSON::ObjectOfObjects)

@@ -122,8 +122,11 @@ void RZSyncTrack::load(const QString& path) {
 Result<void> RZSyncTrack::writeToFile(const QString& path) const {
   QVariantMap top;
   top.insert(QStringLiteral("iteration"), iteration_);
-  top.insert(QStringLiteral("track"), dictionary());
-  const QByteArray bytes = RZSyncJSON::write(top, RZSyncJSON::Style::Pretty) + '\n';
+  // The sections as they are, not copied: the same text as dictionary() gives.
+  top.insert(QStringLiteral("track"),
+             QVariantMap{{kInserted, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&inserted_})},
+                         {kUpdated, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&updated_})},
+                         {kDeleted, QVariant(deleted_)}});
 
   const QByteArray target = QFile::encodeName(path);
   QByteArray temporary = target + ".XXXXXX";
@@ -135,13 +138,22 @@ Result<void> RZSyncTrack::writeToFile(const QString& path) const {
     ::unlink(temporary.constData());
     return error;
   };
-  qsizetype written = 0;
-  while (written < bytes.size()) {
-    const ssize_t n = ::write(fd, bytes.constData() + written, size_t(bytes.size() - written));
-    if (n < 0 && errno == EINTR) continue;
-    if (n <= 0) return fail(QStringLiteral("Cannot write"));
-    written += n;
-  }
+  // Written as it is made: a journal of many changes never lies in memory twice, as values and as text.
+  bool failed = false;
+  auto writeOut = [&](QByteArray& bytes) {
+    qsizetype written = 0;
+    while (!failed && written < bytes.size()) {
+      const ssize_t n = ::write(fd, bytes.constData() + written, size_t(bytes.size() - written));
+      if (n < 0 && errno == EINTR) continue;
+      if (n <= 0) failed = true;
+      written += n;
+    }
+    bytes.resize(0);  // the room stays for the next piece
+  };
+  RZSyncJSON::write(top, RZSyncJSON::Style::Pretty, writeOut);
+  QByteArray end("\n");
+  writeOut(end);
+  if (failed) return fail(QStringLiteral("Cannot write"));
   // The data must be on disk before the name points at it, or a crash could leave an empty journal.
   if (::fsync(fd) != 0) return fail(QStringLiteral("Cannot sync"));
   if (::close(fd) != 0) {
@@ -210,13 +222,16 @@ void RZSyncTrack::updateValues(const QVariantMap& values, const QString& uuid) {
 }
 
 void RZSyncTrack::insertValues(const QVariantMap& values, const QString& uuid) {
-  QVariantMap logged;
-  for (auto it = values.begin(); it != values.end(); ++it)
-    if (std::optional<QVariant> transformed = transformedValue(it.value()))
-      logged.insert(it.key(), *transformed);
-  qCDebug(lcSync).noquote() << QStringLiteral("INSERT(%1) %2")
-                                   .arg(uuid, QString::fromUtf8(
-                                                  RZSyncJSON::write(logged, RZSyncJSON::Style::Compact)));
+  // Only when the log is shown: an import reports thousands of records here.
+  if (lcSync().isDebugEnabled()) {
+    QVariantMap logged;
+    for (auto it = values.begin(); it != values.end(); ++it)
+      if (std::optional<QVariant> transformed = transformedValue(it.value()))
+        logged.insert(it.key(), *transformed);
+    qCDebug(lcSync).noquote() << QStringLiteral("INSERT(%1) %2")
+                                     .arg(uuid, QString::fromUtf8(
+                                                    RZSyncJSON::write(logged, RZSyncJSON::Style::Compact)));
+  }
   updateValues(values, uuid, Section::Inserted);
 }
 

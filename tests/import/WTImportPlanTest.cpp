@@ -1,4 +1,5 @@
 #include "ModelFixture.h"
+#include "WTCSVExport.h"
 #include "WTImportPlan.h"
 
 #include <QBuffer>
@@ -89,6 +90,68 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
 
   WTImport::apply(*context, file, {.stopRunning = true});
   EXPECT_FALSE(context->hasChanges());
+}
+
+// Tessal's spreadsheet of a store, imported into an empty store, gives the same entries: names and notes
+// with commas, quotes and line breaks, a project without client, an entry past midnight.
+TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries) {
+  auto* client = WTClient::insertNewObject(context.get());
+  client->setName(QStringLiteral("ACME, \"West\""));
+  auto* site = WTProject::insertNewObject(context.get());
+  site->setName(QStringLiteral("Site; new"));
+  site->setClient(client);
+  auto* lone = WTProject::insertNewObject(context.get());
+  lone->setName(QStringLiteral("Internal"));
+  const QTimeZone zone("Europe/Berlin");
+  const struct {
+    WTTask* task;
+    const char* name;
+    const char* notes;
+    QDateTime start;
+    int minutes;
+  } entries[] = {
+      {makeTask(site, QStringLiteral("design")), "Header, \"hero\"", "",
+       QDateTime(QDate(2024, 3, 9), QTime(9, 0), zone), 90},
+      {site->tasks().first(), "Call\nwith client", "line one\nline, two",
+       QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 45},
+      {makeTask(lone, QStringLiteral("admin")), "Invoices", "",
+       QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
+  };
+  for (const auto& entry : entries) {
+    auto* time = WTTime::insertNewObject(context.get());
+    time->setTask(entry.task);
+    time->setName(QString::fromUtf8(entry.name));
+    if (*entry.notes) time->setNotes(QString::fromUtf8(entry.notes));
+    time->setStartDate(Date::fromQDateTime(entry.start));
+    time->setEndDate(Date::fromQDateTime(entry.start.addSecs(entry.minutes * 60)));
+  }
+  const auto entriesOf = [](const WTObjectContext& records) {
+    QStringList found;
+    for (const WTTime* time : records.fetch<WTTime>()) {
+      const WTProject* project = time->task()->project();
+      found.append(QStringList{project->client() ? project->client()->name() : QString(), project->name(),
+                               time->task()->name(), time->name(), time->notes(),
+                               QString::number(qint64(time->startDate()->secondsSince1970())),
+                               QString::number(qint64(time->endDate()->secondsSince1970()))}
+                       .join(u'|'));
+    }
+    found.sort();
+    return found.join(u'\n').toStdString();
+  };
+  QList<WTItem*> items;
+  for (WTTime* time : context->fetch<WTTime>()) items.append(time);
+  QByteArray exported = WTCSVExport::spreadsheetCSV(items).toUtf8();
+  QBuffer buffer(&exported);
+  buffer.open(QIODevice::ReadOnly);
+  const WTImportFile file = read(buffer);
+  EXPECT_EQ(file.format, QStringLiteral("tessal"));
+
+  WTObjectContext empty(defaults.get());
+  auto store = WTStore::open(dir.filePath(QStringLiteral("empty.sqlite")));
+  ASSERT_TRUE(store.ok() && empty.attachStore(std::move(store.value())).ok());
+  WTImport::apply(empty, file, {});
+  ASSERT_TRUE(empty.save().ok());
+  EXPECT_EQ(entriesOf(empty), entriesOf(*context));
 }
 
 // Each rate lands on the highest level across which the file keeps it, and nowhere it would be inherited
