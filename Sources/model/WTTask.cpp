@@ -4,8 +4,8 @@
 #include "RZDate.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
-#include "WTItemContainer.h"
 #include "WTBudget.h"
+#include "WTItemContainer.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTStoreRecord.h"
@@ -161,6 +161,18 @@ namespace {
 
 WTTask::TotalsMemo* gTotalsMemo = nullptr;
 
+// A task's total from the memo while one is in force (and `compute`d into it once), else computed.
+template <class Value, class Compute>
+Value remembered(QHash<const WTTask*, Value> WTTask::TotalsMemo::*table, const WTTask* task,
+                 Compute compute) {
+  if (!gTotalsMemo) return compute();
+  QHash<const WTTask*, Value>& known = gTotalsMemo->*table;
+  if (const auto found = known.constFind(task); found != known.cend()) return *found;
+  const Value total = compute();
+  known.insert(task, total);
+  return total;
+}
+
 }  // namespace
 
 WTTask::TotalsMemo::TotalsMemo() : previous_(gTotalsMemo) {
@@ -172,54 +184,42 @@ WTTask::TotalsMemo::~TotalsMemo() {
 }
 
 int WTTask::duration() const {
-  if (gTotalsMemo) {
-    if (const auto known = gTotalsMemo->durations_.constFind(this); known != gTotalsMemo->durations_.cend())
-      return *known;
-  }
-  int total = 0;
-  for (const WTItem* item : items_) total += item->duration();
-  if (gTotalsMemo) gTotalsMemo->durations_.insert(this, total);
-  return total;
+  return remembered(&TotalsMemo::durations_, this, [this] {
+    int total = 0;
+    for (const WTItem* item : items_) total += item->duration();
+    return total;
+  });
 }
 
 Decimal WTTask::cost() const {
-  if (gTotalsMemo) {
-    if (const auto known = gTotalsMemo->costs_.constFind(this); known != gTotalsMemo->costs_.cend())
-      return *known;
-  }
-  // Every item bills at the task's rate: read it once for all of them.
-  const Decimal rate = inheritedRate();
-  Decimal total;
-  for (const WTItem* item : items_) total += item->costAtRate(rate);
-  if (gTotalsMemo) gTotalsMemo->costs_.insert(this, total);
-  return total;
+  return remembered(&TotalsMemo::costs_, this, [this] {
+    // Every item bills at the task's rate: read it once for all of them.
+    const Decimal rate = inheritedRate();
+    Decimal total;
+    for (const WTItem* item : items_) total += item->costAtRate(rate);
+    return total;
+  });
 }
 
 int WTTask::billedDuration() const {
-  if (gTotalsMemo) {
-    const auto known = gTotalsMemo->billedDurations_.constFind(this);
-    if (known != gTotalsMemo->billedDurations_.cend()) return *known;
-  }
-  const WTRoundingRule rule = roundingRule();
-  int total = 0;
-  for (const WTItem* item : items_) total += item->billedDurationWithRule(rule);
-  if (gTotalsMemo) gTotalsMemo->billedDurations_.insert(this, total);
-  return total;
+  return remembered(&TotalsMemo::billedDurations_, this, [this] {
+    const WTRoundingRule rule = roundingRule();
+    int total = 0;
+    for (const WTItem* item : items_) total += item->billedDurationWithRule(rule);
+    return total;
+  });
 }
 
 Decimal WTTask::billedCost() const {
-  if (gTotalsMemo) {
-    const auto known = gTotalsMemo->billedCosts_.constFind(this);
-    if (known != gTotalsMemo->billedCosts_.cend()) return *known;
-  }
-  // What every item of the task bills by, resolved once for all of them.
-  const WTRoundingRule rule = roundingRule();
-  const Decimal rate = inheritedRate();
-  const int places = MoneyFormat::minorUnitDigits(billingCurrency());
-  Decimal total = Decimal().rounded(places);
-  for (const WTItem* item : items_) total += item->billedCostWith(rule, rate, places);
-  if (gTotalsMemo) gTotalsMemo->billedCosts_.insert(this, total);
-  return total;
+  return remembered(&TotalsMemo::billedCosts_, this, [this] {
+    // What every item of the task bills by, resolved once for all of them.
+    const WTRoundingRule rule = roundingRule();
+    const Decimal rate = inheritedRate();
+    const int places = MoneyFormat::minorUnitDigits(billingCurrency());
+    Decimal total = Decimal().rounded(places);
+    for (const WTItem* item : items_) total += item->billedCostWith(rule, rate, places);
+    return total;
+  });
 }
 
 void WTTask::durationDidChange() {
