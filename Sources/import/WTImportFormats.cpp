@@ -338,11 +338,19 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     problem = QStringLiteral("only time entries are imported, not a %1").arg(value(format.kind));
     return std::nullopt;
   }
-  row.client = value(format.client);
-  row.project = value(format.project);
-  row.task = value(format.task);
-  row.name = value(format.description);
-  row.notes = value(format.notes);
+  // Tessal's own file writes text a spreadsheet would take for a formula behind an apostrophe.
+  const auto text = [&](const char* name) {
+    QString field = value(name);
+    if (&format == &kTessal && field.size() > 1 && field.front() == u'\'' &&
+        QStringView(u"=+-@\t\r").contains(field[1]))
+      field.remove(0, 1);
+    return field;
+  };
+  row.client = text(format.client);
+  row.project = text(format.project);
+  row.task = text(format.task);
+  row.name = text(format.description);
+  row.notes = text(format.notes);
   row.tags = splitTags(value(format.tags));
   const std::optional<bool> billable = parseFlag(value(format.billable));
   if (!billable) {

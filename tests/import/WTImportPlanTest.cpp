@@ -114,7 +114,7 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
        QDateTime(QDate(2024, 3, 9), QTime(9, 0), zone), 90},
       {site->tasks().first(), "Call\nwith client", "line one\nline, two",
        QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 45},
-      {makeTask(lone, QStringLiteral("admin")), "Invoices", "",
+      {makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234",
        QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
   };
   for (const auto& entry : entries) {

@@ -203,6 +203,9 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
   WTTime* brief = makeTime(design, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 9, 7));
   brief->setName(QStringLiteral("Line one\nLine \"two\""));
   brief->setNotes(QStringLiteral("Größe – ½ €\r\nzweite Zeile"));
+  WTTime* formula = makeTime(design, berlin(2024, 3, 5, 10), berlin(2024, 3, 5, 11));
+  formula->setName(QStringLiteral("=HYPERLINK(\"x\")"));
+  formula->setNotes(QStringLiteral("-1"));
   auto* tanaka = WTClient::insertNewObject(context.get());
   tanaka->setName(QStringLiteral("Tanaka 株式会社"));
   ASSERT_TRUE(tanaka->setValue(QStringLiteral("currency"), QStringLiteral("JPY")));
@@ -211,7 +214,7 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
 
   const QString path = dir.filePath(QStringLiteral("sheet.csv"));
   const Result<int> written = WTCSVExport::exportSpreadsheet(*context, {}, nullptr, path);
-  ASSERT_TRUE(written.ok() && written.value() == 6);  // four entries, a fee and an expense; no note, no to-do
+  ASSERT_TRUE(written.ok() && written.value() == 7);  // five entries, a fee and an expense; no note, no to-do
   const QString site = QStringLiteral("Web \"Site\""), task = design->name();
   const QList<QStringList> expected = {
       WTCSVExport::spreadsheetColumns(),
@@ -224,6 +227,9 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
       {"Acme", site, task, "expense", "Fonts", "2024-03-04", "", "", "", "", "", "1234.50", "EUR", ""},
       {"Acme", site, task, "time", brief->name(), "2024-03-05", "09:00", "09:07", "0:07", "0:15", "60.00",
        "15.00", "EUR", brief->notes()},
+      // Text a spreadsheet would run as a formula stays text.
+      {"Acme", site, task, "time", "'=HYPERLINK(\"x\")", "2024-03-05", "10:00", "11:00", "1:00", "1:00",
+       "60.00", "60.00", "EUR", "'-1"},
       {"Tanaka 株式会社", "Backend", "API", "flat fee", "Setup", "2024-03-06", "", "", "2:00", "2:00",
        "33.33", "67", "JPY", ""},
   };
