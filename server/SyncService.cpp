@@ -7,7 +7,6 @@ namespace tessal::server {
 namespace {
 
 constexpr size_t kMaxDeviceLength = 128;
-constexpr size_t kMaxRememberedDevices = 100000;
 
 HttpReply retryLater(int status, const std::string& message, std::chrono::seconds after) {
   HttpReply reply;
@@ -101,20 +100,18 @@ HttpReply SyncService::handle(std::string_view body) {
 
 HttpReply SyncService::head(int64_t accountId, int64_t base, const std::string& device) {
   HttpReply reply;
-  int64_t iteration = 0;
-  std::string result;
-  // The poll with nothing new, by far the most common request, costs one indexed read.
-  const SyncStore::Status status = store_.currentHead(accountId, iteration);
-  if (status != SyncStore::Status::Ok) return unavailable();
-  if (base == iteration) {
-    result = R"({"i":{},"u":{},"x":[]})";
+  // The poll with nothing new, by far the most common request, costs one indexed read; it writes only
+  // when the device's last head on record is another.
+  SyncStore::Head head = store_.currentHead(accountId, device);
+  if (head.status != SyncStore::Status::Ok) return unavailable();
+  if (base == head.iteration && (device.empty() || head.lastSent == head.iteration)) {
+    head.result = R"({"i":{},"u":{},"x":[]})";
   } else {
-    SyncStore::Head head = store_.head(accountId, base, device);
+    head = store_.head(accountId, base, device);
     if (head.status != SyncStore::Status::Ok) return unavailable();
-    iteration = head.iteration;
-    result = std::move(head.result);
   }
-  rememberHead(accountId, device, iteration);
+  const int64_t iteration = head.iteration;
+  const std::string& result = head.result;
   reply.body.reserve(result.size() + 48);
   reply.body = "{\"action\":\"head\",\"iteration\":" + std::to_string(iteration) + ",\"result\":";
   reply.body += result;
@@ -128,12 +125,12 @@ HttpReply SyncService::save(int64_t accountId, int64_t base, const std::string& 
   std::string reason;
   const std::optional<ChangeSet> changes = readChangeSet(*data, reason);
   if (!changes) return errorReply(kBadChangeSet, "Bad change set: " + reason);
-  if (isBehindLastHead(accountId, device, base)) {
+  const SyncStore::Save outcome = store_.save(accountId, base, device, *changes);
+  if (outcome.status != SyncStore::Status::Ok) return unavailable();
+  if (outcome.overtaken) {
     return errorReply(kFetchHeadFirst,
                       "This device was already sent a newer iteration; poll \"head\" first.");
   }
-  const SyncStore::Save outcome = store_.save(accountId, base, device, *changes);
-  if (outcome.status != SyncStore::Status::Ok) return unavailable();
   if (outcome.refused) {
     return errorReply(kFetchHeadFirst,
                       "The server has changes this save is not based on; poll \"head\" first.");
@@ -141,23 +138,6 @@ HttpReply SyncService::save(int64_t accountId, int64_t base, const std::string& 
   HttpReply reply;
   reply.body = "{\"action\":\"save\",\"iteration\":" + std::to_string(outcome.iteration) + "}";
   return reply;
-}
-
-void SyncService::rememberHead(int64_t accountId, const std::string& device, int64_t iteration) {
-  if (device.empty()) return;
-  std::string key = std::to_string(accountId) + '/' + device;
-  std::lock_guard lock(headsMutex_);
-  if (lastHeads_.size() >= kMaxRememberedDevices && !lastHeads_.count(key)) lastHeads_.clear();
-  // The latest answer counts, not the largest: after the storage was restored from a backup the
-  // iterations start lower again.
-  lastHeads_[std::move(key)] = iteration;
-}
-
-bool SyncService::isBehindLastHead(int64_t accountId, const std::string& device, int64_t base) {
-  if (device.empty()) return false;
-  std::lock_guard lock(headsMutex_);
-  auto found = lastHeads_.find(std::to_string(accountId) + '/' + device);
-  return found != lastHeads_.end() && base < found->second;
 }
 
 }  // namespace tessal::server

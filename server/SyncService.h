@@ -4,10 +4,8 @@
 #include "SyncStore.h"
 
 #include <cstdint>
-#include <mutex>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -23,10 +21,10 @@ struct HttpReply {
 
 // The sync protocol: one JSON request in, one JSON reply out. Documented in server/README.md.
 //
-// Threads: every HTTP worker calls handle() at the same time, with no lock of the listener held.
-// The only state it keeps is the last head sent to each device, under `headsMutex_`, which is held
-// for a map look-up or update and never across a call to the authenticator or the store. Password
-// checks lock inside PasswordAuthenticator; storage calls lock nothing here (see SyncStore).
+// Threads: every HTTP worker calls handle() at the same time, with no lock of the listener held. It
+// keeps no state: what it must remember between requests (the last head sent to each device) is in
+// the storage, so several server processes over one database answer alike. Password checks lock
+// inside PasswordAuthenticator; storage calls lock nothing here (see SyncStore).
 class SyncService {
  public:
   // The "code" of an error reply.
@@ -53,15 +51,9 @@ class SyncService {
  private:
   HttpReply head(int64_t accountId, int64_t base, const std::string& device);
   HttpReply save(int64_t accountId, int64_t base, const std::string& device, const JsonValue* data);
-  void rememberHead(int64_t accountId, const std::string& device, int64_t iteration);
-  bool isBehindLastHead(int64_t accountId, const std::string& device, int64_t base);
 
   SyncStore& store_;
   PasswordAuthenticator& authenticator_;
-  // The last head iteration sent to each device: a save based on an older one is a request that was
-  // overtaken by a later one of the same device (see README, "Late requests").
-  std::mutex headsMutex_;
-  std::unordered_map<std::string, int64_t> lastHeads_;
 };
 
 }  // namespace tessal::server

@@ -62,6 +62,11 @@ TEST_P(SyncProtocolTest, EveryConversationGetsTheExpectedReplies) {
   for (int number = 1; std::getline(file, line); ++number) {
     if (line.empty()) user.clear();
     if (line.empty() || line[0] == '#') continue;
+    if (line == "restart") {
+      stopServer();
+      startServer();
+      continue;
+    }
     if (user.empty()) user = newUser("from-line-" + std::to_string(number));
     std::istringstream step(line.substr(0, line.find(" => ")));
     std::string device, action, data;
