@@ -32,14 +32,9 @@ class ReportTest : public ModelTest {
   void SetUp() override {
     ModelTest::SetUp();
     setNow(berlin(2024, 3, 20, 12));
-    client = WTClient::insertNewObject(context.get());
-    client->setName(QStringLiteral("Acme"));
-    web = WTProject::insertNewObject(context.get());
-    web->setName(QStringLiteral("Web \"Site\""));
-    web->setClient(client);
-    backend = WTProject::insertNewObject(context.get());
-    backend->setName(QStringLiteral("Backend"));
-    backend->setClient(client);
+    client = makeClient(QStringLiteral("Acme"));
+    web = makeProject(QStringLiteral("Web \"Site\""), client);
+    backend = makeProject(QStringLiteral("Backend"), client);
     design = makeTask(web, QStringLiteral("Design"));
     design->setRate(dec("60"));
     makeTime(design, berlin(2024, 3, 3, 9), berlin(2024, 3, 3, 10, 30))
@@ -144,8 +139,7 @@ TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
 
 TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   // A second project whose name sorts first, and an entry of the design task dated before the others.
-  auto* alpha = WTProject::insertNewObject(context.get());
-  alpha->setName(QStringLiteral("Alpha"));
+  auto* alpha = makeProject(QStringLiteral("Alpha"));
   auto* task = makeTask(alpha, QStringLiteral("Zeta"));
   makeTime(task, berlin(2024, 3, 1, 8), berlin(2024, 3, 1, 8, 45))->setName(QStringLiteral("Early"));
   const QString path = dir.filePath(QStringLiteral("times.csv"));
@@ -203,8 +197,7 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
   WTTime* brief = makeTime(design, berlin(2024, 3, 5, 9), berlin(2024, 3, 5, 9, 7));
   brief->setName(QStringLiteral("Line one\nLine \"two\""));
   brief->setNotes(QStringLiteral("Größe – ½ €\r\nzweite Zeile"));
-  auto* tanaka = WTClient::insertNewObject(context.get());
-  tanaka->setName(QStringLiteral("Tanaka 株式会社"));
+  auto* tanaka = makeClient(QStringLiteral("Tanaka 株式会社"));
   ASSERT_TRUE(tanaka->setValue(QStringLiteral("currency"), QStringLiteral("JPY")));
   backend->setClient(tanaka);
   api->setRate(dec("33.33"));  // finer than the yen: kept as it is; 2 hours bill 66.66, so 67 yen
@@ -265,8 +258,7 @@ TEST_F(ReportTest, SpreadsheetCsvOpensAsColumnsInLibreOffice) {
 TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
   client->setName(QStringLiteral("Smith & <Co>"));
   design->setName(QStringLiteral("a<b"));
-  auto* empty = WTProject::insertNewObject(context.get());
-  empty->setName(QStringLiteral("Not started"));
+  auto* empty = makeProject(QStringLiteral("Not started"));
   makeItem<WTNote>(makeTask(backend, QString()), berlin(2024, 3, 7, 8));
   makeTime(api, berlin(2024, 3, 8, 9), berlin(2024, 3, 8, 9, 45));  // no name
   auto* bare = WTFlat::insertNewObject(context.get());              // unnamed, made today
@@ -358,9 +350,7 @@ TEST_F(ReportTest, APeriodLimitsTheListsAndTotalsToItsItems) {
 // total (415.41) at every level, where the exact sum rounded once said 415.40. Its head names both sides;
 // a budget's line is the whole record's, in a period too.
 TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides) {
-  auto* billed = WTProject::insertNewObject(context.get());
-  billed->setName(QStringLiteral("Billed"));
-  billed->setClient(client);
+  auto* billed = makeProject(QStringLiteral("Billed"), client);
   for (int month : {1, 2, 3}) {
     WTTask* task = makeTask(billed, QStringLiteral("Task %1").arg(month));
     task->setRate(dec("92.31"));
