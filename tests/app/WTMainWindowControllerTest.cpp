@@ -230,8 +230,6 @@ TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
   exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
   EXPECT_EQ(exporter->projectLimit(), first);
   exporter->reject();
-  window->saveLastSelectedProject(2);
-  EXPECT_EQ(defaults->integerForKey("WTLastSelectedProject"), 2);
 }
 
 // File › Import… shows what it makes first, then makes it as one step of undo; a file with a bad row
