@@ -32,7 +32,7 @@ SyncServer::~SyncServer() {
 HttpReply SyncServer::route(const HttpRequest& request) {
   if (request.path == kSyncPath) {
     if (request.method != "POST") return textReply(405, "POST a sync request here.");
-    return service_->handle(request.body);
+    return service_->handle(request.body, addressGroup(clientAddress(request)));
   }
   if (request.path == kSignUpPath && options_.signUp) {
     if (request.method == "GET") return signUpPage_->form();

@@ -44,8 +44,9 @@ class SyncService {
 
   // Answers one POST to "/sync/tessal/sync.php". Failures the client should simply retry (storage
   // unavailable, account locked after failed attempts) are plain-text 503 and 429 answers with
-  // "Retry-After"; every other outcome is a JSON object with status 200.
-  HttpReply handle(std::string_view body);
+  // "Retry-After"; every other outcome is a JSON object with status 200. `client` is what failed
+  // sign-ins are counted against (addressGroup(clientAddress(request))).
+  HttpReply handle(std::string_view body, const std::string& client);
 
   // The JSON error reply {"error": message, "code": code} (with "iteration": 0 for code 4).
   static HttpReply errorReply(int code, const std::string& message, int status = 200);
