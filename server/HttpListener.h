@@ -61,10 +61,12 @@ class HttpListener {
     std::chrono::milliseconds writeTimeout{10000};
     size_t maxConnections = 4096;           // lowered to what the process's descriptor limit allows
     size_t maxConnectionsPerAddress = 256;  // per addressGroup(); 0: no cap
-    size_t maxBodyMemory = 256u << 20;      // the bodies of every request being read or answered
+    // The bodies of every request being read or answered. Answering one takes about as much again (its
+    // JSON), so this with the workers' password checks keeps a flooded server within about 300 MB.
+    size_t maxBodyMemory = 96u << 20;
     // Replies not yet taken by their readers. One reply alone may pass it, or a large account could
     // never be sent.
-    size_t maxReplyMemory = 256u << 20;
+    size_t maxReplyMemory = 64u << 20;
   };
   using Handler = std::function<HttpReply(const HttpRequest&)>;
   // What to answer a request refused before it was complete (status 400, 408, 413, 415, 431); `partial`

@@ -14,7 +14,7 @@ constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
 SyncServer::SyncServer(std::unique_ptr<SyncStore> store, Options options)
     : options_(std::move(options)), store_(std::move(store)) {
   authenticator_ = std::make_unique<PasswordAuthenticator>(*store_, options_.authentication);
-  service_ = std::make_unique<SyncService>(*store_, *authenticator_);
+  service_ = std::make_unique<SyncService>(*store_, *authenticator_, options_.concurrentHeads);
   signUpPage_ = std::make_unique<SignUpPage>(*authenticator_);
 }
 

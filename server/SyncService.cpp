@@ -110,7 +110,12 @@ HttpReply SyncService::head(int64_t accountId, int64_t base, const std::string& 
   if (base == iteration) {
     result = R"({"i":{},"u":{},"x":[]})";
   } else {
+    if (!fullHeads_.try_acquire()) {
+      return retryLater(503, "The sync service is busy sending changes; try again shortly.",
+                        std::chrono::seconds(1));
+    }
     SyncStore::Head head = store_.head(accountId, base, device);
+    fullHeads_.release();
     if (head.status != SyncStore::Status::Ok) return unavailable();
     iteration = head.iteration;
     result = std::move(head.result);

@@ -3,8 +3,10 @@
 #include "PasswordAuthenticator.h"
 #include "SyncStore.h"
 
+#include <algorithm>
 #include <cstdint>
 #include <mutex>
+#include <semaphore>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -39,8 +41,9 @@ class SyncService {
     kRequestTooLarge = 6,   // the body is over the server's limit
   };
 
-  SyncService(SyncStore& store, PasswordAuthenticator& authenticator)
-      : store_(store), authenticator_(authenticator) {}
+  // At most `concurrentHeads` heads that bring changes are built at once (see fullHeads_).
+  SyncService(SyncStore& store, PasswordAuthenticator& authenticator, int concurrentHeads = 4)
+      : store_(store), authenticator_(authenticator), fullHeads_(std::clamp(concurrentHeads, 1, 64)) {}
 
   // Answers one POST to "/sync/tessal/sync.php". Failures the client should simply retry (storage
   // unavailable, account locked after failed attempts) are plain-text 503 and 429 answers with
@@ -59,6 +62,11 @@ class SyncService {
 
   SyncStore& store_;
   PasswordAuthenticator& authenticator_;
+  // A head that brings changes is built in memory, and a large account's first one takes tens of
+  // megabytes: readers asking for it over and over would otherwise take as many of those as there are
+  // workers. Like a password verification it never waits for a slot (503 with Retry-After instead);
+  // the poll with nothing new needs none.
+  std::counting_semaphore<64> fullHeads_;
   // The last head iteration sent to each device: a save based on an older one is a request that was
   // overtaken by a later one of the same device (see README, "Late requests").
   std::mutex headsMutex_;

@@ -26,7 +26,7 @@ constexpr const char* kUsage =
     "LOCATION is a SQLite file (created when missing) or a postgresql:// connection URI.\n"
     "PORT 0 picks a free port; the address served is printed on standard output.\n"
     "--max-body caps one request's body (default 33554432), --body-memory all bodies being read or\n"
-    "answered together (default 268435456; past it: 503). --connections-per-address caps the\n"
+    "answered together (default 100663296; past it: 503). --connections-per-address caps the\n"
     "connections one address (an IPv6 /64) holds, the rest answered 503 at once (default 256, 0: no\n"
     "cap; behind a proxy on this host, raise it to the proxy's connections or use 0).\n";
 
