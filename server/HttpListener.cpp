@@ -269,6 +269,7 @@ void HttpListener::stop() {
   workers_.clear();
   for (const auto& entry : connections_) ::close(entry.first);
   connections_.clear();
+  connectionsPerAddress_.clear();
   ::close(listenFd_);
   ::close(epollFd_);
   ::close(wakeFd_);
