@@ -61,8 +61,8 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   ownerPollsThrough(
       82,
       [&](int t, const std::atomic<bool>& done) {
-        for (int n = 0; t >= 70 && !done;
-             ++n) {  // from a new address each time, so no lock spares a verification
+        // From a new address each time, so no lock spares a verification.
+        for (int n = 0; t >= 70 && !done; ++n) {
           const std::string stranger =
               "stranger-" + std::to_string(t) + "-" + std::to_string(n) + "@example.com";
           const Reply reply =
@@ -205,9 +205,9 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   startServer();
   const std::string user = newUser("owner");
   // The owner's laptop, or a stranger's guesses (no device) from the same address.
-  auto attempt = [&](const std::string& secret, int on = 0) {
+  auto attempt = [&](const std::string& secret) {
     const bool owner = secret == "password-of-" + user;
-    return post(on ? on : port(), kSyncPath, requestBody(user, secret, "head", 0, owner ? "laptop" : ""));
+    return post(port(), kSyncPath, requestBody(user, secret, "head", 0, owner ? "laptop" : ""));
   };
   ASSERT_EQ(attempt("password-of-" + user).status, 200);
   // A wrong password is code 2; while locked a guess is not even tried (429, to retry); the lock doubles.
