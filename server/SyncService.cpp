@@ -49,7 +49,7 @@ HttpReply SyncService::errorReply(int code, const std::string& message, int stat
   return reply;
 }
 
-HttpReply SyncService::handle(std::string_view body) {
+HttpReply SyncService::handle(std::string_view body, const std::string& client) {
   std::string reason;
   const std::optional<JsonValue> request = JsonValue::parse(body, &reason);
   if (!request) return errorReply(kMalformedRequest, "The request is not valid JSON: " + reason);
@@ -77,14 +77,15 @@ HttpReply SyncService::handle(std::string_view body) {
     return errorReply(kMalformedRequest, "\"device\" must be a short printable text.");
   }
 
-  const PasswordAuthenticator::Outcome login = authenticator_.authenticate(*user, *password);
+  const PasswordAuthenticator::Outcome login =
+      authenticator_.authenticate(*user, *password, client, deviceId);
   switch (login.verdict) {
     case PasswordAuthenticator::Verdict::Accepted:
       break;
     case PasswordAuthenticator::Verdict::Rejected:
       return errorReply(kWrongCredentials, "Wrong e-mail address or password.");
     case PasswordAuthenticator::Verdict::Locked:
-      return retryLater(429, "Too many failed sign-in attempts for this account; try again later.",
+      return retryLater(429, "Too many failed sign-in attempts from your address; try again later.",
                         login.retryAfter);
     case PasswordAuthenticator::Verdict::Unavailable:
       return unavailable();
@@ -107,7 +108,12 @@ HttpReply SyncService::head(int64_t accountId, int64_t base, const std::string& 
   if (base == head.iteration && (device.empty() || head.lastSent == head.iteration)) {
     head.result = R"({"i":{},"u":{},"x":[]})";
   } else {
+    if (!fullHeads_.try_acquire()) {
+      return retryLater(503, "The sync service is busy sending changes; try again shortly.",
+                        std::chrono::seconds(1));
+    }
     head = store_.head(accountId, base, device);
+    fullHeads_.release();
     if (head.status != SyncStore::Status::Ok) return unavailable();
   }
   const int64_t iteration = head.iteration;

@@ -3,7 +3,9 @@
 #include "PasswordAuthenticator.h"
 #include "SyncStore.h"
 
+#include <algorithm>
 #include <cstdint>
+#include <semaphore>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -37,13 +39,15 @@ class SyncService {
     kRequestTooLarge = 6,   // the body is over the server's limit
   };
 
-  SyncService(SyncStore& store, PasswordAuthenticator& authenticator)
-      : store_(store), authenticator_(authenticator) {}
+  // At most `concurrentHeads` heads that bring changes are built at once (see fullHeads_).
+  SyncService(SyncStore& store, PasswordAuthenticator& authenticator, int concurrentHeads = 4)
+      : store_(store), authenticator_(authenticator), fullHeads_(std::clamp(concurrentHeads, 1, 64)) {}
 
   // Answers one POST to "/sync/tessal/sync.php". Failures the client should simply retry (storage
   // unavailable, account locked after failed attempts) are plain-text 503 and 429 answers with
-  // "Retry-After"; every other outcome is a JSON object with status 200.
-  HttpReply handle(std::string_view body);
+  // "Retry-After"; every other outcome is a JSON object with status 200. `client` is what failed
+  // sign-ins are counted against (addressGroup(clientAddress(request))).
+  HttpReply handle(std::string_view body, const std::string& client);
 
   // The JSON error reply {"error": message, "code": code} (with "iteration": 0 for code 4).
   static HttpReply errorReply(int code, const std::string& message, int status = 200);
@@ -54,6 +58,11 @@ class SyncService {
 
   SyncStore& store_;
   PasswordAuthenticator& authenticator_;
+  // A head that brings changes is built in memory, and a large account's first one takes tens of
+  // megabytes: readers asking for it over and over would otherwise take as many of those as there are
+  // workers. Like a password verification it never waits for a slot (503 with Retry-After instead);
+  // the poll with nothing new needs none.
+  std::counting_semaphore<64> fullHeads_;
 };
 
 }  // namespace tessal::server

@@ -89,6 +89,16 @@ CREATE TABLE IF NOT EXISTS devices (
   PRIMARY KEY (account_id, device));
 )sql";
 
+// Added after the first release: created, like every table, by the first server that opens a storage
+// without it, which is all an existing storage needs.
+const char* const kProvenDevicesSchema = R"sql(
+CREATE TABLE IF NOT EXISTS proven_devices (
+  account_id BIGINT NOT NULL,
+  device TEXT NOT NULL,
+  proven_at BIGINT NOT NULL,
+  PRIMARY KEY (account_id, device));
+)sql";
+
 void logStorageError(const char* operation, const StorageError& error) {
   std::cerr << "tessal-sync-server: storage error in " << operation << ": " << error.what() << std::endl;
 }
@@ -374,6 +384,7 @@ std::unique_ptr<SyncStore> SyncStore::open(const std::string& location, std::str
 void SyncStore::createSchema() {
   SqlDatabase::Lease c = database_->acquire();
   c->executeScript(kind() == SqlDatabase::Kind::SQLite ? kSqliteSchema : kPostgresSchema);
+  c->executeScript(kProvenDevicesSchema);
 }
 
 SyncStore::Status SyncStore::createAccount(const std::string& email, const std::string& passwordHash) {
@@ -572,6 +583,36 @@ SyncStore::Save SyncStore::save(int64_t accountId, int64_t base, const std::stri
     reply.status = Status::Unavailable;
   }
   return reply;
+}
+
+SyncStore::Status SyncStore::proveDevice(int64_t accountId, const std::string& device, int64_t at,
+                                         int64_t forgetBefore) {
+  try {
+    SqlDatabase::Lease c = database_->acquire();
+    c->query(
+        "INSERT INTO proven_devices (account_id, device, proven_at) VALUES (?, ?, ?) "
+        "ON CONFLICT (account_id, device) DO UPDATE SET proven_at = excluded.proven_at",
+        {accountId, device, at});
+    c->query("DELETE FROM proven_devices WHERE account_id = ? AND proven_at < ?", {accountId, forgetBefore});
+    return Status::Ok;
+  } catch (const StorageError& e) {
+    logStorageError("proveDevice", e);
+    return Status::Unavailable;
+  }
+}
+
+SyncStore::Status SyncStore::deviceProven(int64_t accountId, const std::string& device, int64_t since,
+                                          bool& proven) {
+  try {
+    SqlDatabase::Lease c = database_->acquire();
+    proven = !c->query("SELECT 1 FROM proven_devices WHERE account_id = ? AND device = ? AND proven_at >= ?",
+                       {accountId, device, since})
+                  .empty();
+    return Status::Ok;
+  } catch (const StorageError& e) {
+    logStorageError("deviceProven", e);
+    return Status::Unavailable;
+  }
 }
 
 }  // namespace tessal::server

@@ -82,6 +82,14 @@ class SyncStore {
   // poll with nothing new costs this one read. Only `status`, `iteration` and `lastSent` are set.
   Head currentHead(int64_t accountId, const std::string& device);
 
+  // Devices that proved their account's password, so that every server over this storage lets them
+  // past a lock on their address (PasswordAuthenticator), also after a restart. `device` is a digest
+  // of the device's id; times are Unix seconds. Recording a proof forgets the account's proofs older
+  // than `forgetBefore`.
+  Status proveDevice(int64_t accountId, const std::string& device, int64_t at, int64_t forgetBefore);
+  // Whether `device` proved the password at `since` or later.
+  Status deviceProven(int64_t accountId, const std::string& device, int64_t since, bool& proven);
+
  private:
   explicit SyncStore(std::unique_ptr<SqlDatabase> database) : database_(std::move(database)) {}
   void createSchema();
