@@ -12,6 +12,7 @@
 #include "WTProject.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStore.h"
+#include "WTStoreBackup.h"
 #include "WTStoreSetup.h"
 #include "WTTask.h"
 
@@ -53,15 +54,31 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   bool fill = false;
   Result<std::unique_ptr<WTStore>> store =
       WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+  if (!store && (store.error().code == WTStore::Damaged || store.error().code == WTStore::NotAStore)) {
+    // Never replaced unasked: the damaged file stays as it is unless the user takes a backup instead,
+    // and then it is kept beside the restored one.
+    const QString backup = WTStoreBackup::newestGoodCopy(storePath());
+    if (backup.isEmpty()) {
+      presenter_->presentError(store.error().message);
+    } else if (presenter_->offerRestore(store.error().message, backup)) {
+      const Result<QString> restored = WTStoreSetup::restoreBackup(backup, *defaults_);
+      if (restored) store = WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      if (!restored || !store) presenter_->presentError(restored ? store.error().message : restored.error().message);
+    }
+  } else if (!store) {
+    presenter_->presentError(store.error().message);
+  }
   if (store) {
     Result<void> loaded = context_->attachStore(std::move(store.value()));
     if (!loaded) presenter_->presentError(loaded.error().message);
     fill = loaded && storeIsNew;
-  } else {
-    presenter_->presentError(store.error().message);
   }
   connect(context_.get(), &WTObjectContext::objectsDidChange, this,
           &WTAppDelegate::managedObjectContextObjectsDidChange);
+  if (context_->hasStore()) {
+    dailyBackup_ = std::make_unique<WTStoreBackup::Daily>(storePath());
+    connect(context_.get(), &WTObjectContext::didSave, this, [this] { dailyBackup_->storeDidSave(); });
+  }
 
   syncManager_ = std::make_unique<RZSyncManager>(context_.get(), syncJournalPath());
   syncManager_->syncNetwork()->setCredentialDelegate(this);

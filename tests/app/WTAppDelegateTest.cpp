@@ -6,6 +6,7 @@
 #include "WTPreferencesWindowController.h"
 #include "WTStatusBarController.h"
 #include "WTStatusBarPopup.h"
+#include "WTStoreBackup.h"
 #include "WTStopwatchUpdater.h"
 #include "WTTrackingAlert.h"
 
@@ -81,6 +82,83 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   ASSERT_TRUE(file.open(QIODevice::ReadOnly));
   EXPECT_EQ(file.readAll(), garbage);
   EXPECT_FALSE(QFile::exists(path + "-wal"));
+}
+
+// A damaged store is only ever replaced by the newest good backup the user chose to restore, and kept.
+TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
+  const QString path = WTAppDelegate::storePath();
+  const QString backups = WTAppDelegate::applicationSupportFolder() + "/Backups";
+  {
+    auto first = makeDelegate();
+    WTProject::insertNewObject(first->managedObjectContext())->setName("Backed up");
+    ASSERT_TRUE(first->saveChanges());
+  }
+  ASSERT_TRUE(QDir(backups).removeRecursively());  // the day's copy the first start made
+  ASSERT_TRUE(WTStoreBackup::copy(path, backups + "/Tessal-2026-01-02.sqlite").ok());
+  // Newer, but no store: passed over.
+  QFile damagedCopy(backups + "/Tessal-2026-01-03.sqlite");
+  ASSERT_TRUE(damagedCopy.open(QIODevice::WriteOnly) && damagedCopy.write(QByteArray(8192, 'x')) == 8192);
+  damagedCopy.close();
+  const QByteArray garbage = QByteArray("SQLite format 3").append('\0').append(QByteArray(4080, '\x7f'));
+  for (const bool restore : {false, true}) {
+    SCOPED_TRACE(restore);
+    QFile file(path);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) && file.write(garbage) == garbage.size());
+    file.close();
+    presenter.offers.clear();
+    presenter.restores = restore;
+    auto delegate = makeDelegate();
+    WTObjectContext* context = delegate->managedObjectContext();
+    ASSERT_EQ(presenter.offers.size(), 1);
+    EXPECT_TRUE(presenter.offers[0].contains(path) && presenter.offers[0].endsWith("/Tessal-2026-01-02.sqlite"))
+        << presenter.offers[0].toStdString();
+    QStringList names;
+    for (WTProject* project : context->fetch<WTProject>()) names << project->name();
+    names.sort();
+    EXPECT_EQ(names, restore ? QStringList({"Backed up", "Default Project"}) : QStringList());
+    EXPECT_EQ(context->hasStore(), restore);
+    const QStringList kept = QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
+    EXPECT_EQ(kept.size(), restore ? 1 : 0);
+    QFile damaged(restore ? WTAppDelegate::applicationSupportFolder() + '/' + kept.value(0) : path);
+    ASSERT_TRUE(damaged.open(QIODevice::ReadOnly));
+    EXPECT_EQ(damaged.readAll(), garbage);
+  }
+  EXPECT_TRUE(presenter.errors.isEmpty()) << presenter.errors.join('\n').toStdString();
+}
+
+// The first save of a day leaves the day's copy in the backups, of which the newest 7 stay.
+TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
+  const QString backups = WTAppDelegate::applicationSupportFolder() + "/Backups";
+  ASSERT_TRUE(QDir().mkpath(backups));
+  const QDate today = QDate::currentDate();
+  QStringList older;
+  for (int days = 8; days >= 1; --days) older << today.addDays(-days).toString(u"'Tessal-'yyyy-MM-dd'.sqlite'");
+  for (const QString& name : older + QStringList{"Tessal-2020-01-01-120000.sqlite"}) {
+    QFile file(backups + '/' + name);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+  }
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  WTProject::insertNewObject(context)->setName("Saved today");
+  ASSERT_TRUE(delegate->saveChanges());
+  const QString copy = backups + today.toString(u"'/Tessal-'yyyy-MM-dd'.sqlite'");
+  ASSERT_TRUE(QTest::qWaitFor([&] { return QFile::exists(copy); }, 10000));
+  WTProject::insertNewObject(context)->setName("Saved later");
+  ASSERT_TRUE(delegate->saveChanges());  // one copy a day
+  delegate.reset();  // waits for a copy in progress
+  EXPECT_TRUE(WTStoreBackup::check(copy).ok());
+  EXPECT_EQ(QFileInfo(copy).permissions(), QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
+  WTObjectContext copied;
+  auto store = WTStore::openReadOnly(copy);
+  ASSERT_TRUE(store && copied.attachStore(std::move(store.value())));
+  QStringList names;
+  for (WTProject* project : copied.fetch<WTProject>()) names << project->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Default Project", "Saved today"}));
+  // The two oldest days went; the copy `tessal backup` made stays.
+  QStringList expected = older.mid(2) + QStringList{copy.section('/', -1), "Tessal-2020-01-01-120000.sqlite"};
+  expected.sort();
+  EXPECT_EQ(QDir(backups).entryList(QDir::Files, QDir::Name), expected);
 }
 
 // A save with nothing to save touches no editor; one with changes commits the edit in progress.
