@@ -63,7 +63,8 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
     } else if (presenter_->offerRestore(store.error().message, backup)) {
       const Result<QString> restored = WTStoreSetup::restoreBackup(backup, *defaults_);
       if (restored) store = WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
-      if (!restored || !store) presenter_->presentError(restored ? store.error().message : restored.error().message);
+      if (!restored || !store)
+        presenter_->presentError(restored ? store.error().message : restored.error().message);
     }
   } else if (!store) {
     presenter_->presentError(store.error().message);
@@ -116,10 +117,27 @@ void WTAppDelegate::managedObjectContextObjectsDidChange() {
   QTimer::singleShot(500, this, &WTAppDelegate::saveAction);
 }
 
+namespace {
+
+// A file found damaged only once the records were up (by the check beside the loading) is not replaced
+// under the open window: the message names the copy to put back after quitting.
+QString withDamageAdvice(const Error& error) {
+  if (error.code != WTStore::Damaged) return error.message;
+  const QString copy = WTStoreBackup::newestGoodCopy(WTStoreSetup::storePath());
+  if (copy.isEmpty()) return error.message;
+  return error.message + u' ' +
+         WTAppDelegate::tr(
+             "The newest good backup is “%1”; quit Tessal and run “tessal restore” with it to "
+             "put it back.")
+             .arg(copy);
+}
+
+}  // namespace
+
 void WTAppDelegate::saveAction() {
   if (!context_ || !context_->hasChanges()) return;
   const Result<void> saved = context_->save();
-  if (!saved && context_->hasStore()) presenter_->presentError(saved.error().message);
+  if (!saved && context_->hasStore()) presenter_->presentError(withDamageAdvice(saved.error()));
   qCDebug(lcStore, "Saved");
 }
 
@@ -176,7 +194,7 @@ WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
   if (!context_->hasChanges()) return TerminateReply::TerminateNow;
   const Result<void> saved = context_->save();
   if (saved) return TerminateReply::TerminateNow;
-  if (presenter_->presentError(saved.error().message)) return TerminateReply::TerminateCancel;
+  if (presenter_->presentError(withDamageAdvice(saved.error()))) return TerminateReply::TerminateCancel;
   return presenter_->confirmQuitAnyway() ? TerminateReply::TerminateNow : TerminateReply::TerminateCancel;
 }
 

@@ -41,7 +41,8 @@ class WTCommandLinePresenter final : public WTAlertPresenter, public RZSyncError
   bool confirmDeletion(const QString&, const QString&) override { return false; }
   bool offerRestore(const QString& message, const QString& backup) override {
     err_ << message << '\n'
-         << QStringLiteral("The newest good backup is %1; `tessal restore '%1'` puts it back.").arg(backup) << '\n';
+         << QStringLiteral("The newest good backup is %1; `tessal restore '%1'` puts it back.").arg(backup)
+         << '\n';
     err_.flush();
     return false;
   }

@@ -50,10 +50,11 @@ bool WTDialogAlertPresenter::offerRestore(const QString& message, const QString&
   box.setIcon(QMessageBox::Warning);
   box.setText(message);
   const QString made = QLocale().toString(QFileInfo(backup).lastModified(), QLocale::LongFormat);
-  box.setInformativeText(QCoreApplication::translate("WTAppDelegate",
-                                                     "The newest good backup is “%1”, made %2. Restore it? The "
-                                                     "damaged file is kept beside the restored one.")
-                             .arg(QDir::toNativeSeparators(backup), made));
+  box.setInformativeText(
+      QCoreApplication::translate("WTAppDelegate",
+                                  "The newest good backup is “%1”, made %2. Restore it? The "
+                                  "damaged file is kept beside the restored one.")
+          .arg(QDir::toNativeSeparators(backup), made));
   QPushButton* restore =
       box.addButton(QCoreApplication::translate("WTAppDelegate", "Restore Backup"), QMessageBox::AcceptRole);
   QPushButton* keep =

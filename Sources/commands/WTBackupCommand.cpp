@@ -20,8 +20,10 @@ namespace {
 constexpr int kWriterWaitMs = 10000;
 
 QString positional(const QStringList& arguments, bool required, QString* problem) {
-  if (arguments.size() > 1) *problem = QStringLiteral("unexpected argument '%1'").arg(arguments[1]);
-  else if (required && arguments.isEmpty()) *problem = QStringLiteral("name the backup file to restore");
+  if (arguments.size() > 1)
+    *problem = QStringLiteral("unexpected argument '%1'").arg(arguments[1]);
+  else if (required && arguments.isEmpty())
+    *problem = QStringLiteral("name the backup file to restore");
   else if (!arguments.isEmpty() && arguments[0].startsWith(u'-'))
     *problem = QStringLiteral("unknown option '%1'").arg(arguments[0]);
   return arguments.value(0);
@@ -34,9 +36,10 @@ int runBackupCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const QString file = positional(arguments, false, &problem);
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, "usage: tessal backup [FILE]\n", problem);
   const QString store = WTStoreSetup::storePath();
-  const QString target = file.isEmpty()
-                             ? WTStoreBackup::unusedPath(WTStoreBackup::manualPath(store, QDateTime::currentDateTime()))
-                             : QFileInfo(file).absoluteFilePath();
+  const QString target =
+      file.isEmpty()
+          ? WTStoreBackup::unusedPath(WTStoreBackup::manualPath(store, QDateTime::currentDateTime()))
+          : QFileInfo(file).absoluteFilePath();
   if (const Result<void> copied = WTStoreBackup::copy(store, target); !copied)
     return failure(err, copied.error().message);
   out << target << '\n';
@@ -50,12 +53,14 @@ int runRestoreCommand(const QStringList& arguments, QTextStream& out, QTextStrea
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, "usage: tessal restore FILE\n", problem);
   // The desktop copy keeps the store open and would go on saving into the replaced file.
   if (WTSingleInstanceClient().notifyRunningInstance(2000, false))
-    return failure(err, QStringLiteral("Tessal is running; quit it to restore a backup. Nothing was changed."));
+    return failure(err,
+                   QStringLiteral("Tessal is running; quit it to restore a backup. Nothing was changed."));
   const QString store = WTStoreSetup::storePath();
   QDir().mkpath(QFileInfo(store).path());
   WTStoreWriterLock lock(store);
   if (!lock.lock(kWriterWaitMs))
-    return failure(err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
+    return failure(
+        err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
   UserDefaults defaults;
   WTStoreSetup::registerDefaults(defaults);
   const Result<QString> restored = WTStoreSetup::restoreBackup(QFileInfo(file).absoluteFilePath(), defaults);
@@ -69,12 +74,16 @@ int runRestoreCommand(const QStringList& arguments, QTextStream& out, QTextStrea
 QString damagedStoreAdvice(const Error& error) {
   if (error.code != WTStore::Damaged && error.code != WTStore::NotAStore) return {};
   const QString copy = WTStoreBackup::newestGoodCopy(WTStoreSetup::storePath());
-  if (copy.isEmpty()) return QStringLiteral("There is no good backup in %1.").arg(WTStoreBackup::folder(WTStoreSetup::storePath()));
-  return QStringLiteral("The newest good backup is %1; `tessal restore '%1'` puts it back (the damaged file is kept).")
+  if (copy.isEmpty())
+    return QStringLiteral("There is no good backup in %1.")
+        .arg(WTStoreBackup::folder(WTStoreSetup::storePath()));
+  return QStringLiteral(
+             "The newest good backup is %1; `tessal restore '%1'` puts it back (the damaged file is kept).")
       .arg(copy);
 }
 
 int storeFailure(QTextStream& err, const Error& error) {
   const QString advice = damagedStoreAdvice(error);
-  return failure(err, advice.isEmpty() ? error.message : error.message + u'\n' + QStringLiteral("tessal: ") + advice);
+  return failure(
+      err, advice.isEmpty() ? error.message : error.message + u'\n' + QStringLiteral("tessal: ") + advice);
 }

@@ -14,7 +14,8 @@
 namespace {
 
 constexpr char kUsage[] =
-    "usage: tessal [start|stop|add|status|log|list|import|report|export|template|sync|backup|restore] [ARGS...]\n"
+    "usage: tessal [start|stop|add|status|log|list|import|report|export|template|sync|backup|restore] "
+    "[ARGS...]\n"
     "       (tessal --help tells more)\n";
 
 constexpr char kHelp[] =

@@ -49,7 +49,8 @@ Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
   if (done) done = journalReplacedStore(context, journal);
   if (!done) {
     return Error{WTStore::WriteFailed,
-                 QStringLiteral("the backup is restored, but its records will not sync: %1").arg(done.error().message)};
+                 QStringLiteral("the backup is restored, but its records will not sync: %1")
+                     .arg(done.error().message)};
   }
   return aside;
 }

@@ -50,7 +50,8 @@ void syncFolder(const QString& folder) {
 int copyPages(sqlite3* source, const QString& temporary) {
   // Made here, for the owner alone: SQLite makes its files after the umask, and its rollback journal
   // takes the database file's mode.
-  const int fd = ::open(QFile::encodeName(temporary).constData(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
+  const int fd =
+      ::open(QFile::encodeName(temporary).constData(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
   if (fd < 0) return SQLITE_CANTOPEN;
   ::close(fd);
   sqlite3* target = nullptr;
@@ -117,8 +118,9 @@ Result<void> copy(sqlite3* db, const QString& target) {
   if (code != SQLITE_OK || !QFile::rename(temporary, target)) {
     QFile::remove(temporary);
     QFile::remove(temporary + QStringLiteral("-journal"));
-    return Error{WTStore::WriteFailed,
-                 tr("The data could not be copied to “%1”: %2.").arg(target, QString::fromUtf8(sqlite3_errstr(code)))};
+    return Error{
+        WTStore::WriteFailed,
+        tr("The data could not be copied to “%1”: %2.").arg(target, QString::fromUtf8(sqlite3_errstr(code)))};
   }
   syncFolder(file.absolutePath());
   return {};
@@ -145,8 +147,8 @@ Result<void> copy(const QString& storePath, const QString& target) {
 Result<void> check(const QString& path) {
   if (!QFileInfo(path).isFile()) return Error{WTStore::OpenFailed, tr("There is no file at “%1”.").arg(path)};
   sqlite3* db = nullptr;
-  int code = sqlite3_open_v2(QFile::encodeName(path).constData(), &db, SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX,
-                             nullptr);
+  int code = sqlite3_open_v2(QFile::encodeName(path).constData(), &db,
+                             SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX, nullptr);
   qint64 applicationId = 0, version = 0;
   QByteArray verdict;
   auto read = [&](const char* sql, auto&& take) {
@@ -162,10 +164,10 @@ Result<void> check(const QString& path) {
   read("PRAGMA application_id", [&](sqlite3_stmt* s) { applicationId = sqlite3_column_int64(s, 0); });
   read("PRAGMA user_version", [&](sqlite3_stmt* s) { version = sqlite3_column_int64(s, 0); });
   const int opened = code;
-  if (opened == SQLITE_OK && applicationId == kApplicationId && version >= 1 && version <= WTStore::kSchemaVersion) {
-    read("PRAGMA integrity_check(1)", [&](sqlite3_stmt* s) {
-      verdict = reinterpret_cast<const char*>(sqlite3_column_text(s, 0));
-    });
+  if (opened == SQLITE_OK && applicationId == kApplicationId && version >= 1 &&
+      version <= WTStore::kSchemaVersion) {
+    read("PRAGMA integrity_check(1)",
+         [&](sqlite3_stmt* s) { verdict = reinterpret_cast<const char*>(sqlite3_column_text(s, 0)); });
   }
   sqlite3_close(db);
   if ((opened & 0xff) == SQLITE_NOTADB || (opened == SQLITE_OK && applicationId != kApplicationId))
@@ -193,7 +195,8 @@ void prune(const QString& folderPath, int keep) {
 QString newestGoodCopy(const QString& storePath) {
   const QDir dir(folder(storePath));
   // Newest first, whatever made them: by the time each was written.
-  const QFileInfoList copies = dir.entryInfoList({QStringLiteral("Tessal-*.sqlite")}, QDir::Files, QDir::Time);
+  const QFileInfoList copies =
+      dir.entryInfoList({QStringLiteral("Tessal-*.sqlite")}, QDir::Files, QDir::Time);
   for (const QFileInfo& file : copies)
     if (check(file.absoluteFilePath())) return file.absoluteFilePath();
   return {};
@@ -214,14 +217,16 @@ Result<QString> restore(const QString& backup, const QString& storePath) {
     for (const QString& suffix : {QString(), QStringLiteral("-wal"), QStringLiteral("-shm")}) {
       if (QFileInfo::exists(storePath + suffix) && !QFile::rename(storePath + suffix, aside + suffix)) {
         QFile::remove(incoming);
-        return Error{WTStore::WriteFailed,
-                     tr("The data file “%1” could not be moved aside; nothing was restored.").arg(storePath + suffix)};
+        return Error{
+            WTStore::WriteFailed,
+            tr("The data file “%1” could not be moved aside; nothing was restored.").arg(storePath + suffix)};
       }
     }
   }
   if (!QFile::rename(incoming, storePath)) {
-    return Error{WTStore::WriteFailed,
-                 tr("The copy could not be put in place of “%1”; the old data file is “%2”.").arg(storePath, aside)};
+    return Error{
+        WTStore::WriteFailed,
+        tr("The copy could not be put in place of “%1”; the old data file is “%2”.").arg(storePath, aside)};
   }
   syncFolder(QFileInfo(storePath).absolutePath());
   return aside;
@@ -248,7 +253,8 @@ void Daily::storeDidSave(const QDate& today) {
   running_ = std::async(std::launch::async, [store = storePath_, target] {
     const Result<void> copied = copy(store, target);
     if (!copied) {
-      qCWarning(lcStore, "The day's copy of the data was not made: %s", qUtf8Printable(copied.error().message));
+      qCWarning(lcStore, "The day's copy of the data was not made: %s",
+                qUtf8Printable(copied.error().message));
       return false;
     }
     qCDebug(lcStore, "Copied the data to %s", qUtf8Printable(target));

@@ -8,7 +8,8 @@
 
 Result<void> journalReplacedStore(WTObjectContext& context, const QString& journalPath) {
   RZSyncTrack journal;
-  for (const WTObject* object : context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
+  for (const WTObject* object :
+       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
     journal.updateValues(object->everyValue(), object->uuid(), RZSyncTrack::Section::Inserted);
   // The server sends no device what it wrote itself: under its old identity this installation would
   // never get back its own saves that the copy lacks, nor its own deletions.

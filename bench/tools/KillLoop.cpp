@@ -105,7 +105,8 @@ void edit(WTObjectContext& context, std::mt19937& random, int number) {
   counter->setNotes(QString::number(number));
 }
 
-[[noreturn]] void saveUntilKilled(const QString& storePath, const QString& journalPath, unsigned seed, int fd) {
+[[noreturn]] void saveUntilKilled(const QString& storePath, const QString& journalPath, unsigned seed,
+                                  int fd) {
   auto store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
   if (!store) _exit(2);
   WTObjectContext context(nullptr);
@@ -128,7 +129,8 @@ void edit(WTObjectContext& context, std::mt19937& random, int number) {
 QString integrity(const QString& path) {
   sqlite3* db = nullptr;
   QString verdict = QStringLiteral("(not opened)");
-  if (sqlite3_open_v2(QFile::encodeName(path).constData(), &db, SQLITE_OPEN_READWRITE, nullptr) == SQLITE_OK) {
+  if (sqlite3_open_v2(QFile::encodeName(path).constData(), &db, SQLITE_OPEN_READWRITE, nullptr) ==
+      SQLITE_OK) {
     sqlite3_stmt* statement = nullptr;
     if (sqlite3_prepare_v2(db, "PRAGMA integrity_check", -1, &statement, nullptr) == SQLITE_OK &&
         sqlite3_step(statement) == SQLITE_ROW)
@@ -145,7 +147,8 @@ QString journalDifference(const WTObjectContext& context, const RZSyncTrack& jou
   QSet<QString> live;
   for (const WTObject* object : everything(context)) {
     live.insert(object->uuid());
-    if (journal.isPendingDeletion(object->uuid())) return object->uuid() + QStringLiteral(" is journaled as deleted");
+    if (journal.isPendingDeletion(object->uuid()))
+      return object->uuid() + QStringLiteral(" is journaled as deleted");
     const QVariantMap entry = journal.entry(RZSyncTrack::Section::Inserted, object->uuid());
     if (entry.isEmpty()) return object->uuid() + QStringLiteral(" is not in the journal");
     const QVariantMap values = object->everyValue();
@@ -174,11 +177,16 @@ int main(int argc, char** argv) {
   QString folder;
   for (int i = 1; i + 1 < argc; i += 2) {
     const QByteArray option = argv[i];
-    if (option == "--kills") kills = atoi(argv[i + 1]);
-    else if (option == "--seed") seed = unsigned(strtoul(argv[i + 1], nullptr, 10));
-    else if (option == "--dir") folder = QString::fromLocal8Bit(argv[i + 1]);
-    else if (option == "--max-delay-ms") maxDelayMs = atoi(argv[i + 1]);
-    else return std::fprintf(stderr, "unknown option %s\n", argv[i]), 2;
+    if (option == "--kills")
+      kills = atoi(argv[i + 1]);
+    else if (option == "--seed")
+      seed = unsigned(strtoul(argv[i + 1], nullptr, 10));
+    else if (option == "--dir")
+      folder = QString::fromLocal8Bit(argv[i + 1]);
+    else if (option == "--max-delay-ms")
+      maxDelayMs = atoi(argv[i + 1]);
+    else
+      return std::fprintf(stderr, "unknown option %s\n", argv[i]), 2;
   }
   QTemporaryDir temporary;
   if (folder.isEmpty()) folder = temporary.path();
@@ -218,8 +226,10 @@ int main(int argc, char** argv) {
     Message message;
     while (read(fds[0], &message, sizeof message) == sizeof message) {
       ++messages;
-      if (message.phase == 0) intended[message.number] = message.digest;
-      else lastReturned = message.number, ++returned;
+      if (message.phase == 0)
+        intended[message.number] = message.digest;
+      else
+        lastReturned = message.number, ++returned;
     }
     close(fds[0]);
     if (!WIFSIGNALED(status)) {
@@ -232,7 +242,8 @@ int main(int argc, char** argv) {
       ++faults[what];
       std::printf("kill %d: %s\n", kill, qPrintable(what));
     };
-    if (const QString verdict = integrity(storePath); verdict != QLatin1String("ok") && QFile::exists(storePath)) {
+    if (const QString verdict = integrity(storePath);
+        verdict != QLatin1String("ok") && QFile::exists(storePath)) {
       fault(QStringLiteral("integrity_check: ") + verdict);
       break;
     }
@@ -252,7 +263,8 @@ int main(int argc, char** argv) {
       fault(QStringLiteral("a returned save is lost"));
       break;
     }
-    if (found > lastReturned + 1 || !intended.count(found) || (found > 0 && digestOf(context) != intended[found])) {
+    if (found > lastReturned + 1 || !intended.count(found) ||
+        (found > 0 && digestOf(context) != intended[found])) {
       fault(QStringLiteral("the store holds no whole save"));
       std::printf("  (at save %d; the last that returned: %d)\n", found, lastReturned);
       break;
@@ -269,9 +281,10 @@ int main(int argc, char** argv) {
   }
   int failures = 0;
   for (const auto& [what, count] : faults) failures += count;
-  std::printf("%d kills in %.1f s: %d saves returned, the store at save %d at the end; in %d kills a save "
-              "was in the store without having returned, %d kills came before the first save\n",
-              made, double(clock.elapsed()) / 1000, returned, lastCommitted, inFlightKept, killedWhileOpening);
+  std::printf(
+      "%d kills in %.1f s: %d saves returned, the store at save %d at the end; in %d kills a save "
+      "was in the store without having returned, %d kills came before the first save\n",
+      made, double(clock.elapsed()) / 1000, returned, lastCommitted, inFlightKept, killedWhileOpening);
   std::printf("failures: %d\n", failures);
   for (const auto& [what, count] : faults) std::printf("  %d × %s\n", count, qPrintable(what));
   return failures == 0 ? 0 : 1;

@@ -6,12 +6,14 @@
 #include "WTPreferencesWindowController.h"
 #include "WTStatusBarController.h"
 #include "WTStatusBarPopup.h"
-#include "WTStoreBackup.h"
 #include "WTStopwatchUpdater.h"
+#include "WTStoreBackup.h"
 #include "WTTrackingAlert.h"
 
 #include <QStatusBar>
 #include <QToolButton>
+
+#include <sqlite3.h>
 
 // Each test gets its own data and settings folders.
 class WTAppDelegateTest : public AppTest {
@@ -103,27 +105,63 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
   for (const bool restore : {false, true}) {
     SCOPED_TRACE(restore);
     QFile file(path);
-    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) && file.write(garbage) == garbage.size());
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) &&
+                file.write(garbage) == garbage.size());
     file.close();
     presenter.offers.clear();
     presenter.restores = restore;
     auto delegate = makeDelegate();
     WTObjectContext* context = delegate->managedObjectContext();
     ASSERT_EQ(presenter.offers.size(), 1);
-    EXPECT_TRUE(presenter.offers[0].contains(path) && presenter.offers[0].endsWith("/Tessal-2026-01-02.sqlite"))
+    EXPECT_TRUE(presenter.offers[0].contains(path) &&
+                presenter.offers[0].endsWith("/Tessal-2026-01-02.sqlite"))
         << presenter.offers[0].toStdString();
     QStringList names;
     for (WTProject* project : context->fetch<WTProject>()) names << project->name();
     names.sort();
     EXPECT_EQ(names, restore ? QStringList({"Backed up", "Default Project"}) : QStringList());
     EXPECT_EQ(context->hasStore(), restore);
-    const QStringList kept = QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
+    QStringList kept =
+        QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
+    kept.removeIf([](const QString& name) { return name.endsWith("-wal") || name.endsWith("-shm"); });
     EXPECT_EQ(kept.size(), restore ? 1 : 0);
     QFile damaged(restore ? WTAppDelegate::applicationSupportFolder() + '/' + kept.value(0) : path);
     ASSERT_TRUE(damaged.open(QIODevice::ReadOnly));
     EXPECT_EQ(damaged.readAll(), garbage);
   }
   EXPECT_TRUE(presenter.errors.isEmpty()) << presenter.errors.join('\n').toStdString();
+  // Damage only the check beside the loading finds (a page the loading never reads): nothing is written,
+  // and the refused save names the copy to put back.
+  {
+    std::vector<WTStoreRecord> notes(3000);
+    for (int i = 0; i < 3000; ++i) {
+      notes[i].uuid = QStringLiteral("n%1@WTNote").arg(i);
+      notes[i].entity = QStringLiteral("WTNote");
+    }
+    ASSERT_TRUE(WTStore::open(path).value()->save(notes, {}));
+    // A page of the identity index, which loading does not read.
+    sqlite3* db = nullptr;
+    sqlite3_stmt* statement = nullptr;
+    ASSERT_EQ(sqlite3_open(QFile::encodeName(path).constData(), &db), SQLITE_OK);
+    ASSERT_EQ(
+        sqlite3_prepare_v2(db, "SELECT max(pageno) FROM dbstat WHERE name LIKE 'sqlite_autoindex_records%'",
+                           -1, &statement, nullptr),
+        SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement), SQLITE_ROW);
+    const qint64 page = sqlite3_column_int64(statement, 0);
+    sqlite3_finalize(statement);
+    sqlite3_close(db);
+    QFile file(path);
+    ASSERT_TRUE(page > 1 && file.open(QIODevice::ReadWrite) && file.seek((page - 1) * 4096));
+    ASSERT_EQ(file.write(QByteArray(4096, 0x5a)), 4096);
+  }
+  auto delegate = makeDelegate();
+  WTProject::insertNewObject(delegate->managedObjectContext())->setName("Typed");
+  delegate->saveAction();
+  ASSERT_EQ(presenter.errors.size(), 1);
+  EXPECT_TRUE(presenter.errors[0].contains("damaged") &&
+              presenter.errors[0].contains("/Tessal-2026-01-02.sqlite"))
+      << presenter.errors[0].toStdString();
 }
 
 // The first save of a day leaves the day's copy in the backups, of which the newest 7 stay.
@@ -132,7 +170,8 @@ TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
   ASSERT_TRUE(QDir().mkpath(backups));
   const QDate today = QDate::currentDate();
   QStringList older;
-  for (int days = 8; days >= 1; --days) older << today.addDays(-days).toString(u"'Tessal-'yyyy-MM-dd'.sqlite'");
+  for (int days = 8; days >= 1; --days)
+    older << today.addDays(-days).toString(u"'Tessal-'yyyy-MM-dd'.sqlite'");
   for (const QString& name : older + QStringList{"Tessal-2020-01-01-120000.sqlite"}) {
     QFile file(backups + '/' + name);
     ASSERT_TRUE(file.open(QIODevice::WriteOnly));
@@ -145,9 +184,10 @@ TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
   ASSERT_TRUE(QTest::qWaitFor([&] { return QFile::exists(copy); }, 10000));
   WTProject::insertNewObject(context)->setName("Saved later");
   ASSERT_TRUE(delegate->saveChanges());  // one copy a day
-  delegate.reset();  // waits for a copy in progress
+  delegate.reset();                      // waits for a copy in progress
   EXPECT_TRUE(WTStoreBackup::check(copy).ok());
-  EXPECT_EQ(QFileInfo(copy).permissions(), QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
+  EXPECT_EQ(QFileInfo(copy).permissions(),
+            QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
   WTObjectContext copied;
   auto store = WTStore::openReadOnly(copy);
   ASSERT_TRUE(store && copied.attachStore(std::move(store.value())));

@@ -323,7 +323,8 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   };
   addProject("Before");
   const QString copy = here.expect({"backup"}, 0, here.path("data/Tessal2/Backups/Tessal-")).out.trimmed();
-  EXPECT_EQ(QFileInfo(copy).permissions(), QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
+  EXPECT_EQ(QFileInfo(copy).permissions(),
+            QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
   here.expect({"backup", copy}, 1, "exists already");
   addProject("After");
   const QString store = here.storePath();
@@ -331,7 +332,8 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   const QList<std::pair<QStringList, QString>> refused = {
       {{"restore"}, "name the backup file"},
       {{"restore", here.file("notes.txt", "Not a data file.\n")}, "is not a Tessal data file"},
-      {{"restore", here.file("half.sqlite", bytesOf(copy).left(bytesOf(copy).size() / 2 + 100))}, "is damaged"},
+      {{"restore", here.file("half.sqlite", bytesOf(copy).left(bytesOf(copy).size() / 2 + 100))},
+       "is damaged"},
       {{"restore", here.path("missing.sqlite")}, "There is no file"},
       {{"restore", store}, "is the data file itself"}};
   for (const auto& [arguments, says] : refused) here.expect(arguments, arguments.size() == 1 ? 2 : 1, says);
@@ -342,7 +344,8 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   }
   EXPECT_EQ(bytesOf(store) + bytesOf(store + "-wal"), before);
   const QString kept = here.expect({"restore", copy}, 0, "The replaced data file is kept as ")
-                           .out.section("kept as ", 1).chopped(2);
+                           .out.section("kept as ", 1)
+                           .chopped(2);
   EXPECT_EQ(here.out({"list", "projects"}), "Before\n");
   EXPECT_EQ(bytesOf(kept) + bytesOf(kept + "-wal"), before);
   QFile damaged(store);

@@ -8,10 +8,10 @@
 #include "WTFlat.h"
 #include "WTNote.h"
 #include "WTProject.h"
+#include "WTStoreBackup.h"
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
-#include "WTStoreBackup.h"
 
 #include <iostream>
 #include <random>
