@@ -110,8 +110,12 @@ Result<void> copy(sqlite3* db, const QString& target) {
   const QFileInfo file(target);
   if (file.exists() || file.isSymLink())
     return Error{WTStore::WriteFailed, tr("“%1” exists already; nothing was written.").arg(target)};
+  const bool folderIsNew = !QFileInfo::exists(file.absolutePath());
   if (!QDir().mkpath(file.absolutePath()))
     return Error{WTStore::WriteFailed, tr("The folder “%1” could not be made.").arg(file.absolutePath())};
+  // The copies are as private as the store.
+  if (folderIsNew)
+    QFile::setPermissions(file.absolutePath(), QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
   const QString temporary = target + QStringLiteral(".part");
   QFile::remove(temporary);  // what an interrupted copy left
   const int code = copyPages(db, temporary);

@@ -346,6 +346,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     const QString copy = dir.filePath("Backups/" + copies[0]);
     EXPECT_TRUE(WTStoreBackup::check(copy).ok());
     EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "2", version == 1 ? "0" : "3"}));
+    EXPECT_EQ(int(QFileInfo(dir.filePath("Backups")).permissions() & 0x0777), 0x0700);
     EXPECT_EQ(QFileInfo(copy).permissions(),
               QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
     WTStoreRecord added = record("N@WTClient", "WTClient");
