@@ -51,6 +51,10 @@ int runRestoreCommand(const QStringList& arguments, QTextStream& out, QTextStrea
   QString problem;
   const QString file = positional(arguments, true, &problem);
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, "usage: tessal restore FILE\n", problem);
+  // Nothing, not even the data folder, is made for a copy that is not there.
+  if (!QFileInfo(file).isFile())
+    return failure(err,
+                   QStringLiteral("There is no data file at “%1”.").arg(QFileInfo(file).absoluteFilePath()));
   // The desktop copy keeps the store open and would go on saving into the replaced file.
   if (WTSingleInstanceClient().notifyRunningInstance(2000, false))
     return failure(err,

@@ -34,7 +34,8 @@ QString syncJournalPath() {
 
 Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
   const QString store = storePath();
-  if (QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
+  if (QFileInfo::exists(store) &&
+      QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
     return Error{WTStore::OpenFailed, QStringLiteral("“%1” is the data file itself").arg(backup)};
   const QString journal = syncJournalPath();
   const bool synced = QFileInfo::exists(journal) || !defaults.stringForKey(SettingsKeys::kSyncUser).isEmpty();

@@ -149,7 +149,8 @@ Result<void> copy(const QString& storePath, const QString& target) {
 }
 
 Result<void> check(const QString& path) {
-  if (!QFileInfo(path).isFile()) return Error{WTStore::OpenFailed, tr("There is no file at “%1”.").arg(path)};
+  if (!QFileInfo(path).isFile())
+    return Error{WTStore::OpenFailed, tr("There is no data file at “%1”.").arg(path)};
   sqlite3* db = nullptr;
   int code = sqlite3_open_v2(QFile::encodeName(path).constData(), &db,
                              SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX, nullptr);

@@ -295,8 +295,8 @@ TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
 
 TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   Installation here;
-  const QList<QStringList> noStore = {
-      {"start", "Design"}, {"stop"}, {"status"}, {"add", "Design", "0:30"}, {"export"}};
+  const QList<QStringList> noStore = {{"start", "Design"},       {"stop"},   {"status"},
+                                      {"add", "Design", "0:30"}, {"export"}, {"restore", "none.sqlite"}};
   for (const QStringList& arguments : noStore) here.expect(arguments, 1, "There is no data file at");
   EXPECT_FALSE(QFileInfo::exists(QFileInfo(here.storePath()).path()));
   // The shell alone starts a day's work: the store it makes has the first project, as the desktop's has.
@@ -334,7 +334,7 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
       {{"restore", here.file("notes.txt", "Not a data file.\n")}, "is not a Tessal data file"},
       {{"restore", here.file("half.sqlite", bytesOf(copy).left(bytesOf(copy).size() / 2 + 100))},
        "is damaged"},
-      {{"restore", here.path("missing.sqlite")}, "There is no file"},
+      {{"restore", here.path("missing.sqlite")}, "There is no data file at"},
       {{"restore", store}, "is the data file itself"}};
   for (const auto& [arguments, says] : refused) here.expect(arguments, arguments.size() == 1 ? 2 : 1, says);
   {
