@@ -21,6 +21,9 @@ class WTStopwatchUpdater;
 class WTTrackingAlertPresenter;
 class WTObject;
 class WTObjectContext;
+namespace WTStoreBackup {
+class Daily;
+}
 
 // Owns the one object context, its store file and the sync manager that keeps them in step with the
 // account's server; saves half a second after every change, and decides what happens when the
@@ -41,6 +44,8 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
 
   // The context, made with the store on first use. A store that cannot be opened is reported once;
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.
+  // For a damaged one the report names the newest good backup and offers to restore it
+  // (WTAlertPresenter::offerRestore; WTStoreSetup::restoreBackup keeps the damaged file beside it).
   // A store file made here gets its first project (fillNewStore).
   WTObjectContext* managedObjectContext();
   // What a store file gets when it is made, by the desktop copy or by a command: "Default Project" with
@@ -116,6 +121,8 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // Before the context goes: it observes the context's records.
   std::unique_ptr<WTStopwatchUpdater> stopwatchUpdater_;
   std::function<bool()> commitEditing_;
+  // The day's copy of the store, made after the first save of a day.
+  std::unique_ptr<WTStoreBackup::Daily> dailyBackup_;
   std::unique_ptr<WTPasswordStore> passwordStore_;
   bool displayArchived_ = false;
 };

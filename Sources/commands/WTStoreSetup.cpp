@@ -1,13 +1,17 @@
 #include "WTStoreSetup.h"
 
 #include "MoneyFormat.h"
+#include "RZSyncReplacedStore.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
+#include "WTStore.h"
+#include "WTStoreBackup.h"
 #include "WTTask.h"
 
 #include <QDir>
+#include <QFile>
 #include <QFileInfo>
 #include <QStandardPaths>
 
@@ -26,6 +30,30 @@ QString storePath() {
 QString syncJournalPath() {
   const QFileInfo store(storePath());
   return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+}
+
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
+  const QString store = storePath();
+  if (QFileInfo::exists(store) &&
+      QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
+    return Error{WTStore::OpenFailed, QStringLiteral("“%1” is the data file itself").arg(backup)};
+  const QString journal = syncJournalPath();
+  const bool synced = QFileInfo::exists(journal) || !defaults.stringForKey(SettingsKeys::kSyncUser).isEmpty();
+  const Result<QString> aside = WTStoreBackup::restore(backup, store);
+  if (!aside) return aside;
+  if (!aside.value().isEmpty() && QFileInfo::exists(journal))
+    QFile::copy(journal, journal + aside.value().mid(store.size()));
+  if (!synced) return aside;
+  Result<std::unique_ptr<WTStore>> opened = WTStore::open(store);
+  WTObjectContext context(&defaults);
+  Result<void> done = opened ? context.attachStore(std::move(opened.value())) : Result<void>(opened.error());
+  if (done) done = journalReplacedStore(context, journal);
+  if (!done) {
+    return Error{WTStore::WriteFailed,
+                 QStringLiteral("the backup is restored, but its records will not sync: %1")
+                     .arg(done.error().message)};
+  }
+  return aside;
 }
 
 void registerDefaults(UserDefaults& defaults) {

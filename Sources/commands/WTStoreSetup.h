@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Result.h"
+
 #include <QString>
 
 class UserDefaults;
@@ -14,6 +16,12 @@ QString applicationSupportFolder();
 QString storePath();
 // The store's path with the extension "sync": where the change journal lives.
 QString syncJournalPath();
+
+// Puts the copy at `backup` in place of the store (see WTStoreBackup::restore) and returns the name
+// the replaced store now has. The sync journal is kept beside it under the same addition; when this
+// installation syncs (a journal or a "WTSyncUser"), the restored store is journaled anew
+// (journalReplacedStore). The caller holds the writer lock and knows no desktop copy runs.
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults);
 
 // The settings' values until the user sets them.
 void registerDefaults(UserDefaults& defaults);

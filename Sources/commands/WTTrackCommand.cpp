@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
+#include "WTBackupCommand.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTObjectContext.h"
@@ -73,7 +74,7 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   }
   // A few records change and a failed save is reported at once: no need to read the whole file first.
   Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
-  if (!store) return failure(err, store.error().message);
+  if (!store) return storeFailure(err, store.error());
   store.value()->keepLogOnClose();
   WTStore::Records which =
       WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;

@@ -444,6 +444,22 @@ QVariantMap WTObject::changedValues() const {
   return values;
 }
 
+QVariantMap WTObject::everyValue() const {
+  QVariantMap values;
+  for (const WTKeyDescriptor& key : keys_->keys()) {
+    if (key.stored && key.type == WTKeyType::ToOne) {
+      if (WTObject* related = owner()) values.insert(key.name, KeyPath::variantFromObject(related));
+    } else if (key.stored) {
+      if (QVariant value = fieldValue(key); !value.isNull()) values.insert(key.name, value);
+    } else if (key.journaled && key.type == WTKeyType::Ordered) {
+      // The order of a project's tasks is the project's to tell, as when it changes.
+      if (QList<WTObject*> members = key.members(*this); !members.isEmpty())
+        values.insert(key.name, QVariant::fromValue(WTOrderedRelationship{members}));
+    }
+  }
+  return values;
+}
+
 void WTObject::willSave() {
   WTChangeJournal* journal = context_->changeJournal();
   if (isInserted()) {

@@ -100,6 +100,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   // Changed values since the last save: for a new record every value that is set, otherwise the
   // changed keys only. Relationships are reported as WTChangeJournal.h describes.
   QVariantMap changedValues() const;
+  // Every value that is set, as a new record reports them, and a non-empty order of its members.
+  QVariantMap everyValue() const;
   // Reports this record to the context's change journal as it is about to be saved.
   void willSave();
 

@@ -1,8 +1,10 @@
 #include "WTStore.h"
 
+#include "WTStoreBackup.h"
 #include "WTStoreRows.h"
 
 #include <QCoreApplication>
+#include <QDateTime>
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
@@ -366,6 +368,18 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
   }
   if (version < kSchemaVersion) {
+    // The file as the older version left it stays in the backups: a migration that went wrong, or a
+    // return to that version, still has the data it knew.
+    if (!empty) {
+      const QString copy = WTStoreBackup::unusedPath(
+          WTStoreBackup::beforeMigrationPath(path, QDateTime::currentDateTime(), int(version)));
+      if (const Result<void> copied = WTStoreBackup::copy(db, copy); !copied) {
+        return Error{MigrationFailed,
+                     tr("The data file “%1” was not updated for this version of Tessal, because it could not "
+                        "be copied first: %2")
+                         .arg(path, copied.error().message)};
+      }
+    }
     code = migrate(db, int(version));
     if (code != SQLITE_OK) {
       return Error{MigrationFailed,

@@ -295,8 +295,8 @@ TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
 
 TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   Installation here;
-  const QList<QStringList> noStore = {
-      {"start", "Design"}, {"stop"}, {"status"}, {"add", "Design", "0:30"}, {"export"}};
+  const QList<QStringList> noStore = {{"start", "Design"},       {"stop"},   {"status"},
+                                      {"add", "Design", "0:30"}, {"export"}, {"restore", "none.sqlite"}};
   for (const QStringList& arguments : noStore) here.expect(arguments, 1, "There is no data file at");
   EXPECT_FALSE(QFileInfo::exists(QFileInfo(here.storePath()).path()));
   // The shell alone starts a day's work: the store it makes has the first project, as the desktop's has.
@@ -310,6 +310,48 @@ TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
   syncing.expect({"start", "Design", "--create"}, 1, "there is no project to make it in");
   syncing.expect({"start", "Design", "--project", "Work", "--create"}, 0, "");
   EXPECT_EQ(syncing.out({"list", "projects"}), "Work\n");
+}
+
+// A copy goes back only whole and checked, never while the desktop copy runs, and the store it replaces
+// is kept; a damaged store names the newest good copy.
+TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
+  Installation here;
+  auto addProject = [&](const QString& name) {
+    auto context = here.openStore();
+    project(*context, name);
+    ASSERT_TRUE(context->save());
+  };
+  addProject("Before");
+  const QString copy = here.expect({"backup"}, 0, here.path("data/Tessal2/Backups/Tessal-")).out.trimmed();
+  EXPECT_EQ(QFileInfo(copy).permissions(),
+            QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
+  here.expect({"backup", copy}, 1, "exists already");
+  addProject("After");
+  const QString store = here.storePath();
+  const QByteArray before = bytesOf(store) + bytesOf(store + "-wal");
+  const QList<std::pair<QStringList, QString>> refused = {
+      {{"restore"}, "name the backup file"},
+      {{"restore", here.file("notes.txt", "Not a data file.\n")}, "is not a Tessal data file"},
+      {{"restore", here.file("half.sqlite", bytesOf(copy).left(bytesOf(copy).size() / 2 + 100))},
+       "is damaged"},
+      {{"restore", here.path("missing.sqlite")}, "There is no data file at"},
+      {{"restore", store}, "is the data file itself"}};
+  for (const auto& [arguments, says] : refused) here.expect(arguments, arguments.size() == 1 ? 2 : 1, says);
+  {
+    WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
+    ASSERT_TRUE(desktop.start());
+    here.expect({"restore", copy}, 1, "Tessal is running");
+  }
+  EXPECT_EQ(bytesOf(store) + bytesOf(store + "-wal"), before);
+  const QString kept = here.expect({"restore", copy}, 0, "The replaced data file is kept as ")
+                           .out.section("kept as ", 1)
+                           .chopped(2);
+  EXPECT_EQ(here.out({"list", "projects"}), "Before\n");
+  EXPECT_EQ(bytesOf(kept) + bytesOf(kept + "-wal"), before);
+  QFile damaged(store);
+  ASSERT_TRUE(damaged.open(QIODevice::WriteOnly | QIODevice::Truncate) && damaged.write("garbage") == 7);
+  damaged.close();
+  here.expect({"status"}, 1, "The newest good backup is " + copy);
 }
 
 // Two clients with project names differing in case, quotes and a comma, entries around 3 March in Berlin.

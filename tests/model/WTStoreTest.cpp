@@ -1,8 +1,10 @@
 #include "WTStore.h"
+#include "WTStoreBackup.h"
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
+#include <QDir>
 #include <QFile>
 #include <QFileInfo>
 #include <QTemporaryDir>
@@ -337,6 +339,16 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     auto writer = open();
     ASSERT_TRUE(writer);
     expectSameRecords(loadAll(*writer), expected);
+    // The file as the older version left it stays in the backups, one file of its own, the owner's alone.
+    const QStringList copies =
+        QDir(dir.filePath("Backups")).entryList({QStringLiteral("*-version-%1.sqlite").arg(version)});
+    ASSERT_EQ(copies.size(), 1);
+    const QString copy = dir.filePath("Backups/" + copies[0]);
+    EXPECT_TRUE(WTStoreBackup::check(copy).ok());
+    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "2", version == 1 ? "0" : "3"}));
+    EXPECT_EQ(int(QFileInfo(dir.filePath("Backups")).permissions() & 0x0777), 0x0700);
+    EXPECT_EQ(QFileInfo(copy).permissions(),
+              QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
     WTStoreRecord added = record("N@WTClient", "WTClient");
     added.currency = "JPY";
     added.roundingMinutes = 6;

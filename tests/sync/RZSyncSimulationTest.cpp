@@ -1,6 +1,7 @@
 // Random edits synced through a lossy proxy and a server restart converge on every accepted change, also
 // over three server processes on one database that are killed while they answer.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
+#include "RZSyncReplacedStore.h"
 #include "ServerProcess.h"
 #include "ServerTestSupport.h"
 #include "SqlDatabase.h"
@@ -10,6 +11,7 @@
 #include "WTFlat.h"
 #include "WTNote.h"
 #include "WTProject.h"
+#include "WTStoreBackup.h"
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
@@ -449,6 +451,63 @@ TEST(RZSyncReplicaSimulation, RandomEditsOnThreeReplicasKilledWhileTheyAnswerCon
               << " while answering, " << replicas.appliedUnansweredSaves << " after committing a save\n";
     if (HasFailure()) break;
   }
+}
+
+// A device puts back a copy of its store from before its own and another device's saves: the journal
+// started again, it gets back what was saved since, and the server neither brings back what was deleted
+// since nor loses what the copy lacks.
+TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
+  const servertest::StorageLocation storage(GetParam());
+  const QString user = Simulation::kUser, password = Simulation::kPassword;
+  servertest::LocalServer server(storage.location(), user.toStdString(), password.toStdString());
+  SyncClient here(server.address(), user, password), there(server.address(), user, password);
+  auto task = [](SyncClient& client, const QString& name, WTProject* project) {
+    auto* task = client.context->insertNewObject<WTTask>();
+    task->setName(name);
+    task->setProject(project);
+    return task;
+  };
+  auto* project = here.context->insertNewObject<WTProject>();
+  project->setName("Project");
+  WTTask* gone = task(here, "Deleted here", project);
+  WTTask* renamed = task(here, "Renamed", project);
+  task(here, "Deleted there", project);
+  here.save();
+  ASSERT_TRUE(here.syncOnce() && here.syncOnce() && there.syncOnce());
+  const QString copy = here.dir.filePath("copy.sqlite");
+  ASSERT_TRUE(WTStoreBackup::copy(here.dir.filePath("Tessal.sqlite"), copy).ok());
+
+  task(here, "Added here", project);
+  here.context->deleteObject(gone);
+  renamed->setName("Renamed since");
+  here.save();
+  ASSERT_TRUE(here.syncOnce());
+  for (WTTask* other : there.context->fetch<WTTask>())
+    if (other->name() == "Deleted there") there.context->deleteObject(other);
+  task(there, "Added there", there.find<WTProject>(project->uuid()));
+  there.save();
+  ASSERT_TRUE(there.syncOnce());
+
+  here.close();
+  ASSERT_TRUE(WTStoreBackup::restore(copy, here.dir.filePath("Tessal.sqlite")));
+  {
+    WTObjectContext restored(here.defaults.get());
+    auto store = WTStore::open(here.dir.filePath("Tessal.sqlite"));
+    ASSERT_TRUE(store && restored.attachStore(std::move(store.value())));
+    ASSERT_TRUE(journalReplacedStore(restored, here.journalPath()));
+  }
+  here.open();
+  for (int round = 0; round < 3; ++round) ASSERT_TRUE(here.syncOnce() && there.syncOnce());
+  EXPECT_FALSE(here.track().hasChanges() || there.track().hasChanges());
+  QStringList names;
+  for (WTTask* each : here.context->fetch<WTTask>()) names << each->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Added here", "Added there", "Renamed since"}));
+  EXPECT_EQ(snapshot(*here.context), snapshot(*there.context));
+  // A device set up afresh gets the same from the server.
+  SyncClient fresh(server.address(), user, password);
+  ASSERT_TRUE(fresh.syncOnce());
+  EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, RZSyncSimulation,
