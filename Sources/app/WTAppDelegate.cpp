@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "RZSyncTrack.h"
 #include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
@@ -38,10 +39,6 @@ QString WTAppDelegate::storePath() {
   return WTStoreSetup::storePath();
 }
 
-QString WTAppDelegate::syncJournalPath() {
-  return WTStoreSetup::syncJournalPath();
-}
-
 WTObjectContext* WTAppDelegate::managedObjectContext() {
   if (context_) return context_.get();
   const QString folder = applicationSupportFolder();
@@ -52,7 +49,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   const bool storeIsNew = !QFileInfo::exists(storePath());
   bool fill = false;
   Result<std::unique_ptr<WTStore>> store =
-      WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      RZSyncTrack::openStore(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
   if (store) {
     Result<void> loaded = context_->attachStore(std::move(store.value()));
     if (!loaded) presenter_->presentError(loaded.error().message);
@@ -63,7 +60,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   connect(context_.get(), &WTObjectContext::objectsDidChange, this,
           &WTAppDelegate::managedObjectContextObjectsDidChange);
 
-  syncManager_ = std::make_unique<RZSyncManager>(context_.get(), syncJournalPath());
+  syncManager_ = std::make_unique<RZSyncManager>(context_.get());
   syncManager_->syncNetwork()->setCredentialDelegate(this);
   if (syncErrorPresenter_) syncManager_->setErrorPresenter(syncErrorPresenter_);
   // A merge first saves what the user is typing, the way every safe save does.

@@ -8,7 +8,6 @@
 #include "WTTask.h"
 
 #include <QDir>
-#include <QFileInfo>
 #include <QStandardPaths>
 
 namespace WTStoreSetup {
@@ -21,11 +20,6 @@ QString applicationSupportFolder() {
 
 QString storePath() {
   return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
-}
-
-QString syncJournalPath() {
-  const QFileInfo store(storePath());
-  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
 }
 
 void registerDefaults(UserDefaults& defaults) {

@@ -12,8 +12,6 @@ namespace WTStoreSetup {
 // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
 QString applicationSupportFolder();
 QString storePath();
-// The store's path with the extension "sync": where the change journal lives.
-QString syncJournalPath();
 
 // The settings' values until the user sets them.
 void registerDefaults(UserDefaults& defaults);
