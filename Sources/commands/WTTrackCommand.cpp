@@ -62,8 +62,8 @@ Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
 
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
 // Only the records the command needs are read; what changes is saved together with its sync journal
-// entries, as the desktop copy would have done, so that the next sync sends it. A command that may make records makes
-// the store when there is none, filled as the desktop copy fills a store it makes.
+// entries, as the desktop copy would have done, so that the next sync sends it. A command that may make
+// records makes the store when there is none, filled as the desktop copy fills a store it makes.
 int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments,
                QTextStream& out, QTextStream& err) {
   const bool storeIsNew = !QFileInfo::exists(storePath);

@@ -96,13 +96,14 @@ int addImportColumn(sqlite3* db) {
 // inserted, 'u' updated) the pending values as a JSON object's text; the pending deletions in the order
 // they were made; the server iteration.
 int addJournalTables(sqlite3* db) {
-  return sqlite3_exec(db,
-                      "CREATE TABLE journal (uuid TEXT NOT NULL, section TEXT NOT NULL, changes TEXT NOT NULL,"
-                      "  PRIMARY KEY (uuid, section)) WITHOUT ROWID;"
-                      "CREATE TABLE journal_deletions (position INTEGER PRIMARY KEY, uuid TEXT NOT NULL UNIQUE);"
-                      "CREATE TABLE journal_state (name TEXT PRIMARY KEY NOT NULL, value) WITHOUT ROWID;"
-                      "INSERT INTO journal_state VALUES ('iteration', 0);",
-                      nullptr, nullptr, nullptr);
+  return sqlite3_exec(
+      db,
+      "CREATE TABLE journal (uuid TEXT NOT NULL, section TEXT NOT NULL, changes TEXT NOT NULL,"
+      "  PRIMARY KEY (uuid, section)) WITHOUT ROWID;"
+      "CREATE TABLE journal_deletions (position INTEGER PRIMARY KEY, uuid TEXT NOT NULL UNIQUE);"
+      "CREATE TABLE journal_state (name TEXT PRIMARY KEY NOT NULL, value) WITHOUT ROWID;"
+      "INSERT INTO journal_state VALUES ('iteration', 0);",
+      nullptr, nullptr, nullptr);
 }
 
 // The journal's statements (WTStore::JournalStatement), bound alike: ?1 the uuid, ?2 the section, ?3 the
@@ -415,8 +416,9 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
       return SQLITE_ABORT;
     });
     if (importFailed) {
-      return Error{MigrationFailed, tr("The data file “%1” could not be updated for this version of Tessal: %2")
-                                        .arg(path, importFailed->message)};
+      return Error{MigrationFailed,
+                   tr("The data file “%1” could not be updated for this version of Tessal: %2")
+                       .arg(path, importFailed->message)};
     }
     if (code != SQLITE_OK) {
       return Error{MigrationFailed,
@@ -513,7 +515,7 @@ Error WTStore::namelessError() const {
 }
 
 Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& deletedUuids,
-                              const JournalStep& journal) {
+                               const JournalStep& journal) {
   // Deleting "" would silently remove nothing.
   if (deletedUuids.contains(QString())) return namelessError();
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();
@@ -565,19 +567,21 @@ Result<void> WTStore::writeJournal(const JournalStep& step) {
 }
 
 Error WTStore::readError(int code) const {
-  if (isDamage(code)) return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};
+  if (isDamage(code))
+    return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};
   return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
 }
 
 sqlite3_stmt* WTStore::journalStatement(int which, int* code) {
   *code = SQLITE_OK;
   if (!journal_[which])
-    *code = sqlite3_prepare_v3(db_, kJournalSql[which], -1, SQLITE_PREPARE_PERSISTENT, &journal_[which], nullptr);
+    *code =
+        sqlite3_prepare_v3(db_, kJournalSql[which], -1, SQLITE_PREPARE_PERSISTENT, &journal_[which], nullptr);
   return journal_[which];
 }
 
-Result<void> WTStore::JournalWriter::step(int which, const QString& uuid, char section, const QByteArray& text,
-                                          qint64 number) {
+Result<void> WTStore::JournalWriter::step(int which, const QString& uuid, char section,
+                                          const QByteArray& text, qint64 number) {
   int code = SQLITE_OK;
   sqlite3_stmt* s = store_.journalStatement(which, &code);
   const int parameters = s ? sqlite3_bind_parameter_count(s) : 0;

@@ -16,9 +16,10 @@ struct sqlite3_stmt;
 
 // The one store file: every record in one SQLite table, written in WAL mode with full syncing, one
 // transaction per save. The sync's journal of unsent changes lives in the same file (see JournalWriter),
-// so that a save and the journal entries of what it changed are written in that one transaction. The schema version lives in PRAGMA user_version; a file written by an older
-// version is migrated in order when opened. A file that is not a store, is damaged or was written by a
-// newer version is refused without being changed in any way.
+// so that a save and the journal entries of what it changed are written in that one transaction. The schema
+// version lives in PRAGMA user_version; a file written by an older version is migrated in order when opened.
+// A file that is not a store, is damaged or was written by a newer version is refused without being changed
+// in any way.
 class WTStore {
  public:
   static constexpr int kSchemaVersion = 6;
@@ -62,7 +63,8 @@ class WTStore {
    private:
     friend class WTStore;
     explicit JournalWriter(WTStore& store) : store_(store) {}
-    Result<void> step(int statement, const QString& uuid, char section, const QByteArray& text, qint64 number);
+    Result<void> step(int statement, const QString& uuid, char section, const QByteArray& text,
+                      qint64 number);
     WTStore& store_;
   };
   using JournalStep = std::function<Result<void>(JournalWriter&)>;
@@ -133,20 +135,32 @@ class WTStore {
   };
   Result<JournalRecord> journalRecord(const QString& uuid);
   // Every journal row: each entry to `entry`, the deletions in order to `deletion`, and the iteration.
-  Result<void> readJournal(const std::function<void(const QString& uuid, char section, const QByteArray& changes)>& entry,
-                           const std::function<void(const QString& uuid, qint64 order)>& deletion,
-                           qint64* iteration);
+  Result<void> readJournal(
+      const std::function<void(const QString& uuid, char section, const QByteArray& changes)>& entry,
+      const std::function<void(const QString& uuid, qint64 order)>& deletion, qint64* iteration);
   // The largest place a pending deletion holds; 0 when there is none.
   Result<qint64> lastJournalDeletion();
 
  private:
   WTStore(QString path, sqlite3* db);
-  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly, Check check,
-                                               const JournalImport& import);
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly,
+                                               Check check, const JournalImport& import);
   // The journal's statements, prepared on first use: a command that never saves never needs them.
-  enum JournalStatement { SetEntry, RemoveEntry, SetDeletion, RemoveDeletion, SetIteration, ClearEntries,
-                          ClearDeletions, ReadRecord, ReadEntries, ReadDeletions, ReadIteration, LastDeletion,
-                          kJournalStatements };
+  enum JournalStatement {
+    SetEntry,
+    RemoveEntry,
+    SetDeletion,
+    RemoveDeletion,
+    SetIteration,
+    ClearEntries,
+    ClearDeletions,
+    ReadRecord,
+    ReadEntries,
+    ReadDeletions,
+    ReadIteration,
+    LastDeletion,
+    kJournalStatements
+  };
   sqlite3_stmt* journalStatement(int which, int* code);
   Error readError(int code) const;
   Result<void> prepareStatements(bool writing);

@@ -71,7 +71,8 @@ bool isEmptyChangeSet(const QVariantMap& changes) {
 RZSyncManager::RZSyncManager(WTObjectContext* context, QObject* parent)
     : QObject(parent),
       context_(context),
-      track_(std::make_unique<RZSyncTrack>(context ? context->store() : nullptr, RZSyncTrack::Loading::Whole)),
+      track_(
+          std::make_unique<RZSyncTrack>(context ? context->store() : nullptr, RZSyncTrack::Loading::Whole)),
       network_(new RZSyncNetwork(QUrl(), this, this)),
       logPresenter_(std::make_unique<RZSyncLogErrorPresenter>()) {
   Q_ASSERT_X(context, "RZSyncManager", "line 252: a sync manager needs an object context");

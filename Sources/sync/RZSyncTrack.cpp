@@ -60,7 +60,8 @@ std::optional<QVariantMap> entryValues(const QString& uuid, const QByteArray& te
   QString problem;
   const std::optional<QVariant> parsed = RZSyncJSON::parse(text, &problem);
   if (parsed && parsed->typeId() == QMetaType::QVariantMap) return parsed->toMap();
-  qCWarning(lcSync).noquote() << QStringLiteral("The journal entry of %1 cannot be read: %2").arg(uuid, problem);
+  qCWarning(lcSync).noquote()
+      << QStringLiteral("The journal entry of %1 cannot be read: %2").arg(uuid, problem);
   return std::nullopt;
 }
 
@@ -101,10 +102,11 @@ void RZSyncTrack::readWhole() {
 }
 
 void RZSyncTrack::take(const QString& uuid, const WTStore::JournalRecord& record) {
-  for (const auto& [section, text] : {std::pair{Section::Inserted, &record.inserted},
-                                      std::pair{Section::Updated, &record.updated}}) {
+  for (const auto& [section, text] :
+       {std::pair{Section::Inserted, &record.inserted}, std::pair{Section::Updated, &record.updated}}) {
     if (text->isNull()) continue;
-    if (std::optional<QVariantMap> values = entryValues(uuid, *text)) entriesFor(section).insert(uuid, *values);
+    if (std::optional<QVariantMap> values = entryValues(uuid, *text))
+      entriesFor(section).insert(uuid, *values);
   }
   if (record.deletion >= 0) {
     deleted_.append(uuid);
@@ -192,9 +194,8 @@ void RZSyncTrack::saveEnded(bool written) {
 
 Result<void> RZSyncTrack::write() {
   if (!store_ || (changed_.isEmpty() && !cleared_ && !iterationChanged_)) return {};
-  const Result<void> written = store_->writeJournal([this](WTStore::JournalWriter& writer) {
-    return writeChanges(writer);
-  });
+  const Result<void> written =
+      store_->writeJournal([this](WTStore::JournalWriter& writer) { return writeChanges(writer); });
   saveEnded(written.ok());
   return written;
 }
@@ -203,7 +204,8 @@ Result<void> RZSyncTrack::journalEveryRecord(WTObjectContext& context) {
   resetChanges();
   setIteration(0);
   iterationChanged_ = true;
-  for (WTObject* object : context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
+  for (WTObject* object :
+       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
     updateValues(object->setValues(), object->uuid(), Section::Updated);
   return write();
 }
@@ -226,7 +228,8 @@ Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, con
           qCWarning(lcSync).noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
           // Whatever the file holds may be someone's unsent work: keep it where a person can find it.
           if (!QFile::rename(file, freeName(file, QStringLiteral(".corrupt"))))
-            qCWarning(lcSync).noquote() << QStringLiteral("Could not move the unreadable journal %1 aside").arg(file);
+            qCWarning(lcSync).noquote()
+                << QStringLiteral("Could not move the unreadable journal %1 aside").arg(file);
           return {};
         }
         imported = true;
@@ -235,7 +238,8 @@ Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, con
   if (store && imported) {
     // The journal is in the store now; the file stays, under another name, for whoever looks for it.
     if (!QFile::rename(file, freeName(file, QStringLiteral(".migrated"))))
-      qCWarning(lcSync).noquote() << QStringLiteral("Could not rename the journal %1, which is in the data file now").arg(file);
+      qCWarning(lcSync).noquote()
+          << QStringLiteral("Could not rename the journal %1, which is in the data file now").arg(file);
   } else if (store && QFileInfo::exists(file)) {
     qCWarning(lcSync).noquote()
         << QStringLiteral("Ignoring %1: the journal is kept in the data file now").arg(file);
@@ -301,7 +305,6 @@ bool RZSyncTrack::readFile(const QString& path, QString* problemOut) {
   }
   return true;
 }
-
 
 void RZSyncTrack::resetChanges() {
   inserted_.clear();

@@ -140,9 +140,9 @@ class RZSyncTrack final : public WTChangeJournal {
   qint64 iteration_ = 0;
   Entries inserted_;
   Entries updated_;
-  QStringList deleted_;                    // in order
-  QHash<QString, qint64> deletionOrder_;   // each pending deletion's place in its rows
-  qint64 lastDeletion_ = 0;                // -1: not read yet
+  QStringList deleted_;                   // in order
+  QHash<QString, qint64> deletionOrder_;  // each pending deletion's place in its rows
+  qint64 lastDeletion_ = 0;               // -1: not read yet
   QSet<QString> retired_;
 
   WTStore* store_ = nullptr;

@@ -42,10 +42,12 @@ class Installation {
     QStringList lines;
     if (auto store = WTStore::openReadOnly(storePath(), WTStore::Check::Header)) {
       EXPECT_TRUE(store.value()
-                      ->readJournal([&](const QString& uuid, char section, const QByteArray& changes) {
-                        lines << uuid + ' ' + QChar::fromLatin1(section) + ' ' + QString::fromUtf8(changes);
-                      },
-                      [&](const QString& uuid, qint64) { lines << uuid + QStringLiteral(" x"); }, nullptr)
+                      ->readJournal(
+                          [&](const QString& uuid, char section, const QByteArray& changes) {
+                            lines << uuid + ' ' + QChar::fromLatin1(section) + ' ' +
+                                         QString::fromUtf8(changes);
+                          },
+                          [&](const QString& uuid, qint64) { lines << uuid + QStringLiteral(" x"); }, nullptr)
                       .ok());
     }
     return lines;

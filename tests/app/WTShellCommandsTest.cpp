@@ -6,8 +6,8 @@
 #include <QElapsedTimer>
 #include <QJsonArray>
 #include <QJsonDocument>
-#include <QRegularExpression>
 #include <QJsonObject>
+#include <QRegularExpression>
 #include <QThread>
 #include <QTimeZone>
 

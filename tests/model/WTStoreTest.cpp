@@ -593,7 +593,8 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
               return written;
           return rows.setDeletion(gone, save);
         };
-        if (!store.value()->saveFrom([&] { return next == records.end() ? nullptr : &*next++; }, {gone}, journal))
+        if (!store.value()->saveFrom([&] { return next == records.end() ? nullptr : &*next++; }, {gone},
+                                     journal))
           _exit(3);
         if (write(fds[1], &save, sizeof save) != sizeof save) _exit(4);
       }
@@ -613,10 +614,12 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     std::vector<std::pair<QString, qint64>> deletions;
     if (auto store = open()) {
       records = loadAll(*store);
-      ASSERT_TRUE(store->readJournal([&](const QString& uuid, char, const QByteArray& changes) { entries[uuid] = changes; },
-                                     [&](const QString& uuid, qint64 order) { deletions.emplace_back(uuid, order); },
-                                     nullptr)
-                      .ok());
+      ASSERT_TRUE(
+          store
+              ->readJournal(
+                  [&](const QString& uuid, char, const QByteArray& changes) { entries[uuid] = changes; },
+                  [&](const QString& uuid, qint64 order) { deletions.emplace_back(uuid, order); }, nullptr)
+              .ok());
     }
     ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
     ASSERT_TRUE(records.contains(kCounter));

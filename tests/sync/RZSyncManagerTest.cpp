@@ -321,7 +321,8 @@ TEST_F(RZSyncManagerTest, TheWaitBeforeTheNextPollFollowsWhatHappened) {
   task->setName("While off");
   client.save();
   EXPECT_EQ(manager.scheduledInterval(), -1);
-  EXPECT_TRUE(synctest::StoredJournal(client.storePath()).track.entries(Section::Inserted).contains("S@WTTask"));
+  EXPECT_TRUE(
+      synctest::StoredJournal(client.storePath()).track.entries(Section::Inserted).contains("S@WTTask"));
 
   manager.setIntervals({40, 80, 40});
   bool failing = true;
