@@ -73,16 +73,17 @@ TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
                    R"("u":{"E@WTTime":{"endDate":1700000000}},"x":["C@WTClient"]})");
   const auto stored = [&] {
     const synctest::StoredJournal journal(path);
-    EXPECT_TRUE(journal.track.entry(Section::Inserted, "T@WTTask")
-                    .value("budget")
-                    .value<Decimal>()
-                    .isIdenticalTo(dec("12.30")));
     return std::to_string(journal.track.iteration()) + ' ' + compact(journal.track.dictionary());
   };
   EXPECT_EQ(stored(), "12 " + saved);
+  EXPECT_TRUE(synctest::StoredJournal(path)
+                  .track.entry(Section::Inserted, "T@WTTask")
+                  .value("budget")
+                  .value<Decimal>()
+                  .isIdenticalTo(dec("12.30")));
 
   task->setName("Design");
-  task->setNotes(QString(256 * 1024, u'x'));
+  task->setNotes(QString(64 * 1024, u'x'));
   struct rlimit old {};
   ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
   const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
@@ -98,6 +99,13 @@ TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
   EXPECT_TRUE(context.hasChanges());
   ASSERT_TRUE(context.save().ok());
   EXPECT_EQ(synctest::StoredJournal(path).track.entry(Section::Inserted, "T@WTTask").value("name"), "Design");
+
+  // A store replaced as a whole is journaled again: every record as updated, from iteration 0.
+  task->setNotes("n");
+  ASSERT_TRUE(context.save().ok());
+  ASSERT_TRUE(track.journalEveryRecord(context).ok());
+  EXPECT_EQ(stored(), R"(0 {"i":{},"u":{"T@WTTask":{"archived":false,"budget":12.30,"name":"Design",)"
+                      R"("notes":"n","uuid":"T@WTTask"}},"x":[]})");
 }
 
 // An older store's journal file is read into the store once, as it is updated, and kept as ".migrated";
