@@ -12,6 +12,7 @@
 #include <QFileInfo>
 #include <QtDebug>
 
+#include <algorithm>
 #include <cmath>
 
 namespace {
@@ -150,9 +151,12 @@ Result<void> RZSyncTrack::writeChanges(WTStore::JournalWriter& writer) {
   Result<void> written;
   if (cleared_) written = writer.clear();
   if (written && iterationChanged_) written = writer.setIteration(iteration_);
-  for (auto it = changed_.constBegin(); written && it != changed_.constEnd(); ++it) {
-    const QString& uuid = it.key();
-    const Stored& stored = it.value();
+  // In order: rows inserted by key fill the table's pages one after another.
+  QStringList uuids = changed_.keys();
+  std::sort(uuids.begin(), uuids.end());
+  for (auto it = uuids.cbegin(); written && it != uuids.cend(); ++it) {
+    const QString& uuid = *it;
+    const Stored stored = changed_.value(uuid);
     // A row is written where the entry is, removed where it was and is no more.
     for (const auto& [row, entries, was] : {std::tuple{kInsertedRow, &inserted_, stored.inserted},
                                             std::tuple{kUpdatedRow, &updated_, stored.updated}}) {

@@ -27,7 +27,8 @@ class WTObjectContext;
 class RZSyncTrack final : public WTChangeJournal {
  public:
   enum class Section { Inserted, Updated };    // "i" and "u"
-  using Entries = QMap<QString, QVariantMap>;  // uuid -> key -> JSON value
+  // uuid -> key -> JSON value. Unordered: an import journals a hundred thousand records one by one.
+  using Entries = QHash<QString, QVariantMap>;
 
   // How much of the store's journal is held in memory: all of it (the sync manager's, which sends and
   // merges it), or only the entries of the records a save reports, read as they are reported (a
