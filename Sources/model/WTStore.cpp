@@ -123,6 +123,7 @@ constexpr const char* kJournalSql[] = {
     "SELECT uuid, position FROM journal_deletions ORDER BY position",
     "SELECT value FROM journal_state WHERE name = 'iteration'",
     "SELECT coalesce(max(position), 0) FROM journal_deletions",
+    "SELECT NOT EXISTS (SELECT 1 FROM journal) AND NOT EXISTS (SELECT 1 FROM journal_deletions)",
 };
 
 // A file older than version 5 read without migrating it: a view in the connection's own temporary schema
@@ -675,15 +676,25 @@ Result<void> WTStore::readJournal(
   return {};
 }
 
+Result<bool> WTStore::journalIsEmpty() {
+  const Result<qint64> empty = journalNumber(IsEmpty);
+  if (!empty) return empty.error();
+  return empty.value() != 0;
+}
+
 Result<qint64> WTStore::lastJournalDeletion() {
+  return journalNumber(LastDeletion);
+}
+
+Result<qint64> WTStore::journalNumber(int which) {
   int code = SQLITE_OK;
-  sqlite3_stmt* s = journalStatement(LastDeletion, &code);
-  qint64 last = 0;
+  sqlite3_stmt* s = journalStatement(which, &code);
+  qint64 number = 0;
   if (code == SQLITE_OK && (code = sqlite3_step(s)) == SQLITE_ROW) {
-    last = sqlite3_column_int64(s, 0);
+    number = sqlite3_column_int64(s, 0);
     code = sqlite3_step(s);
   }
   if (s) sqlite3_reset(s);
   if (code != SQLITE_DONE) return readError(code);
-  return last;
+  return number;
 }

@@ -140,6 +140,8 @@ class WTStore {
       const std::function<void(const QString& uuid, qint64 order)>& deletion, qint64* iteration);
   // The largest place a pending deletion holds; 0 when there is none.
   Result<qint64> lastJournalDeletion();
+  // Whether the journal holds no entry and no deletion (as after a sync).
+  Result<bool> journalIsEmpty();
 
  private:
   WTStore(QString path, sqlite3* db);
@@ -159,9 +161,12 @@ class WTStore {
     ReadDeletions,
     ReadIteration,
     LastDeletion,
+    IsEmpty,
     kJournalStatements
   };
   sqlite3_stmt* journalStatement(int which, int* code);
+  // The one number a journal statement answers.
+  Result<qint64> journalNumber(int which);
   Error readError(int code) const;
   Result<void> prepareStatements(bool writing);
   Error writeError(int code) const;

@@ -77,7 +77,14 @@ QString freeName(const QString& path, const QString& suffix) {
 
 RZSyncTrack::RZSyncTrack(WTStore* store, Loading loading)
     : lastDeletion_(-1), store_(store), onDemand_(loading == Loading::OnDemand) {
-  if (!onDemand_) readWhole();
+  if (!onDemand_) {
+    readWhole();
+    return;
+  }
+  // Nothing pending (as after a sync): no record's rows need reading.
+  const Result<bool> empty = store_ ? store_->journalIsEmpty() : Result<bool>(true);
+  nothingStored_ = empty && empty.value();
+  if (nothingStored_) lastDeletion_ = 0;
 }
 
 void RZSyncTrack::readWhole() {
@@ -116,7 +123,7 @@ void RZSyncTrack::take(const QString& uuid, const WTStore::JournalRecord& record
 }
 
 void RZSyncTrack::fetch(const QString& uuid) {
-  if (!onDemand_ || !store_ || cleared_ || fetched_.contains(uuid)) return;
+  if (!onDemand_ || !store_ || cleared_ || nothingStored_ || fetched_.contains(uuid)) return;
   fetched_.insert(uuid);
   const Result<WTStore::JournalRecord> record = store_->journalRecord(uuid);
   if (!record) {

@@ -148,6 +148,7 @@ class RZSyncTrack final : public WTChangeJournal {
 
   WTStore* store_ = nullptr;
   bool onDemand_ = false;
+  bool nothingStored_ = false;  // on demand: the rows held nothing when read
   bool recordsSaves_ = true;
   QSet<QString> fetched_;
   // Changed since the last write.

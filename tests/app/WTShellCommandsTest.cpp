@@ -103,7 +103,9 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
     if (!task->color().isNull()) colors << task->name() + " " + WTObject::colorText(task->color());
   EXPECT_EQ(colors, QStringList({"Design #80ff0000"}));
   // The entries wait in the sync journal, as the desktop copy's own changes do.
-  EXPECT_EQ(here.journal().filter(QRegularExpression("@WTTime i ")).size(), 2);
+  // Each entry's stop joined its start's insertion, read back from the store by the stopping command.
+  EXPECT_EQ(here.journal().filter(QRegularExpression("@WTTime i .*\"endDate\"")).size(), 2);
+  EXPECT_EQ(here.journal().filter(QRegularExpression("@WTTime u ")).size(), 0);
 }
 
 TEST_F(TrackCommand, StartingStopsTheOtherTimersWhenTheSettingSaysSo) {
