@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "RZSyncTrack.h"
 #include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
@@ -39,10 +40,6 @@ QString WTAppDelegate::storePath() {
   return WTStoreSetup::storePath();
 }
 
-QString WTAppDelegate::syncJournalPath() {
-  return WTStoreSetup::syncJournalPath();
-}
-
 WTObjectContext* WTAppDelegate::managedObjectContext() {
   if (context_) return context_.get();
   const QString folder = applicationSupportFolder();
@@ -53,7 +50,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   const bool storeIsNew = !QFileInfo::exists(storePath());
   bool fill = false;
   Result<std::unique_ptr<WTStore>> store =
-      WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      RZSyncTrack::openStore(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
   if (!store && (store.error().code == WTStore::Damaged || store.error().code == WTStore::NotAStore)) {
     // Never replaced unasked: the damaged file stays as it is unless the user takes a backup instead,
     // and then it is kept beside the restored one.
@@ -62,7 +59,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
       presenter_->presentError(store.error().message);
     } else if (presenter_->offerRestore(store.error().message, backup)) {
       const Result<QString> restored = WTStoreSetup::restoreBackup(backup, *defaults_);
-      if (restored) store = WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      if (restored) store = RZSyncTrack::openStore(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
       if (!restored || !store)
         presenter_->presentError(restored ? store.error().message : restored.error().message);
     }
@@ -81,7 +78,7 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
     connect(context_.get(), &WTObjectContext::didSave, this, [this] { dailyBackup_->storeDidSave(); });
   }
 
-  syncManager_ = std::make_unique<RZSyncManager>(context_.get(), syncJournalPath());
+  syncManager_ = std::make_unique<RZSyncManager>(context_.get());
   syncManager_->syncNetwork()->setCredentialDelegate(this);
   if (syncErrorPresenter_) syncManager_->setErrorPresenter(syncErrorPresenter_);
   // A merge first saves what the user is typing, the way every safe save does.

@@ -39,8 +39,6 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
   static QString applicationSupportFolder();
   static QString storePath();
-  // The store's path with the extension "sync": where the change journal lives.
-  static QString syncJournalPath();
 
   // The context, made with the store on first use. A store that cannot be opened is reported once;
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.
@@ -54,7 +52,7 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // set up. A store that exists is never filled, so the user's own emptying it sticks. Saves nothing.
   static void fillNewStore(WTObjectContext& context);
   bool hasContext() const { return context_ != nullptr; }
-  // Made with the context, over syncJournalPath(), with syncing switched on; null before that.
+  // Made with the context, over the store's journal, with syncing switched on; null before that.
   RZSyncManager* syncManager() const { return syncManager_.get(); }
   // Where sync errors are shown (not owned); the log until set. Applies to a manager made later too.
   void setSyncErrorPresenter(RZSyncErrorPresenter* presenter);

@@ -2,6 +2,7 @@
 
 #include "MoneyFormat.h"
 #include "RZSyncReplacedStore.h"
+#include "RZSyncTrack.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTObjectContext.h"
@@ -11,7 +12,6 @@
 #include "WTTask.h"
 
 #include <QDir>
-#include <QFile>
 #include <QFileInfo>
 #include <QStandardPaths>
 
@@ -27,27 +27,17 @@ QString storePath() {
   return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
 }
 
-QString syncJournalPath() {
-  const QFileInfo store(storePath());
-  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
-}
-
 Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
   const QString store = storePath();
   if (QFileInfo::exists(store) &&
       QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
     return Error{WTStore::OpenFailed, QStringLiteral("“%1” is the data file itself").arg(backup)};
-  const QString journal = syncJournalPath();
-  const bool synced = QFileInfo::exists(journal) || !defaults.stringForKey(SettingsKeys::kSyncUser).isEmpty();
   const Result<QString> aside = WTStoreBackup::restore(backup, store);
   if (!aside) return aside;
-  if (!aside.value().isEmpty() && QFileInfo::exists(journal))
-    QFile::copy(journal, journal + aside.value().mid(store.size()));
-  if (!synced) return aside;
-  Result<std::unique_ptr<WTStore>> opened = WTStore::open(store);
+  Result<std::unique_ptr<WTStore>> opened = RZSyncTrack::openStore(store);
   WTObjectContext context(&defaults);
   Result<void> done = opened ? context.attachStore(std::move(opened.value())) : Result<void>(opened.error());
-  if (done) done = journalReplacedStore(context, journal);
+  if (done) done = journalReplacedStore(context);
   if (!done) {
     return Error{WTStore::WriteFailed,
                  QStringLiteral("the backup is restored, but its records will not sync: %1")

@@ -14,12 +14,9 @@ namespace WTStoreSetup {
 // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
 QString applicationSupportFolder();
 QString storePath();
-// The store's path with the extension "sync": where the change journal lives.
-QString syncJournalPath();
 
 // Puts the copy at `backup` in place of the store (see WTStoreBackup::restore) and returns the name
-// the replaced store now has. The sync journal is kept beside it under the same addition; when this
-// installation syncs (a journal or a "WTSyncUser"), the restored store is journaled anew
+// the replaced store, with the journal inside it, now has. The restored store is journaled anew
 // (journalReplacedStore). The caller holds the writer lock and knows no desktop copy runs.
 Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults);
 

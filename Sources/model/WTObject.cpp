@@ -408,7 +408,20 @@ bool WTObject::isDeleted() const {
   return context_->deleted_.count(const_cast<WTObject*>(this)) > 0;
 }
 
+QVariantMap WTObject::setValues() const {
+  QVariantMap values = changedValues(true);
+  for (const WTKeyDescriptor& key : keys_->keys()) {
+    if (key.type == WTKeyType::Ordered)
+      values.insert(key.name, QVariant::fromValue(WTOrderedRelationship{key.members(*this)}));
+  }
+  return values;
+}
+
 QVariantMap WTObject::changedValues() const {
+  return changedValues(isInserted());
+}
+
+QVariantMap WTObject::changedValues(bool everySetValue) const {
   QVariantMap values;
   auto add = [&](const QString& name) {
     const WTKeyDescriptor* key = keys_->find(name);
@@ -429,7 +442,7 @@ QVariantMap WTObject::changedValues() const {
         values.insert(name, fieldValue(*key));
     }
   };
-  if (isInserted()) {
+  if (everySetValue) {
     // A new record reports every value it has; unset ones stay out.
     for (const WTKeyDescriptor& key : keys_->keys()) {
       if (!key.stored) continue;
@@ -441,22 +454,6 @@ QVariantMap WTObject::changedValues() const {
     return values;
   }
   for (const QString& key : changedKeys_) add(key);
-  return values;
-}
-
-QVariantMap WTObject::everyValue() const {
-  QVariantMap values;
-  for (const WTKeyDescriptor& key : keys_->keys()) {
-    if (key.stored && key.type == WTKeyType::ToOne) {
-      if (WTObject* related = owner()) values.insert(key.name, KeyPath::variantFromObject(related));
-    } else if (key.stored) {
-      if (QVariant value = fieldValue(key); !value.isNull()) values.insert(key.name, value);
-    } else if (key.journaled && key.type == WTKeyType::Ordered) {
-      // The order of a project's tasks is the project's to tell, as when it changes.
-      if (QList<WTObject*> members = key.members(*this); !members.isEmpty())
-        values.insert(key.name, QVariant::fromValue(WTOrderedRelationship{members}));
-    }
-  }
   return values;
 }
 

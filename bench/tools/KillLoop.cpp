@@ -151,7 +151,7 @@ QString journalDifference(const WTObjectContext& context, const RZSyncTrack& jou
       return object->uuid() + QStringLiteral(" is journaled as deleted");
     const QVariantMap entry = journal.entry(RZSyncTrack::Section::Inserted, object->uuid());
     if (entry.isEmpty()) return object->uuid() + QStringLiteral(" is not in the journal");
-    const QVariantMap values = object->everyValue();
+    const QVariantMap values = object->setValues();
     for (auto it = values.begin(); it != values.end(); ++it) {
       const std::optional<QVariant> value = RZSyncTrack::transformedValue(it.value());
       if (value && entry.value(it.key()) != *value)

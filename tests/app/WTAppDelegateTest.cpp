@@ -32,8 +32,7 @@ class WTAppDelegateTest : public AppTest {
 
 TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   auto delegate = makeDelegate();
-  EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite") &&
-              delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
+  EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
   EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
   // Made with the store, not by the window: a command that makes the store gets it too.
   EXPECT_EQ(delegate->managedObjectContext()->fetch<WTProject>().size(), 1);
@@ -227,7 +226,7 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenT
 }
 
 // The context's sync manager keeps the installation's journal, takes the account, and stops on quitting.
-TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheJournalBesideTheStore) {
+TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheStoresJournal) {
   defaults->setValue("WTSyncUser", "me@example.org");
   defaults->setValue("WTSyncPassword", "secret");
   auto delegate = makeDelegate();
@@ -236,7 +235,6 @@ TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheJournalBesideTheSt
   RZSyncManager* sync = delegate->syncManager();
   ASSERT_NE(sync, nullptr);
   EXPECT_TRUE(sync->managedObjectContext() == context && sync->syncEnabled());
-  EXPECT_EQ(sync->trackFilePath(), delegate->syncJournalPath());
   EXPECT_EQ(sync->syncNetwork()->user() + " " + sync->syncNetwork()->password(), "me@example.org secret");
   delegate->applicationWillTerminate();
   EXPECT_FALSE(sync->syncEnabled());

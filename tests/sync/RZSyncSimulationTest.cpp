@@ -494,7 +494,7 @@ TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
     WTObjectContext restored(here.defaults.get());
     auto store = WTStore::open(here.dir.filePath("Tessal.sqlite"));
     ASSERT_TRUE(store && restored.attachStore(std::move(store.value())));
-    ASSERT_TRUE(journalReplacedStore(restored, here.journalPath()));
+    ASSERT_TRUE(journalReplacedStore(restored));
   }
   here.open();
   for (int round = 0; round < 3; ++round) ASSERT_TRUE(here.syncOnce() && there.syncOnce());
