@@ -28,8 +28,9 @@ class WTChangeJournal {
   }
   // Whether saved records are reported at all (computing every changed value is not free).
   virtual bool recordsSaves() const { return true; }
-  // Inside the save's transaction, after the records were reported: writes the journal rows of what
-  // changed. An error undoes the whole save.
+  // Inside the save's transaction: writes the journal rows of what the records reported since the last
+  // call changed. A save calls it after its last report, and a large one also every so many reports.
+  // An error undoes the whole save.
   virtual Result<void> writeChanges(WTStore::JournalWriter& writer) {
     Q_UNUSED(writer);
     return {};

@@ -415,12 +415,19 @@ Result<void> WTObjectContext::save() {
   // worth the changed values of every record (a merge saves thousands with it).
   const bool journaled = journal_->recordsSaves();
   Result<void> result = store_->saveFrom(records, deletedUuids, [&](WTStore::JournalWriter& writer) {
-    if (journaled) {
-      for (WTObject* object : rows)
-        if (!reordered.count(object)) object->willSave();
-      for (WTObject* object : deleted_) object->willSave();
-    }
-    return journal_->writeChanges(writer);
+    if (!journaled) return journal_->writeChanges(writer);
+    // The journal writes its rows every so many reports: an import's save never holds them all.
+    constexpr size_t kReportsPerWrite = 4096;
+    size_t reported = 0;
+    Result<void> written;
+    const auto report = [&](WTObject* object) {
+      object->willSave();
+      if (++reported % kReportsPerWrite == 0) written = journal_->writeChanges(writer);
+    };
+    for (auto it = rows.begin(); written && it != rows.end(); ++it)
+      if (!reordered.count(*it)) report(*it);
+    for (auto it = deleted_.begin(); written && it != deleted_.end(); ++it) report(*it);
+    return written ? journal_->writeChanges(writer) : written;
   });
   journal_->saveEnded(result.ok());
   if (!result) return result;

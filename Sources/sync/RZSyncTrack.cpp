@@ -123,7 +123,8 @@ void RZSyncTrack::take(const QString& uuid, const WTStore::JournalRecord& record
 }
 
 void RZSyncTrack::fetch(const QString& uuid) {
-  if (!onDemand_ || !store_ || cleared_ || nothingStored_ || fetched_.contains(uuid)) return;
+  if (!onDemand_ || !store_ || cleared_ || fetched_.contains(uuid)) return;
+  if (nothingStored_ && !flushed_.contains(uuid)) return;
   fetched_.insert(uuid);
   const Result<WTStore::JournalRecord> record = store_->journalRecord(uuid);
   if (!record) {
@@ -156,7 +157,7 @@ void RZSyncTrack::removeDeletion(const QString& uuid) {
 
 Result<void> RZSyncTrack::writeChanges(WTStore::JournalWriter& writer) {
   Result<void> written;
-  if (cleared_) written = writer.clear();
+  if (cleared_ && !std::exchange(clearWritten_, true)) written = writer.clear();
   if (written && iterationChanged_) written = writer.setIteration(iteration_);
   // In order: rows inserted by key fill the table's pages one after another.
   QStringList uuids = changed_.keys();
@@ -178,12 +179,30 @@ Result<void> RZSyncTrack::writeChanges(WTStore::JournalWriter& writer) {
     const qint64 deletion = deletionOrder_.value(uuid, -1);
     if (written && deletion != stored.deletion) written = writer.setDeletion(uuid, deletion);
   }
+  if (!written) return written;
+  // What is written need not be held on demand: should the record be reported again, its rows are read
+  // back (the save's own transaction sees them). A large save so never holds all its entries at once.
+  for (auto it = changed_.constBegin(); it != changed_.constEnd(); ++it) {
+    if (onDemand_) {
+      inserted_.remove(it.key());
+      updated_.remove(it.key());
+      fetched_.remove(it.key());
+    }
+    if (!flushed_.contains(it.key())) flushed_.insert(it.key(), it.value());
+  }
+  changed_.clear();
   return written;
 }
 
 void RZSyncTrack::saveEnded(bool written) {
-  const QHash<QString, Stored> changed = std::exchange(changed_, {});
+  // Each record as its rows were before the save: the first time it was written in it.
+  QHash<QString, Stored> changed = std::exchange(flushed_, {});
+  for (auto it = changed_.constBegin(); it != changed_.constEnd(); ++it)
+    if (!changed.contains(it.key())) changed.insert(it.key(), it.value());
+  changed_.clear();
   const bool everything = std::exchange(cleared_, false) | std::exchange(iterationChanged_, false);
+  clearWritten_ = false;
+  if (written && !changed.isEmpty()) nothingStored_ = false;
   if (written || !store_) return;
   // Nothing of it reached the rows: what changed is read back from them (on demand, when next needed).
   if (everything) {

@@ -26,7 +26,7 @@ class WTObjectContext;
 // null, colours as "#AARRGGBB" text, decimals exactly.
 class RZSyncTrack final : public WTChangeJournal {
  public:
-  enum class Section { Inserted, Updated };    // "i" and "u"
+  enum class Section { Inserted, Updated };  // "i" and "u"
   // uuid -> key -> JSON value. Unordered: an import journals a hundred thousand records one by one.
   using Entries = QHash<QString, QVariantMap>;
 
@@ -153,6 +153,9 @@ class RZSyncTrack final : public WTChangeJournal {
   QSet<QString> fetched_;
   // Changed since the last write.
   QHash<QString, Stored> changed_;
+  // Written already in the save under way (a large save writes its rows as the records are reported).
+  QHash<QString, Stored> flushed_;
   bool cleared_ = false;
+  bool clearWritten_ = false;  // the rows were emptied in the save under way
   bool iterationChanged_ = false;
 };

@@ -108,6 +108,34 @@ TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
                       R"("notes":"n","uuid":"T@WTTask"}},"x":[]})");
 }
 
+// A command's journal writes a large save in pieces as its records are reported, holding none of them
+// afterwards; a record saved again later in the same run keeps what its first save journaled.
+TEST(RZSyncTrackStore, ALargeSaveIsJournaledInPiecesAndEachEntryStaysWhole) {
+  QTemporaryDir dir;
+  const QString path = dir.filePath("Tessal.sqlite");
+  WTObjectContext context;
+  ASSERT_TRUE(context.attachStore(std::move(WTStore::open(path).value())).ok());
+  RZSyncTrack track(context.store(), RZSyncTrack::Loading::OnDemand);
+  context.setChangeJournal(&track);
+  QList<WTTask*> tasks;
+  for (int i = 0; i < 10000; ++i) {
+    tasks.append(context.insertNewObject<WTTask>());
+    tasks.last()->setName(QString::number(i));
+  }
+  ASSERT_TRUE(context.save().ok());
+  EXPECT_FALSE(track.hasChanges());
+  tasks.first()->setNotes("later");
+  tasks.last()->setNotes("later");
+  ASSERT_TRUE(context.save().ok());
+  const synctest::StoredJournal journal(path);
+  EXPECT_EQ(journal.track.entries(Section::Inserted).size(), 10000);
+  for (const WTTask* task : {tasks.first(), tasks.last()}) {
+    const QVariantMap entry = journal.track.entry(Section::Inserted, task->uuid());
+    EXPECT_EQ(entry.value("name"), task->name());
+    EXPECT_EQ(entry.value("notes"), "later");
+  }
+}
+
 // An older store's journal file is read into the store once, as it is updated, and kept as ".migrated";
 // an unreadable one is kept aside as ".corrupt" and the journal starts empty. A journal file found beside
 // the store later is left alone.
