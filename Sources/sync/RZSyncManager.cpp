@@ -196,6 +196,13 @@ void RZSyncManager::post(const QVariantMap& data, const QString& action, qint64 
     inFlight_ = {action, action == kSave ? data : QVariantMap()};
 }
 
+void RZSyncManager::postChanges(qint64 iteration) {
+  bool complete = true;
+  const QVariantMap data = track_->dictionary(intervals_.recordsPerSave, &complete);
+  post(data, kSave, iteration);
+  if (network_->networkAction() != RZSyncNetwork::Idle) inFlight_.complete = complete;
+}
+
 void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const QVariant& object) {
   const Result<RZSyncReply> parsed = RZSyncReply::fromJSON(object);
   if (!parsed) {
@@ -224,7 +231,7 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const 
     if (base < 1) {
       qCDebug(lcSync, "Head iteration problem");
     } else {
-      post(track_->dictionary(), kSave, base);
+      postChanges(base);
     }
     endFailureRun();
     return finish(exchange);
@@ -239,6 +246,11 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const 
     if (answered.action == kSave) track_->removeSentChanges(answered.data);
     track_->setIteration(iteration);
     writeTrack(false);
+    if (answered.action == kSave && !answered.complete && track_->hasChanges()) {
+      endFailureRun();
+      finish(exchange);
+      return postChanges(iteration);
+    }
   }
   endFailureRun();
   finish(exchange);
@@ -275,7 +287,7 @@ void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
   }
   // A merge that changed no record has its journal rows still to write.
   writeTrack(true);
-  if (track_->hasChanges()) post(track_->dictionary(), kSave, iteration);
+  if (track_->hasChanges()) postChanges(iteration);
 }
 
 void RZSyncManager::endFailureRun() {

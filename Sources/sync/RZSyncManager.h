@@ -50,6 +50,9 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
     int pollMs = 5000;       // between polls
     int retryMs = 15000;     // after a failed exchange
     int afterSaveMs = 5000;  // after every save of the context
+    // The records one save carries at most: a large journal (an import) goes in pieces, each well within
+    // the server's limits on a request's size and time.
+    int recordsPerSave = 5000;
   };
 
   // Reads the journal of the context's store (see RZSyncTrack), attaches it to `context` and watches the
@@ -111,13 +114,16 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
  private:
   struct Request {
     QString action;
-    QVariantMap data;  // what a "save" sent
+    QVariantMap data;      // what a "save" sent
+    bool complete = true;  // a "save" sent every change the journal held
   };
 
   void fileNotifications();
   void removeNotifications();
   void managedObjectContextDidSave();
   void post(const QVariantMap& data, const QString& action, qint64 iteration);
+  // Sends the journal's changes, as many as one request may carry; the rest follow each confirmation.
+  void postChanges(qint64 iteration);
   // Saves local edits, merges a "head" reply's result, saves it unjournaled and sends what is pending.
   void mergeHead(const QVariantMap& result, qint64 iteration);
   void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending);

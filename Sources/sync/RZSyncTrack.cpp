@@ -14,6 +14,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <functional>
 
 namespace {
 
@@ -413,6 +414,46 @@ QVariantMap RZSyncTrack::dictionary() const {
   return {{kInserted, entriesVariant(inserted_)},
           {kUpdated, entriesVariant(updated_)},
           {kDeleted, QVariant(deleted_)}};
+}
+
+QVariantMap RZSyncTrack::dictionary(qsizetype records, bool* complete) const {
+  QVariantMap inserted, updated;
+  QStringList deleted;
+  QSet<QString> taken;
+  std::function<bool(const QString&, bool)> include;
+  // A project's order goes with the tasks it lists: the server keeps an order to the tasks it knows, so
+  // tasks sent after it would lose their places.
+  const std::function<void(const QVariantMap&)> takeListed = [&](const QVariantMap& values) {
+    for (const QVariant& value : values)
+      if (value.typeId() == QMetaType::QVariantList)
+        for (const QVariant& listed : value.toList()) include(listed.toString(), true);
+  };
+  include = [&](const QString& uuid, bool listed) {
+    if (taken.contains(uuid)) return true;
+    if (!listed && taken.size() >= records) return false;
+    if (listed && !inserted_.contains(uuid) && !updated_.contains(uuid)) return true;
+    taken.insert(uuid);
+    for (const auto& [entries, out] : {std::pair{&inserted_, &inserted}, std::pair{&updated_, &updated}}) {
+      if (const auto it = entries->constFind(uuid); it != entries->constEnd()) {
+        out->insert(uuid, *it);
+        takeListed(*it);
+      }
+    }
+    return true;
+  };
+  bool all = true;
+  for (const Entries* entries : {&inserted_, &updated_})
+    for (auto it = entries->constBegin(); it != entries->constEnd(); ++it)
+      all = include(it.key(), false) && all;
+  // Deletions keep their order, and a record's deletion goes with its entries.
+  for (const QString& uuid : deleted_) {
+    if (taken.contains(uuid) || include(uuid, false))
+      deleted.append(uuid);
+    else
+      all = false;
+  }
+  if (complete) *complete = all;
+  return {{kInserted, inserted}, {kUpdated, updated}, {kDeleted, QVariant(deleted)}};
 }
 
 void RZSyncTrack::setEntry(Section section, const QString& uuid, const QVariantMap& values) {

@@ -97,8 +97,11 @@ class RZSyncTrack final : public WTChangeJournal {
   }
 
   // The change dictionary {"i": {uuid: values}, "u": {uuid: values}, "x": [uuid]} as a JSON value: the
-  // "data" of a save. A copy; change the journal through the operations here.
+  // "data" of a save. A copy; change the journal through the operations here. With `records`, the
+  // changes of at most that many records (a record's entries and deletion go together); `complete` says
+  // whether that is all of them.
   QVariantMap dictionary() const;
+  QVariantMap dictionary(qsizetype records, bool* complete) const;
 
   // Direct access to the sections, for the merge.
   const Entries& entries(Section section) const {

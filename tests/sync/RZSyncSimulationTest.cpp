@@ -510,6 +510,37 @@ TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
   EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
 
+// A journal larger than one save may carry (an import's) goes out in pieces, one after another within
+// the same poll, and reaches the other devices whole.
+TEST_P(RZSyncSimulation, ALargeJournalIsSentInPieces) {
+  const servertest::StorageLocation storage(GetParam());
+  servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
+                                 Simulation::kPassword.toStdString());
+  SyncClient here(server.address(), Simulation::kUser, Simulation::kPassword);
+  SyncClient there(server.address(), Simulation::kUser, Simulation::kPassword);
+  RZSyncManager::Intervals intervals = here.manager->intervals();
+  intervals.recordsPerSave = 3;
+  here.manager->setIntervals(intervals);
+  for (int i = 0; i < 9; ++i) here.context->insertNewObject<WTClient>()->setName(QString::number(i));
+  // A project's task order goes in one piece with its tasks, or the server would lose it.
+  auto* project = here.context->insertNewObject<WTProject>();
+  project->setName("Imported");
+  for (int i = 0; i < 5; ++i) {
+    auto* task = here.context->insertNewObject<WTTask>();
+    task->setName(QString::number(i));
+    task->setProject(project);
+  }
+  here.save();
+  int saves = 0;
+  QObject::connect(here.manager.get(), &RZSyncManager::exchangeDidFinish,
+                   [&](const RZSyncExchange& exchange) { saves += exchange.action == "save"; });
+  ASSERT_TRUE(here.syncOnce());
+  EXPECT_FALSE(here.track().hasChanges());
+  EXPECT_GE(saves, 4);  // fifteen records, three a save but for the project's six
+  ASSERT_TRUE(there.syncOnce());
+  EXPECT_EQ(snapshot(*there.context), snapshot(*here.context));
+}
+
 INSTANTIATE_TEST_SUITE_P(Storage, RZSyncSimulation,
                          testing::Values(servertest::Storage::SQLite, servertest::Storage::PostgreSQL),
                          servertest::storageName);
