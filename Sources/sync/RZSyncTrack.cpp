@@ -75,39 +75,14 @@ void RZSyncTrack::load(const QString& path) {
     file.close();
   }
 
-  qint64 iteration = 0;
-  Entries inserted, updated;
-  QStringList deleted;
   if (problem.isEmpty()) {
-    const std::optional<QVariant> root = RZSyncJSON::parse(bytes, &problem);
-    if (root && root->typeId() != QMetaType::QVariantMap)
-      problem = QStringLiteral("the journal is not a JSON object");
-    if (root && problem.isEmpty()) {
-      const QVariantMap top = root->toMap();
-      const QVariant number = top.value(QStringLiteral("iteration"));
-      const QVariant track = top.value(QStringLiteral("track"));
-      if (number.typeId() == QMetaType::LongLong) {
-        iteration = number.toLongLong();
-      } else if (number.isValid()) {
-        problem = QStringLiteral("\"iteration\" is not an integer");
-      }
-      if (problem.isEmpty() && track.isValid()) {
-        const QVariantMap changes = track.toMap();
-        if (track.typeId() != QMetaType::QVariantMap || !readEntries(changes.value(kInserted), inserted) ||
-            !readEntries(changes.value(kUpdated), updated) ||
-            !readDeleted(changes.value(kDeleted), deleted)) {
-          problem = QStringLiteral("\"track\" is not a change dictionary");
-        }
-      }
+    if (std::optional<RZSyncTrack> track = fromJSON(bytes, &problem)) {
+      iteration_ = track->iteration_;
+      inserted_ = std::move(track->inserted_);
+      updated_ = std::move(track->updated_);
+      deleted_ = std::move(track->deleted_);
+      return;
     }
-  }
-
-  if (problem.isEmpty()) {
-    iteration_ = iteration;
-    inserted_ = std::move(inserted);
-    updated_ = std::move(updated);
-    deleted_ = std::move(deleted);
-    return;
   }
 
   qCWarning(lcSync).noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
@@ -117,6 +92,36 @@ void RZSyncTrack::load(const QString& path) {
   if (!QFile::rename(path, aside)) {
     qCWarning(lcSync).noquote() << QStringLiteral("Could not move the unreadable journal %1 aside").arg(path);
   }
+}
+
+std::optional<RZSyncTrack> RZSyncTrack::fromJSON(QByteArrayView text, QString* problem) {
+  QString reason;
+  RZSyncTrack track;
+  const std::optional<QVariant> root = RZSyncJSON::parse(text, &reason);
+  if (root && root->typeId() != QMetaType::QVariantMap)
+    reason = QStringLiteral("the journal is not a JSON object");
+  if (root && reason.isEmpty()) {
+    const QVariantMap top = root->toMap();
+    const QVariant number = top.value(QStringLiteral("iteration"));
+    const QVariant changes = top.value(QStringLiteral("track"));
+    if (number.typeId() == QMetaType::LongLong) {
+      track.iteration_ = number.toLongLong();
+    } else if (number.isValid()) {
+      reason = QStringLiteral("\"iteration\" is not an integer");
+    }
+    if (reason.isEmpty() && changes.isValid()) {
+      const QVariantMap sections = changes.toMap();
+      if (changes.typeId() != QMetaType::QVariantMap ||
+          !readEntries(sections.value(kInserted), track.inserted_) ||
+          !readEntries(sections.value(kUpdated), track.updated_) ||
+          !readDeleted(sections.value(kDeleted), track.deleted_)) {
+        reason = QStringLiteral("\"track\" is not a change dictionary");
+      }
+    }
+  }
+  if (reason.isEmpty()) return track;
+  if (problem) *problem = reason;
+  return std::nullopt;
 }
 
 Result<void> RZSyncTrack::writeToFile(const QString& path) const {

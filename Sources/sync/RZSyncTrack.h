@@ -31,6 +31,9 @@ class RZSyncTrack final : public WTChangeJournal {
   // number is added when that name is taken) so that nothing in it is lost, and the journal starts
   // empty at iteration 0.
   explicit RZSyncTrack(const QString& path);
+  // The journal a file's text holds ({"iteration", "track"}, as writeToFile writes it); none, with the
+  // reason in `problem`, when the text is not one.
+  static std::optional<RZSyncTrack> fromJSON(QByteArrayView text, QString* problem = nullptr);
 
   // Writes {"iteration", "track"} as pretty-printed JSON, atomically: a temporary file beside `path`,
   // synced to disk, then renamed over it. On failure the old file and this journal are unchanged.
