@@ -5,7 +5,8 @@
 # soon as a target finds something; the input that did it is left in the build folder, named in the log.
 #
 #   scripts/fuzz.sh [SECONDS]
-# TESSAL_FUZZ_BUILD_DIR (build-fuzz) and TESSAL_FUZZ_TARGETS (all of them, by name) narrow it down.
+# TESSAL_FUZZ_BUILD_DIR (build-fuzz) and TESSAL_FUZZ_TARGETS (all of them, by name) narrow it down;
+# TESSAL_FUZZ_JOBS runs that many at once (1 unless given: on a shared machine, one core is enough).
 set -euo pipefail
 cd "$(dirname "$0")/.."
 seconds=${1:-600}
@@ -46,24 +47,39 @@ if [ -d /dev/shm ] && [ -w /dev/shm ]; then export TMPDIR=/dev/shm; fi
 export ASAN_OPTIONS=${ASAN_OPTIONS:-detect_leaks=1:abort_on_error=1}
 export UBSAN_OPTIONS=${UBSAN_OPTIONS:-print_stacktrace=1:halt_on_error=1}
 export QT_QPA_PLATFORM=offscreen
-status=0
-for target in "${selected[@]}"; do
-  read -r name folder seeds dict length <<<"$target"
-  scratch="$build/fuzz-corpus/$name"
-  findings="$build/fuzz-findings/$name"
+# One target: its summary when it ends, its log's end and a non-zero status when it found something.
+fuzz() {
+  local name folder seeds dict length
+  read -r name folder seeds dict length <<<"$1"
+  local scratch="$build/fuzz-corpus/$name" findings="$build/fuzz-findings/$name"
   mkdir -p "$scratch" "$findings"
-  options=(-max_total_time="$seconds" -timeout=10 -rss_limit_mb=2048 -print_final_stats=1
-           -artifact_prefix="$findings/")
+  local options=(-max_total_time="$seconds" -timeout=10 -rss_limit_mb=2048 -print_final_stats=1
+                 -artifact_prefix="$findings/")
   [ "$dict" != "-" ] && options+=(-dict="tests/fuzz/$dict")
   [ "$length" != 0 ] && options+=(-max_len="$length")
-  echo "== $name for $seconds s"
   if ! "$build/$folder/$name" "${options[@]}" "$scratch" "tests/fuzz/$seeds" 2>"$build/$name.log"; then
     tail -n 60 "$build/$name.log" >&2
     echo "== $name found something: $(ls "$findings")" >&2
-    status=1
-    break
+    return 1
   fi
-  grep -E '^stat::number_of_executed_units|^Done ' "$build/$name.log" || true
-  echo "corpus: $(ls "$scratch" | wc -l) new inputs beside $(ls "tests/fuzz/$seeds" | wc -l) seeds"
+  echo "== $name: $(grep -E '^stat::number_of_executed_units' "$build/$name.log" | sed 's/.*: *//') runs" \
+    "in $seconds s, $(ls "$scratch" | wc -l) new inputs beside $(ls "tests/fuzz/$seeds" | wc -l) seeds"
+}
+
+jobs=${TESSAL_FUZZ_JOBS:-1}
+status=0
+running=0
+for target in "${selected[@]}"; do
+  if [ "$running" -ge "$jobs" ]; then
+    running=$((running - 1))
+    wait -n || { status=1; break; }
+  fi
+  echo "== ${target%% *} for $seconds s"
+  fuzz "$target" &
+  running=$((running + 1))
+done
+while [ "$running" -gt 0 ]; do
+  running=$((running - 1))
+  wait -n || status=1
 done
 exit $status
