@@ -28,7 +28,6 @@ class ImportInstallation {
   // The store as it was before any import, and no changes waiting to be sent (as after a sync).
   void resetStore() const {
     for (const char* suffix : {"", "-wal", "-shm"}) QFile::remove(storePath() + QLatin1String(suffix));
-    QFile::remove(home_.filePath("data/Tessal2/Tessal.sync"));
     QFile::copy(bench::LargeStore::instance().path(), storePath());
   }
   bool run(const QStringList& arguments) const {

@@ -70,7 +70,7 @@ void BM_MergeHeadOf10000ChangesInto100000Items(benchmark::State& state) {
       return;
     }
     context.count();  // opening the store is not what is measured
-    RZSyncManager manager(&context, dir.filePath(QStringLiteral("Tessal.sync")));
+    RZSyncManager manager(&context);
     state.ResumeTiming();
 
     const std::optional<QVariant> parsed = RZSyncJSON::parse(reply);

@@ -29,7 +29,7 @@ find "$build" -name '*.gcda' -delete
 ninja -C "$build" -t cleandead >/dev/null
 find "$build" -name '*.gcno' | while read -r notes; do [ -f "${notes%.gcno}.o" ] || rm -f "$notes"; done
 env -u DBUS_SESSION_BUS_ADDRESS -u DISPLAY -u WAYLAND_DISPLAY QT_QPA_PLATFORM=offscreen \
-  bash scripts/pg-test-cluster.sh run ctest --test-dir "$build" --timeout 600 -j2 "${filter[@]}" >"$build/ctest-$name.log" ||
+  bash scripts/pg-test-cluster.sh run ctest --test-dir "$build" --timeout 600 -j2 -LE long "${filter[@]}" >"$build/ctest-$name.log" ||
   echo "some tests failed: $build/ctest-$name.log" >&2
 report="$build/coverage-$name.json"
 gcovr --root . --object-directory "$build" --filter 'Sources/' --filter 'GXTemplate/' --filter 'server/' \

@@ -13,6 +13,10 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#ifdef __GLIBC__
+#include <malloc.h>
+#endif
+
 #include <algorithm>
 #include <cerrno>
 #include <cstdint>
@@ -25,6 +29,9 @@ namespace tessal::server {
 namespace {
 
 using Clock = std::chrono::steady_clock;
+
+// A request or reply this large leaves many pages behind in the allocator when it is gone.
+constexpr size_t kLargeExchange = 1u << 20;
 
 const char* reason(int status) {
   switch (status) {
@@ -104,7 +111,63 @@ void setNonBlocking(int fd) {
   fcntl(fd, F_SETFL, fcntl(fd, F_GETFL, 0) | O_NONBLOCK);
 }
 
+bool isLoopback(const std::string& address) {
+  return address.rfind("127.", 0) == 0 || address == "::1" || address.rfind("::ffff:127.", 0) == 0;
+}
+
+HttpReply withRetryAfter(HttpReply reply) {
+  const bool has = std::any_of(reply.headers.begin(), reply.headers.end(),
+                               [](const auto& header) { return header.first == "Retry-After"; });
+  if (!has) reply.headers.emplace_back("Retry-After", "1");
+  return reply;
+}
+
+// Writes what the socket takes now; false when the connection is broken.
+bool sendSome(int fd, const std::string& bytes, size_t& written) {
+  while (written < bytes.size()) {
+    const ssize_t sent =
+        send(fd, bytes.data() + written, bytes.size() - written, MSG_NOSIGNAL | MSG_DONTWAIT);
+    if (sent > 0) {
+      written += static_cast<size_t>(sent);
+    } else if (sent < 0 && errno == EINTR) {
+      continue;
+    } else {
+      return sent < 0 && (errno == EAGAIN || errno == EWOULDBLOCK);
+    }
+  }
+  return true;
+}
+
+// Gives the pages of large freed buffers back to the system: the allocator would keep them for the
+// next large request, and a burst would leave the process at its peak for good.
+void releaseFreedMemory() {
+#ifdef __GLIBC__
+  malloc_trim(0);
+#endif
+}
+
 }  // namespace
+
+std::string clientAddress(const HttpRequest& request) {
+  if (!isLoopback(request.peer)) return request.peer;
+  const std::string forwarded = request.header("x-forwarded-for");
+  const size_t comma = forwarded.rfind(',');
+  const std::string last = forwarded.substr(comma == std::string::npos ? 0 : comma + 1);
+  const size_t begin = last.find_first_not_of(' ');
+  if (begin == std::string::npos) return request.peer;
+  return last.substr(begin, last.find_last_not_of(' ') + 1 - begin);
+}
+
+std::string addressGroup(const std::string& address) {
+  in6_addr v6{};
+  if (address.find(':') == std::string::npos || inet_pton(AF_INET6, address.c_str(), &v6) != 1)
+    return address;
+  if (IN6_IS_ADDR_V4MAPPED(&v6)) return address.substr(address.rfind(':') + 1);
+  std::fill(v6.s6_addr + 8, v6.s6_addr + 16, 0);
+  char text[INET6_ADDRSTRLEN] = {};
+  inet_ntop(AF_INET6, &v6, text, sizeof text);
+  return std::string(text) + "/64";
+}
 
 HttpReply textReply(int status, const std::string& text) {
   HttpReply reply;
@@ -116,22 +179,33 @@ HttpReply textReply(int status, const std::string& text) {
 
 struct HttpListener::Connection {
   // Idle: between requests, under the idle deadline. Reading: under the request's deadline. Busy: a
-  // worker holds the connection, and no deadline runs.
-  enum class Phase { Idle, Reading, Busy };
-  Connection(int fd, std::string peer, HttpRequestParser::Limits limits)
-      : fd(fd), peer(std::move(peer)), parser(limits) {}
+  // worker holds the connection, and no deadline runs. Writing: the rest of a reply waits for the
+  // client to take it, under the write deadline; nothing is read meanwhile.
+  enum class Phase { Idle, Reading, Busy, Writing };
+  Connection(int fd, std::string peer, std::string group, HttpRequestParser::Limits limits)
+      : fd(fd), peer(std::move(peer)), group(std::move(group)), parser(limits) {}
   int fd;
   std::string peer;
+  std::string group;  // addressGroup(peer)
   HttpRequestParser parser;
   Phase phase = Phase::Idle;
   Clock::time_point deadline;
+  // Writing: the reply, how much of it is written, what it holds of the budget, and what comes after.
+  std::string output;
+  size_t written = 0;
+  ByteBudget::Lease outputLease;
+  bool keepAlive = false;
 };
 
 HttpListener::HttpListener(Limits limits, int workers, Handler handler, Refusal refusal)
     : limits_(limits),
       workerCount_(std::max(workers, 1)),
       handler_(std::move(handler)),
-      refusal_(std::move(refusal)) {}
+      refusal_(std::move(refusal)),
+      bodyMemory_(limits.maxBodyMemory),
+      replyMemory_(limits.maxReplyMemory) {
+  limits_.request.bodies = &bodyMemory_;
+}
 
 HttpListener::~HttpListener() {
   stop();
@@ -195,6 +269,7 @@ void HttpListener::stop() {
   workers_.clear();
   for (const auto& entry : connections_) ::close(entry.first);
   connections_.clear();
+  connectionsPerAddress_.clear();
   ::close(listenFd_);
   ::close(epollFd_);
   ::close(wakeFd_);
@@ -218,32 +293,20 @@ void HttpListener::readLoop() {
       } else if (fd == wakeFd_) {
         uint64_t count = 0;
         [[maybe_unused]] const ssize_t read = ::read(wakeFd_, &count, sizeof count);
-      } else {
-        readFrom(fd);
+      } else if (auto found = connections_.find(fd); found != connections_.end()) {
+        if (found->second->phase == Connection::Phase::Writing) {
+          writeTo(fd);
+        } else {
+          readFrom(fd);
+        }
       }
     }
-    std::vector<std::pair<int, bool>> returned;
+    std::vector<Returned> returned;
     {
       std::lock_guard lock(mutex_);
       returned.swap(returned_);
     }
-    for (auto& [fd, keep] : returned) {
-      auto found = connections_.find(fd);
-      if (found == connections_.end()) continue;
-      if (!keep || stopping_) {
-        close(fd);
-        continue;
-      }
-      Connection& connection = *found->second;
-      connection.phase = Connection::Phase::Idle;
-      connection.deadline = Clock::now() + limits_.idleTimeout;
-      epoll_event event{};
-      event.events = EPOLLIN | EPOLLRDHUP;
-      event.data.fd = fd;
-      epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event);
-      // A pipelined request may already be waiting in the buffer.
-      if (connection.parser.hasBufferedBytes()) dispatch(fd, {});
-    }
+    for (Returned& back : returned) takeBack(std::move(back));
     sweepDeadlines(Clock::now());
     if (acceptPausedUntil_ && Clock::now() >= *acceptPausedUntil_) {
       acceptPausedUntil_.reset();
@@ -274,17 +337,30 @@ void HttpListener::accept() {
       ::close(fd);
       continue;
     }
-    const int yes = 1;
-    setsockopt(fd, IPPROTO_TCP, TCP_NODELAY, &yes, sizeof yes);
     char text[INET6_ADDRSTRLEN] = {};
     if (address.ss_family == AF_INET6) {
       inet_ntop(AF_INET6, &reinterpret_cast<sockaddr_in6*>(&address)->sin6_addr, text, sizeof text);
     } else {
       inet_ntop(AF_INET, &reinterpret_cast<sockaddr_in*>(&address)->sin_addr, text, sizeof text);
     }
-    auto connection = std::make_unique<Connection>(
-        fd, text,
-        limits_.request);
+    std::string group = addressGroup(text);
+    size_t& fromThere = connectionsPerAddress_[group];
+    if (limits_.maxConnectionsPerAddress > 0 && fromThere >= limits_.maxConnectionsPerAddress) {
+      // Told at once rather than left waiting: it is the address, not the server, that is at its limit.
+      HttpRequest nothing;
+      nothing.peer = text;
+      const std::string bytes =
+          serialise(withRetryAfter(
+                        refusal_(nothing, 503, "Too many connections from your address; try again shortly.")),
+                    false);
+      [[maybe_unused]] const ssize_t sent = send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+      ::close(fd);
+      continue;
+    }
+    ++fromThere;
+    const int yes = 1;
+    setsockopt(fd, IPPROTO_TCP, TCP_NODELAY, &yes, sizeof yes);
+    auto connection = std::make_unique<Connection>(fd, text, std::move(group), limits_.request);
     connection->deadline = Clock::now() + limits_.idleTimeout;
     connections_[fd] = std::move(connection);
     epoll_event event{};
@@ -299,7 +375,12 @@ void HttpListener::close(int fd) {
   if (found == connections_.end()) return;
   epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
   ::close(fd);
+  auto fromThere = connectionsPerAddress_.find(found->second->group);
+  if (fromThere != connectionsPerAddress_.end() && --fromThere->second == 0)
+    connectionsPerAddress_.erase(fromThere);
+  const bool large = found->second->output.size() >= kLargeExchange;
   connections_.erase(found);
+  if (large) releaseFreedMemory();
 }
 
 void HttpListener::readFrom(int fd) {
@@ -318,7 +399,9 @@ void HttpListener::refuse(Connection& connection, int status, const std::string&
   // The head is all a refusal needs; a partial body could be megabytes to copy.
   const HttpRequest& read = connection.parser.partial();
   const HttpRequest partial{read.method, read.path, read.query, read.headers, {}, connection.peer};
-  const std::string bytes = serialise(refusal_(partial, status, why), false);
+  HttpReply reply = refusal_(partial, status, why);
+  if (status == 503) reply = withRetryAfter(std::move(reply));
+  const std::string bytes = serialise(reply, false);
   // Best effort and never blocking: the reader must not wait on a client that does not read.
   [[maybe_unused]] const ssize_t sent =
       send(connection.fd, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
@@ -348,7 +431,7 @@ void HttpListener::dispatch(int fd, std::string_view bytes) {
   outcome.request.peer = connection.peer;
   {
     std::lock_guard lock(mutex_);
-    jobs_.push_back(Job{fd, std::move(outcome.request), outcome.keepAlive});
+    jobs_.push_back(Job{fd, std::move(outcome.request), std::move(outcome.body), outcome.keepAlive});
   }
   work_.notify_one();
 }
@@ -360,7 +443,7 @@ void HttpListener::sweepDeadlines(Clock::time_point now) {
   }
   for (int fd : expired) {
     Connection& connection = *connections_.at(fd);
-    if (connection.phase == Connection::Phase::Idle) {
+    if (connection.phase == Connection::Phase::Idle || connection.phase == Connection::Phase::Writing) {
       close(fd);
     } else {
       refuse(connection, 408, "The request took too long to arrive.");
@@ -368,30 +451,47 @@ void HttpListener::sweepDeadlines(Clock::time_point now) {
   }
 }
 
-bool HttpListener::writeAll(int fd, const std::string& bytes) {
-  size_t done = 0;
-  const auto deadline = Clock::now() + limits_.writeTimeout;
-  while (done < bytes.size()) {
-    const ssize_t sent = send(fd, bytes.data() + done, bytes.size() - done, MSG_NOSIGNAL | MSG_DONTWAIT);
-    if (sent > 0) {
-      done += static_cast<size_t>(sent);
-      continue;
-    }
-    if (sent < 0 && errno != EAGAIN && errno != EWOULDBLOCK && errno != EINTR) return false;
-    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now()).count();
-    if (left <= 0) return false;
-    pollfd writable{fd, POLLOUT, 0};
-    poll(&writable, 1, static_cast<int>(std::min<long long>(left, 1000)));
-  }
-  return true;
+void HttpListener::takeBack(Returned returned) {
+  auto found = connections_.find(returned.fd);
+  if (found == connections_.end()) return;
+  Connection& connection = *found->second;
+  const bool written = returned.written == returned.output.size();
+  if (stopping_ || (written && !returned.keepAlive)) return close(returned.fd);
+  if (written) return awaitRequest(connection);
+  connection.phase = Connection::Phase::Writing;
+  connection.deadline = Clock::now() + limits_.writeTimeout;
+  connection.output = std::move(returned.output);
+  connection.written = returned.written;
+  connection.outputLease = std::move(returned.lease);
+  connection.keepAlive = returned.keepAlive;
+  epoll_event event{};
+  event.events = EPOLLOUT;
+  event.data.fd = returned.fd;
+  epoll_ctl(epollFd_, EPOLL_CTL_ADD, returned.fd, &event);
 }
 
-void HttpListener::handBack(int fd, bool keepAlive) {
-  {
-    std::lock_guard lock(mutex_);
-    returned_.emplace_back(fd, keepAlive);
-  }
-  wake();
+void HttpListener::awaitRequest(Connection& connection) {
+  const bool wasWriting = connection.phase == Connection::Phase::Writing;
+  connection.phase = Connection::Phase::Idle;
+  connection.deadline = Clock::now() + limits_.idleTimeout;
+  epoll_event event{};
+  event.events = EPOLLIN | EPOLLRDHUP;
+  event.data.fd = connection.fd;
+  epoll_ctl(epollFd_, wasWriting ? EPOLL_CTL_MOD : EPOLL_CTL_ADD, connection.fd, &event);
+  // A pipelined request may already be waiting in the buffer.
+  if (connection.parser.hasBufferedBytes()) dispatch(connection.fd, {});
+}
+
+void HttpListener::writeTo(int fd) {
+  Connection& connection = *connections_.at(fd);
+  if (!sendSome(fd, connection.output, connection.written)) return close(fd);
+  if (connection.written < connection.output.size()) return;
+  if (!connection.keepAlive) return close(fd);
+  const bool large = connection.output.size() >= kLargeExchange;
+  std::string().swap(connection.output);
+  connection.outputLease.resize(0);
+  if (large) releaseFreedMemory();
+  awaitRequest(connection);
 }
 
 void HttpListener::workLoop() {
@@ -411,9 +511,32 @@ void HttpListener::workLoop() {
       std::cerr << "tessal-sync-server: request failed: " << e.what() << std::endl;
       reply = HttpReply{500, "Internal error; try again later.\n", "text/plain; charset=utf-8", {}};
     }
-    const bool keep = job.keepAlive && !stopping_;
-    const bool written = writeAll(job.fd, serialise(reply, keep));
-    handBack(job.fd, written && keep);
+    Returned returned{job.fd, job.keepAlive && !stopping_, {}, 0, ByteBudget::Lease(&replyMemory_)};
+    const bool large = job.request.body.size() >= kLargeExchange || reply.body.size() >= kLargeExchange;
+    job = Job{};  // answered: the body's memory goes back before the reply takes more
+    returned.output = serialise(reply, returned.keepAlive);
+    reply = HttpReply{};
+    // The reply waits in memory until its reader has taken it; past the budget it gives way to a short
+    // answer, and its client asks again shortly.
+    if (!returned.lease.resize(returned.output.size(), true)) {
+      returned.output = serialise(
+          withRetryAfter(textReply(503, "The server has too many replies waiting; try again shortly.")),
+          returned.keepAlive);
+    }
+    if (large) releaseFreedMemory();
+    const bool broken = !sendSome(returned.fd, returned.output, returned.written);
+    if (broken || returned.written == returned.output.size()) {
+      // Nothing is left to hold.
+      returned.keepAlive = returned.keepAlive && !broken;
+      std::string().swap(returned.output);
+      returned.written = 0;
+      returned.lease.resize(0);
+    }
+    {
+      std::lock_guard lock(mutex_);
+      returned_.push_back(std::move(returned));
+    }
+    wake();
   }
 }
 

@@ -10,6 +10,10 @@ namespace {
 
 // Chunk size lines are a number and perhaps an extension; nothing honest needs more.
 constexpr size_t kMaxChunkSizeLine = 64;
+// A body's first allocation; it then doubles as its bytes arrive, never past what it may reach.
+constexpr size_t kFirstBodyBlock = 16u << 10;
+// Between requests the buffer keeps no more than this beyond the bytes it holds.
+constexpr size_t kIdleBuffer = 4u << 10;
 
 std::string lowerCase(std::string text) {
   for (char& c : text) {
@@ -26,6 +30,38 @@ std::string trimmed(const std::string& text) {
 }
 
 }  // namespace
+
+ByteBudget::Lease::Lease(Lease&& other) noexcept
+    : budget_(other.budget_), bytes_(std::exchange(other.bytes_, 0)) {}
+
+ByteBudget::Lease& ByteBudget::Lease::operator=(Lease&& other) noexcept {
+  if (this != &other) {
+    resize(0);
+    budget_ = other.budget_;
+    bytes_ = std::exchange(other.bytes_, 0);
+  }
+  return *this;
+}
+
+bool ByteBudget::Lease::resize(size_t bytes, bool evenAlone) {
+  if (!budget_) {
+    bytes_ = bytes;
+    return true;
+  }
+  if (bytes <= bytes_) {
+    budget_->used_ -= bytes_ - bytes;
+    bytes_ = bytes;
+    return true;
+  }
+  const size_t more = bytes - bytes_;
+  size_t used = budget_->used_.load();
+  do {
+    const bool alone = used == bytes_;
+    if (used + more > budget_->total_ && !(evenAlone && alone)) return false;
+  } while (!budget_->used_.compare_exchange_weak(used, used + more));
+  bytes_ = bytes;
+  return true;
+}
 
 std::string HttpRequest::header(const std::string& lowerCaseName) const {
   auto found = headers.find(lowerCaseName);
@@ -56,28 +92,51 @@ void HttpRequestParser::consume(size_t bytes) {
   lineStart_ = lineStart_ > bytes ? lineStart_ - bytes : 0;
 }
 
-HttpRequestParser::Outcome& HttpRequestParser::refuse(Outcome& outcome, int status, std::string why) {
+// Room in the body for `bytes` in all, drawn from the shared budget as the bytes arrive (not as a
+// Content-Length claims them, which costs a client nothing): growing by doubling up to `limit`, and
+// into a buffer of exactly that size, so that what the budget counts is what the body holds.
+bool HttpRequestParser::makeRoomForBody(size_t bytes, size_t limit) {
+  std::string& body = request_.body;
+  if (bytes <= body.capacity() && bytes <= bodyLease_.bytes()) return true;
+  size_t size = std::min(limit, std::max({bytes, 2 * bodyLease_.bytes(), kFirstBodyBlock}));
+  if (!bodyLease_.resize(size)) {
+    size = bytes;
+    if (!bodyLease_.resize(size)) return false;
+  }
+  std::string grown;
+  grown.reserve(size);
+  grown.append(body);
+  body.swap(grown);
+  return true;
+}
+
+HttpRequestParser::Outcome&& HttpRequestParser::refuse(Outcome& outcome, int status, std::string why) {
   phase_ = Phase::Refused;
   refusedStatus_ = status;
   refusedWhy_ = std::move(why);
-  buffer_.clear();
+  std::string().swap(buffer_);
+  std::string().swap(request_.body);
+  bodyLease_.resize(0);
   outcome.kind = Outcome::Kind::Refusal;
   outcome.status = refusedStatus_;
   outcome.why = refusedWhy_;
-  return outcome;
+  return std::move(outcome);
 }
 
-HttpRequestParser::Outcome& HttpRequestParser::complete(Outcome& outcome) {
+HttpRequestParser::Outcome&& HttpRequestParser::complete(Outcome& outcome) {
   outcome.kind = Outcome::Kind::Request;
   outcome.request = std::exchange(request_, HttpRequest{});
+  outcome.body = std::exchange(bodyLease_, ByteBudget::Lease(limits_.bodies));
   outcome.keepAlive = keepAlive_;
+  // A connection may stay open for hours between requests: it keeps only what it must.
+  if (buffer_.capacity() > buffer_.size() + kIdleBuffer) buffer_.shrink_to_fit();
   phase_ = Phase::Headers;
   version_.clear();
   headerCount_ = 0;
   keepAlive_ = true;
   contentLength_ = 0;
   chunkLeft_ = 0;
-  return outcome;
+  return std::move(outcome);
 }
 
 // The request line or one header; false with the outcome refused when it is not acceptable.
@@ -185,11 +244,14 @@ HttpRequestParser::Outcome HttpRequestParser::feed(std::string_view bytes) {
             break;
         }
         break;
-      case Phase::Body:
-        if (buffer_.size() < contentLength_) return outcome;
-        request_.body = buffer_.substr(0, contentLength_);
-        consume(contentLength_);
+      case Phase::Body: {
+        const size_t take = std::min(contentLength_ - request_.body.size(), buffer_.size());
+        if (!makeRoomForBody(request_.body.size() + take, contentLength_)) return busy(outcome);
+        request_.body.append(buffer_, 0, take);
+        consume(take);
+        if (request_.body.size() < contentLength_) return outcome;
         return complete(outcome);
+      }
       case Phase::ChunkSize: {
         const Line found = nextLine(kMaxChunkSizeLine, SIZE_MAX, line);
         if (found == Line::Partial) return outcome;
@@ -212,6 +274,7 @@ HttpRequestParser::Outcome HttpRequestParser::feed(std::string_view bytes) {
       }
       case Phase::ChunkData: {
         const size_t take = std::min(chunkLeft_, buffer_.size());
+        if (!makeRoomForBody(request_.body.size() + take, limits_.maxBodyBytes)) return busy(outcome);
         request_.body.append(buffer_, 0, take);
         consume(take);
         chunkLeft_ -= take;

@@ -19,6 +19,21 @@ bool isSpace(char c) {
   return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\v' || c == '\f';
 }
 
+int64_t unixSeconds(std::chrono::system_clock::time_point time) {
+  return std::chrono::duration_cast<std::chrono::seconds>(time.time_since_epoch()).count();
+}
+
+// What the storage keeps of a device's id: a leaked table names no device that could pass a lock.
+std::string deviceDigest(const std::string& device) {
+  unsigned char digest[32];
+  crypto_generichash(digest, sizeof digest, reinterpret_cast<const unsigned char*>(device.data()),
+                     device.size(), nullptr, 0);
+  static const char kHex[] = "0123456789abcdef";
+  std::string text;
+  for (unsigned char byte : digest) text += {kHex[byte >> 4], kHex[byte & 15]};
+  return text;
+}
+
 // Unknown addresses cost a verification too, so timing does not tell which addresses have accounts.
 const std::string& decoyHash() {
   static std::once_flag once;
@@ -85,8 +100,7 @@ PasswordAuthenticator::Digest PasswordAuthenticator::credentialDigest(const std:
   return digest;
 }
 
-void PasswordAuthenticator::recordFailure(const std::string& email,
-                                          std::chrono::steady_clock::time_point now) {
+void PasswordAuthenticator::recordFailure(const std::string& key, std::chrono::steady_clock::time_point now) {
   std::lock_guard lock(mutex_);
   if (failures_.size() >= kMaxFailures) {
     std::erase_if(failures_,
@@ -94,7 +108,7 @@ void PasswordAuthenticator::recordFailure(const std::string& email,
     // Flooded with addresses: forgetting is better than growing without bound.
     if (failures_.size() >= kMaxFailures) failures_.clear();
   }
-  Failures& failures = failures_[email];
+  Failures& failures = failures_[key];
   // A failure long after the last one starts a new series.
   if (failures.count > 0 && now > failures.lockedUntil + options_.longestLock) failures.count = 0;
   ++failures.count;
@@ -103,23 +117,56 @@ void PasswordAuthenticator::recordFailure(const std::string& email,
   failures.lockedUntil = now + std::min(lock_time, options_.longestLock);
 }
 
-PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::string& email,
-                                                                   const std::string& password) {
-  Outcome outcome;
-  const std::optional<std::string> address = normaliseEmail(email);
-  const std::string secret = trimmed(password);
-  if (!address || secret.empty() || secret.size() > kMaxPasswordBytes) return outcome;
+bool PasswordAuthenticator::lockedOut(const std::string& key, std::chrono::steady_clock::time_point now,
+                                      Outcome& outcome) const {
+  auto found = failures_.find(key);
+  if (found == failures_.end() || found->second.lockedUntil <= now) return false;
+  const auto left = std::chrono::ceil<std::chrono::seconds>(found->second.lockedUntil - now);
+  outcome.verdict = Verdict::Locked;
+  outcome.retryAfter = std::max(left, std::chrono::seconds(1));
+  return true;
+}
 
-  const Digest digest = credentialDigest(*address, secret);
-  auto lockedOut = [&](std::chrono::steady_clock::time_point now) {
-    auto found = failures_.find(*address);
-    if (found == failures_.end() || found->second.lockedUntil <= now) return false;
-    const auto left = std::chrono::ceil<std::chrono::seconds>(found->second.lockedUntil - now);
-    outcome.verdict = Verdict::Locked;
-    outcome.retryAfter = std::max(left, std::chrono::seconds(1));
-    return true;
-  };
-  bool owner = false;
+bool PasswordAuthenticator::isProven(int64_t accountId, const std::string& device) {
+  bool proven = false;
+  const auto since = std::chrono::system_clock::now() - options_.proofLifetime;
+  return store_.deviceProven(accountId, deviceDigest(device), unixSeconds(since), proven) ==
+             SyncStore::Status::Ok &&
+         proven;
+}
+
+void PasswordAuthenticator::prove(int64_t accountId, const std::string& device,
+                                  const std::string& deviceKey) {
+  const auto now = options_.now();
+  {
+    std::lock_guard lock(mutex_);
+    auto written = proofsWritten_.find(deviceKey);
+    if (written != proofsWritten_.end() && now < written->second + options_.successLifetime) return;
+    if (proofsWritten_.size() >= kMaxRemembered) proofsWritten_.clear();
+    proofsWritten_[deviceKey] = now;
+  }
+  const auto wallClock = std::chrono::system_clock::now();
+  // Not written (the storage failed): the device is simply not proven on the other servers yet.
+  if (store_.proveDevice(accountId, deviceDigest(device), unixSeconds(wallClock),
+                         unixSeconds(wallClock - options_.proofLifetime)) != SyncStore::Status::Ok) {
+    std::lock_guard lock(mutex_);
+    proofsWritten_.erase(deviceKey);
+  }
+}
+
+PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::string& email,
+                                                                   const std::string& password,
+                                                                   const std::string& address,
+                                                                   const std::string& device) {
+  Outcome outcome;
+  const std::optional<std::string> normalised = normaliseEmail(email);
+  const std::string secret = trimmed(password);
+  if (!normalised || secret.empty() || secret.size() > kMaxPasswordBytes) return outcome;
+
+  const Digest digest = credentialDigest(*normalised, secret);
+  const std::string addressKey = "address " + address;
+  const std::string deviceKey = device.empty() ? std::string() : "device " + *normalised + '\n' + device;
+  Outcome addressLock;
   {
     const auto now = options_.now();
     std::lock_guard lock(mutex_);
@@ -127,21 +174,31 @@ PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::st
     if (found != remembered_.end() && found->second.expires > now) {
       outcome.verdict = Verdict::Accepted;
       outcome.accountId = found->second.accountId;
-      owners_[digest] = now + options_.ownerLifetime;
-      return outcome;
+    } else if (!deviceKey.empty() && lockedOut(deviceKey, now, outcome)) {
+      return outcome;  // only a proven device's failures lock it
+    } else {
+      lockedOut(addressKey, now, addressLock);
     }
-    auto proven = owners_.find(digest);
-    owner = proven != owners_.end() && proven->second > now;
-    if (!owner && lockedOut(now)) return outcome;
+  }
+  if (outcome.verdict == Verdict::Accepted) {
+    if (!device.empty()) prove(outcome.accountId, device, deviceKey);
+    return outcome;
   }
 
   SyncStore::Account account;
-  const SyncStore::Status status = store_.findAccount(*address, account);
+  const SyncStore::Status status = store_.findAccount(*normalised, account);
   if (status == SyncStore::Status::Unavailable) {
     outcome.verdict = Verdict::Unavailable;
     return outcome;
   }
   const bool known = status == SyncStore::Status::Ok;
+  // Only a device that proved the password passes a lock on its address; the storage is asked only
+  // then, and when a verification fails, so that polls do not pay for it.
+  std::optional<bool> proven;
+  if (addressLock.verdict == Verdict::Locked) {
+    proven = known && !device.empty() && isProven(account.id, device);
+    if (!*proven) return addressLock;
+  }
   // The same credentials arriving together (one owner's devices after a restart) share one
   // verification. A new one never waits for a slot: waiting would hold the request's worker, and a flood
   // of guesses would then hold them all.
@@ -179,24 +236,22 @@ PasswordAuthenticator::Outcome PasswordAuthenticator::authenticate(const std::st
 
   const auto now = options_.now();
   if (!good) {
-    // An owner's stale password (changed on another device) fails like anyone's, but its failures do
-    // not lock the account for the others.
-    if (!owner) recordFailure(*address, now);
+    // An owner's device with a stale password (changed on another device) slows down only itself.
+    if (!proven) proven = known && !device.empty() && isProven(account.id, device);
+    recordFailure(*proven ? deviceKey : addressKey, now);
     outcome.verdict = Verdict::Rejected;
     return outcome;
   }
-  std::lock_guard lock(mutex_);
-  if (remembered_.size() >= kMaxRemembered) {
-    std::erase_if(remembered_, [&](const auto& entry) { return entry.second.expires <= now; });
-    if (remembered_.size() >= kMaxRemembered) remembered_.clear();
+  {
+    std::lock_guard lock(mutex_);
+    if (remembered_.size() >= kMaxRemembered) {
+      std::erase_if(remembered_, [&](const auto& entry) { return entry.second.expires <= now; });
+      if (remembered_.size() >= kMaxRemembered) remembered_.clear();
+    }
+    remembered_[digest] = Remembered{account.id, now + options_.successLifetime};
+    if (!deviceKey.empty()) failures_.erase(deviceKey);
   }
-  if (owners_.size() >= kMaxRemembered) {
-    std::erase_if(owners_, [&](const auto& entry) { return entry.second <= now; });
-    if (owners_.size() >= kMaxRemembered) owners_.clear();
-  }
-  remembered_[digest] = Remembered{account.id, now + options_.successLifetime};
-  owners_[digest] = now + options_.ownerLifetime;
-  failures_.erase(*address);
+  if (!device.empty()) prove(account.id, device, deviceKey);
   outcome.verdict = Verdict::Accepted;
   outcome.accountId = account.id;
   return outcome;

@@ -21,17 +21,22 @@ namespace tessal::server {
 // milliseconds and megabytes on purpose, while a device polls every five seconds with its password, so
 // a success is remembered for a bounded time under a keyed hash of the credentials (the key is random
 // per process): a poll then costs a hash and a lookup, and a changed password stops working when the
-// entry expires. Failed attempts lock the account for a time that doubles with each consecutive
-// failure; while locked no verification runs for strangers. Credentials that were proven once are
-// remembered much longer (under the same keyed hash) as the owner's: they pass a lock and are verified
-// again, so however many strangers fail, the owner's devices keep working, also after a night offline.
+// entry expires.
+//
+// Failed attempts lock the address they come from (not the account) for a time that doubles with each
+// consecutive failure; while it is locked no verification runs for requests from there. So guesses
+// slow down the guesser and nobody else. A device that proved the password is recorded in the storage
+// (a digest of its id, with the time), so that every server over the storage lets it past a lock on
+// its address and verifies it, also after a restart or a night offline: a stranger sharing the
+// owner's address (or a proxy that does not name clients) cannot shut the owner out. Such a device's
+// own failures (a password changed elsewhere) lock only that device.
 // A verification never waits for a free slot: when all are taken the request is told to come back.
 class PasswordAuthenticator {
  public:
   struct Options {
     std::chrono::milliseconds successLifetime = std::chrono::minutes(10);
-    // How long proven credentials pass a lock after their last successful use.
-    std::chrono::milliseconds ownerLifetime = std::chrono::hours(24 * 30);
+    // How long a device that proved the password passes a lock on its address after it last did.
+    std::chrono::seconds proofLifetime = std::chrono::hours(24 * 30);
     std::chrono::milliseconds firstLock = std::chrono::seconds(1);  // after the first failure
     std::chrono::milliseconds longestLock = std::chrono::minutes(5);
     int concurrentVerifications = 2;  // bounds the memory Argon2id takes under load
@@ -47,7 +52,7 @@ class PasswordAuthenticator {
   enum class Verdict {
     Accepted,
     Rejected,     // unknown address or wrong password
-    Locked,       // too many failures; `retryAfter` tells how long
+    Locked,       // too many failures from there; `retryAfter` tells how long
     Unavailable,  // the storage failed
     Busy,         // every verification slot is taken; try again shortly
   };
@@ -58,7 +63,9 @@ class PasswordAuthenticator {
   };
 
   // `email` is normalised here (see normaliseEmail); `password` is taken trimmed of white space.
-  Outcome authenticate(const std::string& email, const std::string& password);
+  // `address` is the client's (clientAddress()); `device` the id the request names, or empty.
+  Outcome authenticate(const std::string& email, const std::string& password, const std::string& address,
+                       const std::string& device);
 
   // Creates an account. Fails with a reason for an address that is not one, a password shorter than 8
   // characters or longer than 1024 bytes, or an address already taken.
@@ -88,7 +95,12 @@ class PasswordAuthenticator {
   };
 
   Digest credentialDigest(const std::string& email, const std::string& password) const;
-  void recordFailure(const std::string& email, std::chrono::steady_clock::time_point now);
+  void recordFailure(const std::string& key, std::chrono::steady_clock::time_point now);
+  // Whether the failures under `key` lock it now; sets the outcome's verdict and wait when they do.
+  bool lockedOut(const std::string& key, std::chrono::steady_clock::time_point now, Outcome& outcome) const;
+  bool isProven(int64_t accountId, const std::string& device);
+  // Records in the storage that `device` proved the password, unless this process just did.
+  void prove(int64_t accountId, const std::string& device, const std::string& deviceKey);
 
   SyncStore& store_;
   Options options_;
@@ -97,9 +109,11 @@ class PasswordAuthenticator {
 
   std::mutex mutex_;
   std::unordered_map<Digest, Remembered, DigestHash> remembered_;
-  std::unordered_map<Digest, std::chrono::steady_clock::time_point, DigestHash> owners_;  // until when
   std::unordered_map<Digest, std::shared_future<bool>, DigestHash> inFlight_;  // verifications running
+  // By address group, or by account and device for a proven device.
   std::unordered_map<std::string, Failures> failures_;
+  // When each device's proof was last written by this process: one write per successLifetime.
+  std::unordered_map<std::string, std::chrono::steady_clock::time_point> proofsWritten_;
 };
 
 }  // namespace tessal::server

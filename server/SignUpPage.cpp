@@ -147,10 +147,6 @@ std::string authorityOf(const std::string& url) {
   return authority;
 }
 
-bool isLoopback(const std::string& address) {
-  return address.rfind("127.", 0) == 0 || address == "::1" || address.rfind("::ffff:127.", 0) == 0;
-}
-
 }  // namespace
 
 std::unordered_map<std::string, std::string> parseForm(const std::string& body) {
@@ -190,15 +186,7 @@ HttpReply SignUpPage::submit(const HttpRequest& request) {
   const std::string type = request.header("content-type");
   if (type.rfind("application/x-www-form-urlencoded", 0) != 0 || !request.query.empty())
     return textReply(415, "Send the form's fields in a url-encoded request body.");
-  std::string client = request.peer;
-  if (isLoopback(client)) {
-    const std::string forwarded = request.header("x-forwarded-for");
-    const size_t comma = forwarded.rfind(',');
-    const std::string last = forwarded.substr(comma == std::string::npos ? 0 : comma + 1);
-    const size_t begin = last.find_first_not_of(' ');
-    if (begin != std::string::npos) client = last.substr(begin);
-  }
-  if (!admit(client)) {
+  if (!admit(clientAddress(request))) {
     HttpReply reply =
         page(429, kTitle, formHtml({}, "Too many sign-ups from your address; please try again later."));
     reply.headers.emplace_back("Retry-After", std::to_string(window.count()));

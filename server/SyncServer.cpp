@@ -14,7 +14,7 @@ constexpr const char* kSignUpPath = "/sync/tessal/signup.php";
 SyncServer::SyncServer(std::unique_ptr<SyncStore> store, Options options)
     : options_(std::move(options)), store_(std::move(store)) {
   authenticator_ = std::make_unique<PasswordAuthenticator>(*store_, options_.authentication);
-  service_ = std::make_unique<SyncService>(*store_, *authenticator_);
+  service_ = std::make_unique<SyncService>(*store_, *authenticator_, options_.concurrentHeads);
   signUpPage_ = std::make_unique<SignUpPage>(*authenticator_);
 }
 
@@ -32,7 +32,7 @@ SyncServer::~SyncServer() {
 HttpReply SyncServer::route(const HttpRequest& request) {
   if (request.path == kSyncPath) {
     if (request.method != "POST") return textReply(405, "POST a sync request here.");
-    return service_->handle(request.body);
+    return service_->handle(request.body, addressGroup(clientAddress(request)));
   }
   if (request.path == kSignUpPath && options_.signUp) {
     if (request.method == "GET") return signUpPage_->form();

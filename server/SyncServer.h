@@ -25,7 +25,8 @@ class SyncServer {
     int threads = 64;
     // Header caps and read deadlines of every connection (its maxBodyBytes is the one above).
     HttpListener::Limits limits;
-    bool signUp = true;  // false: the sign-up page answers 404
+    bool signUp = true;       // false: the sign-up page answers 404
+    int concurrentHeads = 4;  // heads that bring changes, built at once (SyncService)
     PasswordAuthenticator::Options authentication;
   };
 

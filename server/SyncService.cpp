@@ -7,7 +7,6 @@ namespace tessal::server {
 namespace {
 
 constexpr size_t kMaxDeviceLength = 128;
-constexpr size_t kMaxRememberedDevices = 100000;
 
 HttpReply retryLater(int status, const std::string& message, std::chrono::seconds after) {
   HttpReply reply;
@@ -50,7 +49,7 @@ HttpReply SyncService::errorReply(int code, const std::string& message, int stat
   return reply;
 }
 
-HttpReply SyncService::handle(std::string_view body) {
+HttpReply SyncService::handle(std::string_view body, const std::string& client) {
   std::string reason;
   const std::optional<JsonValue> request = JsonValue::parse(body, &reason);
   if (!request) return errorReply(kMalformedRequest, "The request is not valid JSON: " + reason);
@@ -78,14 +77,15 @@ HttpReply SyncService::handle(std::string_view body) {
     return errorReply(kMalformedRequest, "\"device\" must be a short printable text.");
   }
 
-  const PasswordAuthenticator::Outcome login = authenticator_.authenticate(*user, *password);
+  const PasswordAuthenticator::Outcome login =
+      authenticator_.authenticate(*user, *password, client, deviceId);
   switch (login.verdict) {
     case PasswordAuthenticator::Verdict::Accepted:
       break;
     case PasswordAuthenticator::Verdict::Rejected:
       return errorReply(kWrongCredentials, "Wrong e-mail address or password.");
     case PasswordAuthenticator::Verdict::Locked:
-      return retryLater(429, "Too many failed sign-in attempts for this account; try again later.",
+      return retryLater(429, "Too many failed sign-in attempts from your address; try again later.",
                         login.retryAfter);
     case PasswordAuthenticator::Verdict::Unavailable:
       return unavailable();
@@ -101,20 +101,23 @@ HttpReply SyncService::handle(std::string_view body) {
 
 HttpReply SyncService::head(int64_t accountId, int64_t base, const std::string& device) {
   HttpReply reply;
-  int64_t iteration = 0;
-  std::string result;
-  // The poll with nothing new, by far the most common request, costs one indexed read.
-  const SyncStore::Status status = store_.currentHead(accountId, iteration);
-  if (status != SyncStore::Status::Ok) return unavailable();
-  if (base == iteration) {
-    result = R"({"i":{},"u":{},"x":[]})";
+  // The poll with nothing new, by far the most common request, costs one indexed read; it writes only
+  // when the device's last head on record is another.
+  SyncStore::Head head = store_.currentHead(accountId, device);
+  if (head.status != SyncStore::Status::Ok) return unavailable();
+  if (base == head.iteration && (device.empty() || head.lastSent == head.iteration)) {
+    head.result = R"({"i":{},"u":{},"x":[]})";
   } else {
-    SyncStore::Head head = store_.head(accountId, base, device);
+    if (!fullHeads_.try_acquire()) {
+      return retryLater(503, "The sync service is busy sending changes; try again shortly.",
+                        std::chrono::seconds(1));
+    }
+    head = store_.head(accountId, base, device);
+    fullHeads_.release();
     if (head.status != SyncStore::Status::Ok) return unavailable();
-    iteration = head.iteration;
-    result = std::move(head.result);
   }
-  rememberHead(accountId, device, iteration);
+  const int64_t iteration = head.iteration;
+  const std::string& result = head.result;
   reply.body.reserve(result.size() + 48);
   reply.body = "{\"action\":\"head\",\"iteration\":" + std::to_string(iteration) + ",\"result\":";
   reply.body += result;
@@ -128,12 +131,12 @@ HttpReply SyncService::save(int64_t accountId, int64_t base, const std::string& 
   std::string reason;
   const std::optional<ChangeSet> changes = readChangeSet(*data, reason);
   if (!changes) return errorReply(kBadChangeSet, "Bad change set: " + reason);
-  if (isBehindLastHead(accountId, device, base)) {
+  const SyncStore::Save outcome = store_.save(accountId, base, device, *changes);
+  if (outcome.status != SyncStore::Status::Ok) return unavailable();
+  if (outcome.overtaken) {
     return errorReply(kFetchHeadFirst,
                       "This device was already sent a newer iteration; poll \"head\" first.");
   }
-  const SyncStore::Save outcome = store_.save(accountId, base, device, *changes);
-  if (outcome.status != SyncStore::Status::Ok) return unavailable();
   if (outcome.refused) {
     return errorReply(kFetchHeadFirst,
                       "The server has changes this save is not based on; poll \"head\" first.");
@@ -141,23 +144,6 @@ HttpReply SyncService::save(int64_t accountId, int64_t base, const std::string& 
   HttpReply reply;
   reply.body = "{\"action\":\"save\",\"iteration\":" + std::to_string(outcome.iteration) + "}";
   return reply;
-}
-
-void SyncService::rememberHead(int64_t accountId, const std::string& device, int64_t iteration) {
-  if (device.empty()) return;
-  std::string key = std::to_string(accountId) + '/' + device;
-  std::lock_guard lock(headsMutex_);
-  if (lastHeads_.size() >= kMaxRememberedDevices && !lastHeads_.count(key)) lastHeads_.clear();
-  // The latest answer counts, not the largest: after the storage was restored from a backup the
-  // iterations start lower again.
-  lastHeads_[std::move(key)] = iteration;
-}
-
-bool SyncService::isBehindLastHead(int64_t accountId, const std::string& device, int64_t base) {
-  if (device.empty()) return false;
-  std::lock_guard lock(headsMutex_);
-  auto found = lastHeads_.find(std::to_string(accountId) + '/' + device);
-  return found != lastHeads_.end() && base < found->second;
 }
 
 }  // namespace tessal::server

@@ -3,11 +3,11 @@
 #include "PasswordAuthenticator.h"
 #include "SyncStore.h"
 
+#include <algorithm>
 #include <cstdint>
-#include <mutex>
+#include <semaphore>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -23,10 +23,10 @@ struct HttpReply {
 
 // The sync protocol: one JSON request in, one JSON reply out. Documented in server/README.md.
 //
-// Threads: every HTTP worker calls handle() at the same time, with no lock of the listener held.
-// The only state it keeps is the last head sent to each device, under `headsMutex_`, which is held
-// for a map look-up or update and never across a call to the authenticator or the store. Password
-// checks lock inside PasswordAuthenticator; storage calls lock nothing here (see SyncStore).
+// Threads: every HTTP worker calls handle() at the same time, with no lock of the listener held. It
+// keeps no state: what it must remember between requests (the last head sent to each device) is in
+// the storage, so several server processes over one database answer alike. Password checks lock
+// inside PasswordAuthenticator; storage calls lock nothing here (see SyncStore).
 class SyncService {
  public:
   // The "code" of an error reply.
@@ -39,13 +39,15 @@ class SyncService {
     kRequestTooLarge = 6,   // the body is over the server's limit
   };
 
-  SyncService(SyncStore& store, PasswordAuthenticator& authenticator)
-      : store_(store), authenticator_(authenticator) {}
+  // At most `concurrentHeads` heads that bring changes are built at once (see fullHeads_).
+  SyncService(SyncStore& store, PasswordAuthenticator& authenticator, int concurrentHeads = 4)
+      : store_(store), authenticator_(authenticator), fullHeads_(std::clamp(concurrentHeads, 1, 64)) {}
 
   // Answers one POST to "/sync/tessal/sync.php". Failures the client should simply retry (storage
   // unavailable, account locked after failed attempts) are plain-text 503 and 429 answers with
-  // "Retry-After"; every other outcome is a JSON object with status 200.
-  HttpReply handle(std::string_view body);
+  // "Retry-After"; every other outcome is a JSON object with status 200. `client` is what failed
+  // sign-ins are counted against (addressGroup(clientAddress(request))).
+  HttpReply handle(std::string_view body, const std::string& client);
 
   // The JSON error reply {"error": message, "code": code} (with "iteration": 0 for code 4).
   static HttpReply errorReply(int code, const std::string& message, int status = 200);
@@ -53,15 +55,14 @@ class SyncService {
  private:
   HttpReply head(int64_t accountId, int64_t base, const std::string& device);
   HttpReply save(int64_t accountId, int64_t base, const std::string& device, const JsonValue* data);
-  void rememberHead(int64_t accountId, const std::string& device, int64_t iteration);
-  bool isBehindLastHead(int64_t accountId, const std::string& device, int64_t base);
 
   SyncStore& store_;
   PasswordAuthenticator& authenticator_;
-  // The last head iteration sent to each device: a save based on an older one is a request that was
-  // overtaken by a later one of the same device (see README, "Late requests").
-  std::mutex headsMutex_;
-  std::unordered_map<std::string, int64_t> lastHeads_;
+  // A head that brings changes is built in memory, and a large account's first one takes tens of
+  // megabytes: readers asking for it over and over would otherwise take as many of those as there are
+  // workers. Like a password verification it never waits for a slot (503 with Retry-After instead);
+  // the poll with nothing new needs none.
+  std::counting_semaphore<64> fullHeads_;
 };
 
 }  // namespace tessal::server

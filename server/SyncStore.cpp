@@ -47,6 +47,11 @@ CREATE TABLE IF NOT EXISTS fields (
   PRIMARY KEY (account_id, uuid, name)) WITHOUT ROWID;
 CREATE INDEX IF NOT EXISTS fields_iter ON fields (account_id, iter);
 CREATE INDEX IF NOT EXISTS fields_ref ON fields (account_id, ref) WHERE ref IS NOT NULL;
+CREATE TABLE IF NOT EXISTS devices (
+  account_id INTEGER NOT NULL,
+  device TEXT NOT NULL,
+  last_head INTEGER NOT NULL,
+  PRIMARY KEY (account_id, device)) WITHOUT ROWID;
 )sql";
 
 const char* const kPostgresSchema = R"sql(
@@ -77,6 +82,21 @@ CREATE TABLE IF NOT EXISTS fields (
   PRIMARY KEY (account_id, uuid, name));
 CREATE INDEX IF NOT EXISTS fields_iter ON fields (account_id, iter);
 CREATE INDEX IF NOT EXISTS fields_ref ON fields (account_id, ref) WHERE ref IS NOT NULL;
+CREATE TABLE IF NOT EXISTS devices (
+  account_id BIGINT NOT NULL,
+  device TEXT NOT NULL,
+  last_head BIGINT NOT NULL,
+  PRIMARY KEY (account_id, device));
+)sql";
+
+// Added after the first release: created, like every table, by the first server that opens a storage
+// without it, which is all an existing storage needs.
+const char* const kProvenDevicesSchema = R"sql(
+CREATE TABLE IF NOT EXISTS proven_devices (
+  account_id BIGINT NOT NULL,
+  device TEXT NOT NULL,
+  proven_at BIGINT NOT NULL,
+  PRIMARY KEY (account_id, device));
 )sql";
 
 void logStorageError(const char* operation, const StorageError& error) {
@@ -364,6 +384,7 @@ std::unique_ptr<SyncStore> SyncStore::open(const std::string& location, std::str
 void SyncStore::createSchema() {
   SqlDatabase::Lease c = database_->acquire();
   c->executeScript(kind() == SqlDatabase::Kind::SQLite ? kSqliteSchema : kPostgresSchema);
+  c->executeScript(kProvenDevicesSchema);
 }
 
 SyncStore::Status SyncStore::createAccount(const std::string& email, const std::string& passwordHash) {
@@ -395,26 +416,40 @@ SyncStore::Status SyncStore::findAccount(const std::string& email, Account& acco
   }
 }
 
-SyncStore::Status SyncStore::currentHead(int64_t accountId, int64_t& head) {
+SyncStore::Head SyncStore::currentHead(int64_t accountId, const std::string& device) {
+  Head reply;
   try {
     SqlDatabase::Lease c = database_->acquire();
-    const std::vector<SqlRow> rows = c->query("SELECT head FROM accounts WHERE id = ?", {accountId});
-    if (rows.empty()) return Status::NotFound;
-    head = rows[0].integer(0);
-    return Status::Ok;
+    const std::vector<SqlRow> rows = c->query(
+        "SELECT a.head, d.last_head FROM accounts a LEFT JOIN devices d ON d.account_id = a.id AND "
+        "d.device = ? WHERE a.id = ?",
+        {device, accountId});
+    if (rows.empty()) {
+      reply.status = Status::NotFound;
+      return reply;
+    }
+    reply.iteration = rows[0].integer(0);
+    reply.lastSent = rows[0].isNull(1) ? -1 : rows[0].integer(1);
   } catch (const StorageError& e) {
     logStorageError("currentHead", e);
-    return Status::Unavailable;
+    reply.status = Status::Unavailable;
   }
+  return reply;
 }
 
 SyncStore::Head SyncStore::head(int64_t accountId, int64_t base, const std::string& device) {
   Head reply;
   try {
     SqlDatabase::Lease c = database_->acquire();
-    c->beginRead();
+    // Remembering what a device was sent writes, and must not interleave with a save of the account
+    // (from this process or another): a save is then either in the reply or checked against it.
+    const bool remember = !device.empty();
+    remember ? c->beginWrite() : c->beginRead();
     TransactionGuard transaction(*c);
-    const std::vector<SqlRow> heads = c->query("SELECT head FROM accounts WHERE id = ?", {accountId});
+    const std::vector<SqlRow> heads = c->query(remember && kind() == SqlDatabase::Kind::PostgreSQL
+                                                   ? "SELECT head FROM accounts WHERE id = ? FOR SHARE"
+                                                   : "SELECT head FROM accounts WHERE id = ?",
+                                               {accountId});
     if (heads.empty()) {
       reply.status = Status::NotFound;
       return reply;
@@ -445,6 +480,14 @@ SyncStore::Head SyncStore::head(int64_t accountId, int64_t base, const std::stri
         if (!deleted.empty()) deleted += ',';
         appendJsonString(deleted, row.text(0));
       }
+    }
+    // The latest answer counts, not the largest: after the storage was restored from a backup the
+    // iterations start lower again.
+    if (remember) {
+      c->query(
+          "INSERT INTO devices (account_id, device, last_head) VALUES (?, ?, ?) "
+          "ON CONFLICT (account_id, device) DO UPDATE SET last_head = excluded.last_head",
+          {accountId, device, reply.iteration});
     }
     transaction.commit();
     addOwnersOfListedTasks(entries);
@@ -495,6 +538,17 @@ SyncStore::Save SyncStore::save(int64_t accountId, int64_t base, const std::stri
       return reply;
     }
     const int64_t head = heads[0].integer(0);
+    // A request overtaken by a later head of the same device (it timed out, the device moved on): the
+    // device has merged values this save would overwrite behind its back. Checked under the account's
+    // lock, so a head answered by any process just before counts.
+    if (!device.empty()) {
+      const std::vector<SqlRow> sent =
+          c->query("SELECT last_head FROM devices WHERE account_id = ? AND device = ?", {accountId, device});
+      if (!sent.empty() && base < sent[0].integer(0)) {
+        reply.refused = reply.overtaken = true;
+        return reply;
+      }
+    }
     if (base > head) {
       // The client counts from a history this server does not have; its next "head" gets everything.
       reply.refused = true;
@@ -529,6 +583,36 @@ SyncStore::Save SyncStore::save(int64_t accountId, int64_t base, const std::stri
     reply.status = Status::Unavailable;
   }
   return reply;
+}
+
+SyncStore::Status SyncStore::proveDevice(int64_t accountId, const std::string& device, int64_t at,
+                                         int64_t forgetBefore) {
+  try {
+    SqlDatabase::Lease c = database_->acquire();
+    c->query(
+        "INSERT INTO proven_devices (account_id, device, proven_at) VALUES (?, ?, ?) "
+        "ON CONFLICT (account_id, device) DO UPDATE SET proven_at = excluded.proven_at",
+        {accountId, device, at});
+    c->query("DELETE FROM proven_devices WHERE account_id = ? AND proven_at < ?", {accountId, forgetBefore});
+    return Status::Ok;
+  } catch (const StorageError& e) {
+    logStorageError("proveDevice", e);
+    return Status::Unavailable;
+  }
+}
+
+SyncStore::Status SyncStore::deviceProven(int64_t accountId, const std::string& device, int64_t since,
+                                          bool& proven) {
+  try {
+    SqlDatabase::Lease c = database_->acquire();
+    proven = !c->query("SELECT 1 FROM proven_devices WHERE account_id = ? AND device = ? AND proven_at >= ?",
+                       {accountId, device, since})
+                  .empty();
+    return Status::Ok;
+  } catch (const StorageError& e) {
+    logStorageError("deviceProven", e);
+    return Status::Unavailable;
+  }
 }
 
 }  // namespace tessal::server

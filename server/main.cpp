@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include <malloc.h>
 #include <pthread.h>
 #include <sys/resource.h>
 
@@ -19,11 +20,15 @@ namespace {
 
 constexpr const char* kUsage =
     "usage:\n"
-    "  tessal-sync-server serve --listen HOST:PORT --db LOCATION [--threads N] [--max-body BYTES] "
-    "[--no-signup]\n"
+    "  tessal-sync-server serve --listen HOST:PORT --db LOCATION [--threads N] [--max-body BYTES]\n"
+    "      [--body-memory BYTES] [--connections-per-address N] [--no-signup]\n"
     "  tessal-sync-server add-user EMAIL --db LOCATION      (reads the password from standard input)\n"
     "LOCATION is a SQLite file (created when missing) or a postgresql:// connection URI.\n"
-    "PORT 0 picks a free port; the address served is printed on standard output.\n";
+    "PORT 0 picks a free port; the address served is printed on standard output.\n"
+    "--max-body caps one request's body (default 33554432), --body-memory all bodies being read or\n"
+    "answered together (default 100663296; past it: 503). --connections-per-address caps the\n"
+    "connections one address (an IPv6 /64) holds, the rest answered 503 at once (default 256, 0: no\n"
+    "cap; behind a proxy on this host, raise it to the proxy's connections or use 0).\n";
 
 int usage() {
   std::cerr << kUsage;
@@ -71,6 +76,14 @@ int serve(const std::vector<std::string>& args) {
       const auto value = number(args[++i]);
       if (!value || *value < 1024) return usage();
       options.maxBodyBytes = static_cast<size_t>(*value);
+    } else if (arg == "--body-memory" && hasValue) {
+      const auto value = number(args[++i]);
+      if (!value || *value < 1024) return usage();
+      options.limits.maxBodyMemory = static_cast<size_t>(*value);
+    } else if (arg == "--connections-per-address" && hasValue) {
+      const auto value = number(args[++i]);
+      if (!value) return usage();
+      options.limits.maxConnectionsPerAddress = static_cast<size_t>(*value);
     } else if (arg == "--no-signup") {
       options.signUp = false;
     } else {
@@ -86,6 +99,10 @@ int serve(const std::vector<std::string>& args) {
   sigaddset(&signals, SIGTERM);
   pthread_sigmask(SIG_BLOCK, &signals, nullptr);
   std::signal(SIGPIPE, SIG_IGN);
+  // Bodies and replies of a megabyte or more get pages of their own, which go back to the system the
+  // moment they are freed; by default the allocator raises this threshold after each large free, and
+  // a burst of large requests then leaves the process at its peak.
+  mallopt(M_MMAP_THRESHOLD, 1 << 20);
   // Every open connection is a descriptor; the usual soft limit of 1,024 is below the connections the
   // server is meant to hold.
   rlimit files{};
@@ -164,6 +181,10 @@ int addUser(const std::vector<std::string>& args) {
 int main(int argc, char** argv) {
   if (argc < 2) return usage();
   const std::string command = argv[1];
+  if (command == "--help" || command == "-h") {
+    std::cout << kUsage;
+    return 0;
+  }
   const std::vector<std::string> args(argv + 2, argv + argc);
   if (command == "serve") return serve(args);
   if (command == "add-user") return addUser(args);

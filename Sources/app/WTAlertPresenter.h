@@ -13,4 +13,10 @@ class WTAlertPresenter {
   // Asks `question` ("Delete “General” and its 14 items?"), with `detail` under it when not empty;
   // true for "Delete".
   virtual bool confirmDeletion(const QString& question, const QString& detail) = 0;
+  // Says `message` (the store cannot be opened for damage) and offers to put back the copy at `backup`;
+  // true for "Restore Backup". By default only the message is shown.
+  virtual bool offerRestore(const QString& message, const QString& backup) {
+    Q_UNUSED(backup);
+    return presentError(message);
+  }
 };

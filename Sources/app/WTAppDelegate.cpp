@@ -1,6 +1,7 @@
 #include "WTAppDelegate.h"
 
 #include "RZSyncManager.h"
+#include "RZSyncTrack.h"
 #include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
@@ -12,6 +13,7 @@
 #include "WTProject.h"
 #include "WTStopwatchUpdater.h"
 #include "WTStore.h"
+#include "WTStoreBackup.h"
 #include "WTStoreSetup.h"
 #include "WTTask.h"
 
@@ -38,10 +40,6 @@ QString WTAppDelegate::storePath() {
   return WTStoreSetup::storePath();
 }
 
-QString WTAppDelegate::syncJournalPath() {
-  return WTStoreSetup::syncJournalPath();
-}
-
 WTObjectContext* WTAppDelegate::managedObjectContext() {
   if (context_) return context_.get();
   const QString folder = applicationSupportFolder();
@@ -52,18 +50,35 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
   const bool storeIsNew = !QFileInfo::exists(storePath());
   bool fill = false;
   Result<std::unique_ptr<WTStore>> store =
-      WTStore::open(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      RZSyncTrack::openStore(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+  if (!store && (store.error().code == WTStore::Damaged || store.error().code == WTStore::NotAStore)) {
+    // Never replaced unasked: the damaged file stays as it is unless the user takes a backup instead,
+    // and then it is kept beside the restored one.
+    const QString backup = WTStoreBackup::newestGoodCopy(storePath());
+    if (backup.isEmpty()) {
+      presenter_->presentError(store.error().message);
+    } else if (presenter_->offerRestore(store.error().message, backup)) {
+      const Result<QString> restored = WTStoreSetup::restoreBackup(backup, *defaults_);
+      if (restored) store = RZSyncTrack::openStore(storePath(), nullptr, WTStore::Check::WholeFileBeforeSaving);
+      if (!restored || !store)
+        presenter_->presentError(restored ? store.error().message : restored.error().message);
+    }
+  } else if (!store) {
+    presenter_->presentError(store.error().message);
+  }
   if (store) {
     Result<void> loaded = context_->attachStore(std::move(store.value()));
     if (!loaded) presenter_->presentError(loaded.error().message);
     fill = loaded && storeIsNew;
-  } else {
-    presenter_->presentError(store.error().message);
   }
   connect(context_.get(), &WTObjectContext::objectsDidChange, this,
           &WTAppDelegate::managedObjectContextObjectsDidChange);
+  if (context_->hasStore()) {
+    dailyBackup_ = std::make_unique<WTStoreBackup::Daily>(storePath());
+    connect(context_.get(), &WTObjectContext::didSave, this, [this] { dailyBackup_->storeDidSave(); });
+  }
 
-  syncManager_ = std::make_unique<RZSyncManager>(context_.get(), syncJournalPath());
+  syncManager_ = std::make_unique<RZSyncManager>(context_.get());
   syncManager_->syncNetwork()->setCredentialDelegate(this);
   if (syncErrorPresenter_) syncManager_->setErrorPresenter(syncErrorPresenter_);
   // A merge first saves what the user is typing, the way every safe save does.
@@ -99,10 +114,27 @@ void WTAppDelegate::managedObjectContextObjectsDidChange() {
   QTimer::singleShot(500, this, &WTAppDelegate::saveAction);
 }
 
+namespace {
+
+// A file found damaged only once the records were up (by the check beside the loading) is not replaced
+// under the open window: the message names the copy to put back after quitting.
+QString withDamageAdvice(const Error& error) {
+  if (error.code != WTStore::Damaged) return error.message;
+  const QString copy = WTStoreBackup::newestGoodCopy(WTStoreSetup::storePath());
+  if (copy.isEmpty()) return error.message;
+  return error.message + u' ' +
+         WTAppDelegate::tr(
+             "The newest good backup is “%1”; quit Tessal and run “tessal restore” with it to "
+             "put it back.")
+             .arg(copy);
+}
+
+}  // namespace
+
 void WTAppDelegate::saveAction() {
   if (!context_ || !context_->hasChanges()) return;
   const Result<void> saved = context_->save();
-  if (!saved && context_->hasStore()) presenter_->presentError(saved.error().message);
+  if (!saved && context_->hasStore()) presenter_->presentError(withDamageAdvice(saved.error()));
   qCDebug(lcStore, "Saved");
 }
 
@@ -159,7 +191,7 @@ WTAppDelegate::TerminateReply WTAppDelegate::applicationShouldTerminate() {
   if (!context_->hasChanges()) return TerminateReply::TerminateNow;
   const Result<void> saved = context_->save();
   if (saved) return TerminateReply::TerminateNow;
-  if (presenter_->presentError(saved.error().message)) return TerminateReply::TerminateCancel;
+  if (presenter_->presentError(withDamageAdvice(saved.error()))) return TerminateReply::TerminateCancel;
   return presenter_->confirmQuitAnyway() ? TerminateReply::TerminateNow : TerminateReply::TerminateCancel;
 }
 

@@ -21,6 +21,9 @@ class WTStopwatchUpdater;
 class WTTrackingAlertPresenter;
 class WTObject;
 class WTObjectContext;
+namespace WTStoreBackup {
+class Daily;
+}
 
 // Owns the one object context, its store file and the sync manager that keeps them in step with the
 // account's server; saves half a second after every change, and decides what happens when the
@@ -36,11 +39,11 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
   static QString applicationSupportFolder();
   static QString storePath();
-  // The store's path with the extension "sync": where the change journal lives.
-  static QString syncJournalPath();
 
   // The context, made with the store on first use. A store that cannot be opened is reported once;
   // the context then works without one, finds nothing and cannot save, and the file is left untouched.
+  // For a damaged one the report names the newest good backup and offers to restore it
+  // (WTAlertPresenter::offerRestore; WTStoreSetup::restoreBackup keeps the damaged file beside it).
   // A store file made here gets its first project (fillNewStore).
   WTObjectContext* managedObjectContext();
   // What a store file gets when it is made, by the desktop copy or by a command: "Default Project" with
@@ -49,7 +52,7 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // set up. A store that exists is never filled, so the user's own emptying it sticks. Saves nothing.
   static void fillNewStore(WTObjectContext& context);
   bool hasContext() const { return context_ != nullptr; }
-  // Made with the context, over syncJournalPath(), with syncing switched on; null before that.
+  // Made with the context, over the store's journal, with syncing switched on; null before that.
   RZSyncManager* syncManager() const { return syncManager_.get(); }
   // Where sync errors are shown (not owned); the log until set. Applies to a manager made later too.
   void setSyncErrorPresenter(RZSyncErrorPresenter* presenter);
@@ -116,6 +119,8 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // Before the context goes: it observes the context's records.
   std::unique_ptr<WTStopwatchUpdater> stopwatchUpdater_;
   std::function<bool()> commitEditing_;
+  // The day's copy of the store, made after the first save of a day.
+  std::unique_ptr<WTStoreBackup::Daily> dailyBackup_;
   std::unique_ptr<WTPasswordStore> passwordStore_;
   bool displayArchived_ = false;
 };

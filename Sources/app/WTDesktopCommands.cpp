@@ -39,6 +39,13 @@ class WTCommandLinePresenter final : public WTAlertPresenter, public RZSyncError
   }
   bool confirmQuitAnyway() override { return false; }
   bool confirmDeletion(const QString&, const QString&) override { return false; }
+  bool offerRestore(const QString& message, const QString& backup) override {
+    err_ << message << '\n'
+         << QStringLiteral("The newest good backup is %1; `tessal restore '%1'` puts it back.").arg(backup)
+         << '\n';
+    err_.flush();
+    return false;
+  }
   void presentSyncError(const QString&) override {}
   void presentNetworkError(const QString&) override {}
 

@@ -1,6 +1,9 @@
 #include "WTDialogAlertPresenter.h"
 
 #include <QCoreApplication>
+#include <QDir>
+#include <QFileInfo>
+#include <QLocale>
 #include <QMessageBox>
 #include <QPushButton>
 
@@ -40,6 +43,26 @@ bool WTDialogAlertPresenter::confirmDeletion(const QString& question, const QStr
   box.setEscapeButton(cancel);
   box.exec();
   return box.clickedButton() == remove;
+}
+
+bool WTDialogAlertPresenter::offerRestore(const QString& message, const QString& backup) {
+  QMessageBox box(parent_);
+  box.setIcon(QMessageBox::Warning);
+  box.setText(message);
+  const QString made = QLocale().toString(QFileInfo(backup).lastModified(), QLocale::LongFormat);
+  box.setInformativeText(
+      QCoreApplication::translate("WTAppDelegate",
+                                  "The newest good backup is “%1”, made %2. Restore it? The "
+                                  "damaged file is kept beside the restored one.")
+          .arg(QDir::toNativeSeparators(backup), made));
+  QPushButton* restore =
+      box.addButton(QCoreApplication::translate("WTAppDelegate", "Restore Backup"), QMessageBox::AcceptRole);
+  QPushButton* keep =
+      box.addButton(QCoreApplication::translate("WTAppDelegate", "Don’t Restore"), QMessageBox::RejectRole);
+  box.setDefaultButton(restore);
+  box.setEscapeButton(keep);
+  box.exec();
+  return box.clickedButton() == restore;
 }
 
 void WTDialogAlertPresenter::presentSyncError(const QString& message) {

@@ -12,6 +12,7 @@ class WTDialogAlertPresenter final : public WTAlertPresenter, public RZSyncError
   bool presentError(const QString& message) override;
   bool confirmQuitAnyway() override;
   bool confirmDeletion(const QString& question, const QString& detail) override;
+  bool offerRestore(const QString& message, const QString& backup) override;
   void presentSyncError(const QString& message) override;
   void presentNetworkError(const QString& message) override;
 

@@ -34,6 +34,7 @@
 #include <QScreen>
 #include <QStatusBar>
 #include <QStyle>
+#include <QThread>
 #include <QTimeZone>
 #include <QToolBar>
 #include <QToolButton>
@@ -316,19 +317,35 @@ QMessageBox* WTMainWindowController::importFile(const QString& path) {
   auto* dialog = new QMessageBox(this);
   dialog->setAttribute(Qt::WA_DeleteOnClose);
   dialog->setWindowTitle(tr("Import"));
-  QFile file(path);
+  dialog->setText(tr("Reading “%1”…").arg(QFileInfo(path).fileName()));
+  dialog->setStandardButtons(QMessageBox::Cancel);
+  dialog->open();
   WTImportFormats::Options options;
   options.zone = QTimeZone::systemTimeZone();
   options.fileTime = Date::fromQDateTime(QFileInfo(path).lastModified());
-  Result<WTImportFile> read = file.open(QIODevice::ReadOnly)
-                                  ? WTImportFormats::read(file, options)
-                                  : Result<WTImportFile>(Error{1, file.errorString()});
+  // A long history takes a second or two to read: the window stays live meanwhile, and a cancelled
+  // dialog simply never hears of the result.
+  auto read = std::make_shared<std::optional<Result<WTImportFile>>>();
+  QThread* reader = QThread::create([path, options, read] {
+    QFile file(path);
+    *read = file.open(QIODevice::ReadOnly) ? WTImportFormats::read(file, options)
+                                           : Result<WTImportFile>(Error{1, file.errorString()});
+  });
+  connect(reader, &QThread::finished, reader, &QObject::deleteLater);
+  connect(reader, &QThread::finished, dialog, [this, dialog, path, zone = options.zone, read] {
+    previewImport(dialog, path, std::move(**read), zone);
+  });
+  reader->start();
+  return dialog;
+}
+
+void WTMainWindowController::previewImport(QMessageBox* dialog, const QString& path,
+                                           Result<WTImportFile> read, const QTimeZone& zone) {
   if (!read) {
     dialog->setIcon(QMessageBox::Warning);
     dialog->setText(tr("“%1” cannot be imported: %2").arg(QFileInfo(path).fileName(), read.error().message));
     dialog->setStandardButtons(QMessageBox::Close);
-    dialog->open();
-    return dialog;
+    return;
   }
   auto imported = std::make_shared<WTImportFile>(std::move(read.value()));
   WTObjectContext* context = delegate_.managedObjectContext();
@@ -337,20 +354,18 @@ QMessageBox* WTMainWindowController::importFile(const QString& path) {
       imported->problems.empty()
           ? tr("Import %n entries from “%1”?", nullptr, plan.entries).arg(QFileInfo(path).fileName())
           : tr("“%1” has rows that cannot be read; nothing is imported.").arg(QFileInfo(path).fileName()));
-  dialog->setInformativeText(WTImport::preview(*imported, plan, options.zone));
+  dialog->setInformativeText(WTImport::preview(*imported, plan, zone));
   if (!imported->problems.empty() || plan.entries == 0) {
     dialog->setIcon(imported->problems.empty() ? QMessageBox::Information : QMessageBox::Warning);
     dialog->setStandardButtons(QMessageBox::Close);
   } else {
+    dialog->setStandardButtons(QMessageBox::Cancel);
     QPushButton* import = dialog->addButton(tr("Import"), QMessageBox::AcceptRole);
     import->setObjectName(QStringLiteral("import"));
-    dialog->addButton(QMessageBox::Cancel);
     dialog->setDefaultButton(import);
     connect(import, &QPushButton::clicked, this,
             [context, imported] { WTImport::apply(*context, *imported, {}); });
   }
-  dialog->open();
-  return dialog;
 }
 
 QList<WTProject*> WTMainWindowController::fetchProjects() const {

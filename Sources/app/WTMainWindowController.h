@@ -1,5 +1,6 @@
 #pragma once
 
+#include "Result.h"
 #include "WTViewController.h"
 
 #include <QList>
@@ -16,6 +17,8 @@ class WTAppDelegate;
 class WTClientsViewController;
 class WTExportController;
 class QMessageBox;
+class QTimeZone;
+struct WTImportFile;
 class WTNavigationController;
 class WTPreferencesWindowController;
 class WTProject;
@@ -65,7 +68,8 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   // File › Import…: asks for a file, then importFile().
   void importData();
   // What importing `path` makes, in a dialog over the window (its rows that cannot be read instead, and
-  // no import); its Import button makes it all, one step of undo. The dialog is returned open.
+  // no import); its Import button makes it all, one step of undo. The dialog is returned open, saying the
+  // file is being read; the file is read on a thread of its own and the preview follows.
   QMessageBox* importFile(const QString& path);
   // Pops the visible stack, unless only its root is left.
   void goBack();
@@ -113,6 +117,8 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void closeEvent(QCloseEvent* event) override;
 
  private:
+  void previewImport(QMessageBox* dialog, const QString& path, Result<WTImportFile> read,
+                     const QTimeZone& zone);
   void restoreWindowGeometry();
   void saveWindowGeometry();
   void buildActions();

@@ -1,5 +1,6 @@
 #include "WTCommandLine.h"
 
+#include "WTBackupCommand.h"
 #include "WTReportCommand.h"
 #include "WTTimerCommands.h"
 #include "WTTrackCommand.h"
@@ -13,7 +14,8 @@
 namespace {
 
 constexpr char kUsage[] =
-    "usage: tessal [start|stop|add|status|log|list|import|report|export|template|sync] [ARGS...]\n"
+    "usage: tessal [start|stop|add|status|log|list|import|report|export|template|sync|backup|restore] "
+    "[ARGS...]\n"
     "       (tessal --help tells more)\n";
 
 constexpr char kHelp[] =
@@ -58,6 +60,10 @@ constexpr char kHelp[] =
     "                                                render a report template with a JSON object's "
     "variables\n"
     "  tessal sync [--timeout SECONDS]               bring this installation in step with its sync server\n"
+    "  tessal backup [FILE]                          copy the data into FILE, or into the Backups folder\n"
+    "                                                beside it; prints the copy's path\n"
+    "  tessal restore FILE                           put a backup back (not while Tessal runs); the\n"
+    "                                                replaced data file is kept beside it\n"
     "  tessal --help                                 show this text\n"
     "  tessal --version                              show the version\n"
     "\n"
@@ -115,8 +121,9 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
   // load, unless a report is to be laid out as a PDF.
   const bool readsHere = command == QLatin1String("export") ||
                          (command == QLatin1String("report") && !reportCommandWritesPDF(arguments));
+  const bool copies = command == QLatin1String("backup") || command == QLatin1String("restore");
   if (isDesktopCommand(command) && !readsHere) return std::nullopt;
-  if (!isTrackingCommand(command) && !readsHere) {
+  if (!isTrackingCommand(command) && !readsHere && !copies) {
     if (desktopArgumentsValid(argc, argv)) return std::nullopt;
     return usageError(argv[1]);
   }
@@ -129,6 +136,8 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
   if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
   // Their output is for people and scripts: the journal's and the store's diary stays out of it.
   QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
+  if (command == QLatin1String("backup")) return runBackupCommand(arguments, out, err);
+  if (command == QLatin1String("restore")) return runRestoreCommand(arguments, out, err);
   if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);
   if (command == QLatin1String("list")) return runListCommand(arguments, out, err);
   return runTrackCommand(command, arguments, out, err);

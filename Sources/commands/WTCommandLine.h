@@ -6,6 +6,7 @@
 
 // What `tessal ARGS` does. The `tessal` executable is lean: it carries out the tracking commands itself
 //   tessal start|stop|add|status|log|list ...          (see WTTrackCommand.h)
+//   tessal backup [FILE], tessal restore FILE          (see WTBackupCommand.h)
 //   tessal --help, tessal --version                    print and exit 0
 // and hands everything else, with the same arguments, to the desktop executable, which links the
 // interface (WTDesktopCommands.h): the desktop application itself and the commands that render or sync

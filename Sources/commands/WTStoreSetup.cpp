@@ -1,10 +1,14 @@
 #include "WTStoreSetup.h"
 
 #include "MoneyFormat.h"
+#include "RZSyncReplacedStore.h"
+#include "RZSyncTrack.h"
 #include "SettingsKeys.h"
 #include "UserDefaults.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
+#include "WTStore.h"
+#include "WTStoreBackup.h"
 #include "WTTask.h"
 
 #include <QDir>
@@ -23,9 +27,23 @@ QString storePath() {
   return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
 }
 
-QString syncJournalPath() {
-  const QFileInfo store(storePath());
-  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
+  const QString store = storePath();
+  if (QFileInfo::exists(store) &&
+      QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
+    return Error{WTStore::OpenFailed, QStringLiteral("“%1” is the data file itself").arg(backup)};
+  const Result<QString> aside = WTStoreBackup::restore(backup, store);
+  if (!aside) return aside;
+  Result<std::unique_ptr<WTStore>> opened = RZSyncTrack::openStore(store);
+  WTObjectContext context(&defaults);
+  Result<void> done = opened ? context.attachStore(std::move(opened.value())) : Result<void>(opened.error());
+  if (done) done = journalReplacedStore(context);
+  if (!done) {
+    return Error{WTStore::WriteFailed,
+                 QStringLiteral("the backup is restored, but its records will not sync: %1")
+                     .arg(done.error().message)};
+  }
+  return aside;
 }
 
 void registerDefaults(UserDefaults& defaults) {

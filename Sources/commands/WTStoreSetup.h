@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Result.h"
+
 #include <QString>
 
 class UserDefaults;
@@ -12,8 +14,11 @@ namespace WTStoreSetup {
 // $XDG_DATA_HOME/Tessal2 (the temporary folder's Tessal2 when there is no data location); not created.
 QString applicationSupportFolder();
 QString storePath();
-// The store's path with the extension "sync": where the change journal lives.
-QString syncJournalPath();
+
+// Puts the copy at `backup` in place of the store (see WTStoreBackup::restore) and returns the name
+// the replaced store, with the journal inside it, now has. The restored store is journaled anew
+// (journalReplacedStore). The caller holds the writer lock and knows no desktop copy runs.
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults);
 
 // The settings' values until the user sets them.
 void registerDefaults(UserDefaults& defaults);

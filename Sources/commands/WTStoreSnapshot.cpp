@@ -1,5 +1,6 @@
 #include "WTStoreSnapshot.h"
 
+#include "WTBackupCommand.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTProject.h"
@@ -18,7 +19,7 @@ std::unique_ptr<WTStoreSnapshot> WTStoreSnapshot::open(QTextStream& err, WTStore
   Result<std::unique_ptr<WTStoreSnapshot>> snapshot =
       open(WTStoreSetup::storePath(), std::move(defaults), which, tasks);
   if (!snapshot) {
-    WTCommandArguments::failure(err, snapshot.error().message);
+    storeFailure(err, snapshot.error());
     return nullptr;
   }
   return std::move(snapshot.value());

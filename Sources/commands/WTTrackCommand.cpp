@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "RZSyncTrack.h"
 #include "UserDefaults.h"
+#include "WTBackupCommand.h"
 #include "WTClient.h"
 #include "WTCommandArguments.h"
 #include "WTObjectContext.h"
@@ -61,9 +62,9 @@ Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
 }
 
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
-// Only the records the command needs are read; what changes is saved and written to the sync journal, as
-// the desktop copy would have done, so that the next sync sends it. A command that may make records makes
-// the store when there is none, filled as the desktop copy fills a store it makes.
+// Only the records the command needs are read; what changes is saved together with its sync journal
+// entries, as the desktop copy would have done, so that the next sync sends it. A command that may make
+// records makes the store when there is none, filled as the desktop copy fills a store it makes.
 int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments,
                QTextStream& out, QTextStream& err) {
   const bool storeIsNew = !QFileInfo::exists(storePath);
@@ -72,8 +73,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     return failure(err, WTStore::openReadOnly(storePath).error().message);
   }
   // A few records change and a failed save is reported at once: no need to read the whole file first.
-  Result<std::unique_ptr<WTStore>> store = WTStore::open(storePath, nullptr, WTStore::Check::Header);
-  if (!store) return failure(err, store.error().message);
+  Result<std::unique_ptr<WTStore>> store = RZSyncTrack::openStore(storePath, nullptr, WTStore::Check::Header);
+  if (!store) return storeFailure(err, store.error());
   store.value()->keepLogOnClose();
   WTStore::Records which =
       WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;
@@ -94,17 +95,12 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (context.hasChanges()) {
-    // Only a save reports to the journal: a command that changes nothing (an import of what is there
-    // already) never reads it.
-    const QString journalFile = WTStoreSetup::syncJournalPath();
-    RZSyncTrack journal(journalFile);
+    // The save journals what it saved, in its own transaction, reading only those records' entries.
+    RZSyncTrack journal(context.store(), RZSyncTrack::Loading::OnDemand);
     context.setChangeJournal(&journal);
     const Result<void> saved = context.save();
     context.setChangeJournal(nullptr);
     if (!saved) return failure(err, saved.error().message);
-    const Result<void> written = journal.writeToFile(journalFile);
-    // The change is in the store; only the sync would miss it, and the user should know.
-    if (!written) err << "tessal: the change is saved but will not sync: " << written.error().message << '\n';
   }
   context.setChangeJournal(nullptr);
   return print(outcome, out, err);

@@ -257,14 +257,6 @@ QString formatShort(Date date, bool withTime) {
   return fromUnicode(text);
 }
 
-// The default zone's offset from GMT now, in seconds.
-double presentOffsetSeconds() {
-  int32_t raw = 0, dst = 0;
-  UErrorCode status = U_ZERO_ERROR;
-  calendar().getTimeZone().getOffset(toUDate(Date::now()), false, raw, dst, status);
-  return U_SUCCESS(status) ? (raw + dst) / 1000.0 : 0.0;
-}
-
 }  // namespace
 
 Date midnight(Date date) {
@@ -357,22 +349,9 @@ Date beginOfMinute(Date date) {
   return fromUDate(ms - (local - std::floor(local / 60000.0) * 60000.0));
 }
 
-Date nextMonth(Date date) {
-  return addMonth(date, 1);
-}
-
-Date nextYear(Date date) {
-  const Fields f = fieldsOf(date);
-  return fromUDate(build(clampedSum(f.year, 1), f.month, f.day));
-}
-
 Date addMonth(Date date, int months) {
   const Fields f = fieldsOf(date);
   return fromUDate(build(f.year, clampedSum(f.month, months), f.day));
-}
-
-Date dateByTakingDateUnitsFrom(Date date, Date other) {
-  return dateByTakingComponents(date, DayUnits, other);
 }
 
 void assignFlags(Date date, unsigned flags, DateComponents& components) {
@@ -386,29 +365,10 @@ void assignFlags(Date date, unsigned flags, DateComponents& components) {
   if (flags & Second) components.second = f.second;
 }
 
-Date dateByTakingComponents(Date date, unsigned flags, Date from) {
-  DateComponents components;
-  assignFlags(from, flags, components);
-  assignFlags(date, ~flags & AllFields, components);
-  return dateFromComponents(components);
-}
-
 Date dateFromComponents(const DateComponents& c) {
   auto orMinimum = [](int value, int minimum) { return value == DateComponents::kUnset ? minimum : value; };
   return fromUDate(build(orMinimum(c.year, 1), orMinimum(c.month, 1), orMinimum(c.day, 1),
                          orMinimum(c.hour, 0), orMinimum(c.minute, 0), orMinimum(c.second, 0)));
-}
-
-bool isEarlierThen(Date date, Date other) {
-  return midnight(date) < midnight(other);
-}
-
-bool isEarlierThenToday(Date date) {
-  return midnight(date) < midnight(Date::now());
-}
-
-bool isLaterThenToday(Date date) {
-  return midnight(date) > midnight(Date::now());
 }
 
 QString shortFormat(Date date) {
@@ -417,16 +377,6 @@ QString shortFormat(Date date) {
 
 QString shortFormatWithTime(Date date) {
   return formatShort(date, true);
-}
-
-// Both use the offset in force now, whatever the offset at the converted instant: converting a summer
-// date in winter shifts it by the winter offset.
-Date GMTFromLocalDate(Date date) {
-  return date.addingSeconds(-presentOffsetSeconds());
-}
-
-Date localDateFromGMT(Date date) {
-  return date.addingSeconds(presentOffsetSeconds());
 }
 
 Range rangeForToday() {

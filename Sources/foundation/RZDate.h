@@ -49,30 +49,17 @@ Date beginOfYear(Date date);
 Date beginOfNextYear(Date date);
 Date beginOfLastYear(Date date);
 Date beginOfMinute(Date date);
-Date nextMonth(Date date);
-Date nextYear(Date date);
 Date addMonth(Date date, int months);
 
-// Year, month and day of `other` with hour, minute and second of `date`.
-Date dateByTakingDateUnitsFrom(Date date, Date other);
 // Copies those of the six fields that `flags` names from `date` into `components`.
 void assignFlags(Date date, unsigned flags, DateComponents& components);
-// The fields named by `flags` from `from`, every other of the six fields from `date`.
-Date dateByTakingComponents(Date date, unsigned flags, Date from);
 // Builds an instant from components in the current calendar; unset fields count as their minimum.
 Date dateFromComponents(const DateComponents& components);
-
-bool isEarlierThen(Date date, Date other);
-bool isEarlierThenToday(Date date);
-bool isLaterThenToday(Date date);
 
 QString shortFormat(Date date);
 // The date as text by an ICU (Unicode) pattern such as "HH:mm", in the default zone and locale.
 QString stringWithPattern(Date date, const QString& pattern);
 QString shortFormatWithTime(Date date);
-
-Date GMTFromLocalDate(Date date);
-Date localDateFromGMT(Date date);
 
 Range rangeForToday();
 Range rangeForYesterday();

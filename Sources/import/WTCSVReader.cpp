@@ -30,6 +30,19 @@ int WTCSVReader::get() {
   return static_cast<unsigned char>(buffer_.at(position_++));
 }
 
+// Most bytes mean nothing to the reader: it takes them a buffered run at a time, up to the next quote,
+// line end or (outside quotes) separator.
+qsizetype WTCSVReader::takePlainRun(QByteArray& field, bool quoted) {
+  if (position_ >= buffer_.size() && !fill()) return 0;
+  const char* begin = buffer_.constData() + position_;
+  const char* end = buffer_.constData() + buffer_.size();
+  const char* p = begin;
+  while (p < end && *p != '"' && *p != '\n' && *p != '\r' && (quoted || *p != separator_)) ++p;
+  field.append(begin, p - begin);
+  position_ += p - begin;
+  return p - begin;
+}
+
 int WTCSVReader::peek() {
   if (position_ >= buffer_.size() && !fill()) return -1;
   return static_cast<unsigned char>(buffer_.at(position_));
@@ -77,13 +90,20 @@ WTCSVReader::Status WTCSVReader::next(QStringList& fields) {
     };
     int c = 0;
     for (;;) {
+      if (const qsizetype plain = takePlainRun(field, quoted)) {
+        any = true;
+        recordBytes += plain;
+      }
       c = get();
-      if (c < 0) break;
-      any = true;
-      if (++recordBytes > kMaxRecordBytes) {
+      if (c >= 0) {
+        any = true;
+        ++recordBytes;
+      }
+      if (recordBytes > kMaxRecordBytes) {
         error_ = QStringLiteral("line %1 is longer than %2 bytes").arg(recordLine_).arg(kMaxRecordBytes);
         return Status::Failed;
       }
+      if (c < 0) break;
       if (quoted) {
         if (c == '"') {
           if (peek() == '"') {

@@ -27,6 +27,7 @@ class WTCSVReader {
  private:
   int get();
   int peek();
+  qsizetype takePlainRun(QByteArray& field, bool quoted);
   bool fill();
   void detectSeparator();
 

@@ -5,7 +5,6 @@
 #include <QCryptographicHash>
 #include <QHash>
 #include <QIODevice>
-#include <QRegularExpression>
 
 namespace WTImportFormats {
 
@@ -165,49 +164,94 @@ qsizetype requiredPresent(const Header& header, const CSVFormat& format) {
                        [&](const char* name) { return header.column(name) >= 0; });
 }
 
+// Reads the numbers and marks of a date, a time or a duration from left to right. Every row has three
+// or four of them, so a scanner instead of a regular expression per field is most of the reading's speed.
+class Scanner {
+ public:
+  explicit Scanner(QStringView text) : text_(text.trimmed()) {}
+  // A number of minDigits to maxDigits digits, or none (and nothing read).
+  std::optional<int> number(qsizetype minDigits, qsizetype maxDigits) {
+    qsizetype end = at_;
+    int value = 0;
+    while (end < text_.size() && end - at_ < maxDigits && text_[end].isDigit() && text_[end].unicode() < 128)
+      value = value * 10 + (text_[end++].unicode() - '0');
+    if (end - at_ < minDigits || (end < text_.size() && text_[end].isDigit())) return std::nullopt;
+    at_ = end;
+    return value;
+  }
+  // The next character when it is one of `marks`, or a null QChar (and nothing read).
+  QChar mark(QStringView marks) {
+    if (at_ >= text_.size() || !marks.contains(text_[at_])) return QChar();
+    return text_[at_++];
+  }
+  void skipSpaces() {
+    while (at_ < text_.size() && text_[at_].isSpace()) ++at_;
+  }
+  bool atEnd() const { return at_ == text_.size(); }
+
+ private:
+  QStringView text_;
+  qsizetype at_ = 0;
+};
+
+// "2024-03-10", "10.03.2024" or "10-03-2024" (day first), "03/10/2024" (month first, as the hosted
+// trackers' American default writes it; a first number past 12 can only be a day).
 std::optional<QDate> parseDate(const QString& text) {
-  static const QRegularExpression iso(QStringLiteral("^(\\d{4})-(\\d{1,2})-(\\d{1,2})$"));
-  static const QRegularExpression dotted(QStringLiteral("^(\\d{1,2})[.-](\\d{1,2})[.-](\\d{4})$"));
-  static const QRegularExpression slashed(QStringLiteral("^(\\d{1,2})/(\\d{1,2})/(\\d{4})$"));
-  const QString trimmed = text.trimmed();
+  Scanner scan(text);
   QDate date;
-  if (const auto m = iso.match(trimmed); m.hasMatch()) {
-    date = QDate(m.captured(1).toInt(), m.captured(2).toInt(), m.captured(3).toInt());
-  } else if (const auto m = dotted.match(trimmed); m.hasMatch()) {
-    date = QDate(m.captured(3).toInt(), m.captured(2).toInt(), m.captured(1).toInt());
-  } else if (const auto m = slashed.match(trimmed); m.hasMatch()) {
-    // Month first, as the hosted trackers' American default writes it; a first number past 12 can
-    // only be a day.
-    const int first = m.captured(1).toInt(), second = m.captured(2).toInt(), year = m.captured(3).toInt();
-    date = first > 12 ? QDate(year, second, first) : QDate(year, first, second);
+  if (const auto year = scan.number(4, 4)) {
+    const auto month = scan.mark(u"-").isNull() ? std::nullopt : scan.number(1, 2);
+    const auto day = !month || scan.mark(u"-").isNull() ? std::nullopt : scan.number(1, 2);
+    if (day && scan.atEnd()) date = QDate(*year, *month, *day);
+  } else if (const auto first = scan.number(1, 2)) {
+    const QChar mark = scan.mark(u".-/");
+    const auto second = mark.isNull() ? std::nullopt : scan.number(1, 2);
+    const bool slashed = mark == u'/';
+    const bool marked = second && !scan.mark(slashed ? u"/" : u".-").isNull();
+    const auto year = marked ? scan.number(4, 4) : std::nullopt;
+    if (year && scan.atEnd()) {
+      if (!slashed)
+        date = QDate(*year, *second, *first);
+      else
+        date = *first > 12 ? QDate(*year, *second, *first) : QDate(*year, *first, *second);
+    }
   }
   if (!date.isValid()) return std::nullopt;
   return date;
 }
 
-// "13:30", "13:30:15", "1:30 PM", "01:30:00 pm".
+// "13:30", "13:30:15", "1:30 PM", "01:30:00 pm", "1:30 p.m.".
 std::optional<QTime> parseTime(const QString& text) {
-  static const QRegularExpression pattern(
-      QStringLiteral("^(\\d{1,2}):(\\d{2})(?::(\\d{2}))?\\s*(?:([AaPp])\\.?[Mm]\\.?)?$"));
-  const auto m = pattern.match(text.trimmed());
-  if (!m.hasMatch()) return std::nullopt;
-  int hour = m.captured(1).toInt();
-  const QString half = m.captured(4).toLower();
-  if (!half.isEmpty()) {
-    if (hour < 1 || hour > 12) return std::nullopt;
-    hour = hour % 12 + (half == u"p" ? 12 : 0);
+  Scanner scan(text);
+  std::optional<int> hour = scan.number(1, 2);
+  if (!hour || scan.mark(u":").isNull()) return std::nullopt;
+  const std::optional<int> minute = scan.number(2, 2);
+  std::optional<int> second = 0;
+  if (!scan.mark(u":").isNull()) second = scan.number(2, 2);
+  if (!minute || !second) return std::nullopt;
+  scan.skipSpaces();
+  if (const QChar half = scan.mark(u"AaPp"); !half.isNull()) {
+    scan.mark(u".");
+    if (scan.mark(u"Mm").isNull()) return std::nullopt;
+    scan.mark(u".");
+    if (*hour < 1 || *hour > 12) return std::nullopt;
+    hour = *hour % 12 + (half.toLower() == u'p' ? 12 : 0);
   }
-  const QTime time(hour, m.captured(2).toInt(), m.captured(3).toInt());
-  if (!time.isValid()) return std::nullopt;
+  const QTime time(*hour, *minute, *second);
+  if (!scan.atEnd() || !time.isValid()) return std::nullopt;
   return time;
 }
 
 // "1:20:00" or "1:20" as seconds.
 std::optional<qint64> parseDuration(const QString& text) {
-  static const QRegularExpression pattern(QStringLiteral("^(\\d+):(\\d{2})(?::(\\d{2}))?$"));
-  const auto m = pattern.match(text.trimmed());
-  if (!m.hasMatch()) return std::nullopt;
-  return m.captured(1).toLongLong() * 3600 + m.captured(2).toLongLong() * 60 + m.captured(3).toLongLong();
+  Scanner scan(text);
+  const std::optional<int> hours = scan.number(1, 9);
+  if (!hours || scan.mark(u":").isNull()) return std::nullopt;
+  const std::optional<int> minutes = scan.number(2, 2);
+  std::optional<int> seconds = 0;
+  if (!scan.mark(u":").isNull()) seconds = scan.number(2, 2);
+  if (!minutes || !seconds || !scan.atEnd()) return std::nullopt;
+  return qint64(*hours) * 3600 + *minutes * 60 + *seconds;
 }
 
 // A number as a spreadsheet or a locale writes it: "1,234.50", "1.234,50", "50,00", with a currency
@@ -243,20 +287,48 @@ QStringList splitTags(const QString& text) {
 
 // Formats without ids of their own: the entry's own fields, so that the same entry read again is known.
 QString hashedId(const QString& format, const WTImportRow& row) {
-  const QString key = QStringList{row.client, row.project, row.task, row.name,
-                                  QString::number(qint64(row.start.secondsSince1970()))}
-                          .join(QChar(0x1f));
-  return format + u':' +
-         QString::fromLatin1(QCryptographicHash::hash(key.toUtf8(), QCryptographicHash::Sha1).toHex());
+  QByteArray key;
+  for (const QString* field : {&row.client, &row.project, &row.task, &row.name})
+    key += field->toUtf8() + '\x1f';
+  key += QByteArray::number(qint64(row.start.secondsSince1970()));
+  return format + u':' + QString::fromLatin1(QCryptographicHash::hash(key, QCryptographicHash::Sha1).toHex());
 }
 
-Date at(const QDate& day, const QTime& time, const QTimeZone& zone) {
-  return Date::fromQDateTime(QDateTime(day, time, zone));
-}
+// A zone's dates and times as instants. Most days keep one offset from UTC all day: that offset is worked
+// out once per day; a day with a change goes through the zone's rules for each time.
+class ZoneDays {
+ public:
+  explicit ZoneDays(const QTimeZone& zone) : zone_(zone) {}
+
+  Date at(const QDate& day, const QTime& time) {
+    auto offset = offsets_.constFind(day.toJulianDay());
+    if (offset == offsets_.constEnd()) offset = offsets_.insert(day.toJulianDay(), steadyOffset(day));
+    if (!*offset) return Date::fromQDateTime(QDateTime(day, time, zone_));
+    const QDateTime utc(day, time, QTimeZone::utc());
+    return Date::fromSeconds(double(utc.toSecsSinceEpoch() - **offset) + time.msec() / 1000.0);
+  }
+
+ private:
+  // The offset when no change falls within a day of either side of the date (offsets stay within a
+  // day), else none.
+  std::optional<int> steadyOffset(const QDate& day) const {
+    if (!zone_.isValid()) return std::nullopt;
+    const QDateTime from(day.addDays(-1), QTime(0, 0), QTimeZone::utc());
+    if (zone_.hasTransitions()) {
+      const QTimeZone::OffsetData change = zone_.nextTransition(from);
+      if (change.atUtc.isValid() && change.atUtc < from.addDays(3)) return std::nullopt;
+    }
+    return zone_.offsetFromUtc(from);
+  }
+
+  QTimeZone zone_;
+  QHash<qint64, std::optional<int>> offsets_;
+};
 
 // One CSV record as an entry, or the reason it is none.
 std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& header,
-                                      const QStringList& fields, const Options& options, QString& problem) {
+                                      const QStringList& fields, const Options& options, ZoneDays& days,
+                                      QString& problem) {
   const auto value = [&](const char* name) {
     const qsizetype column = header.column(name);
     return column >= 0 && column < fields.size() ? fields[column].trimmed() : QString();
@@ -266,11 +338,19 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     problem = QStringLiteral("only time entries are imported, not a %1").arg(value(format.kind));
     return std::nullopt;
   }
-  row.client = value(format.client);
-  row.project = value(format.project);
-  row.task = value(format.task);
-  row.name = value(format.description);
-  row.notes = value(format.notes);
+  // Tessal's own file writes text a spreadsheet would take for a formula behind an apostrophe.
+  const auto text = [&](const char* name) {
+    QString field = value(name);
+    if (&format == &kTessal && field.size() > 1 && field.front() == u'\'' &&
+        QStringView(u"=+-@\t\r").contains(field[1]))
+      field.remove(0, 1);
+    return field;
+  };
+  row.client = text(format.client);
+  row.project = text(format.project);
+  row.task = text(format.task);
+  row.name = text(format.description);
+  row.notes = text(format.notes);
   row.tags = splitTags(value(format.tags));
   const std::optional<bool> billable = parseFlag(value(format.billable));
   if (!billable) {
@@ -290,7 +370,7 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     problem = QStringLiteral("the start time “%1” cannot be read").arg(value(format.startTime));
     return std::nullopt;
   }
-  row.start = at(*day, *startTime, options.zone);
+  row.start = days.at(*day, *startTime);
   const QString durationText = value(format.duration);
   const std::optional<qint64> duration = parseDuration(durationText);
   const QString endText = value(format.endTime);
@@ -302,9 +382,9 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
       problem = QStringLiteral("the end “%1 %2” cannot be read").arg(endDayText, endText).trimmed();
       return std::nullopt;
     }
-    row.end = at(*endDay, *endTime, options.zone);
+    row.end = days.at(*endDay, *endTime);
     // Tessal's own file writes one date: an end earlier in the day is on the next.
-    if (&format == &kTessal && *row.end < row.start) row.end = at(endDay->addDays(1), *endTime, options.zone);
+    if (&format == &kTessal && *row.end < row.start) row.end = days.at(endDay->addDays(1), *endTime);
   } else if (duration && header.column(format.endTime) < 0) {
     row.end = row.start.addingSeconds(double(*duration));
   } else {
@@ -372,12 +452,13 @@ Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
   }
   WTImportFile file;
   file.format = QString::fromUtf8(format->name);
+  ZoneDays days(options.zone);
   for (;;) {
     const WTCSVReader::Status next = reader.next(fields);
     if (next == WTCSVReader::Status::Failed) return Error{1, reader.error()};
     if (next == WTCSVReader::Status::End) break;
     QString problem;
-    if (std::optional<WTImportRow> row = readRecord(*format, header, fields, options, problem)) {
+    if (std::optional<WTImportRow> row = readRecord(*format, header, fields, options, days, problem)) {
       row->line = reader.line();
       file.rows.push_back(std::move(*row));
     } else {

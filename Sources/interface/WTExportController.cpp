@@ -22,7 +22,7 @@ WTExportController::WTExportController(WTObjectContext* context, std::function<W
       selectedProject_(std::move(selectedProject)),
       chooseSaveLocation_(askForSaveLocation) {
   setObjectName(QStringLiteral("exportWindow"));
-  setWindowTitle(tr("Export Time Entries"));
+  setWindowTitle(tr("Export"));
   setMinimumWidth(420);
   auto* layout = new QVBoxLayout(this);
   auto* form = new QFormLayout;
@@ -112,11 +112,11 @@ Result<int> WTExportController::exportToPath(const QString& path) const {
 
 void WTExportController::accept() {
   const QString path =
-      chooseSaveLocation_(this, tr("Export Time Entries"), tr("CSV files (*.csv)"), QStringLiteral("csv"));
+      chooseSaveLocation_(this, tr("Export"), tr("CSV files (*.csv)"), QStringLiteral("csv"));
   if (path.isEmpty()) return;  // the choices stay on screen for another try
   const Result<int> written = exportToPath(path);
   if (!written) {
-    QMessageBox::warning(this, tr("Export Time Entries"), written.error().message);
+    QMessageBox::warning(this, tr("Export"), written.error().message);
     return;
   }
   QDialog::accept();

@@ -1,5 +1,8 @@
 #pragma once
 
+#include "Result.h"
+#include "WTStore.h"
+
 #include <QString>
 #include <QVariantMap>
 
@@ -8,6 +11,9 @@
 // booleans, Decimal, Date, QColor), a to-one relationship as the related record (KeyValueCoding*, which
 // also is an RZSyncObject), an ordered to-many relationship as WTOrderedRelationship and an unordered one
 // as WTUnorderedRelationship (see WTObject.h).
+//
+// A save reports its records inside its store transaction and then lets the journal write the rows of
+// what the reports changed (writeChanges), so that the store and its journal always agree.
 class WTChangeJournal {
  public:
   virtual ~WTChangeJournal() = default;
@@ -20,6 +26,17 @@ class WTChangeJournal {
     Q_UNUSED(uuid);
     return false;
   }
+  // Whether saved records are reported at all (computing every changed value is not free).
+  virtual bool recordsSaves() const { return true; }
+  // Inside the save's transaction, after the records were reported: writes the journal rows of what
+  // changed. An error undoes the whole save.
+  virtual Result<void> writeChanges(WTStore::JournalWriter& writer) {
+    Q_UNUSED(writer);
+    return {};
+  }
+  // The save is over: `written` when its rows (and the journal's) are in the file; otherwise nothing of
+  // it is, and the journal forgets what it was told.
+  virtual void saveEnded(bool written) { Q_UNUSED(written); }
 };
 
 // The journal in force while no sync is set up: it records nothing.
@@ -28,4 +45,5 @@ class WTNullChangeJournal final : public WTChangeJournal {
   void insertValues(const QVariantMap&, const QString&) override {}
   void updateValues(const QVariantMap&, const QString&) override {}
   void deleteObjectWithId(const QString&) override {}
+  bool recordsSaves() const override { return false; }
 };

@@ -408,7 +408,20 @@ bool WTObject::isDeleted() const {
   return context_->deleted_.count(const_cast<WTObject*>(this)) > 0;
 }
 
+QVariantMap WTObject::setValues() const {
+  QVariantMap values = changedValues(true);
+  for (const WTKeyDescriptor& key : keys_->keys()) {
+    if (key.type == WTKeyType::Ordered)
+      values.insert(key.name, QVariant::fromValue(WTOrderedRelationship{key.members(*this)}));
+  }
+  return values;
+}
+
 QVariantMap WTObject::changedValues() const {
+  return changedValues(isInserted());
+}
+
+QVariantMap WTObject::changedValues(bool everySetValue) const {
   QVariantMap values;
   auto add = [&](const QString& name) {
     const WTKeyDescriptor* key = keys_->find(name);
@@ -429,7 +442,7 @@ QVariantMap WTObject::changedValues() const {
         values.insert(name, fieldValue(*key));
     }
   };
-  if (isInserted()) {
+  if (everySetValue) {
     // A new record reports every value it has; unset ones stay out.
     for (const WTKeyDescriptor& key : keys_->keys()) {
       if (!key.stored) continue;

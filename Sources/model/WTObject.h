@@ -100,6 +100,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   // Changed values since the last save: for a new record every value that is set, otherwise the
   // changed keys only. Relationships are reported as WTChangeJournal.h describes.
   QVariantMap changedValues() const;
+  // Every value that is set, as a new record reports them, and the ordered members (a project's tasks).
+  QVariantMap setValues() const;
   // Reports this record to the context's change journal as it is about to be saved.
   void willSave();
 
@@ -153,6 +155,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   void changeOwner(WTObject* owner, int index = -1);
 
  private:
+  // With `everySetValue`, as a new record reports: every set value and the changed relationships.
+  QVariantMap changedValues(bool everySetValue) const;
   // The generic paths by a key's declaration.
   QVariant fieldValue(const WTKeyDescriptor& key) const;
   void writeField(const WTKeyDescriptor& key, const QVariant& value);

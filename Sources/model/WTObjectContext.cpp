@@ -410,20 +410,25 @@ Result<void> WTObjectContext::save() {
     if (!byUuid_.contains(object->uuid_)) deletedUuids.append(object->uuid_);
   }
 
-  Result<void> result = store_->saveFrom(records, deletedUuids);
+  // The journal hears of each record once its row is written, inside the same transaction, and writes
+  // its own rows before the commit: a crash keeps both or neither. The journal that records nothing is not
+  // worth the changed values of every record (a merge saves thousands with it).
+  const bool journaled = journal_->recordsSaves();
+  Result<void> result = store_->saveFrom(records, deletedUuids, [&](WTStore::JournalWriter& writer) {
+    if (journaled) {
+      for (WTObject* object : rows)
+        if (!reordered.count(object)) object->willSave();
+      for (WTObject* object : deleted_) object->willSave();
+    }
+    return journal_->writeChanges(writer);
+  });
+  journal_->saveEnded(result.ok());
   if (!result) return result;
-  // Told once the rows are in the file, so that a large save never holds its rows' cache and the
-  // journal's copy of every value at once. The journal that records nothing is not worth the changed
-  // values of every record (a merge saves thousands with it).
-  // Each record's changed keys go as soon as the journal has its values.
-  const bool journaled = journal_ != &nullJournal_;
   for (WTObject* object : rows) {
-    if (journaled && !reordered.count(object)) object->willSave();
     object->persisted_ = true;
     object->changedKeys_ = QStringList();
   }
   for (WTObject* object : deleted_) {
-    if (journaled) object->willSave();
     object->persisted_ = false;
     object->changedKeys_ = QStringList();
   }

@@ -22,8 +22,8 @@
 class UserDefaults;
 
 // The one object graph of the application: every record lives here, in memory, found by identity. A
-// store file (WTStore) mirrors it; save() writes what changed since the last save in one transaction
-// and then reports each record to the change journal.
+// store file (WTStore) mirrors it; save() writes what changed since the last save, and the change
+// journal's entries for it, in one transaction.
 //
 // Changes are announced synchronously to observers of (record, key), with every key that depends on the
 // changed one, and once per event-loop turn as objectsDidChange (which also closes the undo group).
@@ -101,9 +101,9 @@ class WTObjectContext : public QObject {
 
   // Saving.
   bool hasChanges() const;
-  // Writes every change since the last save in one transaction, then reports each record to the journal.
-  // On failure nothing is forgotten and nothing is journaled: the changes stay and the next save tries
-  // again.
+  // Writes every change since the last save and reports each record to the journal, which writes its
+  // rows in the same transaction. On failure nothing is forgotten and nothing is journaled: the changes
+  // stay and the next save tries again.
   Result<void> save();
 
   // Undo and redo of whole event-loop turns.

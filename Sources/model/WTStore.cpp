@@ -1,8 +1,10 @@
 #include "WTStore.h"
 
+#include "WTStoreBackup.h"
 #include "WTStoreRows.h"
 
 #include <QCoreApplication>
+#include <QDateTime>
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
@@ -14,6 +16,7 @@
 #include <algorithm>
 #include <array>
 #include <iterator>
+#include <optional>
 #include <string>
 #include <utility>
 
@@ -90,6 +93,41 @@ int addImportColumn(sqlite3* db) {
   return sqlite3_exec(db, "ALTER TABLE records ADD COLUMN importId TEXT;", nullptr, nullptr, nullptr);
 }
 
+// Schema version 6: the sync's journal of unsent changes, which was a file of its own beside the store (a
+// crash between writing the two could leave a change saved but never sent). Per record and section ('i'
+// inserted, 'u' updated) the pending values as a JSON object's text; the pending deletions in the order
+// they were made; the server iteration.
+int addJournalTables(sqlite3* db) {
+  return sqlite3_exec(
+      db,
+      "CREATE TABLE journal (uuid TEXT NOT NULL, section TEXT NOT NULL, changes TEXT NOT NULL,"
+      "  PRIMARY KEY (uuid, section)) WITHOUT ROWID;"
+      "CREATE TABLE journal_deletions (position INTEGER PRIMARY KEY, uuid TEXT NOT NULL UNIQUE);"
+      "CREATE TABLE journal_state (name TEXT PRIMARY KEY NOT NULL, value) WITHOUT ROWID;"
+      "INSERT INTO journal_state VALUES ('iteration', 0);",
+      nullptr, nullptr, nullptr);
+}
+
+// The journal's statements (WTStore::JournalStatement), bound alike: ?1 the uuid, ?2 the section, ?3 the
+// changes' text, ?4 a number.
+constexpr const char* kJournalSql[] = {
+    "INSERT INTO journal (uuid, section, changes) VALUES (?1, ?2, ?3) "
+    "ON CONFLICT (uuid, section) DO UPDATE SET changes = ?3",
+    "DELETE FROM journal WHERE uuid = ?1 AND section = ?2",
+    "INSERT OR REPLACE INTO journal_deletions (position, uuid) VALUES (?4, ?1)",
+    "DELETE FROM journal_deletions WHERE uuid = ?1",
+    "INSERT OR REPLACE INTO journal_state (name, value) VALUES ('iteration', ?4)",
+    "DELETE FROM journal",
+    "DELETE FROM journal_deletions",
+    "SELECT section, changes FROM journal WHERE uuid = ?1 "
+    "UNION ALL SELECT 'x', position FROM journal_deletions WHERE uuid = ?1",
+    "SELECT uuid, section, changes FROM journal",
+    "SELECT uuid, position FROM journal_deletions ORDER BY position",
+    "SELECT value FROM journal_state WHERE name = 'iteration'",
+    "SELECT coalesce(max(position), 0) FROM journal_deletions",
+    "SELECT NOT EXISTS (SELECT 1 FROM journal) AND NOT EXISTS (SELECT 1 FROM journal_deletions)",
+};
+
 // A file older than version 5 read without migrating it: a view in the connection's own temporary schema
 // stands in for its table where reading names it unqualified (the temporary schema is searched first) and
 // answers the columns it lacks as NULL. Writing names the table itself, "main.records".
@@ -138,8 +176,9 @@ static_assert(kApplicationId == 1416852332);
 // kMigrations[n] takes a file from version n to n + 1. A new schema version appends its step here and
 // raises WTStore::kSchemaVersion; every step runs inside the one migration transaction.
 using Migration = int (*)(sqlite3*);
-constexpr Migration kMigrations[] = {createVersion1, addTimerIndexes, addItemIndex, addBillingColumns,
-                                     addImportColumn};
+constexpr Migration kMigrations[] = {createVersion1,    addTimerIndexes, addItemIndex,
+                                     addBillingColumns, addImportColumn, addJournalTables};
+constexpr int kJournalVersion = 6;
 static_assert(std::size(kMigrations) == WTStore::kSchemaVersion);
 
 // What went wrong, in words for the user, for SQLite's result code.
@@ -229,12 +268,14 @@ bool wholeFileIsDamaged(const QString& path, const std::string& vfs) {
   return damaged;
 }
 
-// Runs the migration steps from `version` to the current one in one transaction.
-int migrate(sqlite3* db, int version) {
+// Runs the migration steps from `version` to the current one in one transaction; `fillJournal` runs in it
+// when the journal's tables were made.
+int migrate(sqlite3* db, int version, const std::function<int()>& fillJournal) {
   int code = sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
   if (code != SQLITE_OK) return code;
   for (int step = version; step < WTStore::kSchemaVersion && code == SQLITE_OK; ++step)
     code = kMigrations[step](db);
+  if (code == SQLITE_OK && version < kJournalVersion) code = fillJournal();
   if (code == SQLITE_OK) {
     const QByteArray setVersion = "PRAGMA user_version = " + QByteArray::number(WTStore::kSchemaVersion);
     code = sqlite3_exec(db, setVersion.constData(), nullptr, nullptr, nullptr);
@@ -259,20 +300,22 @@ WTStore::~WTStore() {
   for (sqlite3_stmt* statement :
        {begin_, commit_, rollback_, replace_, remove_, selectAll_, selectTimerRecords_, selectItemsOfTasks_})
     sqlite3_finalize(statement);
+  for (sqlite3_stmt* statement : journal_) sqlite3_finalize(statement);
   sqlite3_close(db_);
 }
 
-Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, Check check) {
-  return open(path, vfs, false, check);
+Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, Check check,
+                                               const JournalImport& import) {
+  return open(path, vfs, false, check, import);
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path, Check check) {
   if (!QFileInfo::exists(path)) return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
-  return open(path, nullptr, true, check);
+  return open(path, nullptr, true, check, {});
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly,
-                                               Check check) {
+                                               Check check, const JournalImport& import) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -366,7 +409,32 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     return Error{OpenFailed, tr("The data file “%1” could not be opened: %2.").arg(path, reason(code))};
   }
   if (version < kSchemaVersion) {
-    code = migrate(db, int(version));
+    // The file as the older version left it stays in the backups: a migration that went wrong, or a
+    // return to that version, still has the data it knew.
+    if (!empty) {
+      const QString copy = WTStoreBackup::unusedPath(
+          WTStoreBackup::beforeMigrationPath(path, QDateTime::currentDateTime(), int(version)));
+      if (const Result<void> copied = WTStoreBackup::copy(db, copy); !copied) {
+        return Error{MigrationFailed,
+                     tr("The data file “%1” was not updated for this version of Tessal, because it could not "
+                        "be copied first: %2")
+                         .arg(path, copied.error().message)};
+      }
+    }
+    std::optional<Error> importFailed;
+    code = migrate(db, int(version), [&] {
+      if (!import) return SQLITE_OK;
+      JournalWriter writer(*store);
+      Result<void> imported = import(writer);
+      if (imported) return SQLITE_OK;
+      importFailed = imported.error();
+      return SQLITE_ABORT;
+    });
+    if (importFailed) {
+      return Error{MigrationFailed,
+                   tr("The data file “%1” could not be updated for this version of Tessal: %2")
+                       .arg(path, importFailed->message)};
+    }
     if (code != SQLITE_OK) {
       return Error{MigrationFailed,
                    tr("The data file “%1” could not be updated for this version of Tessal: %2.")
@@ -461,7 +529,8 @@ Error WTStore::namelessError() const {
                tr("A record without identity cannot be written to the data file “%1”.").arg(path_)};
 }
 
-Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& deletedUuids) {
+Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& deletedUuids,
+                               const JournalStep& journal) {
   // Deleting "" would silently remove nothing.
   if (deletedUuids.contains(QString())) return namelessError();
   if (damageCheck_.valid()) damaged_ = damageCheck_.get();
@@ -486,11 +555,16 @@ Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& d
     code = WTStoreRows::bindString(remove_, WTStoreRows::kUuid, *uuid);
     if (code == SQLITE_OK) code = stepOnce(remove_);
   }
-  if (!nameless && code == SQLITE_OK) code = stepOnce(commit_);
+  std::optional<Error> journalFailed;
+  if (!nameless && code == SQLITE_OK && journal) {
+    JournalWriter writer(*this);
+    if (Result<void> written = journal(writer); !written) journalFailed = written.error();
+  }
+  if (!nameless && !journalFailed && code == SQLITE_OK) code = stepOnce(commit_);
   // The statements must not keep pointers into the caller's records.
   sqlite3_clear_bindings(replace_);
   sqlite3_clear_bindings(remove_);
-  if (!nameless && code == SQLITE_OK) {
+  if (!nameless && !journalFailed && code == SQLITE_OK) {
     // What the save wrote is in the file and its log now: the cache a large save filled goes back, and
     // the next save reads the pages it needs through the map.
     sqlite3_db_release_memory(db_);
@@ -499,5 +573,142 @@ Result<void> WTStore::saveFrom(const RecordSource& records, const QStringList& d
   // Some errors end the transaction by themselves; whatever is left of it is undone.
   if (!sqlite3_get_autocommit(db_)) stepOnce(rollback_);
   if (nameless) return namelessError();
+  if (journalFailed) return *journalFailed;
   return writeError(code);
+}
+
+Result<void> WTStore::writeJournal(const JournalStep& step) {
+  return saveFrom([]() -> const WTStoreRecord* { return nullptr; }, {}, step);
+}
+
+Error WTStore::readError(int code) const {
+  if (isDamage(code))
+    return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};
+  return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
+}
+
+sqlite3_stmt* WTStore::journalStatement(int which, int* code) {
+  *code = SQLITE_OK;
+  if (!journal_[which])
+    *code =
+        sqlite3_prepare_v3(db_, kJournalSql[which], -1, SQLITE_PREPARE_PERSISTENT, &journal_[which], nullptr);
+  return journal_[which];
+}
+
+Result<void> WTStore::JournalWriter::step(int which, const QString& uuid, char section,
+                                          const QByteArray& text, qint64 number) {
+  int code = SQLITE_OK;
+  sqlite3_stmt* s = store_.journalStatement(which, &code);
+  const int parameters = s ? sqlite3_bind_parameter_count(s) : 0;
+  if (code == SQLITE_OK && parameters >= 1 && !uuid.isNull())
+    code = WTStoreRows::bindString(s, WTStoreRows::kUuid, uuid);
+  if (code == SQLITE_OK && parameters >= 2 && section)
+    code = sqlite3_bind_text(s, 2, &section, 1, SQLITE_TRANSIENT);
+  if (code == SQLITE_OK && parameters >= 3 && !text.isNull())
+    code = sqlite3_bind_text(s, 3, text.constData(), int(text.size()), SQLITE_STATIC);
+  if (code == SQLITE_OK && parameters >= 4) code = sqlite3_bind_int64(s, 4, number);
+  if (code == SQLITE_OK) code = stepOnce(s);
+  if (s) sqlite3_clear_bindings(s);
+  if (code != SQLITE_OK) return store_.writeError(code);
+  return {};
+}
+
+Result<void> WTStore::JournalWriter::setEntry(const QString& uuid, char section, const QByteArray& changes) {
+  if (uuid.isEmpty()) return store_.namelessError();
+  return step(changes.isNull() ? RemoveEntry : SetEntry, uuid, section, changes, 0);
+}
+
+Result<void> WTStore::JournalWriter::setDeletion(const QString& uuid, qint64 order) {
+  if (uuid.isEmpty()) return store_.namelessError();
+  return step(order < 0 ? RemoveDeletion : SetDeletion, uuid, 0, {}, order);
+}
+
+Result<void> WTStore::JournalWriter::setIteration(qint64 iteration) {
+  return step(SetIteration, {}, 0, {}, iteration);
+}
+
+Result<void> WTStore::JournalWriter::clear() {
+  if (Result<void> entries = step(ClearEntries, {}, 0, {}, 0); !entries) return entries;
+  return step(ClearDeletions, {}, 0, {}, 0);
+}
+
+namespace {
+
+QByteArray columnBytes(sqlite3_stmt* s, int column) {
+  const char* text = reinterpret_cast<const char*>(sqlite3_column_text(s, column));
+  return text ? QByteArray(text, sqlite3_column_bytes(s, column)) : QByteArray();
+}
+
+QString columnString(sqlite3_stmt* s, int column) {
+  const char* text = reinterpret_cast<const char*>(sqlite3_column_text(s, column));
+  return text ? QString::fromUtf8(text, sqlite3_column_bytes(s, column)) : QString();
+}
+
+}  // namespace
+
+Result<WTStore::JournalRecord> WTStore::journalRecord(const QString& uuid) {
+  int code = SQLITE_OK;
+  sqlite3_stmt* s = journalStatement(ReadRecord, &code);
+  if (code == SQLITE_OK) code = WTStoreRows::bindString(s, WTStoreRows::kUuid, uuid);
+  JournalRecord record;
+  while (code == SQLITE_OK && (code = sqlite3_step(s)) == SQLITE_ROW) {
+    code = SQLITE_OK;
+    const char section = char(sqlite3_column_text(s, 0)[0]);
+    if (section == 'x') {
+      record.deletion = sqlite3_column_int64(s, 1);
+    } else {
+      (section == 'i' ? record.inserted : record.updated) = columnBytes(s, 1);
+    }
+  }
+  if (s) {
+    sqlite3_reset(s);
+    sqlite3_clear_bindings(s);
+  }
+  if (code != SQLITE_DONE) return readError(code);
+  return record;
+}
+
+Result<void> WTStore::readJournal(
+    const std::function<void(const QString& uuid, char section, const QByteArray& changes)>& entry,
+    const std::function<void(const QString& uuid, qint64 order)>& deletion, qint64* iteration) {
+  int code = SQLITE_OK;
+  for (int which : {ReadEntries, ReadDeletions, ReadIteration}) {
+    sqlite3_stmt* s = journalStatement(which, &code);
+    while (code == SQLITE_OK && (code = sqlite3_step(s)) == SQLITE_ROW) {
+      code = SQLITE_OK;
+      if (which == ReadEntries) {
+        entry(columnString(s, 0), char(sqlite3_column_text(s, 1)[0]), columnBytes(s, 2));
+      } else if (which == ReadDeletions) {
+        deletion(columnString(s, 0), sqlite3_column_int64(s, 1));
+      } else {
+        if (iteration) *iteration = sqlite3_column_int64(s, 0);
+      }
+    }
+    if (s) sqlite3_reset(s);
+    if (code != SQLITE_DONE) return readError(code);
+  }
+  return {};
+}
+
+Result<bool> WTStore::journalIsEmpty() {
+  const Result<qint64> empty = journalNumber(IsEmpty);
+  if (!empty) return empty.error();
+  return empty.value() != 0;
+}
+
+Result<qint64> WTStore::lastJournalDeletion() {
+  return journalNumber(LastDeletion);
+}
+
+Result<qint64> WTStore::journalNumber(int which) {
+  int code = SQLITE_OK;
+  sqlite3_stmt* s = journalStatement(which, &code);
+  qint64 number = 0;
+  if (code == SQLITE_OK && (code = sqlite3_step(s)) == SQLITE_ROW) {
+    number = sqlite3_column_int64(s, 0);
+    code = sqlite3_step(s);
+  }
+  if (s) sqlite3_reset(s);
+  if (code != SQLITE_DONE) return readError(code);
+  return number;
 }

@@ -15,12 +15,14 @@ struct sqlite3;
 struct sqlite3_stmt;
 
 // The one store file: every record in one SQLite table, written in WAL mode with full syncing, one
-// transaction per save. The schema version lives in PRAGMA user_version; a file written by an older
-// version is migrated in order when opened. A file that is not a store, is damaged or was written by a
-// newer version is refused without being changed in any way.
+// transaction per save. The sync's journal of unsent changes lives in the same file (see JournalWriter),
+// so that a save and the journal entries of what it changed are written in that one transaction. The schema
+// version lives in PRAGMA user_version; a file written by an older version is migrated in order when opened.
+// A file that is not a store, is damaged or was written by a newer version is refused without being changed
+// in any way.
 class WTStore {
  public:
-  static constexpr int kSchemaVersion = 5;
+  static constexpr int kSchemaVersion = 6;
   // The oldest version a reader that may not migrate still reads: versions 2 and 3 only added indexes,
   // and the columns version 4 added read as none from an older file.
   static constexpr int kOldestReadableVersion = 1;
@@ -43,11 +45,41 @@ class WTStore {
   // few records, and reports a failed save at once, checks the header.
   enum class Check { WholeFile, WholeFileBeforeSaving, Header };
 
+  // The journal's rows, which the store keeps without knowing what they mean: per record its pending
+  // changes as the text of a JSON object, in section 'i' (inserted) or 'u' (updated); the pending
+  // deletions in the order they were made; and the server iteration. Written only inside a transaction:
+  // a save's (saveFrom), or writeJournal's.
+  class JournalWriter {
+   public:
+    // Sets the changes of `uuid` in `section`; a null text removes them.
+    Result<void> setEntry(const QString& uuid, char section, const QByteArray& changes);
+    // Puts the deletion of `uuid` at place `order` (older deletions have smaller ones); a negative order
+    // removes it.
+    Result<void> setDeletion(const QString& uuid, qint64 order);
+    Result<void> setIteration(qint64 iteration);
+    // Removes every entry and deletion; the iteration stays.
+    Result<void> clear();
+
+   private:
+    friend class WTStore;
+    explicit JournalWriter(WTStore& store) : store_(store) {}
+    Result<void> step(int statement, const QString& uuid, char section, const QByteArray& text,
+                      qint64 number);
+    WTStore& store_;
+  };
+  using JournalStep = std::function<Result<void>(JournalWriter&)>;
+
+  // Reads a journal an older version kept in a file of its own into the journal rows, inside the
+  // transaction that brings the file to the version that holds them; called only then. An error leaves
+  // the file as it was (the opening fails).
+  using JournalImport = JournalStep;
+
   // Opens the store at `path`, creating the file (not its folder) when missing. The error's message
   // names the file and says what is wrong, ready to show to the user. `vfs` names the SQLite VFS to
   // use; none for the default (tests pass one that injects faults).
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr,
-                                               Check check = Check::WholeFile);
+                                               Check check = Check::WholeFile,
+                                               const JournalImport& import = {});
   // Opens an existing store for reading only, beside a process that may be writing it: nothing is
   // created, migrated or changed, and save() fails. A file that holds no records yet reads as empty; one
   // written by a version older than kOldestReadableVersion is refused (the application updates it).
@@ -88,11 +120,54 @@ class WTStore {
   // The same, with the records handed out one at a time (none: no more), each valid until the next is
   // asked for: a save of many records never holds all their rows at once.
   using RecordSource = std::function<const WTStoreRecord*()>;
-  Result<void> saveFrom(const RecordSource& records, const QStringList& deletedUuids);
+  // `journal`, when given, writes the journal rows of this save after its records, in its transaction: an
+  // error there undoes the whole save.
+  Result<void> saveFrom(const RecordSource& records, const QStringList& deletedUuids,
+                        const JournalStep& journal = {});
+
+  // Changes the journal rows alone, in a transaction of their own.
+  Result<void> writeJournal(const JournalStep& step);
+  // The journal rows of one record: its sections' texts (null when absent) and the place of its pending
+  // deletion (-1: none).
+  struct JournalRecord {
+    QByteArray inserted, updated;
+    qint64 deletion = -1;
+  };
+  Result<JournalRecord> journalRecord(const QString& uuid);
+  // Every journal row: each entry to `entry`, the deletions in order to `deletion`, and the iteration.
+  Result<void> readJournal(
+      const std::function<void(const QString& uuid, char section, const QByteArray& changes)>& entry,
+      const std::function<void(const QString& uuid, qint64 order)>& deletion, qint64* iteration);
+  // The largest place a pending deletion holds; 0 when there is none.
+  Result<qint64> lastJournalDeletion();
+  // Whether the journal holds no entry and no deletion (as after a sync).
+  Result<bool> journalIsEmpty();
 
  private:
   WTStore(QString path, sqlite3* db);
-  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly, Check check);
+  static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly,
+                                               Check check, const JournalImport& import);
+  // The journal's statements, prepared on first use: a command that never saves never needs them.
+  enum JournalStatement {
+    SetEntry,
+    RemoveEntry,
+    SetDeletion,
+    RemoveDeletion,
+    SetIteration,
+    ClearEntries,
+    ClearDeletions,
+    ReadRecord,
+    ReadEntries,
+    ReadDeletions,
+    ReadIteration,
+    LastDeletion,
+    IsEmpty,
+    kJournalStatements
+  };
+  sqlite3_stmt* journalStatement(int which, int* code);
+  // The one number a journal statement answers.
+  Result<qint64> journalNumber(int which);
+  Error readError(int code) const;
   Result<void> prepareStatements(bool writing);
   Error writeError(int code) const;
   Error namelessError() const;
@@ -110,4 +185,5 @@ class WTStore {
   sqlite3_stmt* selectAll_ = nullptr;
   sqlite3_stmt* selectTimerRecords_ = nullptr;
   sqlite3_stmt* selectItemsOfTasks_ = nullptr;  // prepared on first use
+  sqlite3_stmt* journal_[kJournalStatements] = {};
 };

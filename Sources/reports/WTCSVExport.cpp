@@ -109,6 +109,13 @@ QString spreadsheetField(const QString& text) {
   return QLatin1Char('"') + quoted + QLatin1Char('"');
 }
 
+// A spreadsheet opening the file takes a cell beginning with = + - @ (or a tab or CR before them) for a
+// formula, which a name someone else typed must never become: such text is written behind an
+// apostrophe, the spreadsheets' own mark for "text". Tessal's import takes it off again.
+QString inertText(const QString& text) {
+  return text.isEmpty() || !QStringView(u"=+-@\t\r").contains(text.front()) ? text : u'\'' + text;
+}
+
 void appendSpreadsheetRow(QString& out, const QStringList& fields) {
   for (qsizetype i = 0; i < fields.size(); ++i) {
     if (i) out += QLatin1Char(',');
@@ -189,12 +196,13 @@ QString spreadsheetCSV(QList<WTItem*> items) {
     const QString currency = item->billingCurrency();
     const int places = MoneyFormat::minorUnitDigits(currency);
     appendSpreadsheetRow(
-        out, {row.names[0], row.names[1], row.names[2], kindOf(item), item->name(), isoDay(row.date),
-              time ? clockTime(time->startDate()) : QString(), time ? clockTime(time->endDate()) : QString(),
+        out, {inertText(row.names[0]), inertText(row.names[1]), inertText(row.names[2]), kindOf(item),
+              inertText(item->name()), isoDay(row.date), time ? clockTime(time->startDate()) : QString(),
+              time ? clockTime(time->endDate()) : QString(),
               expense ? QString() : hoursAndMinutes(item->duration()),
               expense ? QString() : hoursAndMinutes(item->billedDuration()),
               expense || !rate ? QString() : plainNumber(*rate, places),
-              plainNumber(item->billedCost(), places), currency, item->notes()});
+              plainNumber(item->billedCost(), places), currency, inertText(item->notes())});
   }
   return out;
 }

@@ -68,11 +68,11 @@ bool isEmptyChangeSet(const QVariantMap& changes) {
 
 }  // namespace
 
-RZSyncManager::RZSyncManager(WTObjectContext* context, const QString& trackFile, QObject* parent)
+RZSyncManager::RZSyncManager(WTObjectContext* context, QObject* parent)
     : QObject(parent),
       context_(context),
-      trackFilePath_(trackFile),
-      track_(std::make_unique<RZSyncTrack>(trackFile)),
+      track_(
+          std::make_unique<RZSyncTrack>(context ? context->store() : nullptr, RZSyncTrack::Loading::Whole)),
       network_(new RZSyncNetwork(QUrl(), this, this)),
       logPresenter_(std::make_unique<RZSyncLogErrorPresenter>()) {
   Q_ASSERT_X(context, "RZSyncManager", "line 252: a sync manager needs an object context");
@@ -152,12 +152,11 @@ void RZSyncManager::removeNotifications() {
 
 void RZSyncManager::managedObjectContextDidSave() {
   qCDebug(lcSync, "--- did save ---");
-  if (attached_) writeTrack(true);
   if (syncEnabled_) rescheduleTimer(intervals_.afterSaveMs);
 }
 
 void RZSyncManager::writeTrack(bool logFailure) {
-  const Result<void> written = track_->writeToFile(trackFilePath_);
+  const Result<void> written = track_->write();
   if (!written && logFailure)
     qCWarning(lcSync).noquote()
         << QStringLiteral("Error writing JSON Data - %1").arg(written.error().message);
@@ -260,19 +259,21 @@ void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
   context_->processPendingChanges();
   context_->undoManager().enableRegistration();
 
-  // Saved with the journal detached: the server's changes are not local ones.
-  context_->setChangeJournal(nullptr);
+  // Caught up with this head once the merge is saved, whatever becomes of the save below: a refused or
+  // lost save must not make the next poll deliver the same changes again over edits made since.
+  track_->setIteration(iteration);
+  // Saved unjournaled, since the server's changes are not local ones, but with what the merge changed in
+  // the journal and the iteration, in the same transaction (a failed save reads them back as they were).
+  track_->setRecordsSaves(false);
   attached_ = false;
   const Result<void> mergedSave = context_->save();
-  context_->setChangeJournal(track_.get());
+  track_->setRecordsSaves(true);
   attached_ = true;
   if (!mergedSave) {
     qCWarning(lcSync).noquote() << mergedSave.error().message;
     return;
   }
-  // Caught up with this head now, whatever becomes of the save below: a refused or lost save must not
-  // make the next poll deliver the same changes again over edits made since.
-  track_->setIteration(iteration);
+  // A merge that changed no record has its journal rows still to write.
   writeTrack(true);
   if (track_->hasChanges()) post(track_->dictionary(), kSave, iteration);
 }

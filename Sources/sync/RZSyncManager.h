@@ -32,9 +32,9 @@ struct RZSyncExchange {
 };
 
 // Keeps the object store and the server account in step. It owns the change journal (attached to the
-// context, so every save is journaled) and the network client, polls "head" on a timer, merges the
-// server's changes into the context by uuid, sends local changes with "save", and writes the journal
-// after every save. Main thread only.
+// context, so every save journals its records in its own transaction) and the network client, polls
+// "head" on a timer, merges the server's changes into the context by uuid, sends local changes with
+// "save", and writes what it changes in the journal as the rows it touches. Main thread only.
 //
 // To lose nothing it also: forgets only what a confirmed save sent (edits made while it
 // was on its way stay pending); moves the journal's iteration to a merged head at once; resumes polling
@@ -52,15 +52,14 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
     int afterSaveMs = 5000;  // after every save of the context
   };
 
-  // Loads the journal at `trackFile` (see RZSyncTrack), attaches it to `context` and watches the
+  // Reads the journal of the context's store (see RZSyncTrack), attaches it to `context` and watches the
   // context's saves. The server address and this installation's identity come from the context's user
   // defaults ("WTSyncServer", "WTSyncDevice"; the identity is made and stored on first use). Syncing is
   // off until enableSync(). `context` is not owned and must outlive the manager.
-  RZSyncManager(WTObjectContext* context, const QString& trackFile, QObject* parent = nullptr);
+  explicit RZSyncManager(WTObjectContext* context, QObject* parent = nullptr);
   ~RZSyncManager() override;
 
   WTObjectContext* managedObjectContext() const { return context_; }
-  QString trackFilePath() const { return trackFilePath_; }
   // The journal; null only while detached during the save of a merge.
   RZSyncTrack* syncTrack() const { return attached_ ? track_.get() : nullptr; }
   RZSyncNetwork* syncNetwork() const { return network_; }
@@ -133,7 +132,6 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   UserDefaults* userDefaults() const;
 
   QPointer<WTObjectContext> context_;
-  QString trackFilePath_;
   std::unique_ptr<RZSyncTrack> track_;
   bool attached_ = false;
   RZSyncNetwork* network_;

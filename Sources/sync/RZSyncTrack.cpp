@@ -5,17 +5,15 @@
 #include "RZSyncJSON.h"
 #include "TessalLogging.h"
 #include "WTObject.h"
+#include "WTObjectContext.h"
 
 #include <QDateTime>
 #include <QFile>
 #include <QFileInfo>
 #include <QtDebug>
 
-#include <fcntl.h>
-#include <unistd.h>
-#include <cerrno>
+#include <algorithm>
 #include <cmath>
-#include <cstring>
 
 namespace {
 
@@ -51,20 +49,247 @@ QVariantMap entriesVariant(const RZSyncTrack::Entries& entries) {
   return map;
 }
 
-QString systemError(const QString& what, const QString& path) {
-  return QStringLiteral("%1 %2: %3").arg(what, path, QString::fromLocal8Bit(std::strerror(errno)));
+constexpr char kInsertedRow = 'i';
+constexpr char kUpdatedRow = 'u';
+
+QByteArray entryText(const QVariantMap& values) {
+  return RZSyncJSON::write(QVariant(values), RZSyncJSON::Style::Compact);
+}
+
+// An entry's values from its row; none (logged) for a row that is not a JSON object.
+std::optional<QVariantMap> entryValues(const QString& uuid, const QByteArray& text) {
+  QString problem;
+  const std::optional<QVariant> parsed = RZSyncJSON::parse(text, &problem);
+  if (parsed && parsed->typeId() == QMetaType::QVariantMap) return parsed->toMap();
+  qCWarning(lcSync).noquote()
+      << QStringLiteral("The journal entry of %1 cannot be read: %2").arg(uuid, problem);
+  return std::nullopt;
+}
+
+// `path` + `suffix`, or with a number added when that name is taken.
+QString freeName(const QString& path, const QString& suffix) {
+  QString name = path + suffix;
+  for (int n = 2; QFileInfo::exists(name); ++n) name = path + suffix + QStringLiteral(".%1").arg(n);
+  return name;
 }
 
 }  // namespace
 
-RZSyncTrack::RZSyncTrack(const QString& path) {
-  load(path);
+RZSyncTrack::RZSyncTrack(WTStore* store, Loading loading)
+    : lastDeletion_(-1), store_(store), onDemand_(loading == Loading::OnDemand) {
+  if (!onDemand_) {
+    readWhole();
+    return;
+  }
+  // Nothing pending (as after a sync): no record's rows need reading.
+  const Result<bool> empty = store_ ? store_->journalIsEmpty() : Result<bool>(true);
+  nothingStored_ = empty && empty.value();
+  if (nothingStored_) lastDeletion_ = 0;
 }
 
-void RZSyncTrack::load(const QString& path) {
-  QFile file(path);
-  if (path.isEmpty() || !file.exists()) return;
+void RZSyncTrack::readWhole() {
+  inserted_.clear();
+  updated_.clear();
+  deleted_.clear();
+  deletionOrder_.clear();
+  iteration_ = 0;
+  lastDeletion_ = 0;
+  if (!store_) return;
+  const Result<void> read = store_->readJournal(
+      [&](const QString& uuid, char section, const QByteArray& changes) {
+        if (std::optional<QVariantMap> values = entryValues(uuid, changes))
+          (section == kInsertedRow ? inserted_ : updated_).insert(uuid, std::move(*values));
+      },
+      [&](const QString& uuid, qint64 order) {
+        deleted_.append(uuid);
+        deletionOrder_.insert(uuid, order);
+        lastDeletion_ = std::max(lastDeletion_, order);
+      },
+      &iteration_);
+  if (!read) qCWarning(lcSync).noquote() << read.error().message;
+}
 
+void RZSyncTrack::take(const QString& uuid, const WTStore::JournalRecord& record) {
+  for (const auto& [section, text] :
+       {std::pair{Section::Inserted, &record.inserted}, std::pair{Section::Updated, &record.updated}}) {
+    if (text->isNull()) continue;
+    if (std::optional<QVariantMap> values = entryValues(uuid, *text))
+      entriesFor(section).insert(uuid, *values);
+  }
+  if (record.deletion >= 0) {
+    deleted_.append(uuid);
+    deletionOrder_.insert(uuid, record.deletion);
+  }
+}
+
+void RZSyncTrack::fetch(const QString& uuid) {
+  if (!onDemand_ || !store_ || cleared_ || nothingStored_ || fetched_.contains(uuid)) return;
+  fetched_.insert(uuid);
+  const Result<WTStore::JournalRecord> record = store_->journalRecord(uuid);
+  if (!record) {
+    qCWarning(lcSync).noquote() << record.error().message;
+    return;
+  }
+  take(uuid, record.value());
+}
+
+void RZSyncTrack::touch(const QString& uuid) {
+  fetch(uuid);
+  if (changed_.contains(uuid)) return;
+  changed_.insert(uuid, {inserted_.contains(uuid), updated_.contains(uuid), deletionOrder_.value(uuid, -1)});
+}
+
+void RZSyncTrack::addDeletion(const QString& uuid) {
+  if (deletionOrder_.contains(uuid)) return;
+  if (lastDeletion_ < 0) {
+    const Result<qint64> last = store_ ? store_->lastJournalDeletion() : Result<qint64>(0);
+    lastDeletion_ = last ? last.value() : 0;
+    if (!last) qCWarning(lcSync).noquote() << last.error().message;
+  }
+  deleted_.append(uuid);
+  deletionOrder_.insert(uuid, ++lastDeletion_);
+}
+
+void RZSyncTrack::removeDeletion(const QString& uuid) {
+  if (deletionOrder_.remove(uuid)) deleted_.removeAll(uuid);
+}
+
+Result<void> RZSyncTrack::writeChanges(WTStore::JournalWriter& writer) {
+  Result<void> written;
+  if (cleared_) written = writer.clear();
+  if (written && iterationChanged_) written = writer.setIteration(iteration_);
+  // In order: rows inserted by key fill the table's pages one after another.
+  QStringList uuids = changed_.keys();
+  std::sort(uuids.begin(), uuids.end());
+  for (auto it = uuids.cbegin(); written && it != uuids.cend(); ++it) {
+    const QString& uuid = *it;
+    const Stored stored = changed_.value(uuid);
+    // A row is written where the entry is, removed where it was and is no more.
+    for (const auto& [row, entries, was] : {std::tuple{kInsertedRow, &inserted_, stored.inserted},
+                                            std::tuple{kUpdatedRow, &updated_, stored.updated}}) {
+      const auto entry = entries->constFind(uuid);
+      if (entry != entries->constEnd()) {
+        written = writer.setEntry(uuid, row, entryText(entry.value()));
+      } else if (was) {
+        written = writer.setEntry(uuid, row, QByteArray());
+      }
+      if (!written) break;
+    }
+    const qint64 deletion = deletionOrder_.value(uuid, -1);
+    if (written && deletion != stored.deletion) written = writer.setDeletion(uuid, deletion);
+  }
+  return written;
+}
+
+void RZSyncTrack::saveEnded(bool written) {
+  const QHash<QString, Stored> changed = std::exchange(changed_, {});
+  const bool everything = std::exchange(cleared_, false) | std::exchange(iterationChanged_, false);
+  if (written || !store_) return;
+  // Nothing of it reached the rows: what changed is read back from them (on demand, when next needed).
+  if (everything) {
+    if (!onDemand_) return readWhole();
+    inserted_.clear(), updated_.clear(), deleted_.clear(), deletionOrder_.clear(), fetched_.clear();
+    return;
+  }
+  for (auto it = changed.constBegin(); it != changed.constEnd(); ++it) {
+    const QString& uuid = it.key();
+    inserted_.remove(uuid);
+    updated_.remove(uuid);
+    removeDeletion(uuid);
+    fetched_.remove(uuid);
+    if (onDemand_) continue;
+    const Result<WTStore::JournalRecord> record = store_->journalRecord(uuid);
+    if (record) take(uuid, record.value());
+  }
+}
+
+Result<void> RZSyncTrack::write() {
+  if (!store_ || (changed_.isEmpty() && !cleared_ && !iterationChanged_)) return {};
+  const Result<void> written =
+      store_->writeJournal([this](WTStore::JournalWriter& writer) { return writeChanges(writer); });
+  saveEnded(written.ok());
+  return written;
+}
+
+Result<void> RZSyncTrack::journalEveryRecord(WTObjectContext& context) {
+  resetChanges();
+  setIteration(0);
+  iterationChanged_ = true;
+  for (WTObject* object :
+       context.fetchObjectsForEntityName(QStringLiteral("WTObject")).value_or(QList<WTObject*>()))
+    updateValues(object->setValues(), object->uuid(), Section::Updated);
+  return write();
+}
+
+QString RZSyncTrack::legacyFilePath(const QString& storePath) {
+  const QFileInfo store(storePath);
+  return store.path() + u'/' + store.completeBaseName() + QStringLiteral(".sync");
+}
+
+Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, const char* vfs,
+                                                        WTStore::Check check) {
+  const QString file = legacyFilePath(path);
+  bool imported = false;
+  Result<std::unique_ptr<WTStore>> store =
+      WTStore::open(path, vfs, check, [&](WTStore::JournalWriter& writer) -> Result<void> {
+        if (!QFileInfo::exists(file)) return {};
+        RZSyncTrack legacy;
+        QString problem;
+        if (!legacy.readFile(file, &problem)) {
+          qCWarning(lcSync).noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
+          // Whatever the file holds may be someone's unsent work: keep it where a person can find it.
+          if (!QFile::rename(file, freeName(file, QStringLiteral(".corrupt"))))
+            qCWarning(lcSync).noquote()
+                << QStringLiteral("Could not move the unreadable journal %1 aside").arg(file);
+          return {};
+        }
+        imported = true;
+        return legacy.writeChanges(writer);
+      });
+  if (store && imported) {
+    // The journal is in the store now; the file stays, under another name, for whoever looks for it.
+    if (!QFile::rename(file, freeName(file, QStringLiteral(".migrated"))))
+      qCWarning(lcSync).noquote()
+          << QStringLiteral("Could not rename the journal %1, which is in the data file now").arg(file);
+  } else if (store && QFileInfo::exists(file)) {
+    qCWarning(lcSync).noquote()
+        << QStringLiteral("Ignoring %1: the journal is kept in the data file now").arg(file);
+  }
+  return store;
+}
+
+std::optional<RZSyncTrack::FileContents> RZSyncTrack::fromJSON(QByteArrayView text, QString* problem) {
+  QString reason;
+  FileContents contents;
+  const std::optional<QVariant> root = RZSyncJSON::parse(text, &reason);
+  if (root && root->typeId() != QMetaType::QVariantMap)
+    reason = QStringLiteral("the journal is not a JSON object");
+  if (root && reason.isEmpty()) {
+    const QVariantMap top = root->toMap();
+    const QVariant number = top.value(QStringLiteral("iteration"));
+    const QVariant track = top.value(QStringLiteral("track"));
+    if (number.typeId() == QMetaType::LongLong) {
+      contents.iteration = number.toLongLong();
+    } else if (number.isValid()) {
+      reason = QStringLiteral("\"iteration\" is not an integer");
+    }
+    if (reason.isEmpty() && track.isValid()) {
+      const QVariantMap changes = track.toMap();
+      if (track.typeId() != QMetaType::QVariantMap ||
+          !readEntries(changes.value(kInserted), contents.inserted) ||
+          !readEntries(changes.value(kUpdated), contents.updated) ||
+          !readDeleted(changes.value(kDeleted), contents.deleted)) {
+        reason = QStringLiteral("\"track\" is not a change dictionary");
+      }
+    }
+  }
+  if (reason.isEmpty()) return contents;
+  if (problem) *problem = reason;
+  return std::nullopt;
+}
+
+bool RZSyncTrack::readFile(const QString& path, QString* problemOut) {
+  QFile file(path);
   QString problem;
   QByteArray bytes;
   if (!file.open(QIODevice::ReadOnly)) {
@@ -75,115 +300,36 @@ void RZSyncTrack::load(const QString& path) {
     file.close();
   }
 
-  if (problem.isEmpty()) {
-    if (std::optional<RZSyncTrack> track = fromJSON(bytes, &problem)) {
-      iteration_ = track->iteration_;
-      inserted_ = std::move(track->inserted_);
-      updated_ = std::move(track->updated_);
-      deleted_ = std::move(track->deleted_);
-      return;
+  std::optional<FileContents> contents;
+  if (problem.isEmpty()) contents = fromJSON(bytes, &problem);
+  if (!problem.isEmpty()) {
+    *problemOut = problem;
+    return false;
+  }
+  // Read as if every value had just been journaled here.
+  setIteration(contents->iteration);
+  for (const Section section : {Section::Inserted, Section::Updated}) {
+    const Entries& read = section == Section::Inserted ? contents->inserted : contents->updated;
+    for (auto it = read.begin(); it != read.end(); ++it) {
+      touch(it.key());
+      entriesFor(section).insert(it.key(), it.value());
     }
   }
-
-  qCWarning(lcSync).noquote() << QStringLiteral("Can not parse json - %1").arg(problem);
-  // Whatever the file holds may be someone's unsent work: keep it where a person can find it.
-  QString aside = path + QStringLiteral(".corrupt");
-  for (int n = 2; QFileInfo::exists(aside); ++n) aside = path + QStringLiteral(".corrupt.%1").arg(n);
-  if (!QFile::rename(path, aside)) {
-    qCWarning(lcSync).noquote() << QStringLiteral("Could not move the unreadable journal %1 aside").arg(path);
+  for (const QString& uuid : contents->deleted) {
+    touch(uuid);
+    addDeletion(uuid);
   }
-}
-
-std::optional<RZSyncTrack> RZSyncTrack::fromJSON(QByteArrayView text, QString* problem) {
-  QString reason;
-  RZSyncTrack track;
-  const std::optional<QVariant> root = RZSyncJSON::parse(text, &reason);
-  if (root && root->typeId() != QMetaType::QVariantMap)
-    reason = QStringLiteral("the journal is not a JSON object");
-  if (root && reason.isEmpty()) {
-    const QVariantMap top = root->toMap();
-    const QVariant number = top.value(QStringLiteral("iteration"));
-    const QVariant changes = top.value(QStringLiteral("track"));
-    if (number.typeId() == QMetaType::LongLong) {
-      track.iteration_ = number.toLongLong();
-    } else if (number.isValid()) {
-      reason = QStringLiteral("\"iteration\" is not an integer");
-    }
-    if (reason.isEmpty() && changes.isValid()) {
-      const QVariantMap sections = changes.toMap();
-      if (changes.typeId() != QMetaType::QVariantMap ||
-          !readEntries(sections.value(kInserted), track.inserted_) ||
-          !readEntries(sections.value(kUpdated), track.updated_) ||
-          !readDeleted(sections.value(kDeleted), track.deleted_)) {
-        reason = QStringLiteral("\"track\" is not a change dictionary");
-      }
-    }
-  }
-  if (reason.isEmpty()) return track;
-  if (problem) *problem = reason;
-  return std::nullopt;
-}
-
-Result<void> RZSyncTrack::writeToFile(const QString& path) const {
-  QVariantMap top;
-  top.insert(QStringLiteral("iteration"), iteration_);
-  // The sections as they are, not copied: the same text as dictionary() gives.
-  top.insert(QStringLiteral("track"),
-             QVariantMap{{kInserted, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&inserted_})},
-                         {kUpdated, QVariant::fromValue(RZSyncJSON::ObjectOfObjects{&updated_})},
-                         {kDeleted, QVariant(deleted_)}});
-
-  const QByteArray target = QFile::encodeName(path);
-  QByteArray temporary = target + ".XXXXXX";
-  const int fd = ::mkstemp(temporary.data());
-  if (fd < 0) return Error{1, systemError(QStringLiteral("Cannot create a file beside"), path)};
-  auto fail = [&](const QString& what) {
-    Error error{1, systemError(what, path)};
-    ::close(fd);
-    ::unlink(temporary.constData());
-    return error;
-  };
-  // Written as it is made: a journal of many changes never lies in memory twice, as values and as text.
-  bool failed = false;
-  auto writeOut = [&](QByteArray& bytes) {
-    qsizetype written = 0;
-    while (!failed && written < bytes.size()) {
-      const ssize_t n = ::write(fd, bytes.constData() + written, size_t(bytes.size() - written));
-      if (n < 0 && errno == EINTR) continue;
-      if (n <= 0) failed = true;
-      written += n;
-    }
-    bytes.resize(0);  // the room stays for the next piece
-  };
-  RZSyncJSON::write(top, RZSyncJSON::Style::Pretty, writeOut);
-  QByteArray end("\n");
-  writeOut(end);
-  if (failed) return fail(QStringLiteral("Cannot write"));
-  // The data must be on disk before the name points at it, or a crash could leave an empty journal.
-  if (::fsync(fd) != 0) return fail(QStringLiteral("Cannot sync"));
-  if (::close(fd) != 0) {
-    Error error{1, systemError(QStringLiteral("Cannot close"), path)};
-    ::unlink(temporary.constData());
-    return error;
-  }
-  if (::rename(temporary.constData(), target.constData()) != 0) {
-    Error error{1, systemError(QStringLiteral("Cannot replace"), path)};
-    ::unlink(temporary.constData());
-    return error;
-  }
-  // And the rename itself must survive a crash.
-  const QByteArray folder = QFile::encodeName(QFileInfo(path).absolutePath());
-  if (const int dir = ::open(folder.constData(), O_RDONLY | O_DIRECTORY); dir >= 0) {
-    ::fsync(dir);
-    ::close(dir);
-  }
-  return {};
+  return true;
 }
 
 void RZSyncTrack::resetChanges() {
   inserted_.clear();
   updated_.clear();
   deleted_.clear();
+  deletionOrder_.clear();
+  fetched_.clear();
+  changed_.clear();
+  cleared_ = true;
 }
 
 std::optional<QVariant> RZSyncTrack::transformedValue(const QVariant& value) {
@@ -214,15 +360,17 @@ std::optional<QVariant> RZSyncTrack::transformedValue(const QVariant& value) {
 }
 
 void RZSyncTrack::updateValues(const QVariantMap& values, const QString& uuid, Section section) {
+  touch(uuid);
   QVariantMap& entry = entriesFor(section)[uuid];
   for (auto it = values.begin(); it != values.end(); ++it) {
     if (std::optional<QVariant> transformed = transformedValue(it.value()))
       entry.insert(it.key(), *transformed);
   }
-  deleted_.removeAll(uuid);
+  removeDeletion(uuid);
 }
 
 void RZSyncTrack::updateValues(const QVariantMap& values, const QString& uuid) {
+  fetch(uuid);
   updateValues(values, uuid, inserted_.contains(uuid) ? Section::Inserted : Section::Updated);
 }
 
@@ -243,7 +391,8 @@ void RZSyncTrack::insertValues(const QVariantMap& values, const QString& uuid) {
 void RZSyncTrack::deleteObjectWithId(const QString& uuid) {
   if (uuid.isEmpty()) return;
   qCDebug(lcSync).noquote() << QStringLiteral("DELETE(%1)").arg(uuid);
-  if (!deleted_.contains(uuid)) deleted_.append(uuid);
+  touch(uuid);
+  addDeletion(uuid);
 }
 
 QVariantMap RZSyncTrack::dictionary() const {
@@ -253,6 +402,7 @@ QVariantMap RZSyncTrack::dictionary() const {
 }
 
 void RZSyncTrack::setEntry(Section section, const QString& uuid, const QVariantMap& values) {
+  touch(uuid);
   if (values.isEmpty()) {
     entriesFor(section).remove(uuid);
   } else {
@@ -261,9 +411,10 @@ void RZSyncTrack::setEntry(Section section, const QString& uuid, const QVariantM
 }
 
 void RZSyncTrack::forget(const QString& uuid) {
+  touch(uuid);
   inserted_.remove(uuid);
   updated_.remove(uuid);
-  deleted_.removeAll(uuid);
+  removeDeletion(uuid);
 }
 
 void RZSyncTrack::removeSentChanges(const QVariantMap& sent) {
@@ -273,6 +424,7 @@ void RZSyncTrack::removeSentChanges(const QVariantMap& sent) {
     for (auto sentEntry = sentEntries.begin(); sentEntry != sentEntries.end(); ++sentEntry) {
       auto current = entries.find(sentEntry.key());
       if (current == entries.end()) continue;
+      touch(sentEntry.key());
       const QVariantMap sentValues = sentEntry.value().toMap();
       for (auto value = sentValues.begin(); value != sentValues.end(); ++value) {
         auto pending = current->find(value.key());
@@ -293,7 +445,10 @@ void RZSyncTrack::removeSentChanges(const QVariantMap& sent) {
     }
   }
   for (const QVariant& uuid : sent.value(kDeleted).toList()) {
-    deleted_.removeAll(uuid.toString());
+    if (deletionOrder_.contains(uuid.toString())) {
+      touch(uuid.toString());
+      removeDeletion(uuid.toString());
+    }
     retired_.insert(uuid.toString());
   }
 }

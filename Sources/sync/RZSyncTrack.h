@@ -3,18 +3,23 @@
 #include "Result.h"
 #include "WTChangeJournal.h"
 
+#include <QHash>
 #include <QMap>
 #include <QSet>
 #include <QString>
 #include <QStringList>
 #include <QVariant>
 
+#include <memory>
 #include <optional>
+
+class WTObjectContext;
 
 // The change journal: which records were inserted ("i"), updated ("u") or deleted ("x") here since the
 // server last confirmed a save, with their values in JSON form, keyed by uuid; and the server iteration
-// this client has caught up with. The sync manager keeps it in memory, writes it after every save, sends
-// it with "save" and forgets what the server confirmed.
+// this client has caught up with. Its rows live in the store file (WTStore::JournalWriter): a save writes
+// the rows of the records it reports in its own transaction, and every other change (a confirmed save, a
+// merge, the iteration) is written as the rows it touches, never the whole journal.
 //
 // Values go in through transformedValue: dates as whole seconds since 1970, records as their uuid,
 // ordered relationships as arrays of uuids, unordered relationships not at all, a cleared value as
@@ -22,22 +27,50 @@
 class RZSyncTrack final : public WTChangeJournal {
  public:
   enum class Section { Inserted, Updated };    // "i" and "u"
-  using Entries = QMap<QString, QVariantMap>;  // uuid -> key -> JSON value
+  // uuid -> key -> JSON value. Unordered: an import journals a hundred thousand records one by one.
+  using Entries = QHash<QString, QVariantMap>;
 
-  // An empty journal at iteration 0.
+  // How much of the store's journal is held in memory: all of it (the sync manager's, which sends and
+  // merges it), or only the entries of the records a save reports, read as they are reported (a
+  // command's: saving a few records never reads the rest). Everything that reads the journal as a whole
+  // (dictionary, entries, hasChanges) answers for what is held.
+  enum class Loading { Whole, OnDemand };
+
+  // An empty journal at iteration 0, in memory only (written wherever a save it is attached to goes).
   RZSyncTrack() = default;
-  // Loads the journal at `path`; never fails. A missing file gives an empty journal; a file that cannot
-  // be read as a journal is logged ("Can not parse json - %@"), moved aside to `path` + ".corrupt" (a
-  // number is added when that name is taken) so that nothing in it is lost, and the journal starts
-  // empty at iteration 0.
-  explicit RZSyncTrack(const QString& path);
-  // The journal a file's text holds ({"iteration", "track"}, as writeToFile writes it); none, with the
-  // reason in `problem`, when the text is not one.
-  static std::optional<RZSyncTrack> fromJSON(QByteArrayView text, QString* problem = nullptr);
+  // The journal rows of `store` (not owned; it must outlive this). Rows that cannot be read are logged
+  // and the journal starts empty; they stay in the file.
+  RZSyncTrack(WTStore* store, Loading loading);
 
-  // Writes {"iteration", "track"} as pretty-printed JSON, atomically: a temporary file beside `path`,
-  // synced to disk, then renamed over it. On failure the old file and this journal are unchanged.
-  Result<void> writeToFile(const QString& path) const;
+  // Where an older version kept the journal, a file of its own: "Tessal.sync" beside "Tessal.sqlite".
+  static QString legacyFilePath(const QString& storePath);
+  // What such a file's text holds ({"iteration", "track"}); none, with the reason in `problem`, when the
+  // text is not a journal.
+  struct FileContents {
+    qint64 iteration = 0;
+    Entries inserted, updated;
+    QStringList deleted;  // each once
+  };
+  static std::optional<FileContents> fromJSON(QByteArrayView text, QString* problem = nullptr);
+  // Opens the store for writing (see WTStore::open). The opening that brings an older file up to date
+  // reads the journal file beside it into the store's journal in the same transaction (a file that
+  // cannot be read as a journal is logged, "Can not parse json - %@", and kept aside as ".corrupt", a
+  // number added when that name is taken, and nothing is imported), then renames it to ".migrated"
+  // (numbered the same way): nothing in it is ever lost. A journal file beside a store that is up to date
+  // already is ignored, and logged.
+  static Result<std::unique_ptr<WTStore>> openStore(const QString& path, const char* vfs = nullptr,
+                                                    WTStore::Check check = WTStore::Check::WholeFile);
+
+  // Writes what changed since the last write, in a transaction of its own. On failure the journal is
+  // read back from the rows it changed, which are as they were.
+  Result<void> write();
+  // Journals every record of `context` (every record loaded) as updated with all its stored values,
+  // forgets every other pending change, sets the iteration to 0 and writes it all at once: for a store
+  // that has been replaced as a whole, so that the server hears of all of it again.
+  Result<void> journalEveryRecord(WTObjectContext& context);
+  // While off, saves report nothing to this journal but still write its changed rows: the merge saves
+  // the server's changes, which are not local ones, together with what it changed in the journal.
+  void setRecordsSaves(bool records) { recordsSaves_ = records; }
 
   // Forgets every change; keeps the iteration.
   void resetChanges();
@@ -59,11 +92,17 @@ class RZSyncTrack final : public WTChangeJournal {
   void deleteObjectWithId(const QString& uuid) override;
   // The deletions the server confirmed while this journal was in memory: the server keeps a deletion for
   // good and drops everything sent later under the identity.
-  bool isRetired(const QString& uuid) const override { return retired_.contains(uuid); }
+  bool isRetired(const QString& uuid) const override { return recordsSaves_ && retired_.contains(uuid); }
+  bool recordsSaves() const override { return recordsSaves_; }
+  Result<void> writeChanges(WTStore::JournalWriter& writer) override;
+  void saveEnded(bool written) override;
 
   bool hasChanges() const { return !inserted_.isEmpty() || !updated_.isEmpty() || !deleted_.isEmpty(); }
   qint64 iteration() const { return iteration_; }
-  void setIteration(qint64 iteration) { iteration_ = iteration; }
+  void setIteration(qint64 iteration) {
+    iterationChanged_ = iterationChanged_ || iteration != iteration_;
+    iteration_ = iteration;
+  }
 
   // The change dictionary {"i": {uuid: values}, "u": {uuid: values}, "x": [uuid]} as a JSON value: the
   // "data" of a save. A copy; change the journal through the operations here.
@@ -78,7 +117,7 @@ class RZSyncTrack final : public WTChangeJournal {
   // Replaces the entry; an empty map removes the uuid from the section.
   void setEntry(Section section, const QString& uuid, const QVariantMap& values);
   const QStringList& deletedIds() const { return deleted_; }
-  bool isPendingDeletion(const QString& uuid) const { return deleted_.contains(uuid); }
+  bool isPendingDeletion(const QString& uuid) const { return deletionOrder_.contains(uuid); }
   // Drops every pending change of `uuid`: its entries under "i" and "u" and its place in "x".
   void forget(const QString& uuid);
 
@@ -89,12 +128,39 @@ class RZSyncTrack final : public WTChangeJournal {
   void removeSentChanges(const QVariantMap& sent);
 
  private:
+  // What the rows of a changed record held before it changed.
+  struct Stored {
+    bool inserted = false, updated = false;
+    qint64 deletion = -1;
+  };
+
   Entries& entriesFor(Section section) { return section == Section::Inserted ? inserted_ : updated_; }
-  void load(const QString& path);
+  // Reads the rows of `uuid` into memory, once, when they are read on demand.
+  void fetch(const QString& uuid);
+  // Before `uuid` changes: its rows are held and it is written with the next write.
+  void touch(const QString& uuid);
+  void addDeletion(const QString& uuid);
+  void removeDeletion(const QString& uuid);
+  void take(const QString& uuid, const WTStore::JournalRecord& record);
+  void readWhole();
+  // Reads a journal file; false when it cannot be read as one (then this is unchanged).
+  bool readFile(const QString& path, QString* problem);
 
   qint64 iteration_ = 0;
   Entries inserted_;
   Entries updated_;
-  QStringList deleted_;
+  QStringList deleted_;                   // in order
+  QHash<QString, qint64> deletionOrder_;  // each pending deletion's place in its rows
+  qint64 lastDeletion_ = 0;               // -1: not read yet
   QSet<QString> retired_;
+
+  WTStore* store_ = nullptr;
+  bool onDemand_ = false;
+  bool nothingStored_ = false;  // on demand: the rows held nothing when read
+  bool recordsSaves_ = true;
+  QSet<QString> fetched_;
+  // Changed since the last write.
+  QHash<QString, Stored> changed_;
+  bool cleared_ = false;
+  bool iterationChanged_ = false;
 };

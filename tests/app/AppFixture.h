@@ -41,9 +41,12 @@ class RecordingPresenter final : public WTAlertPresenter {
     deletionQuestions << (detail.isEmpty() ? question : question + u' ' + detail);
     return deletes;
   }
-  QStringList errors, deletionQuestions;
+  bool offerRestore(const QString& message, const QString& backup) override {
+    return offers << message + u' ' + backup, restores;
+  }
+  QStringList errors, deletionQuestions, offers;
   int questions = 0;
-  bool quitAnyway = false, deletes = true;
+  bool quitAnyway = false, deletes = true, restores = false;
 };
 
 class AppTest : public ::testing::Test {

@@ -37,7 +37,21 @@ class Installation {
   }
   QString path(const QString& name) const { return home_.filePath(name); }
   QString storePath() const { return path("data/Tessal2/Tessal.sqlite"); }
-  QString journalPath() const { return path("data/Tessal2/Tessal.sync"); }
+  // The sync journal's rows in the store, "uuid section changes" a line (a pending deletion "uuid x").
+  QStringList journal() const {
+    QStringList lines;
+    if (auto store = WTStore::openReadOnly(storePath(), WTStore::Check::Header)) {
+      EXPECT_TRUE(store.value()
+                      ->readJournal(
+                          [&](const QString& uuid, char section, const QByteArray& changes) {
+                            lines << uuid + ' ' + QChar::fromLatin1(section) + ' ' +
+                                         QString::fromUtf8(changes);
+                          },
+                          [&](const QString& uuid, qint64) { lines << uuid + QStringLiteral(" x"); }, nullptr)
+                      .ok());
+    }
+    return lines;
+  }
   QString runtimeFolder() const { return path("runtime"); }
   void setSetting(const QString& key, const QString& value) {
     QSettings(path("config/Tessal/Tessal.conf"), QSettings::IniFormat).setValue(key, value);

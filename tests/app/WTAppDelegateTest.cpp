@@ -7,10 +7,13 @@
 #include "WTStatusBarController.h"
 #include "WTStatusBarPopup.h"
 #include "WTStopwatchUpdater.h"
+#include "WTStoreBackup.h"
 #include "WTTrackingAlert.h"
 
 #include <QStatusBar>
 #include <QToolButton>
+
+#include <sqlite3.h>
 
 // Each test gets its own data and settings folders.
 class WTAppDelegateTest : public AppTest {
@@ -29,8 +32,7 @@ class WTAppDelegateTest : public AppTest {
 
 TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   auto delegate = makeDelegate();
-  EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite") &&
-              delegate->syncJournalPath().endsWith("/data/Tessal2/Tessal.sync"));
+  EXPECT_TRUE(delegate->storePath().endsWith("/data/Tessal2/Tessal.sqlite"));
   EXPECT_FALSE(delegate->hasContext());  // nothing is opened before somebody asks
   // Made with the store, not by the window: a command that makes the store gets it too.
   EXPECT_EQ(delegate->managedObjectContext()->fetch<WTProject>().size(), 1);
@@ -83,6 +85,121 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   EXPECT_FALSE(QFile::exists(path + "-wal"));
 }
 
+// A damaged store is only ever replaced by the newest good backup the user chose to restore, and kept.
+TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
+  const QString path = WTAppDelegate::storePath();
+  const QString backups = WTAppDelegate::applicationSupportFolder() + "/Backups";
+  {
+    auto first = makeDelegate();
+    WTProject::insertNewObject(first->managedObjectContext())->setName("Backed up");
+    ASSERT_TRUE(first->saveChanges());
+  }
+  ASSERT_TRUE(QDir(backups).removeRecursively());  // the day's copy the first start made
+  ASSERT_TRUE(WTStoreBackup::copy(path, backups + "/Tessal-2026-01-02.sqlite").ok());
+  // Newer, but no store: passed over.
+  QFile damagedCopy(backups + "/Tessal-2026-01-03.sqlite");
+  ASSERT_TRUE(damagedCopy.open(QIODevice::WriteOnly) && damagedCopy.write(QByteArray(8192, 'x')) == 8192);
+  damagedCopy.close();
+  const QByteArray garbage = QByteArray("SQLite format 3").append('\0').append(QByteArray(4080, '\x7f'));
+  for (const bool restore : {false, true}) {
+    SCOPED_TRACE(restore);
+    QFile file(path);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) &&
+                file.write(garbage) == garbage.size());
+    file.close();
+    presenter.offers.clear();
+    presenter.restores = restore;
+    auto delegate = makeDelegate();
+    WTObjectContext* context = delegate->managedObjectContext();
+    ASSERT_EQ(presenter.offers.size(), 1);
+    EXPECT_TRUE(presenter.offers[0].contains(path) &&
+                presenter.offers[0].endsWith("/Tessal-2026-01-02.sqlite"))
+        << presenter.offers[0].toStdString();
+    QStringList names;
+    for (WTProject* project : context->fetch<WTProject>()) names << project->name();
+    names.sort();
+    EXPECT_EQ(names, restore ? QStringList({"Backed up", "Default Project"}) : QStringList());
+    EXPECT_EQ(context->hasStore(), restore);
+    QStringList kept =
+        QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
+    kept.removeIf([](const QString& name) { return name.endsWith("-wal") || name.endsWith("-shm"); });
+    EXPECT_EQ(kept.size(), restore ? 1 : 0);
+    QFile damaged(restore ? WTAppDelegate::applicationSupportFolder() + '/' + kept.value(0) : path);
+    ASSERT_TRUE(damaged.open(QIODevice::ReadOnly));
+    EXPECT_EQ(damaged.readAll(), garbage);
+  }
+  EXPECT_TRUE(presenter.errors.isEmpty()) << presenter.errors.join('\n').toStdString();
+  // Damage only the check beside the loading finds (a page the loading never reads): nothing is written,
+  // and the refused save names the copy to put back.
+  {
+    std::vector<WTStoreRecord> notes(3000);
+    for (int i = 0; i < 3000; ++i) {
+      notes[i].uuid = QStringLiteral("n%1@WTNote").arg(i);
+      notes[i].entity = QStringLiteral("WTNote");
+    }
+    ASSERT_TRUE(WTStore::open(path).value()->save(notes, {}));
+    // A page of the identity index, which loading does not read.
+    sqlite3* db = nullptr;
+    sqlite3_stmt* statement = nullptr;
+    ASSERT_EQ(sqlite3_open(QFile::encodeName(path).constData(), &db), SQLITE_OK);
+    ASSERT_EQ(
+        sqlite3_prepare_v2(db, "SELECT max(pageno) FROM dbstat WHERE name LIKE 'sqlite_autoindex_records%'",
+                           -1, &statement, nullptr),
+        SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement), SQLITE_ROW);
+    const qint64 page = sqlite3_column_int64(statement, 0);
+    sqlite3_finalize(statement);
+    sqlite3_close(db);
+    QFile file(path);
+    ASSERT_TRUE(page > 1 && file.open(QIODevice::ReadWrite) && file.seek((page - 1) * 4096));
+    ASSERT_EQ(file.write(QByteArray(4096, 0x5a)), 4096);
+  }
+  auto delegate = makeDelegate();
+  WTProject::insertNewObject(delegate->managedObjectContext())->setName("Typed");
+  delegate->saveAction();
+  ASSERT_EQ(presenter.errors.size(), 1);
+  EXPECT_TRUE(presenter.errors[0].contains("damaged") &&
+              presenter.errors[0].contains("/Tessal-2026-01-02.sqlite"))
+      << presenter.errors[0].toStdString();
+}
+
+// The first save of a day leaves the day's copy in the backups, of which the newest 7 stay.
+TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
+  const QString backups = WTAppDelegate::applicationSupportFolder() + "/Backups";
+  ASSERT_TRUE(QDir().mkpath(backups));
+  const QDate today = QDate::currentDate();
+  QStringList older;
+  for (int days = 8; days >= 1; --days)
+    older << today.addDays(-days).toString(u"'Tessal-'yyyy-MM-dd'.sqlite'");
+  for (const QString& name : older + QStringList{"Tessal-2020-01-01-120000.sqlite"}) {
+    QFile file(backups + '/' + name);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+  }
+  auto delegate = makeDelegate();
+  WTObjectContext* context = delegate->managedObjectContext();
+  WTProject::insertNewObject(context)->setName("Saved today");
+  ASSERT_TRUE(delegate->saveChanges());
+  const QString copy = backups + today.toString(u"'/Tessal-'yyyy-MM-dd'.sqlite'");
+  ASSERT_TRUE(QTest::qWaitFor([&] { return QFile::exists(copy); }, 10000));
+  WTProject::insertNewObject(context)->setName("Saved later");
+  ASSERT_TRUE(delegate->saveChanges());  // one copy a day
+  delegate.reset();                      // waits for a copy in progress
+  EXPECT_TRUE(WTStoreBackup::check(copy).ok());
+  EXPECT_EQ(QFileInfo(copy).permissions(),
+            QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
+  WTObjectContext copied;
+  auto store = WTStore::openReadOnly(copy);
+  ASSERT_TRUE(store && copied.attachStore(std::move(store.value())));
+  QStringList names;
+  for (WTProject* project : copied.fetch<WTProject>()) names << project->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Default Project", "Saved today"}));
+  // The two oldest days went; the copy `tessal backup` made stays.
+  QStringList expected = older.mid(2) + QStringList{copy.section('/', -1), "Tessal-2020-01-01-120000.sqlite"};
+  expected.sort();
+  EXPECT_EQ(QDir(backups).entryList(QDir::Files, QDir::Name), expected);
+}
+
 // A save with nothing to save touches no editor; one with changes commits the edit in progress.
 TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenThereIsSomethingToSave) {
   auto delegate = makeDelegate();
@@ -109,7 +226,7 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenT
 }
 
 // The context's sync manager keeps the installation's journal, takes the account, and stops on quitting.
-TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheJournalBesideTheStore) {
+TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheStoresJournal) {
   defaults->setValue("WTSyncUser", "me@example.org");
   defaults->setValue("WTSyncPassword", "secret");
   auto delegate = makeDelegate();
@@ -118,7 +235,6 @@ TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheJournalBesideTheSt
   RZSyncManager* sync = delegate->syncManager();
   ASSERT_NE(sync, nullptr);
   EXPECT_TRUE(sync->managedObjectContext() == context && sync->syncEnabled());
-  EXPECT_EQ(sync->trackFilePath(), delegate->syncJournalPath());
   EXPECT_EQ(sync->syncNetwork()->user() + " " + sync->syncNetwork()->password(), "me@example.org secret");
   delegate->applicationWillTerminate();
   EXPECT_FALSE(sync->syncEnabled());

@@ -82,6 +82,7 @@ TEST_F(BashCompletion, OffersCommandsOptionsValuesAndQuotedNames) {
       {{"add", "--"}, {"--client", "--create", "--date", "--note", "--project"}},
       {{"add", "--date", "y"}, {"yesterday"}},
       {{"i"}, {"import"}},
+      {{"re"}, {"report", "restore"}},
       {{"import", "--format", "t"}, {"tessal", "timewarrior", "toggl"}},
       {{"import", "a.csv", "--"}, {"--dry-run", "--format", "--stop-running", "--tags", "--tz"}},
       {{"add", "Design", "0:45", "--c"}, {"--client", "--create"}},

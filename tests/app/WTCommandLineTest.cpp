@@ -40,9 +40,7 @@ TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
                          here.file("bad3.json", ""),
                          here.path("none.json"),
                          here.path("missing.txt"),
-                         here.file("latin1.txt",
-                                   "Gr\xfc\xdf"
-                                   "e"),
+                         here.file("latin1.txt", "Gr\xfc\xdf\x65"),
                          here.path("")};
   // 2 for what the user typed wrong, 1 when the template gave no result (a folder is no text).
   const QString t = "template";

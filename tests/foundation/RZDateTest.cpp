@@ -86,24 +86,8 @@ class RZDateInZone : public RZDateTest, public ::testing::WithParamInterface<con
   }
 };
 
-TEST_P(RZDateInZone, TakingFieldsFromAnotherDateAndFromComponents) {
-  const Date receiver = at({2024, 5, 14, 14, 30, 15, 250}), other = at({2023, 11, 3, 8, 45, 50});
-  EXPECT_EQ(RZDate::dateByTakingDateUnitsFrom(receiver, at({2024, 5, 2, 8})), at({2024, 5, 2, 14, 30, 15}));
-  // clang-format off
-  const std::pair<unsigned, Wall> cases[] = {
-      {RZDate::DayUnits, {2023, 11, 3, 14, 30, 15}}, {RZDate::TimeUnits, {2024, 5, 14, 8, 45, 50}},
-      {RZDate::MinuteUnits, {2023, 11, 3, 8, 45, 15}}, {RZDate::AllFields, {2023, 11, 3, 8, 45, 50}},
-      {RZDate::Year, {2023, 5, 14, 14, 30, 15}}, {RZDate::Month, {2024, 11, 14, 14, 30, 15}},
-      {RZDate::Minute | RZDate::Second, {2024, 5, 14, 14, 45, 50}}, {0, {2024, 5, 14, 14, 30, 15}},
-      {RZDate::Weekday, {2024, 5, 14, 14, 30, 15}}, {RZDate::WeekUnits, {2023, 11, 3, 14, 30, 15}}};
-  // clang-format on
-  for (const auto& [flags, expected] : cases)
-    EXPECT_EQ(RZDate::dateByTakingComponents(receiver, flags, other), at(expected)) << "flags " << flags;
-  // Fields taken from two dates may name a day that does not exist; the calendar rolls it over.
-  EXPECT_EQ(
-      RZDate::dateByTakingComponents(at({2024, 1, 31, 10}), RZDate::Year | RZDate::Month, at({2023, 2, 10})),
-      at({2023, 3, 3, 10}));
-
+// Fields that name no day roll over in the lenient calendar.
+TEST_P(RZDateInZone, FieldsToAndFromComponents) {
   RZDate::DateComponents c;
   c.minute = 7;
   RZDate::assignFlags(at({2024, 5, 14, 14, 30, 15}), RZDate::Year | RZDate::Hour | RZDate::Weekday, c);
@@ -141,13 +125,12 @@ TEST_P(RZDateInZone, DaysAndRangesAgreeWithTheZone) {
           {RZDate::nextWeek, start(day, 7)}, {RZDate::lastWeek, start(day, -7)}, {RZDate::beginOfWeek, start(week)},
           {RZDate::beginOfNextMonth, start(month.addMonths(1))}, {RZDate::beginOfLastMonth, start(month.addMonths(-1))},
           {RZDate::beginOfYear, start(year)}, {RZDate::beginOfNextYear, start(year.addYears(1))},
-          {RZDate::beginOfLastYear, start(year.addYears(-1))}, {RZDate::nextMonth, months(1)},
-          {RZDate::nextYear, months(12)},
+          {RZDate::beginOfLastYear, start(year.addYears(-1))},
           {RZDate::beginOfMinute, Date::fromSeconds(std::floor(t.secondsSince1970() / 60) * 60)}};
       // clang-format on
       for (std::size_t i = 0; i < std::size(days); ++i)
         ASSERT_EQ(days[i].first(t), days[i].second) << at << " #" << i;
-      for (int n : {-17, -1, 0, 25}) ASSERT_EQ(RZDate::addMonth(t, n), months(n)) << at << " " << n;
+      for (int n : {-17, -1, 0, 1, 12, 25}) ASSERT_EQ(RZDate::addMonth(t, n), months(n)) << at << " " << n;
       fixClock(t);
       // clang-format off
       const std::pair<RZDate::Range (*)(), RZDate::Range> ranges[] = {
@@ -159,13 +142,6 @@ TEST_P(RZDateInZone, DaysAndRangesAgreeWithTheZone) {
           {RZDate::rangeForLastYear, {start(year.addYears(-1)), start(year)}}};
       // clang-format on
       for (const auto& [range, expected] : ranges) ASSERT_EQ(range(), expected) << at;
-      const Date lastOfYesterday = start(day).addingSeconds(-0.5), tomorrow = start(day, 1);
-      ASSERT_TRUE(RZDate::isEarlierThen(lastOfYesterday, t) && RZDate::isEarlierThen(t, tomorrow)) << at;
-      ASSERT_FALSE(RZDate::isEarlierThen(start(day), t) || RZDate::isEarlierThen(t, start(day))) << at;
-      ASSERT_TRUE(RZDate::isEarlierThenToday(lastOfYesterday) && RZDate::isLaterThenToday(tomorrow)) << at;
-      ASSERT_FALSE(RZDate::isEarlierThenToday(start(day)) ||
-                   RZDate::isLaterThenToday(tomorrow.addingSeconds(-0.5)))
-          << at;
     }
   };
   check(instants);
@@ -267,22 +243,6 @@ TEST_F(RZDateTest, RepeatedMidnightIsTheLaterOne) {
       {utc(2024, 11, 2, 16), utc(2024, 11, 2, 4)},    {utc(2024, 11, 3, 4, 15), utc(2024, 11, 3, 5)}};
   for (const auto& [at, midnight] : walk) EXPECT_EQ(RZDate::midnight(at), midnight) << at.secondsSince1970();
   EXPECT_EQ(RZDate::tomorrow(utc(2024, 11, 2, 16)), utc(2024, 11, 3, 5));
-  EXPECT_TRUE(RZDate::isEarlierThen(utc(2024, 11, 3, 3, 59, 59), utc(2024, 11, 3, 4, 30)));
-}
-
-// Receivers are 02:30 / 01:45 wall time on an ordinary day; the argument names the day of a change.
-TEST_F(RZDateTest, FieldsTakenOntoADayWithAChange) {
-  const std::tuple<const char*, Date, Date, Date> cases[] = {
-      {"Europe/Berlin", utc(2024, 5, 14, 0, 30), utc(2024, 3, 31, 12), utc(2024, 3, 31, 1, 30)},
-      {"Europe/Berlin", utc(2024, 5, 14, 0, 30), utc(2024, 10, 27, 12), utc(2024, 10, 27, 1, 30)},
-      {"America/New_York", utc(2024, 5, 14, 6, 30), utc(2024, 3, 10, 18), utc(2024, 3, 10, 7, 30)},
-      {"Australia/Lord_Howe", utc(2024, 5, 13, 15, 45), utc(2024, 10, 6, 2), utc(2024, 10, 5, 15, 45)},
-      {"Australia/Lord_Howe", utc(2024, 5, 13, 15, 15), utc(2024, 4, 7, 2), utc(2024, 4, 6, 15, 15)},
-  };
-  for (const auto& [zone, receiver, dayFrom, expected] : cases) {
-    setZone(zone);
-    EXPECT_EQ(RZDate::dateByTakingDateUnitsFrom(receiver, dayFrom), expected) << zone;
-  }
 }
 
 // A change of zone drops cached days; an unknown zone changes nothing; weeks start on Sunday in any locale.
@@ -326,24 +286,6 @@ TEST_F(RZDateTest, ShortFormatsFollowLocaleAndZone) {
   }
   setLocale("en_US");  // a change of locale alone is seen too
   EXPECT_EQ(RZDate::shortFormat(afternoon), "5/14/24");
-}
-
-// The converted dates lie in the other season on purpose: the present offset applies to both.
-TEST_F(RZDateTest, GMTShiftsUseTheOffsetOfNow) {
-  const Date summer = utc(2024, 7, 1, 12), winter = utc(2024, 1, 15, 12);
-  const std::tuple<const char*, Date, double> cases[] = {
-      {"Europe/Berlin", winter, 3600},        {"Europe/Berlin", summer, 7200},
-      {"America/New_York", winter, -18000},   {"America/New_York", summer, -14400},
-      {"Australia/Lord_Howe", winter, 39600}, {"Australia/Lord_Howe", summer, 37800},
-  };
-  for (const auto& [zone, now, offset] : cases) {
-    setZone(zone);
-    fixClock(now);
-    for (Date d : {summer, winter}) {
-      EXPECT_EQ(RZDate::GMTFromLocalDate(d), d.addingSeconds(-offset)) << zone;
-      EXPECT_EQ(RZDate::localDateFromGMT(d), d.addingSeconds(offset)) << zone;
-    }
-  }
 }
 
 // The system clock reads with fractions of a second (a few readings, in case one falls on a whole second).

@@ -53,69 +53,41 @@ TEST_P(ImportSampleTest, ReadsEveryAwkwardCase) {
 
 // Zones change in the samples: Berlin's clocks went forward on 2024-03-31 and back on 2024-10-27, New
 // York's forward on 2024-03-10.
+// clang-format off
 INSTANTIATE_TEST_SUITE_P(
     Formats, ImportSampleTest,
     testing::Values(
-        Sample{
-            "toggl.csv",
-            "",
-            "Europe/Berlin",
-            {},
-            "toggl",
-            {"2 Acme/Website/Design|Header, \"hero\" image|2024-03-30T22:30:00Z|180|50.00 EUR|billable|web;"
-             "design|",
-             "3 Acme/Website/|Call\nwith client|2024-03-11T08:00:00Z|45|- EUR|not billable||",
-             "5 /Internal/|Running thing|2024-03-12T09:00:00Z|running to 2024-03-12T09:30:00Z|- "
-             "EUR|billable||"},
-            {"6: the entry ends (2024-03-31 11:00) before it starts (2024-03-31 12:00)"}},
-        Sample{"toggl-import.csv",
-               "toggl",
-               "Europe/Berlin",
-               {},
-               "toggl",
+        Sample{"toggl.csv", "", "Europe/Berlin", {}, "toggl",
+               {"2 Acme/Website/Design|Header, \"hero\" image|2024-03-30T22:30:00Z|180|50.00 EUR|billable|web;"
+                "design|",
+                "3 Acme/Website/|Call\nwith client|2024-03-11T08:00:00Z|45|- EUR|not billable||",
+                "5 /Internal/|Running thing|2024-03-12T09:00:00Z|running to 2024-03-12T09:30:00Z|- "
+                "EUR|billable||"},
+               {"6: the entry ends (2024-03-31 11:00) before it starts (2024-03-31 12:00)"}},
+        Sample{"toggl-import.csv", "toggl", "Europe/Berlin", {}, "toggl",
                {"2 Acme/Website/Design|Imported plan|2024-03-30T22:30:00Z|75|- |billable||"},
                {}},
-        Sample{"clockify.csv",
-               "",
-               "America/New_York",
-               {},
-               "clockify",
+        Sample{"clockify.csv", "", "America/New_York", {}, "clockify",
                {"2 Globex/Mobile App/|Night shift|2024-03-10T06:30:00Z|60|80.50 USD|billable||",
                 "3 Globex/Mobile App/Code|Review|2024-03-12T03:45:00Z|30|1080.00 USD|not billable|x;y|",
                 "4 Globex/Mobile App/Code|Lunch|2024-03-13T16:00:00Z|60|- USD|billable||"},
                {"5: the date “31/02/2024” cannot be read"}},
-        Sample{"timewarrior.json",
-               "",
-               "UTC",
-               {},
-               "timewarrior",
+        Sample{"timewarrior.json", "", "UTC", {}, "timewarrior",
                {"2 /Website/|design, logo, print|2023-10-01T10:30:00Z|90|- |billable||first \"draft\"",
                 "3 //||2023-10-29T00:30:00Z|60|- |billable||",
                 "4 /Internal/||2023-10-30T08:00:00Z|running to 2024-11-01T12:00:00Z|- |billable||"},
                {"5: the entry ends (2023-10-31 07:00) before it starts (2023-10-31 08:00)"}},
-        Sample{"timewarrior.json",
-               "timewarrior",
-               "UTC",
-               {"client", "project"},
-               "timewarrior",
+        Sample{"timewarrior.json", "timewarrior", "UTC", {"client", "project"}, "timewarrior",
                {"2 Website/design, logo/|print|2023-10-01T10:30:00Z|90|- |billable||first \"draft\"",
                 "3 //||2023-10-29T00:30:00Z|60|- |billable||",
                 "4 Internal//||2023-10-30T08:00:00Z|running to 2024-11-01T12:00:00Z|- |billable||"},
                {"5: the entry ends (2023-10-31 07:00) before it starts (2023-10-31 08:00)"}},
-        Sample{"kimai.csv",
-               "",
-               "Europe/Berlin",
-               {},
-               "kimai",
+        Sample{"kimai.csv", "", "Europe/Berlin", {}, "kimai",
                {"2 Initech/TPS/Reports|cover; sheet|2024-10-26T23:30:00Z|180|60.00 EUR|billable||",
                 "3 Initech/TPS/|Standup|2024-10-28T08:00:00Z|60|60.00 EUR|not billable|meeting|"},
                {"4: the entry ends (2024-10-28 10:00) before it starts (2024-10-28 11:00)",
                 "5: the start time “nine” cannot be read"}},
-        Sample{"tessal.csv",
-               "",
-               "Europe/Berlin",
-               {},
-               "tessal",
+        Sample{"tessal.csv", "", "Europe/Berlin", {}, "tessal",
                {"2 Acme/Website/Design|Late, late|2024-03-30T22:30:00Z|90|50.00 EUR|billable||two\nlines",
                 "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||"},
                {"4: only time entries are imported, not a flat fee"}}),
@@ -125,6 +97,7 @@ INSTANTIATE_TEST_SUITE_P(
         if (!isalnum(uchar(c))) c = '_';
       return name;
     });
+// clang-format on
 
 struct Refusal {
   const char* name;

@@ -34,11 +34,8 @@ class ImportPlanTest : public ModelTest {
 };
 
 TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdits) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName(QStringLiteral("ACME"));
-  auto* project = WTProject::insertNewObject(context.get());
-  project->setName(QStringLiteral("website"));
-  project->setClient(client);
+  auto* client = makeClient(QStringLiteral("ACME"));
+  auto* project = makeProject(QStringLiteral("website"), client);
   makeTask(project, QStringLiteral("design"));
   saveAndReopen();
 
@@ -95,13 +92,9 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
 // Tessal's spreadsheet of a store, imported into an empty store, gives the same entries: names and notes
 // with commas, quotes and line breaks, a project without client, an entry past midnight.
 TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName(QStringLiteral("ACME, \"West\""));
-  auto* site = WTProject::insertNewObject(context.get());
-  site->setName(QStringLiteral("Site; new"));
-  site->setClient(client);
-  auto* lone = WTProject::insertNewObject(context.get());
-  lone->setName(QStringLiteral("Internal"));
+  auto* client = makeClient(QStringLiteral("ACME, \"West\""));
+  auto* site = makeProject(QStringLiteral("Site; new"), client);
+  auto* lone = makeProject(QStringLiteral("Internal"));
   const QTimeZone zone("Europe/Berlin");
   const struct {
     WTTask* task;
@@ -114,7 +107,7 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
        QDateTime(QDate(2024, 3, 9), QTime(9, 0), zone), 90},
       {site->tasks().first(), "Call\nwith client", "line one\nline, two",
        QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 45},
-      {makeTask(lone, QStringLiteral("admin")), "Invoices", "",
+      {makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234",
        QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
   };
   for (const auto& entry : entries) {
@@ -157,8 +150,7 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
 // Each rate lands on the highest level across which the file keeps it, and nowhere it would be inherited
 // anyway; a client that was there keeps its own rate.
 TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
-  auto* five = WTClient::insertNewObject(context.get());
-  five->setName(QStringLiteral("Five"));
+  auto* five = makeClient(QStringLiteral("Five"));
   five->setRate(Decimal(50));
   QByteArray content =
       "client,project,task,kind,name,date,start,end,duration,billed duration,rate,amount,currency,notes\n"

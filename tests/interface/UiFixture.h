@@ -123,14 +123,6 @@ class UiTest : public ModelTest {
   static Date at(int year, int month, int day, int hour = 12, int minute = 0) {
     return berlin(year, month, day, hour, minute);
   }
-  template <class T>
-  T* named(const QString& name) {
-    auto* object = T::insertNewObject(context.get());
-    object->setName(name);
-    return object;
-  }
-  WTProject* makeProject(const QString& name) { return named<WTProject>(name); }
-  WTClient* makeClient(const QString& name) { return named<WTClient>(name); }
   using ModelTest::makeItem;
   // A named item; a time entry lasts half an hour.
   template <class T>

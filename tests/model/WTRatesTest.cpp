@@ -40,11 +40,9 @@ TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
 
 // Costs in full precision (an item's own rate never counts); a report's totals memo lives no longer than it.
 TEST_F(WTRatesTest, ItemCostsAndSumsUpToClients) {
-  auto* client = WTClient::insertNewObject(context.get());
-  auto* projectA = WTProject::insertNewObject(context.get());
-  auto* projectB = WTProject::insertNewObject(context.get());
-  projectA->setClient(client);
-  projectB->setClient(client);
+  auto* client = makeClient({});
+  auto* projectA = makeProject({}, client);
+  auto* projectB = makeProject({}, client);
   projectB->setRate(dec("75"));
   client->setRate(dec("120"));
   WTTask* a1 = makeTask(projectA);
@@ -109,9 +107,8 @@ TEST_F(WTRatesTest, RoundingRulesBillEachTimeEntryAndAreInheritedLikeRates) {
   setNow(berlin(2026, 3, 2, 12, 7));
   for (const auto& [preferences, clientRule, projectRule, taskRule, billed] : rows) {
     SCOPED_TRACE(std::string(preferences) + " / " + clientRule + " / " + projectRule + " / " + taskRule);
-    auto* client = WTClient::insertNewObject(context.get());
-    auto* project = WTProject::insertNewObject(context.get());
-    project->setClient(client);
+    auto* client = makeClient({});
+    auto* project = makeProject({}, client);
     WTTask* task = makeTask(project);
     const Date start = berlin(2026, 3, 2, 9);
     QList<WTItem*> items;
@@ -176,10 +173,8 @@ TEST_F(WTRatesTest, BilledCostsRoundEachItemOnceAndAddUpAtEveryLevel) {
   client->setRate(dec("100"));
   client->setRoundingMinutes(15);
   client->setRoundingMode("up");
-  auto* projectA = WTProject::insertNewObject(context.get());
-  auto* projectB = WTProject::insertNewObject(context.get());
-  projectA->setClient(client);
-  projectB->setClient(client);
+  auto* projectA = makeProject({}, client);
+  auto* projectB = makeProject({}, client);
   projectB->setRate(dec("70"));
   projectB->setRoundingMinutes(1);
   WTTask* a = makeTask(projectA);

@@ -1,8 +1,10 @@
 #include "WTStore.h"
+#include "WTStoreBackup.h"
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
+#include <QDir>
 #include <QFile>
 #include <QFileInfo>
 #include <QTemporaryDir>
@@ -266,7 +268,7 @@ TEST_F(WTStoreTest, NewMissingAndEmptyFiles) {
   ASSERT_TRUE(open());
   for (const char* suffix : {"-wal", "-shm"})  // closing folds the log back into the file
     EXPECT_FALSE(QFileInfo::exists(path() + QLatin1StringView(suffix))) << suffix;
-  EXPECT_EQ(shape(path()), QStringList({"5", "wal", "0", "3"}));
+  EXPECT_EQ(shape(path()), QStringList({"6", "wal", "0", "3"}));
   const QString folder = dir.filePath(QStringLiteral("Tessal2"));
   auto inMissingFolder = WTStore::open(folder + QStringLiteral("/Tessal.sqlite"));
   ASSERT_FALSE(inMissingFolder.ok());
@@ -337,12 +339,22 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     auto writer = open();
     ASSERT_TRUE(writer);
     expectSameRecords(loadAll(*writer), expected);
+    // The file as the older version left it stays in the backups, one file of its own, the owner's alone.
+    const QStringList copies =
+        QDir(dir.filePath("Backups")).entryList({QStringLiteral("*-version-%1.sqlite").arg(version)});
+    ASSERT_EQ(copies.size(), 1);
+    const QString copy = dir.filePath("Backups/" + copies[0]);
+    EXPECT_TRUE(WTStoreBackup::check(copy).ok());
+    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "2", version == 1 ? "0" : "3"}));
+    EXPECT_EQ(int(QFileInfo(dir.filePath("Backups")).permissions() & 0x0777), 0x0700);
+    EXPECT_EQ(QFileInfo(copy).permissions(),
+              QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
     WTStoreRecord added = record("N@WTClient", "WTClient");
     added.currency = "JPY";
     added.roundingMinutes = 6;
     ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
     expected[added.uuid] = added;
-    EXPECT_EQ(shape(path()), QStringList({"5", "wal", "3", "3"}));
+    EXPECT_EQ(shape(path()), QStringList({"6", "wal", "3", "3"}));
 
     auto reader = WTStore::openReadOnly(path());
     ASSERT_TRUE(reader) << reader.error().message.toStdString();
@@ -544,7 +556,8 @@ TEST_F(WTStoreTest, AFailedFirstOpenOrSaveLeavesNothingBehindAndTheStoreUsable) 
   }
 }
 
-// Save k adds its items, deletes the extra item of save k - 1, adds its own and sets the counter to k.
+// Save k adds its items, deletes the extra item of save k - 1, adds its own and sets the counter to k; its
+// journal rows (written in the same transaction) name save k for each record and the deletion.
 constexpr int kRecordsPerSave = 10;
 const QString kCounter = QStringLiteral("counter@WTTask");
 
@@ -583,7 +596,18 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
       auto store = WTStore::open(path());
       if (!store) _exit(2);
       for (int save = committed + 1;; ++save) {
-        if (!store.value()->save(recordsOfSave(save), {itemUuid(save - 1, kRecordsPerSave)})) _exit(3);
+        const std::vector<WTStoreRecord> records = recordsOfSave(save);
+        const QString gone = itemUuid(save - 1, kRecordsPerSave);
+        auto next = records.begin();
+        const auto journal = [&](WTStore::JournalWriter& rows) -> Result<void> {
+          for (const WTStoreRecord& record : records)
+            if (Result<void> written = rows.setEntry(record.uuid, 'u', QByteArray::number(save)); !written)
+              return written;
+          return rows.setDeletion(gone, save);
+        };
+        if (!store.value()->saveFrom([&] { return next == records.end() ? nullptr : &*next++; }, {gone},
+                                     journal))
+          _exit(3);
         if (write(fds[1], &save, sizeof save) != sizeof save) _exit(4);
       }
     }
@@ -598,7 +622,17 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     close(fds[0]);
 
     Records records;
-    if (auto store = open()) records = loadAll(*store);
+    std::map<QString, QByteArray> entries;
+    std::vector<std::pair<QString, qint64>> deletions;
+    if (auto store = open()) {
+      records = loadAll(*store);
+      ASSERT_TRUE(
+          store
+              ->readJournal(
+                  [&](const QString& uuid, char, const QByteArray& changes) { entries[uuid] = changes; },
+                  [&](const QString& uuid, qint64 order) { deletions.emplace_back(uuid, order); }, nullptr)
+              .ok());
+    }
     ASSERT_EQ(RawDatabase(path()).text("PRAGMA integrity_check"), "ok");
     ASSERT_TRUE(records.contains(kCounter));
     const int last = records.at(kCounter).position;
@@ -609,6 +643,13 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
       for (int i = 0; i < kRecordsPerSave; ++i)
         ASSERT_TRUE(records.contains(itemUuid(k, i))) << k << "/" << i;
     ASSERT_TRUE(records.contains(itemUuid(last, kRecordsPerSave)));
+    // Every save found is journaled, and none that is not.
+    ASSERT_EQ(entries.size(), last == 0 ? 0 : std::size_t(last) * (kRecordsPerSave + 1) + 1);
+    ASSERT_EQ(deletions.size(), std::size_t(last));
+    if (last > 0) {
+      ASSERT_EQ(entries[kCounter], QByteArray::number(last));
+      ASSERT_EQ(deletions.back(), std::pair(itemUuid(last - 1, kRecordsPerSave), qint64(last)));
+    }
     committed = last;
   }
   EXPECT_GT(committed, kRounds);  // the saver got through many saves, not just its open

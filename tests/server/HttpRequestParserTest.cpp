@@ -62,4 +62,33 @@ TEST(HttpRequestParserTest, BytesGiveTheSameRequestOrRefusalHoweverTheyArrive) {
   EXPECT_EQ(rows, 33);
 }
 
+// Bodies draw on a budget shared by every connection as their bytes arrive (a claimed length costs
+// nothing), past it a request is refused 503, and an answered request leaves no buffer behind.
+TEST(HttpRequestParserTest, BodiesDrawOnOneBudgetAndKeepNothingAfterwards) {
+  tessal::server::ByteBudget budget(1 << 20);
+  HttpRequestParser::Limits limits;
+  limits.bodies = &budget;
+  HttpRequestParser first(limits), second(limits);
+  const std::string head = "POST /s HTTP/1.1\r\nContent-Length: 700000\r\n\r\n";
+  // Body bytes in pieces as a socket gives them, then `after`; the last outcome.
+  auto feed = [](HttpRequestParser& parser, size_t bytes, const std::string& after = {}) {
+    HttpRequestParser::Outcome outcome;
+    for (size_t at = 0; at < bytes && outcome.kind == Kind::NeedMore; at += 16384)
+      outcome = parser.feed(std::string(std::min<size_t>(16384, bytes - at), 'x'));
+    return outcome.kind == Kind::NeedMore && !after.empty() ? parser.feed(after) : std::move(outcome);
+  };
+  EXPECT_EQ(first.feed(head).kind, Kind::NeedMore);
+  EXPECT_EQ(second.feed(head).kind, Kind::NeedMore);
+  EXPECT_EQ(budget.used(), 0u);
+  EXPECT_EQ(feed(first, 600000).kind, Kind::NeedMore);
+  EXPECT_EQ(describe(feed(second, 600000)), "503");
+  HttpRequestParser::Outcome done = feed(first, 100000, "GET /next HTTP/1.1\r\n");
+  ASSERT_EQ(done.kind, Kind::Request);
+  EXPECT_EQ(done.request.body.size(), 700000u);
+  EXPECT_EQ(budget.used(), done.body.bytes());
+  EXPECT_LT(first.heldBytes(), 8192u) << "only the next request's first bytes are kept";
+  done = {};
+  EXPECT_EQ(budget.used(), 0u);
+}
+
 }  // namespace

@@ -91,6 +91,9 @@ TEST_P(ServerCommandLineTest, AddUserServeWithFewDescriptorsStopAndRefusals) {
     EXPECT_EQ(result.exitCode, exitCode) << arguments.join(' ').toStdString();
     EXPECT_TRUE(exitCode != 2 || result.err.find("usage") != std::string::npos) << result.err;
   }
+  const Outcome help = run({"--help"});
+  EXPECT_EQ(help.exitCode, 0);
+  EXPECT_NE(help.out.find("--connections-per-address N"), std::string::npos) << help.out;
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, ServerCommandLineTest,

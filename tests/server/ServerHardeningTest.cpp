@@ -1,9 +1,14 @@
 // The server as strangers meet it over real sockets: floods, slow requests, guessing, foreign sign-ups.
 #include "ServerTestSupport.h"
 
+#include <poll.h>
+#include <sys/socket.h>
+
 #include <atomic>
 #include <chrono>
 #include <functional>
+#include <map>
+#include <sstream>
 #include <thread>
 #include <vector>
 
@@ -56,10 +61,13 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   ownerPollsThrough(
       82,
       [&](int t, const std::atomic<bool>& done) {
-        for (int n = 0; t >= 70 && !done; ++n) {  // a new address each time, so no lock spares a verification
+        // From a new address each time, so no lock spares a verification.
+        for (int n = 0; t >= 70 && !done; ++n) {
           const std::string stranger =
               "stranger-" + std::to_string(t) + "-" + std::to_string(n) + "@example.com";
-          const Reply reply = post(port(), kSyncPath, requestBody(stranger, "guess", "head", 0));
+          const Reply reply =
+              post(port(), kSyncPath, requestBody(stranger, "guess", "head", 0), "application/json",
+                   "10." + std::to_string(t) + "." + std::to_string(n % 250) + ".1");
           busy += reply.status == 503 && reply.retryAfter == "1";
           unanswered += reply.status == 0;
         }
@@ -76,7 +84,116 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   EXPECT_EQ(unanswered, 0);
 }
 
-// Guesses are slowed down, never locking out the owner's devices; sign-ups from strangers are refused.
+// Bodies being read draw on one budget, as their bytes arrive: past it a request is answered 503 at
+// once, and what a request held goes back when its connection closes.
+TEST_P(ServerHardeningTest, BodiesInFlightShareOneBudget) {
+  options.maxBodyBytes = 96 << 10;
+  options.limits.maxBodyMemory = 128 << 10;
+  startServer();
+  const std::string user = newUser("owner");
+  const std::string padding(80 << 10, ' '),
+      body = requestBody(user, "password-of-" + user, "head", 0, "laptop");
+  const std::string sized = requestHead(
+      "Connection: close\r\nContent-Length: " + std::to_string(padding.size() + body.size()) + "\r\n");
+  auto chunk = [](const std::string& bytes) {
+    return (std::stringstream() << std::hex << bytes.size()).str() + "\r\n" + bytes + "\r\n";
+  };
+  auto holder = std::make_unique<RawConnection>(port());
+  ASSERT_TRUE(holder->send(sized + padding));  // and never the rest
+  std::this_thread::sleep_for(300ms);          // read by the server
+  const struct {
+    bool holderGone;
+    std::string request;
+    int status;
+  } rows[] = {
+      {false, sized + padding + body, 503},
+      {false,
+       requestHead("Connection: close\r\nTransfer-Encoding: chunked\r\n") + chunk(padding) + chunk(body) +
+           "0\r\n\r\n",
+       503},
+      {true, sized + padding + body, 200},
+  };
+  for (const auto& row : rows) {
+    if (row.holderGone) {
+      holder.reset();
+      std::this_thread::sleep_for(200ms);  // the server has seen it close
+    }
+    RawConnection connection(port());
+    connection.send(row.request);
+    const std::string reply = connection.readAll();
+    EXPECT_EQ(RawConnection::status(reply), row.status) << reply.substr(0, 300);
+    EXPECT_EQ(row.status == 503, reply.find("Retry-After: ") != std::string::npos) << reply.substr(0, 300);
+  }
+}
+
+// A reply waits for its reader without holding a worker, within one budget for every waiting reply;
+// a reader that does not take its reply in time is dropped, and the budget comes back.
+TEST_P(ServerHardeningTest, RepliesWaitingForTheirReadersShareOneBudget) {
+  options.threads = 2;
+  options.limits.maxReplyMemory = 24 << 20;
+  options.limits.writeTimeout = 1500ms;
+  startServer();
+  const std::string user = newUser("owner");
+  const std::string note = R"({"i":{"big@WTNote":{"text":")" + std::string(8 << 20, 'n') + R"("}}})";
+  ASSERT_EQ(sync(user, "save", 0, "laptop", note).integer("iteration"), 1);
+  const std::string body = requestBody(user, "password-of-" + user, "head", 0, "reader");
+  const std::string ask =
+      requestHead("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+  // Two readers that do not read: the first reply (about 16 MiB) waits, the second does not fit.
+  RawConnection first(port()), second(port());
+  ASSERT_TRUE(first.send(ask) && second.send(ask));
+  std::map<int, RawConnection*> byStatus;
+  for (RawConnection* reader : {&first, &second}) {
+    pollfd readable{reader->fd(), POLLIN, 0};
+    ASSERT_EQ(poll(&readable, 1, 20000), 1);
+    char start[13] = {};
+    ASSERT_EQ(recv(reader->fd(), start, 12, MSG_PEEK | MSG_WAITALL), 12);
+    byStatus[RawConnection::status(start)] = reader;
+  }
+  ASSERT_EQ(byStatus.size(), 2u);
+  ASSERT_TRUE(byStatus.count(200) && byStatus.count(503));
+  EXPECT_NE(byStatus[503]->readAll().find("Retry-After: 1"), std::string::npos);
+  EXPECT_EQ(sync(user, "head", 1, "laptop").status, 200) << "a poll is answered meanwhile";
+  std::this_thread::sleep_for(2500ms);  // past the write deadline
+  const size_t dropped = byStatus[200]->readAll().size();
+  RawConnection reading(port());
+  ASSERT_TRUE(reading.send(ask));
+  const std::string whole = reading.readAll();
+  EXPECT_EQ(RawConnection::status(whole), 200);
+  EXPECT_GT(whole.size(), 16u << 20);
+  EXPECT_LT(dropped, whole.size()) << "the reader that did not read was dropped";
+}
+
+// One address holds a few connections at most; the next one is answered 503 at once, and every other
+// address is served.
+TEST_P(ServerHardeningTest, ConnectionsAreCappedPerAddress) {
+  options.limits.maxConnectionsPerAddress = 3;
+  startServer();
+  const std::string user = newUser("owner");
+  const std::string body = requestBody(user, "password-of-" + user, "head", 0, "laptop");
+  const std::string ask =
+      requestHead("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+  std::vector<std::unique_ptr<RawConnection>> held;
+  for (int i = 0; i < 3; ++i) held.push_back(std::make_unique<RawConnection>(port()));
+  std::this_thread::sleep_for(200ms);  // accepted
+  const struct {
+    const char* from;
+    size_t stillHeld;
+    int status;
+  } rows[] = {{"127.0.0.1", 3, 503}, {"127.0.0.2", 3, 200}, {"127.0.0.1", 2, 200}};
+  for (const auto& row : rows) {
+    held.resize(row.stillHeld);
+    std::this_thread::sleep_for(200ms);  // the closed one is gone
+    RawConnection connection(port(), row.from);
+    ASSERT_TRUE(connection.connected());
+    connection.send(ask);
+    const std::string reply = connection.readAll();
+    EXPECT_EQ(RawConnection::status(reply), row.status) << row.from << ": " << reply.substr(0, 300);
+  }
+}
+
+// Guesses slow down the address they come from, never the owner's devices: those that proved the
+// password pass, also on another server over the same storage; sign-ups from strangers are refused.
 TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   std::atomic<int64_t> offset{0};
   options.authentication.now = [&] {
@@ -87,8 +204,10 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   options.authentication.longestLock = 10min;
   startServer();
   const std::string user = newUser("owner");
+  // The owner's laptop, or a stranger's guesses (no device) from the same address.
   auto attempt = [&](const std::string& secret) {
-    return post(port(), kSyncPath, requestBody(user, secret, "head", 0, "laptop"));
+    const bool owner = secret == "password-of-" + user;
+    return post(port(), kSyncPath, requestBody(user, secret, "head", 0, owner ? "laptop" : ""));
   };
   ASSERT_EQ(attempt("password-of-" + user).status, 200);
   // A wrong password is code 2; while locked a guess is not even tried (429, to retry); the lock doubles.
@@ -107,8 +226,35 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   }
   EXPECT_EQ(attempt("one-more-guess").status, 429);
 
+  // Another server over the same storage (a replica, or this one restarted) knows nothing of the
+  // above but the laptop's proof; it remembers no success, so every row is verified.
+  SyncServer::Options fresh = options;
+  fresh.authentication.successLifetime = 0ms;
+  std::string error;
+  const std::unique_ptr<SyncServer> replica = SyncServer::create(storage_->location(), fresh, error);
+  ASSERT_TRUE(replica && replica->start(error)) << error;
+  const struct {
+    const char *secret, *device, *from;  // from: X-Forwarded-For, as a proxy on loopback names a client
+    int outcome;                         // a status, or 2 for the error code
+  } replicaRows[] = {
+      {"guess", "", "", 2},
+      {"guess", "", "", 429},
+      {"password-of-", "laptop", "", 200},  // proven: past the lock on its address
+      {"password-of-", "phone", "", 429},   // new, at the guesser's address
+      {"password-of-", "phone", "198.51.100.7", 200},
+      {"password-of-", "phone", "", 200},  // proven now
+  };
+  for (const auto& row : replicaRows) {
+    const std::string secret = *row.secret == 'p' ? row.secret + user : row.secret;
+    const Reply reply = post(replica->port(), kSyncPath, requestBody(user, secret, "head", 0, row.device),
+                             "application/json", row.from);
+    EXPECT_EQ(row.outcome == 2 ? reply.code() : reply.status, row.outcome)
+        << row.secret << " " << row.device << " " << row.from << ": " << reply.body;
+  }
+
   // Sign-ups from other sites, with the fields in the query or too often are refused, saying what is wrong.
   const std::string sameSite = "Origin: http://127.0.0.1:" + std::to_string(port()) + "\r\n";
+  int checks = 0;
   // The reply to a sign-up, and whether the account exists afterwards.
   auto signUp = [&](const std::string& name, const std::string& password, const std::string& headers,
                     const std::string& query = {}) {
@@ -120,8 +266,10 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
                     "\r\nContent-Type: application/x-www-form-urlencoded\r\nConnection: close\r\n" + headers +
                     "Content-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body);
     const std::string reply = connection.readAll();
+    // From an address of its own: the guesses above slowed down this one.
     const Reply head =
-        post(port(), kSyncPath, requestBody(name + "@example.com", "long enough password", "head", 0));
+        post(port(), kSyncPath, requestBody(name + "@example.com", "long enough password", "head", 0),
+             "application/json", "192.0.2." + std::to_string(++checks));
     return std::pair(reply, head.status == 200 && head.code() == 0);
   };
   const std::string password = "long+enough+password", tooLong(1025, 'p');

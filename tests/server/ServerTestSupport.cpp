@@ -54,10 +54,13 @@ static Reply toReply(const httplib::Result& result) {
           result->get_header_value("Retry-After")};
 }
 
-Reply post(int port, const std::string& path, const std::string& body, const std::string& contentType) {
+Reply post(int port, const std::string& path, const std::string& body, const std::string& contentType,
+           const std::string& forwardedFor) {
   httplib::Client client("127.0.0.1", port);
   client.set_read_timeout(30, 0);
-  return toReply(client.Post(path.c_str(), body, contentType.c_str()));
+  httplib::Headers headers;
+  if (!forwardedFor.empty()) headers.emplace("X-Forwarded-For", forwardedFor);
+  return toReply(client.Post(path.c_str(), headers, body, contentType.c_str()));
 }
 
 Reply get(int port, const std::string& path) {
@@ -77,7 +80,13 @@ std::string requestBody(const std::string& user, const std::string& password, co
   return body + (data.empty() ? "" : ",\"data\":" + data) + "}";
 }
 
-RawConnection::RawConnection(int port) : fd_(socket(AF_INET, SOCK_STREAM, 0)) {
+RawConnection::RawConnection(int port, const std::string& from) : fd_(socket(AF_INET, SOCK_STREAM, 0)) {
+  if (!from.empty()) {
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, from.c_str(), &local.sin_addr);
+    if (bind(fd_, reinterpret_cast<sockaddr*>(&local), sizeof local) != 0) return;
+  }
   sockaddr_in address{};
   address.sin_family = AF_INET;
   address.sin_port = htons(static_cast<uint16_t>(port));

@@ -46,8 +46,9 @@ struct Reply {
   int64_t code() const { return (*this)["error"] ? integer("code") : 0; }  // 0 when no error
 };
 
+// `forwardedFor` names the client the way a reverse proxy on loopback would (X-Forwarded-For).
 Reply post(int port, const std::string& path, const std::string& body,
-           const std::string& contentType = "application/json");
+           const std::string& contentType = "application/json", const std::string& forwardedFor = {});
 Reply get(int port, const std::string& path);
 
 // A sync request body. `data` is JSON text or empty (no "data"); `device` empty leaves "device" out.
@@ -57,7 +58,8 @@ std::string requestBody(const std::string& user, const std::string& password, co
 // One TCP connection driven byte by byte, the way a hostile client would.
 class RawConnection {
  public:
-  explicit RawConnection(int port);
+  // From `from`, a loopback address other than 127.0.0.1 when the test needs a second client address.
+  explicit RawConnection(int port, const std::string& from = {});
   ~RawConnection();
   bool connected() const { return connected_; }
   int fd() const { return fd_; }

@@ -108,6 +108,19 @@ class ModelTest : public ::testing::Test {
     return task;
   }
 
+  WTClient* makeClient(const QString& name) {
+    auto* client = WTClient::insertNewObject(context.get());
+    client->setName(name);
+    return client;
+  }
+
+  WTProject* makeProject(const QString& name, WTClient* client = nullptr) {
+    auto* project = WTProject::insertNewObject(context.get());
+    project->setName(name);
+    project->setClient(client);
+    return project;
+  }
+
   template <class T>
   T* makeItem(WTTask* task, Date start) {
     auto* item = T::insertNewObject(context.get());

@@ -46,26 +46,19 @@ TEST(RZSyncCommand, FailsWithAMessage) {
     QString server, user;
     const char* result;  // the start of what run() gives
   } rows[] = {
-      {errorReply("Wrong e-mail address or password.", 2),
-       {},
-       server.address(),
-       "ann",
+      // clang-format off
+      {errorReply("Wrong e-mail address or password.", 2), {}, server.address(), "ann",
        "1 |  | The server refused: Wrong e-mail address or password. - (Code: 2)"},
-      {LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"),
-       {},
-       server.address(),
-       "ann",
+      {LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"), {}, server.address(), "ann",
        "1 |  | Sync failed: "},
-      {QByteArray(),
-       {"--timeout", "1"},
-       server.address(),
-       "ann",
+      {QByteArray(), {"--timeout", "1"}, server.address(), "ann",
        "1 |  | Not in step with the server after 1 seconds."},
       {QByteArray(), {}, "", "ann", "1 |  | "},  // the message names the missing setting
       {QByteArray(), {}, server.address(), "  ", "1 |  | "},
       {QByteArray(), {"--timeout"}, server.address(), "ann", "2 |  | "},
       {QByteArray(), {"--timeout", "0"}, server.address(), "ann", "2 |  | "},
       {QByteArray(), {"now"}, server.address(), "ann", "2 |  | "},
+      // clang-format on
   };
   for (const auto& row : rows) {
     server.handler = [&](const HttpRequest&) { return row.answer; };

@@ -1,18 +1,25 @@
-// Random edits synced through a lossy proxy and a server restart converge on every accepted change.
+// Random edits synced through a lossy proxy and a server restart converge on every accepted change, also
+// over three server processes on one database that are killed while they answer.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
+#include "RZSyncReplacedStore.h"
+#include "ServerProcess.h"
 #include "ServerTestSupport.h"
+#include "SqlDatabase.h"
 #include "SyncTestSupport.h"
 #include "WTClient.h"
 #include "WTExpense.h"
 #include "WTFlat.h"
 #include "WTNote.h"
 #include "WTProject.h"
+#include "WTStoreBackup.h"
 #include "WTTask.h"
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <future>
 #include <iostream>
 #include <random>
+#include <thread>
 
 using namespace synctest;
 
@@ -53,10 +60,98 @@ struct Expected {
   }
 };
 
+// Where the released requests go.
+class Servers {
+ public:
+  virtual ~Servers() = default;
+  // The server's reply (status 0 when none came); `appliedUnanswered` when a save without a reply was
+  // applied all the same.
+  virtual servertest::Reply deliver(const std::string& path, const std::string& body,
+                                    bool& appliedUnanswered) = 0;
+  virtual void stop() = 0;
+  virtual bool start() = 0;
+};
+
+class OneServer final : public Servers {
+ public:
+  explicit OneServer(servertest::LocalServer& server) : server_(server) {}
+  servertest::Reply deliver(const std::string& path, const std::string& body, bool&) override {
+    return servertest::post(server_.port(), path, body);
+  }
+  void stop() override { server_.stop(); }
+  bool start() override { return server_.start(); }
+
+ private:
+  servertest::LocalServer& server_;
+};
+
+// Three server processes over one database. Each request goes to any of them; now and then the one
+// answering is killed (-9) at a random moment while the request is on its way, and started again.
+class Replicas final : public Servers {
+ public:
+  Replicas(const std::string& location, const std::string& user, const std::string& password, unsigned seed)
+      : poll_(servertest::requestBody(user, password, "head", 0)), random_(seed) {
+    for (int i = 0; i < 3; ++i)
+      replicas_.push_back(std::make_unique<servertest::ServerProcess>(kExe, location));
+    std::string error;
+    database_ = tessal::server::SqlDatabase::open(location, error);
+    EXPECT_TRUE(database_) << error;
+    EXPECT_TRUE(Replicas::start());
+  }
+  static inline const std::string kExe = TESSAL_SYNC_SERVER_EXE;
+  int killPercent = 15;
+  int kills = 0, killedAnswering = 0, appliedUnansweredSaves = 0;
+
+  servertest::Reply deliver(const std::string& path, const std::string& body,
+                            bool& appliedUnanswered) override {
+    servertest::ServerProcess& replica = *replicas_[std::uniform_int_distribution<size_t>(0, 2)(random_)];
+    if (!replica.running()) return {};
+    if (std::uniform_int_distribution<int>(0, 99)(random_) >= killPercent)
+      return servertest::post(replica.port(), path, body);
+    const int64_t before = head();
+    auto reply = std::async(std::launch::async,
+                            [&, port = replica.port()] { return servertest::post(port, path, body); });
+    const auto moment = std::chrono::microseconds(std::uniform_int_distribution<int>(0, 3000)(random_));
+    killedAnswering += reply.wait_for(moment) == std::future_status::timeout;
+    replica.kill();
+    ++kills;
+    const servertest::Reply answer = reply.get();
+    EXPECT_TRUE(start(replica));
+    // Nothing else runs meanwhile, so a moved head is this save, committed before its reply was sent.
+    appliedUnanswered = answer.status == 0 && head() != before;
+    appliedUnansweredSaves += appliedUnanswered;
+    return answer;
+  }
+  void stop() override {
+    for (auto& replica : replicas_) replica->kill();
+  }
+  bool start() override {
+    bool started = true;
+    for (auto& replica : replicas_) started &= start(*replica);
+    return started;
+  }
+
+ private:
+  // A replica's first request checks the password, which takes longer than a save: done here, so that
+  // the random moment of a kill falls into the request, not into the check.
+  bool start(servertest::ServerProcess& replica) {
+    return replica.start() && servertest::post(replica.port(), servertest::kSyncPath, poll_).status == 200;
+  }
+
+  int64_t head() {
+    return database_ ? database_->acquire()->query("SELECT head FROM accounts").at(0).integer(0) : -1;
+  }
+
+  std::string poll_;  // a head without a device, which changes nothing
+  std::mt19937 random_;
+  std::unique_ptr<tessal::server::SqlDatabase> database_;
+  std::vector<std::unique_ptr<servertest::ServerProcess>> replicas_;
+};
+
 // The proxy holds every request until released, so a run depends on its seed, not on the machine.
 class Simulation {
  public:
-  Simulation(unsigned seed, servertest::LocalServer& server) : seed_(seed), random_(seed), server_(server) {
+  Simulation(unsigned seed, Servers& server) : seed_(seed), random_(seed), server_(server) {
     proxy_.handler = [](const HttpRequest&) { return QByteArray(); };  // hold
     // Syncing stays "off": no timer polls on its own, every exchange is one the run starts.
     for (int i = std::uniform_int_distribution<int>(3, 5)(random_); i > 0; --i)
@@ -260,11 +355,12 @@ class Simulation {
     if (fate == Fate::LoseRequest) {
       proxy_.answerHeld(kGatewayError), ++lost_;
     } else {
+      bool appliedUnanswered = false;
       const servertest::Reply reply =
-          servertest::post(server_.port(), request.path.toStdString(), request.body.toStdString());
+          server_.deliver(request.path.toStdString(), request.body.toStdString(), appliedUnanswered);
       const QByteArray body = QByteArray::fromStdString(reply.body);
       const QVariantMap answer = RZSyncJSON::parse(body).value_or(QVariant()).toMap();
-      if (answer.value("action") == "save" && !answer.contains("error"))
+      if ((answer.value("action") == "save" && !answer.contains("error")) || appliedUnanswered)
         appliedSaves_.append(request.json().value("data").toMap());
       lost_ += fate == Fate::LoseReply;
       // A lost reply, or the server is down.
@@ -301,8 +397,8 @@ class Simulation {
   std::mt19937 random_;
   LoopbackHttpServer proxy_;
   qsizetype released_ = 0;
-  QList<QVariantMap> appliedSaves_;  // the "data" of each save the server confirmed, in order
-  servertest::LocalServer& server_;
+  QList<QVariantMap> appliedSaves_;  // the "data" of each save the server applied, in order
+  Servers& server_;
   std::vector<std::unique_ptr<SyncClient>> clients_;
 };
 
@@ -311,23 +407,107 @@ class Simulation {
 // Over both storages of the server: PostgreSQL when a throw-away cluster is given (TESSAL_TEST_POSTGRES).
 class RZSyncSimulation : public servertest::StorageTest {};
 
-TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
+std::vector<unsigned> seeds(int runs) {
   std::vector<unsigned> seeds;
-  const int runs =
-      qEnvironmentVariableIsSet("TESSAL_SYNC_RUNS") ? qEnvironmentVariableIntValue("TESSAL_SYNC_RUNS") : 2;
+  if (qEnvironmentVariableIsSet("TESSAL_SYNC_RUNS")) runs = qEnvironmentVariableIntValue("TESSAL_SYNC_RUNS");
   for (int i = 0; i < runs; ++i) seeds.push_back(20240601u + unsigned(i) * 7919u);
   if (const QByteArray seed = qgetenv("TESSAL_SYNC_SEED"); !seed.isEmpty()) seeds = {seed.toUInt()};
-  for (const unsigned seed : seeds) {
+  return seeds;
+}
+
+TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
+  for (const unsigned seed : seeds(2)) {
     SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
     const servertest::StorageLocation storage(GetParam());
     servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
                                    Simulation::kPassword.toStdString());
-    Simulation simulation(seed, server);
+    OneServer one(server);
+    Simulation simulation(seed, one);
     simulation.run(600);
     ASSERT_TRUE(simulation.settle()) << "no quiescence";
     simulation.check();
     if (HasFailure()) break;
   }
+}
+
+// The long run (ctest -L long) sets TESSAL_SYNC_RUNS=20.
+TEST(RZSyncReplicaSimulation, RandomEditsOnThreeReplicasKilledWhileTheyAnswerConverge) {
+  if (servertest::postgresUri().empty()) GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set";
+  for (const unsigned seed : seeds(1)) {
+    SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
+    const servertest::StorageLocation storage(servertest::Storage::PostgreSQL);
+    {
+      servertest::LocalServer accounts(storage.location(), Simulation::kUser.toStdString(),
+                                       Simulation::kPassword.toStdString());
+    }
+    Replicas replicas(storage.location(), Simulation::kUser.toStdString(),
+                      Simulation::kPassword.toStdString(), seed);
+    Simulation simulation(seed, replicas);
+    simulation.run(600);
+    replicas.killPercent = 0;
+    ASSERT_TRUE(simulation.settle()) << "no quiescence";
+    simulation.check();
+    std::cout << "seed " << seed << ": " << replicas.kills << " replicas killed, " << replicas.killedAnswering
+              << " while answering, " << replicas.appliedUnansweredSaves << " after committing a save\n";
+    if (HasFailure()) break;
+  }
+}
+
+// A device puts back a copy of its store from before its own and another device's saves: the journal
+// started again, it gets back what was saved since, and the server neither brings back what was deleted
+// since nor loses what the copy lacks.
+TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
+  const servertest::StorageLocation storage(GetParam());
+  const QString user = Simulation::kUser, password = Simulation::kPassword;
+  servertest::LocalServer server(storage.location(), user.toStdString(), password.toStdString());
+  SyncClient here(server.address(), user, password), there(server.address(), user, password);
+  auto task = [](SyncClient& client, const QString& name, WTProject* project) {
+    auto* task = client.context->insertNewObject<WTTask>();
+    task->setName(name);
+    task->setProject(project);
+    return task;
+  };
+  auto* project = here.context->insertNewObject<WTProject>();
+  project->setName("Project");
+  WTTask* gone = task(here, "Deleted here", project);
+  WTTask* renamed = task(here, "Renamed", project);
+  task(here, "Deleted there", project);
+  here.save();
+  ASSERT_TRUE(here.syncOnce() && here.syncOnce() && there.syncOnce());
+  const QString copy = here.dir.filePath("copy.sqlite");
+  ASSERT_TRUE(WTStoreBackup::copy(here.dir.filePath("Tessal.sqlite"), copy).ok());
+
+  task(here, "Added here", project);
+  here.context->deleteObject(gone);
+  renamed->setName("Renamed since");
+  here.save();
+  ASSERT_TRUE(here.syncOnce());
+  for (WTTask* other : there.context->fetch<WTTask>())
+    if (other->name() == "Deleted there") there.context->deleteObject(other);
+  task(there, "Added there", there.find<WTProject>(project->uuid()));
+  there.save();
+  ASSERT_TRUE(there.syncOnce());
+
+  here.close();
+  ASSERT_TRUE(WTStoreBackup::restore(copy, here.dir.filePath("Tessal.sqlite")));
+  {
+    WTObjectContext restored(here.defaults.get());
+    auto store = WTStore::open(here.dir.filePath("Tessal.sqlite"));
+    ASSERT_TRUE(store && restored.attachStore(std::move(store.value())));
+    ASSERT_TRUE(journalReplacedStore(restored));
+  }
+  here.open();
+  for (int round = 0; round < 3; ++round) ASSERT_TRUE(here.syncOnce() && there.syncOnce());
+  EXPECT_FALSE(here.track().hasChanges() || there.track().hasChanges());
+  QStringList names;
+  for (WTTask* each : here.context->fetch<WTTask>()) names << each->name();
+  names.sort();
+  EXPECT_EQ(names, QStringList({"Added here", "Added there", "Renamed since"}));
+  EXPECT_EQ(snapshot(*here.context), snapshot(*there.context));
+  // A device set up afresh gets the same from the server.
+  SyncClient fresh(server.address(), user, password);
+  ASSERT_TRUE(fresh.syncOnce());
+  EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
 
 INSTANTIATE_TEST_SUITE_P(Storage, RZSyncSimulation,

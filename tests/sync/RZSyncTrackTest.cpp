@@ -8,10 +8,9 @@
 #include "WTTask.h"
 
 #include <QColor>
-#include <QDir>
 #include <QFile>
 
-#include <nlohmann/json.hpp>
+#include <sqlite3.h>
 
 #include <sys/resource.h>
 #include <csignal>
@@ -33,60 +32,95 @@ void writeFile(const QString& path, const QByteArray& bytes) {
 }
 constexpr const char* kEmpty = R"({"i":{},"u":{},"x":[]})";
 
+// A store file as the version before the journal moved into it wrote it.
+void makeOlderStore(const QString& path) {
+  ASSERT_TRUE(WTStore::open(path).ok());
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(QFile::encodeName(path).constData(), &db), SQLITE_OK);
+  EXPECT_EQ(sqlite3_exec(db,
+                         "DROP TABLE journal; DROP TABLE journal_deletions; DROP TABLE journal_state;"
+                         "PRAGMA user_version = 5;",
+                         nullptr, nullptr, nullptr),
+            SQLITE_OK);
+  sqlite3_close(db);
+}
+
 }  // namespace
 
-// Written pretty and read back the same; a write that fails half-way leaves the previous file alone.
-TEST(RZSyncTrackFile, HoldsIterationAndTrackAndKeepsItThroughAFailedWrite) {
+// Each save writes the rows of what it journaled, and values read back exactly; a save that cannot be
+// written leaves the rows, and the journal in memory, as they were.
+TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
   QTemporaryDir dir;
-  const QString path = dir.filePath("Tessal.sync");
-  RZSyncTrack track;
+  const QString path = dir.filePath("Tessal.sqlite");
+  WTObjectContext context;
+  ASSERT_TRUE(context.attachStore(std::move(WTStore::open(path).value())).ok());
+  RZSyncTrack track(context.store(), RZSyncTrack::Loading::Whole);
+  context.setChangeJournal(&track);
+  auto* task = context.insertNewObject<WTTask>();
+  task->setUuid("T@WTTask");
+  task->setBudget(dec("12.30"));
+  auto* client = context.insertNewObject<WTClient>();
+  client->setUuid("C@WTClient");
+  ASSERT_TRUE(context.save().ok());
   track.setIteration(12);
-  track.insertValues({{"name", "Design"}, {"budget", synctest::money("12.30")}}, "T@WTTask");
   track.updateValues({{"endDate", QVariant::fromValue(Date::fromSeconds(1700000000.75))}}, "E@WTTime");
-  track.deleteObjectWithId("N@WTNote");
-  ASSERT_TRUE(track.writeToFile(path).ok());
-  const QByteArray text = readFile(path);
-  EXPECT_TRUE(text.contains("\n  \"track\": {") && text.contains("\"budget\": 12.30")) << text.toStdString();
-  EXPECT_EQ(
-      nlohmann::json::parse(text.toStdString()),
-      nlohmann::json::parse(R"({"iteration":12,"track":{"i":{"T@WTTask":{"budget":12.30,"name":"Design"}},)"
-                            R"("u":{"E@WTTime":{"endDate":1700000000}},"x":["N@WTNote"]}})"));
-  RZSyncTrack loaded(path);
-  EXPECT_EQ(loaded.iteration(), 12);
-  EXPECT_EQ(compact(loaded.dictionary()), compact(track.dictionary()));
-  EXPECT_TRUE(loaded.entry(Section::Inserted, "T@WTTask")
+  ASSERT_TRUE(track.write().ok());
+  context.deleteObject(client);
+  ASSERT_TRUE(context.save().ok());
+  const std::string saved = compact(track.dictionary());
+  EXPECT_EQ(saved, R"({"i":{"C@WTClient":{"archived":false,"uuid":"C@WTClient"},)"
+                   R"("T@WTTask":{"archived":false,"budget":12.30,"uuid":"T@WTTask"}},)"
+                   R"("u":{"E@WTTime":{"endDate":1700000000}},"x":["C@WTClient"]})");
+  const auto stored = [&] {
+    const synctest::StoredJournal journal(path);
+    return std::to_string(journal.track.iteration()) + ' ' + compact(journal.track.dictionary());
+  };
+  EXPECT_EQ(stored(), "12 " + saved);
+  EXPECT_TRUE(synctest::StoredJournal(path)
+                  .track.entry(Section::Inserted, "T@WTTask")
                   .value("budget")
                   .value<Decimal>()
                   .isIdenticalTo(dec("12.30")));
 
-  track.insertValues({{"notes", QString(64 * 1024, u'x')}}, "B@WTTask");
+  task->setName("Design");
+  task->setNotes(QString(64 * 1024, u'x'));
   struct rlimit old {};
   ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
   const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
   struct rlimit small = old;
   small.rlim_cur = 4096;
   ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
-  const Result<void> written = track.writeToFile(path);
+  const Result<void> failed = context.save();
   setrlimit(RLIMIT_FSIZE, &old);
   std::signal(SIGXFSZ, oldHandler);
-  EXPECT_FALSE(written.ok());
-  EXPECT_EQ(readFile(path), text);
-  EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files), QStringList{"Tessal.sync"});
-  EXPECT_TRUE(track.entries(Section::Inserted).contains("B@WTTask"));  // memory unchanged
-  EXPECT_TRUE(track.writeToFile(path).ok());
-  EXPECT_FALSE(track.writeToFile(dir.filePath("missing/Tessal.sync")).ok());
+  EXPECT_FALSE(failed.ok());
+  EXPECT_EQ(compact(track.dictionary()), saved);
+  EXPECT_EQ(stored(), "12 " + saved);
+  EXPECT_TRUE(context.hasChanges());
+  ASSERT_TRUE(context.save().ok());
+  EXPECT_EQ(synctest::StoredJournal(path).track.entry(Section::Inserted, "T@WTTask").value("name"), "Design");
+
+  // A store replaced as a whole is journaled again: every record as updated, from iteration 0.
+  task->setNotes("n");
+  ASSERT_TRUE(context.save().ok());
+  ASSERT_TRUE(track.journalEveryRecord(context).ok());
+  EXPECT_EQ(stored(), R"(0 {"i":{},"u":{"T@WTTask":{"archived":false,"budget":12.30,"name":"Design",)"
+                      R"("notes":"n","uuid":"T@WTTask"}},"x":[]})");
 }
 
-// An unreadable journal is kept aside, byte for byte (an earlier copy too), and starts over.
-TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
+// An older store's journal file is read into the store once, as it is updated, and kept as ".migrated";
+// an unreadable one is kept aside as ".corrupt" and the journal starts empty. A journal file found beside
+// the store later is left alone.
+TEST(RZSyncTrackStore, AnOlderStoresJournalFileMovesIntoItOnce) {
   const struct {
     const char* text;  // null: no file
     qint64 iteration;
     const char* loaded;  // null: kept aside
   } rows[] = {
       {nullptr, 0, kEmpty},
-      {R"({"iteration": 3, "track": {"u": {"A@WTTask": {"name": "a"}}}})", 3,
-       R"({"i":{},"u":{"A@WTTask":{"name":"a"}},"x":[]})"},
+      {R"({"iteration": 3, "track": {"i": {"B@WTTask": {}}, "u": {"A@WTTask": {"name": "a", "rate": 12.30}},)"
+       R"( "x": ["D@WTNote", "C@WTNote"]}})",
+       3, R"({"i":{"B@WTTask":{}},"u":{"A@WTTask":{"name":"a","rate":12.30}},"x":["D@WTNote","C@WTNote"]})"},
       {"", 0, nullptr},
       {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr},  // cut short
       {"[1, 2]", 0, nullptr},
@@ -98,20 +132,32 @@ TEST(RZSyncTrackFile, LoadsOrKeepsTheFileAside) {
   for (const auto& row : rows) {
     SCOPED_TRACE(row.text ? row.text : "(no file)");
     QTemporaryDir folder;
+    const QString path = folder.filePath("Tessal.sqlite");
     const QString file = folder.filePath("Tessal.sync");
+    makeOlderStore(path);
     if (row.text) writeFile(file, row.text);
-    LogCapture log;
-    RZSyncTrack track(file);
-    EXPECT_EQ(track.iteration(), row.iteration);
-    EXPECT_EQ(compact(track.dictionary()), row.loaded ? row.loaded : kEmpty);
-    EXPECT_EQ(log.contains("Can not parse json - "), !row.loaded);
-    EXPECT_EQ(QFile::exists(file), row.loaded && row.text);
-    EXPECT_EQ(readFile(file + ".corrupt"), row.loaded ? QByteArray() : QByteArray(row.text));
+    const auto journal = [&] {
+      Result<std::unique_ptr<WTStore>> store = RZSyncTrack::openStore(path);
+      EXPECT_TRUE(store.ok());
+      if (!store) return std::string();
+      const RZSyncTrack track(store.value().get(), RZSyncTrack::Loading::Whole);
+      return std::to_string(track.iteration()) + ' ' + compact(track.dictionary());
+    };
+    {
+      LogCapture log;
+      EXPECT_EQ(journal(), std::to_string(row.iteration) + ' ' + (row.loaded ? row.loaded : kEmpty));
+      EXPECT_EQ(log.contains("Can not parse json - "), !row.loaded);
+    }
+    EXPECT_FALSE(QFile::exists(file));
+    EXPECT_EQ(readFile(file + (row.loaded ? ".migrated" : ".corrupt")), row.text ? row.text : "");
+    EXPECT_EQ(QFile::exists(file + ".migrated"), row.loaded && row.text);
     EXPECT_EQ(QFile::exists(file + ".corrupt"), !row.loaded);
-    if (row.loaded) continue;
-    writeFile(file, "second");
-    RZSyncTrack second(file);
-    EXPECT_EQ(readFile(file + ".corrupt.2"), "second");
+
+    writeFile(file, R"({"iteration": 9})");
+    LogCapture later;
+    EXPECT_EQ(journal(), std::to_string(row.iteration) + ' ' + (row.loaded ? row.loaded : kEmpty));
+    EXPECT_TRUE(later.contains("Ignoring " + file)) << later.lines.join('\n').toStdString();
+    EXPECT_EQ(readFile(file), R"({"iteration": 9})");
   }
 }
 

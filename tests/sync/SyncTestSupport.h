@@ -177,9 +177,9 @@ class SyncClient final : public RZSyncNetworkCredentialDelegate {
 
   void open() {
     context = std::make_unique<WTObjectContext>(defaults.get());
-    auto store = WTStore::open(dir.filePath(QStringLiteral("Tessal.sqlite")));
+    auto store = WTStore::open(storePath());
     EXPECT_TRUE(store.ok() && context->attachStore(std::move(store.value())).ok());
-    manager = std::make_unique<RZSyncManager>(context.get(), journalPath());
+    manager = std::make_unique<RZSyncManager>(context.get());
     manager->syncNetwork()->setCredentialDelegate(this);
     manager->setErrorPresenter(&presenter);
   }
@@ -187,7 +187,7 @@ class SyncClient final : public RZSyncNetworkCredentialDelegate {
   void close() { manager.reset(), context.reset(); }
   void reopen() { close(), open(); }
 
-  QString journalPath() const { return dir.filePath(QStringLiteral("Tessal.sync")); }
+  QString storePath() const { return dir.filePath(QStringLiteral("Tessal.sqlite")); }
   RZSyncTrack& track() const { return *manager->syncTrack(); }
   RZSyncNetwork& network() const { return *manager->syncNetwork(); }
   bool idle() const { return network().networkAction() == RZSyncNetwork::Idle; }
@@ -210,6 +210,15 @@ class SyncClient final : public RZSyncNetworkCredentialDelegate {
   std::unique_ptr<WTObjectContext> context;
   std::unique_ptr<RZSyncManager> manager;
   RecordingPresenter presenter;
+};
+
+// The journal as the store file holds it, read through a connection of its own.
+struct StoredJournal {
+  explicit StoredJournal(const QString& storePath)
+      : store(std::move(WTStore::openReadOnly(storePath, WTStore::Check::Header).value())),
+        track(store.get(), RZSyncTrack::Loading::Whole) {}
+  std::unique_ptr<WTStore> store;
+  RZSyncTrack track;
 };
 
 // A stored value in journal form (an item's own rate, not its task's; a task order as uuids).
