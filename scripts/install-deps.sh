@@ -7,6 +7,7 @@ if [ "$(id -u)" -ne 0 ]; then SUDO="sudo"; fi
 export DEBIAN_FRONTEND=noninteractive
 packages=(
   g++ cmake ninja-build pkg-config
+  clang-14 libclang-rt-14-dev
   qt6-base-dev qt6-svg-dev libgl-dev libxcb-screensaver0-dev libwayland-dev wayland-protocols libicu-dev libsqlite3-dev nlohmann-json3-dev
   libgtest-dev libgmock-dev libbenchmark-dev
   libcpp-httplib-dev libsodium-dev libpq-dev postgresql wrk qtkeychain-qt6-dev libsecret-1-0

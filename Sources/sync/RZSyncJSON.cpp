@@ -17,21 +17,25 @@ namespace {
 // or an exponent over with their text, which is what keeps money exact.
 class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
-  bool null() override { return add(QVariant()); }
-  bool boolean(bool value) override { return add(value); }
-  bool number_integer(number_integer_t value) override { return add(qint64(value)); }
+  explicit VariantBuilder(std::size_t maxValues) : maxValues_(maxValues), valuesLeft_(maxValues) {}
+
+  bool null() override { return counted() && add(QVariant()); }
+  bool boolean(bool value) override { return counted() && add(value); }
+  bool number_integer(number_integer_t value) override { return counted() && add(qint64(value)); }
   bool number_unsigned(number_unsigned_t value) override {
+    if (!counted()) return false;
     if (value <= number_unsigned_t(std::numeric_limits<qint64>::max())) return add(qint64(value));
     return add(QVariant::fromValue(*Decimal::fromString(QString::number(value))));
   }
   bool number_float(number_float_t value, const string_t& text) override {
+    if (!counted()) return false;
     if (std::optional<Decimal> exact = Decimal::fromString(QString::fromStdString(text))) {
       return add(QVariant::fromValue(*exact));
     }
     // Beyond Decimal's range: nothing exact is possible, keep the nearest double.
     return add(double(value));
   }
-  bool string(string_t& value) override { return add(QString::fromStdString(value)); }
+  bool string(string_t& value) override { return counted() && add(QString::fromStdString(value)); }
   bool binary(binary_t&) override { return false; }
   bool start_object(std::size_t) override {
     if (!enter()) return false;
@@ -68,8 +72,20 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
   // Documents of this protocol nest a few levels; a deep one is refused before it is built, since
   // building, copying and destroying nested values recurses once per level.
   bool enter() {
+    if (!counted()) return false;
     if (stack_.size() < kMaxDepth) return true;
     error = QStringLiteral("JSON nested deeper than %1 levels").arg(kMaxDepth);
+    return false;
+  }
+
+  // Bytes alone do not bound the memory: "[]," is three bytes of text and a QVariant of 32 with its
+  // share of the list, so each value is counted before it is built.
+  bool counted() {
+    if (valuesLeft_ > 0) {
+      --valuesLeft_;
+      return true;
+    }
+    error = QStringLiteral("JSON holds more than %1 values").arg(qulonglong(maxValues_));
     return false;
   }
 
@@ -91,6 +107,8 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
   }
 
   std::vector<Frame> stack_;
+  const std::size_t maxValues_;
+  std::size_t valuesLeft_;
 };
 
 void writeString(QByteArray& out, const QString& text) {
@@ -260,8 +278,8 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
 
 }  // namespace
 
-std::optional<QVariant> parse(QByteArrayView text, QString* error) {
-  VariantBuilder builder;
+std::optional<QVariant> parse(QByteArrayView text, QString* error, std::size_t maxValues) {
+  VariantBuilder builder(maxValues);
   const char* begin = text.data();
   const bool ok = nlohmann::json::sax_parse(begin, begin + text.size(), &builder);
   if (!ok) {

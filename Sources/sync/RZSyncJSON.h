@@ -7,6 +7,7 @@
 #include <QVariant>
 
 #include <functional>
+#include <limits>
 #include <optional>
 
 // JSON for the change journal and the sync protocol, exact for money: a number with a fraction or an
@@ -20,11 +21,15 @@ namespace RZSyncJSON {
 
 // Containers nested deeper than this are refused while parsing.
 inline constexpr std::size_t kMaxDepth = 64;
+// No bound on the number of values (the journal: this installation's own file).
+inline constexpr std::size_t kAnyNumberOfValues = std::numeric_limits<std::size_t>::max();
 
 // Parses one JSON text; a bare string or number at the top level is accepted (the caller decides
-// whether it wants a container). None for malformed text or nesting deeper than kMaxDepth, with a
-// description in `error` when given.
-std::optional<QVariant> parse(QByteArrayView text, QString* error = nullptr);
+// whether it wants a container). None for malformed text, nesting deeper than kMaxDepth or more than
+// `maxValues` values (every container and every member counts, keys do not), with a description in
+// `error` when given. The bound holds while parsing: a refused text is never built whole.
+std::optional<QVariant> parse(QByteArrayView text, QString* error = nullptr,
+                              std::size_t maxValues = kAnyNumberOfValues);
 
 enum class Style {
   Compact,

@@ -129,7 +129,7 @@ void RZSyncNetwork::replyFinished() {
     return;
   }
   QString error;
-  const std::optional<QVariant> object = RZSyncJSON::parse(body, &error);
+  const std::optional<QVariant> object = RZSyncJSON::parse(body, &error, maxReplyValues_);
   if (object && RZSyncJSON::isContainer(*object)) {
     if (delegate_) delegate_->syncNetworkReceivedJSONObject(this, *object);
     return;

@@ -278,6 +278,36 @@ Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, con
   return store;
 }
 
+std::optional<RZSyncTrack::FileContents> RZSyncTrack::fromJSON(QByteArrayView text, QString* problem) {
+  QString reason;
+  FileContents contents;
+  const std::optional<QVariant> root = RZSyncJSON::parse(text, &reason);
+  if (root && root->typeId() != QMetaType::QVariantMap)
+    reason = QStringLiteral("the journal is not a JSON object");
+  if (root && reason.isEmpty()) {
+    const QVariantMap top = root->toMap();
+    const QVariant number = top.value(QStringLiteral("iteration"));
+    const QVariant track = top.value(QStringLiteral("track"));
+    if (number.typeId() == QMetaType::LongLong) {
+      contents.iteration = number.toLongLong();
+    } else if (number.isValid()) {
+      reason = QStringLiteral("\"iteration\" is not an integer");
+    }
+    if (reason.isEmpty() && track.isValid()) {
+      const QVariantMap changes = track.toMap();
+      if (track.typeId() != QMetaType::QVariantMap ||
+          !readEntries(changes.value(kInserted), contents.inserted) ||
+          !readEntries(changes.value(kUpdated), contents.updated) ||
+          !readDeleted(changes.value(kDeleted), contents.deleted)) {
+        reason = QStringLiteral("\"track\" is not a change dictionary");
+      }
+    }
+  }
+  if (reason.isEmpty()) return contents;
+  if (problem) *problem = reason;
+  return std::nullopt;
+}
+
 bool RZSyncTrack::readFile(const QString& path, QString* problemOut) {
   QFile file(path);
   QString problem;
@@ -290,47 +320,22 @@ bool RZSyncTrack::readFile(const QString& path, QString* problemOut) {
     file.close();
   }
 
-  qint64 iteration = 0;
-  Entries inserted, updated;
-  QStringList deleted;
-  if (problem.isEmpty()) {
-    const std::optional<QVariant> root = RZSyncJSON::parse(bytes, &problem);
-    if (root && root->typeId() != QMetaType::QVariantMap)
-      problem = QStringLiteral("the journal is not a JSON object");
-    if (root && problem.isEmpty()) {
-      const QVariantMap top = root->toMap();
-      const QVariant number = top.value(QStringLiteral("iteration"));
-      const QVariant track = top.value(QStringLiteral("track"));
-      if (number.typeId() == QMetaType::LongLong) {
-        iteration = number.toLongLong();
-      } else if (number.isValid()) {
-        problem = QStringLiteral("\"iteration\" is not an integer");
-      }
-      if (problem.isEmpty() && track.isValid()) {
-        const QVariantMap changes = track.toMap();
-        if (track.typeId() != QMetaType::QVariantMap || !readEntries(changes.value(kInserted), inserted) ||
-            !readEntries(changes.value(kUpdated), updated) ||
-            !readDeleted(changes.value(kDeleted), deleted)) {
-          problem = QStringLiteral("\"track\" is not a change dictionary");
-        }
-      }
-    }
-  }
-
+  std::optional<FileContents> contents;
+  if (problem.isEmpty()) contents = fromJSON(bytes, &problem);
   if (!problem.isEmpty()) {
     *problemOut = problem;
     return false;
   }
   // Read as if every value had just been journaled here.
-  setIteration(iteration);
+  setIteration(contents->iteration);
   for (const Section section : {Section::Inserted, Section::Updated}) {
-    const Entries& read = section == Section::Inserted ? inserted : updated;
+    const Entries& read = section == Section::Inserted ? contents->inserted : contents->updated;
     for (auto it = read.begin(); it != read.end(); ++it) {
       touch(it.key());
       entriesFor(section).insert(it.key(), it.value());
     }
   }
-  for (const QString& uuid : deleted) {
+  for (const QString& uuid : contents->deleted) {
     touch(uuid);
     addDeletion(uuid);
   }

@@ -44,6 +44,14 @@ class RZSyncTrack final : public WTChangeJournal {
 
   // Where an older version kept the journal, a file of its own: "Tessal.sync" beside "Tessal.sqlite".
   static QString legacyFilePath(const QString& storePath);
+  // What such a file's text holds ({"iteration", "track"}); none, with the reason in `problem`, when the
+  // text is not a journal.
+  struct FileContents {
+    qint64 iteration = 0;
+    Entries inserted, updated;
+    QStringList deleted;  // each once
+  };
+  static std::optional<FileContents> fromJSON(QByteArrayView text, QString* problem = nullptr);
   // Opens the store for writing (see WTStore::open). The opening that brings an older file up to date
   // reads the journal file beside it into the store's journal in the same transaction (a file that
   // cannot be read as a journal is logged, "Can not parse json - %@", and kept aside as ".corrupt", a

@@ -94,10 +94,16 @@ TEST_F(RZSyncNetworkTest, RequestCarriesCredentialsBodyAndHeaders) {
             R"("device":"device-1","iteration":9,"password":"secret","user":"carl@example.org"})");
 }
 
-// Only an object or array is delivered; a redirect (the request carries the password) fails.
+// Only an object or array is delivered; a redirect (the request carries the password) fails; so does a
+// reply past the bound of bytes or of values.
 TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
   LoopbackHttpServer elsewhere;
   network.setMaxReplyBytes(1024);
+  network.setMaxReplyValues(64);
+  // An array of `values` values, all but the array itself empty arrays.
+  auto arrays = [](int values) {
+    return LoopbackHttpServer::raw("[" + QByteArray("[],").repeated(values - 2) + "[]]");
+  };
   network.setTimeoutMilliseconds(300);
   QByteArray chunked =
       "HTTP/1.1 200 OK\r\nContent-Type: application/json\r\nTransfer-Encoding: chunked\r\n\r\n";
@@ -121,6 +127,11 @@ TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
        "307"},
       {LoopbackHttpServer::raw("{\"pad\": \"" + QByteArray(4096, 'x') + "\"}"), "larger than 1024 bytes"},
       {chunked + "2\r\n{}\r\n0\r\n\r\n", "larger than 1024 bytes"},
+      {arrays(64), nullptr},
+      {arrays(65), "more than 64 values"},
+      {LoopbackHttpServer::raw(R"({"result": {"i": {"a": {"b": [)" + QByteArray("1,").repeated(59) +
+                               "1]}}}}"),
+       "more than 64 values"},
       {QByteArray(), ""},
       {"closed", ""},
   };
