@@ -201,7 +201,8 @@ void RZSyncTrack::saveEnded(bool written) {
   for (auto it = changed_.constBegin(); it != changed_.constEnd(); ++it)
     if (!changed.contains(it.key())) changed.insert(it.key(), it.value());
   changed_.clear();
-  const bool everything = std::exchange(cleared_, false) | std::exchange(iterationChanged_, false);
+  const bool cleared = std::exchange(cleared_, false);
+  const bool everything = std::exchange(iterationChanged_, false) || cleared;
   clearWritten_ = false;
   if (written && !changed.isEmpty()) nothingStored_ = false;
   if (written || !store_) return;
