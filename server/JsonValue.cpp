@@ -158,7 +158,7 @@ class Builder {
  public:
   using json = nlohmann::json;
 
-  explicit Builder(int maxDepth) : maxDepth_(maxDepth) {}
+  Builder(int maxDepth, size_t maxValues) : maxDepth_(maxDepth), maxValues_(maxValues) {}
 
   bool null() { return add(JsonValue::null()); }
   bool boolean(bool value) { return add(JsonValue::boolean(value)); }
@@ -210,7 +210,12 @@ class Builder {
     return false;
   }
 
+  bool count() {
+    return ++values_ <= maxValues_ || fail("JSON holds more than " + std::to_string(maxValues_) + " values");
+  }
+
   bool open(JsonValue container) {
+    if (!count()) return false;
     if (static_cast<int>(stack_.size()) >= maxDepth_) return fail("JSON nested too deeply");
     stack_.push_back(std::move(container));
     keys_.emplace_back();
@@ -225,6 +230,7 @@ class Builder {
   }
 
   bool add(JsonValue value) {
+    if (!value.isArray() && !value.isObject() && !count()) return false;
     if (stack_.empty()) {
       root_ = std::move(value);
       done_ = true;
@@ -240,6 +246,8 @@ class Builder {
   }
 
   int maxDepth_;
+  size_t maxValues_;
+  size_t values_ = 0;
   std::vector<JsonValue> stack_;
   std::vector<std::string> keys_;
   JsonValue root_;
@@ -249,8 +257,9 @@ class Builder {
 
 }  // namespace
 
-std::optional<JsonValue> JsonValue::parse(std::string_view text, std::string* error, int maxDepth) {
-  Builder builder(maxDepth);
+std::optional<JsonValue> JsonValue::parse(std::string_view text, std::string* error, int maxDepth,
+                                          size_t maxValues) {
+  Builder builder(maxDepth, maxValues);
   bool ok = false;
   try {
     ok = nlohmann::json::sax_parse(text.begin(), text.end(), &builder, nlohmann::json::input_format_t::json,

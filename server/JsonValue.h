@@ -52,10 +52,13 @@ class JsonValue {
   std::string dump() const;
   void dumpTo(std::string& out) const;
 
-  // Parses a whole JSON document. Objects may not repeat a member name and nesting is limited to
-  // `maxDepth` levels. On failure returns none and, when `error` is given, a short reason.
+  // Parses a whole JSON document. Objects may not repeat a member name, nesting is limited to
+  // `maxDepth` levels and the document to `maxValues` values (containers and members count, names do
+  // not): each costs about a hundred bytes however short its text, so the bound is what keeps a body of
+  // tiny values from becoming gigabytes. On failure returns none and, when `error` is given, a short
+  // reason.
   static std::optional<JsonValue> parse(std::string_view text, std::string* error = nullptr,
-                                        int maxDepth = 16);
+                                        int maxDepth = 16, size_t maxValues = SIZE_MAX);
 
  private:
   Type type_ = Type::Null;

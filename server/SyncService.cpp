@@ -7,6 +7,10 @@ namespace tessal::server {
 namespace {
 
 constexpr size_t kMaxDeviceLength = 128;
+// A client's save carries the changes of at most 5,000 records, some tens of thousands of values; a
+// million, about 100 MB parsed, leaves room for a project of very many tasks and bounds what one body
+// of tiny values can cost (32 MiB of "0," would otherwise be 16 million values, 1.5 GB).
+constexpr size_t kMaxRequestValues = 1'000'000;
 
 HttpReply retryLater(int status, const std::string& message, std::chrono::seconds after) {
   HttpReply reply;
@@ -51,7 +55,7 @@ HttpReply SyncService::errorReply(int code, const std::string& message, int stat
 
 HttpReply SyncService::handle(std::string_view body, const std::string& client) {
   std::string reason;
-  const std::optional<JsonValue> request = JsonValue::parse(body, &reason);
+  const std::optional<JsonValue> request = JsonValue::parse(body, &reason, 16, kMaxRequestValues);
   if (!request) return errorReply(kMalformedRequest, "The request is not valid JSON: " + reason);
   if (!request->isObject()) return errorReply(kMalformedRequest, "The request is not a JSON object.");
 
