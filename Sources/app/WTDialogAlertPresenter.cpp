@@ -14,55 +14,53 @@ bool WTDialogAlertPresenter::presentError(const QString& message) {
   return false;
 }
 
-bool WTDialogAlertPresenter::confirmQuitAnyway() {
-  QMessageBox box(parent_);
+namespace {
+
+enum class Answer { Yes, No, Neither };  // Neither: the box was closed by something other than the user
+
+// A warning that asks one question with two answers. Escape always means no.
+Answer ask(QWidget* parent, const QString& text, const QString& detail, const QString& yes,
+           QMessageBox::ButtonRole yesRole, const QString& no, bool yesIsDefault) {
+  QMessageBox box(parent);
   box.setIcon(QMessageBox::Warning);
-  box.setText(
-      QCoreApplication::translate("WTAppDelegate", "Could not save changes while quitting. Quit anyway?"));
-  QPushButton* quit =
-      box.addButton(QCoreApplication::translate("WTAppDelegate", "Quit anyway"), QMessageBox::AcceptRole);
-  QPushButton* cancel =
-      box.addButton(QCoreApplication::translate("WTAppDelegate", "Cancel"), QMessageBox::RejectRole);
-  box.setDefaultButton(quit);
-  box.setEscapeButton(cancel);
+  box.setText(text);
+  box.setInformativeText(detail);
+  QPushButton* accept = box.addButton(yes, yesRole);
+  QPushButton* reject = box.addButton(no, QMessageBox::RejectRole);
+  box.setDefaultButton(yesIsDefault ? accept : reject);
+  box.setEscapeButton(reject);
   box.exec();
-  return box.clickedButton() != cancel;
+  if (box.clickedButton() == accept) return Answer::Yes;
+  return box.clickedButton() == reject ? Answer::No : Answer::Neither;
+}
+
+}  // namespace
+
+bool WTDialogAlertPresenter::confirmQuitAnyway() {
+  // Only an explicit Cancel keeps the application running.
+  return ask(parent_,
+             QCoreApplication::translate("WTAppDelegate",
+                                         "Could not save changes while quitting. Quit anyway?"),
+             {}, QCoreApplication::translate("WTAppDelegate", "Quit anyway"), QMessageBox::AcceptRole,
+             QCoreApplication::translate("WTAppDelegate", "Cancel"), true) != Answer::No;
 }
 
 bool WTDialogAlertPresenter::confirmDeletion(const QString& question, const QString& detail) {
-  QMessageBox box(parent_);
-  box.setIcon(QMessageBox::Warning);
-  box.setText(question);
-  box.setInformativeText(detail);
-  QPushButton* remove = box.addButton(QCoreApplication::translate("WTMainWindowController", "Delete"),
-                                      QMessageBox::DestructiveRole);
-  QPushButton* cancel =
-      box.addButton(QCoreApplication::translate("WTMainWindowController", "Cancel"), QMessageBox::RejectRole);
   // Return keeps what is there: a deletion is chosen, never fallen into.
-  box.setDefaultButton(cancel);
-  box.setEscapeButton(cancel);
-  box.exec();
-  return box.clickedButton() == remove;
+  return ask(parent_, question, detail, QCoreApplication::translate("WTMainWindowController", "Delete"),
+             QMessageBox::DestructiveRole, QCoreApplication::translate("WTMainWindowController", "Cancel"),
+             false) == Answer::Yes;
 }
 
 bool WTDialogAlertPresenter::offerRestore(const QString& message, const QString& backup) {
-  QMessageBox box(parent_);
-  box.setIcon(QMessageBox::Warning);
-  box.setText(message);
   const QString made = QLocale().toString(QFileInfo(backup).lastModified(), QLocale::LongFormat);
-  box.setInformativeText(
-      QCoreApplication::translate("WTAppDelegate",
-                                  "The newest good backup is “%1”, made %2. Restore it? The "
-                                  "damaged file is kept beside the restored one.")
-          .arg(QDir::toNativeSeparators(backup), made));
-  QPushButton* restore =
-      box.addButton(QCoreApplication::translate("WTAppDelegate", "Restore Backup"), QMessageBox::AcceptRole);
-  QPushButton* keep =
-      box.addButton(QCoreApplication::translate("WTAppDelegate", "Don’t Restore"), QMessageBox::RejectRole);
-  box.setDefaultButton(restore);
-  box.setEscapeButton(keep);
-  box.exec();
-  return box.clickedButton() == restore;
+  return ask(parent_, message,
+             QCoreApplication::translate("WTAppDelegate",
+                                         "The newest good backup is “%1”, made %2. Restore it? The "
+                                         "damaged file is kept beside the restored one.")
+                 .arg(QDir::toNativeSeparators(backup), made),
+             QCoreApplication::translate("WTAppDelegate", "Restore Backup"), QMessageBox::AcceptRole,
+             QCoreApplication::translate("WTAppDelegate", "Don’t Restore"), true) == Answer::Yes;
 }
 
 void WTDialogAlertPresenter::presentSyncError(const QString& message) {
