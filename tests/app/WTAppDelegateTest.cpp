@@ -16,19 +16,7 @@
 #include <sqlite3.h>
 
 // Each test gets its own data and settings folders.
-class WTAppDelegateTest : public AppTest {
- protected:
-  // The names of the projects a later start of the application finds, sorted.
-  QStringList storedProjectNames(std::unique_ptr<WTAppDelegate>& delegate) {
-    auto other = makeDelegate();
-    delegate.reset();
-    QStringList names;
-    for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
-      names << stored->name();
-    names.sort();
-    return names;
-  }
-};
+class WTAppDelegateTest : public AppTest {};
 
 TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   auto delegate = makeDelegate();
@@ -115,10 +103,8 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
     EXPECT_TRUE(presenter.offers[0].contains(path) &&
                 presenter.offers[0].endsWith("/Tessal-2026-01-02.sqlite"))
         << presenter.offers[0].toStdString();
-    QStringList names;
-    for (WTProject* project : context->fetch<WTProject>()) names << project->name();
-    names.sort();
-    EXPECT_EQ(names, restore ? QStringList({"Backed up", "Default Project"}) : QStringList());
+    EXPECT_EQ(namesIn<WTProject>(*context),
+              restore ? QStringList({"Backed up", "Default Project"}) : QStringList());
     EXPECT_EQ(context->hasStore(), restore);
     QStringList kept =
         QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
@@ -187,13 +173,7 @@ TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
   EXPECT_TRUE(WTStoreBackup::check(copy).ok());
   EXPECT_EQ(QFileInfo(copy).permissions(),
             QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
-  WTObjectContext copied;
-  auto store = WTStore::openReadOnly(copy);
-  ASSERT_TRUE(store && copied.attachStore(std::move(store.value())));
-  QStringList names;
-  for (WTProject* project : copied.fetch<WTProject>()) names << project->name();
-  names.sort();
-  EXPECT_EQ(names, QStringList({"Default Project", "Saved today"}));
+  EXPECT_EQ(storedNames<WTProject>(copy), QStringList({"Default Project", "Saved today"}));
   // The two oldest days went; the copy `tessal backup` made stays.
   QStringList expected = older.mid(2) + QStringList{copy.section('/', -1), "Tessal-2020-01-01-120000.sqlite"};
   expected.sort();
@@ -221,7 +201,7 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenT
   ASSERT_TRUE(delegate->saveChanges());
   EXPECT_EQ(commits, 1);
   EXPECT_FALSE(context->hasChanges());
-  EXPECT_EQ(storedProjectNames(delegate),
+  EXPECT_EQ(storedNames<WTProject>(delegate->storePath()),
             QStringList({"Default Project", "another change", "autosaved", "typed, not yet committed"}));
 }
 
