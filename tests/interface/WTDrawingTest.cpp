@@ -54,9 +54,9 @@ TEST(WTTableRowViewTest, TheBodyTakesItsColoursAndTheGrooveRunsAlongTheBottom) {
 TEST(RZBackgroundViewTest, PaintsItsGradientFromHexColours) {
   RZBackgroundView view;
   view.resize(40, 40);
-  view.setIBGradientBeginHexColor("0xffffff");
-  view.setIBGradientEndHexColor("1000000");
-  EXPECT_EQ(QList<QColor>({view.beginColor(), view.endColor()}), QList<QColor>({Qt::white, Qt::black}));
+  view.setIBGradientBeginHexColor("0xFfFfFf");
+  view.setIBGradientEndHexColor("1000005");
+  EXPECT_EQ(QList<QColor>({view.beginColor(), view.endColor()}), QList<QColor>({Qt::white, QColor(0, 0, 5)}));
   QImage image(view.size(), QImage::Format_RGB32);
   image.fill(Qt::red);
   QPainter painter(&image);
