@@ -266,8 +266,9 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
   for (const auto& c : cases) {
     const QByteArray store = storeBytes(here.storePath());
     here.expect(c.arguments, c.code, c.says);
-    if (c.code != 0 || c.arguments.contains("--dry-run"))
+    if (c.code != 0 || c.arguments.contains("--dry-run")) {
       EXPECT_EQ(storeBytes(here.storePath()), store) << c.says.toStdString();
+    }
   }
   here.expect({"log", "--range", "2026-03-04..2026-03-04"}, 0,
               "2026-03-04  09:00–10:30  Atlas › Design  01:30  120.00\n"
