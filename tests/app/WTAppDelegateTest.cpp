@@ -141,7 +141,6 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
       << presenter.errors[0].toStdString();
 }
 
-// The first save of a day leaves the day's copy in the backups, of which the newest 7 stay.
 TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
   const QString backups = WTAppDelegate::applicationSupportFolder() + "/Backups";
   ASSERT_TRUE(QDir().mkpath(backups));
@@ -248,7 +247,6 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
   }
 }
 
-// Where the desktop shows no notifications, a budget notice stands on the window's status line.
 TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStatusLine) {
   AnsweringPresenter asking;
   auto delegate = makeDelegate();

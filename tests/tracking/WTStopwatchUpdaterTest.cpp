@@ -10,7 +10,6 @@ namespace {
 
 using Answer = WTTrackingAlertAnswer;
 
-// Ticks total the running entries into badge and title, moving once per minute boundary.
 TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   WTTask* task = makeTask();
   WTTask* other = makeTask(nullptr, "Other");
