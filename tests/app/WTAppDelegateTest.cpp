@@ -1,5 +1,6 @@
 #include "AppFixture.h"
 #include "RZSyncManager.h"
+#include "TrackingFixture.h"
 #include "WTBudgetWatcher.h"
 #include "WTDesktopNotifier.h"
 #include "WTPreferencesWindowController.h"
@@ -211,25 +212,11 @@ TEST_F(WTAppDelegateTest, TheContextComesWithASyncManagerOnTheStoresJournal) {
   EXPECT_FALSE(sync->syncEnabled());
 }
 
-namespace {
-
-// Answers the ticker's questions with its default button and keeps their titles.
-class AnsweringPresenter final : public WTTrackingAlertPresenter {
- public:
-  WTTrackingAlertAnswer runAlert(const WTTrackingAlert& alert) override {
-    titles << alert.messageText;
-    return WTTrackingAlertAnswer::Default;
-  }
-  QStringList titles;
-};
-
-}  // namespace
-
 // Quitting asks the ticker's question and the last save stores the answer; a session's end cannot wait.
 TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRunning) {
   for (const bool sessionEnds : {false, true}) {
     QDir(home.filePath("data")).removeRecursively();
-    AnsweringPresenter asking;
+    ScriptedPresenter asking;
     auto delegate = makeDelegate();
     delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
     WTTask::insertNewObject(delegate->managedObjectContext())->toggleTimer();
@@ -237,7 +224,8 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
       delegate->sessionWillEnd();
     else
       EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
-    EXPECT_EQ(asking.titles, sessionEnds ? QStringList() : QStringList{"Running Timer"});
+    EXPECT_TRUE(sessionEnds ? asking.shown.empty()
+                            : asking.shown.size() == 1 && asking.shown[0].messageText == "Running Timer");
     // The one time entry of the store file, as a later start of the application would find it.
     auto store = WTStore::openReadOnly(delegate->storePath());
     WTObjectContext stored;
@@ -248,7 +236,7 @@ TEST_F(WTAppDelegateTest, QuittingAsksAboutRunningTimersAndLoggingOutKeepsThemRu
 }
 
 TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStatusLine) {
-  AnsweringPresenter asking;
+  ScriptedPresenter asking;
   auto delegate = makeDelegate();
   WTMainWindowController window(*delegate);
   WTBudgetWatcher watcher(delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr));
@@ -275,7 +263,7 @@ TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStat
 
 // Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.
 TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOneTheToolbarOffersTheList) {
-  AnsweringPresenter asking;
+  ScriptedPresenter asking;
   auto delegate = makeDelegate();
   WTMainWindowController window(*delegate);
   WTStopwatchUpdater* updater = delegate->startStopwatchUpdater(nullptr, &asking, nullptr, nullptr);
@@ -293,7 +281,7 @@ TEST_F(WTAppDelegateTest, WithATrayClosingTheWindowKeepsTessalThereAndWithoutOne
   QCoreApplication::processEvents();  // the toolbar lays its items out afresh
   EXPECT_FALSE(window.runningTimeButton()->isVisible());
   EXPECT_TRUE(window.close());
-  EXPECT_TRUE(!window.isVisible() && asking.titles.isEmpty());
+  EXPECT_TRUE(!window.isVisible() && asking.shown.empty());
   emit statusBar.showMainWindowRequested();
   EXPECT_TRUE(window.isVisible());
 
