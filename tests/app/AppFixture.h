@@ -49,6 +49,23 @@ class RecordingPresenter final : public WTAlertPresenter {
   bool quitAnyway = false, deletes = true, restores = false;
 };
 
+// The names of the context's records of kind T, sorted.
+template <class T>
+QStringList namesIn(WTObjectContext& context) {
+  QStringList names;
+  for (const T* record : context.fetch<T>()) names << record->name();
+  names.sort();
+  return names;
+}
+// The same of a store file, as a later start of the application reads it.
+template <class T>
+QStringList storedNames(const QString& path) {
+  WTObjectContext context;
+  auto store = WTStore::openReadOnly(path);
+  EXPECT_TRUE(store && context.attachStore(std::move(store.value())));
+  return namesIn<T>(context);
+}
+
 class AppTest : public ::testing::Test {
  protected:
   void SetUp() override {

@@ -259,7 +259,6 @@ TEST_F(WTMainWindowControllerTest, TheImportPreviewsThenMakesItAllAsOneStep) {
   EXPECT_TRUE(context->fetch<WTClient>().isEmpty());
 }
 
-// The window registers a custom range; it fits the screen and comes back where it was.
 TEST_F(WTMainWindowControllerTest, ARangeIsRegisteredAndTheWindowFitsTheScreenAndKeepsItsPlace) {
   open();
   EXPECT_LT(defaults->dateForKey("WTCustomRangeBegin").value_or(Date::now()), Date::now());

@@ -29,6 +29,10 @@ QByteArray bytesOf(const QString& path) {
   QFile file(path);
   return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
 }
+// A store file with its write-ahead log.
+QByteArray storeBytes(const QString& path) {
+  return bytesOf(path) + bytesOf(path + "-wal");
+}
 
 // Acme's Atlas and client-less Hermes both have a "Design"; one name holds quotes. Nothing runs.
 class TrackCommand : public ::testing::Test {
@@ -260,11 +264,10 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
       // clang-format on
   };
   for (const auto& c : cases) {
-    const QByteArray store = bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal");
+    const QByteArray store = storeBytes(here.storePath());
     here.expect(c.arguments, c.code, c.says);
     if (c.code != 0 || c.arguments.contains("--dry-run")) {
-      EXPECT_EQ(bytesOf(here.storePath()) + bytesOf(here.storePath() + "-wal"), store)
-          << c.says.toStdString();
+      EXPECT_EQ(storeBytes(here.storePath()), store) << c.says.toStdString();
     }
   }
   here.expect({"log", "--range", "2026-03-04..2026-03-04"}, 0,
@@ -327,7 +330,7 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   here.expect({"backup", copy}, 1, "exists already");
   addProject("After");
   const QString store = here.storePath();
-  const QByteArray before = bytesOf(store) + bytesOf(store + "-wal");
+  const QByteArray before = storeBytes(store);
   const QList<std::pair<QStringList, QString>> refused = {
       {{"restore"}, "name the backup file"},
       {{"restore", here.file("notes.txt", "Not a data file.\n")}, "is not a Tessal data file"},
@@ -341,12 +344,12 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
     ASSERT_TRUE(desktop.start());
     here.expect({"restore", copy}, 1, "Tessal is running");
   }
-  EXPECT_EQ(bytesOf(store) + bytesOf(store + "-wal"), before);
+  EXPECT_EQ(storeBytes(store), before);
   const QString kept = here.expect({"restore", copy}, 0, "The replaced data file is kept as ")
                            .out.section("kept as ", 1)
                            .chopped(2);
   EXPECT_EQ(here.out({"list", "projects"}), "Before\n");
-  EXPECT_EQ(bytesOf(kept) + bytesOf(kept + "-wal"), before);
+  EXPECT_EQ(storeBytes(kept), before);
   QFile damaged(store);
   ASSERT_TRUE(damaged.open(QIODevice::WriteOnly | QIODevice::Truncate) && damaged.write("garbage") == 7);
   damaged.close();

@@ -34,14 +34,7 @@ class WTTypingAcrossSavesTest : public WindowTest {
     QTest::keyClick(editor, Qt::Key_Return);
     ASSERT_TRUE(QTest::qWaitFor([&] { return !editor || !editor->isVisible(); }, 2000));
   }
-  QStringList storedClientNames() {
-    QStringList names;
-    auto other = makeDelegate();
-    for (WTClient* client : WTClient::fetchByPredicate({}, other->managedObjectContext()))
-      names << client->name();
-    names.sort();
-    return names;
-  }
+  QStringList storedClientNames() { return storedNames<WTClient>(delegate->storePath()); }
 };
 
 // A save without changes ignores the editor; with changes it saves the text, and the row moves under it.
@@ -97,11 +90,7 @@ TEST_F(WTTypingAcrossSavesTest, TheOutlinesFieldAndEditorKeepFocusTextAndCursorA
   editor->setSelection(6, -3);  // "loy", cursor before it
   ASSERT_TRUE(saveWithOtherChanges());
   expectUntouched(editor, "Deploy", "loy", 3);
-  auto other = makeDelegate();
-  QStringList names;
-  for (WTProject* stored : WTProject::fetchByPredicate({}, other->managedObjectContext()))
-    for (WTTask* task : stored->tasks()) names << task->name();
-  EXPECT_TRUE(names.contains("Deploy")) << names.join(", ").toStdString();
+  EXPECT_TRUE(storedNames<WTTask>(delegate->storePath()).contains("Deploy"));
 }
 
 // Undo stays in the editor or keeps the focus, never reviving replaced text; quitting saves the edit.
@@ -147,15 +136,10 @@ TEST_F(WTTypingAcrossSavesTest, UndoOfTypingStaysInTheEditorAndUndoOfARecordLeav
 TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   synctest::LoopbackHttpServer server;
   qint64 iteration = 1;
-  QVariantMap pendingChange;
+  QVariantMap pendingChange = synctest::changeSet();
   server.handler = [&](const synctest::HttpRequest& request) {
-    const QVariantMap body = request.json();
-    QVariantMap reply{{"action", body.value("action")}, {"iteration", ++iteration}};
-    const QVariantMap nothing{{"i", QVariantMap{}}, {"u", QVariantMap{}}, {"x", QVariantList{}}};
-    if (body.value("action") == "head")
-      reply.insert("result", pendingChange.isEmpty() ? nothing : pendingChange);
-    if (body.value("action") == "head") pendingChange.clear();
-    return synctest::LoopbackHttpServer::json(reply);
+    if (request.json().value("action") != "head") return synctest::saveReply(++iteration);
+    return synctest::headReply(++iteration, std::exchange(pendingChange, synctest::changeSet()));
   };
   defaults->setValue("WTSyncServer", server.address());
   defaults->setValue("WTSyncUser", "typist@example.org");
@@ -174,11 +158,9 @@ TEST_F(WTTypingAcrossSavesTest, AMergedHeadReplyLeavesTheEditorAlone) {
   const qsizetype seen = server.requests.size();
   ASSERT_TRUE(synctest::waitUntil([&] { return server.requests.size() >= seen + 3; }));
   // Another record renamed, and a client that joins the list being edited.
-  pendingChange = QVariantMap{
-      {"i", QVariantMap{{"AA@WTClient", QVariantMap{{"name", "Aaron"}, {"uuid", "AA@WTClient"}}}}},
-      {"u", QVariantMap{{window->fetchProjects().value(0)->uuid(),
-                         QVariantMap{{"name", "Renamed on the laptop"}}}}},
-      {"x", QVariantList{}}};
+  pendingChange = synctest::changeSet(
+      {{"AA@WTClient", QVariantMap{{"name", "Aaron"}, {"uuid", "AA@WTClient"}}}},
+      {{window->fetchProjects().value(0)->uuid(), QVariantMap{{"name", "Renamed on the laptop"}}}});
   ASSERT_TRUE(synctest::waitUntil([&] {
     return window->fetchProjects().value(0)->name() == "Renamed on the laptop" &&
            WTClient::fetchByPredicate({}, delegate->managedObjectContext()).size() == 2;

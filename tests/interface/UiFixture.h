@@ -36,6 +36,15 @@ inline void type(QLineEdit* field, const QString& text, bool andReturn = false) 
   if (andReturn) QTest::keyClick(field, Qt::Key_Return);
 }
 
+// The tip shown over a point of a view's viewport, or nothing.
+inline QString tipAt(QAbstractItemView* view, QPoint point) {
+  QToolTip::hideText();  // fades out: wait until it is gone
+  EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
+  QHelpEvent help(QEvent::ToolTip, point, view->viewport()->mapToGlobal(point));
+  QApplication::sendEvent(view->viewport(), &help);
+  return QToolTip::isVisible() ? QToolTip::text() : QString();
+}
+
 // Receives what the desktop would open, in the desktop's place.
 class UrlCatcher : public QObject {
   Q_OBJECT
@@ -93,14 +102,6 @@ struct ShownOutline : Shown<WTItemsViewController> {
     const QRect visual = outline()->visualRect(rowOf(object));
     const QRectF row(0, visual.y(), outline()->viewport()->width(), visual.height());
     return controller.cellViewPrototypeForIndex(rowOf(object)).partRect(part, row).center().toPoint();
-  }
-  // The tip shown over a point of the viewport, or nothing.
-  QString tipAt(QPoint point) {
-    QToolTip::hideText();  // fades out: wait until it is gone
-    EXPECT_TRUE(QTest::qWaitFor([] { return !QToolTip::isVisible(); }, 2000));
-    QHelpEvent help(QEvent::ToolTip, point, outline()->viewport()->mapToGlobal(point));
-    QApplication::sendEvent(outline()->viewport(), &help);
-    return QToolTip::isVisible() ? QToolTip::text() : QString();
   }
   // The one line editor open in the outline once closed ones are gone, else nothing.
   QLineEdit* openEditor() {

@@ -266,7 +266,7 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
       {expense, Part::Cost, "double-click"},
   };
   for (const auto& [object, part, says] : tips) {
-    const QString tip = shown->tipAt(shown->centreOf(object, part));
+    const QString tip = tipAt(outline(), shown->centreOf(object, part));
     if (says.isEmpty() || object == design) {
       EXPECT_EQ(tip, says) << object->name().toStdString() << ' ' << int(part);
     } else {

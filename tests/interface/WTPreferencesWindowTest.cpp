@@ -179,7 +179,6 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");
 }
 
-// The timer settings are stored as they are changed, and shown again by the next window.
 TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
   defaults->setValue("WTIdleTime", 20);
   open();

@@ -150,7 +150,6 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
   }
 }
 
-// Every row showing a cost repaints at once when a rate above it changes.
 TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   WTTime* monday = makeItem<WTTime>(design, "Monday", at(2024, 3, 11, 9));
   WTTime* tuesday = makeItem<WTTime>(design, "Tuesday", at(2024, 3, 12, 9));
@@ -189,7 +188,6 @@ TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
   EXPECT_EQ(repaintedShowing(), std::pair(true, QString("45.00 75.00")));
 }
 
-// A task row's menu opens the rate sheet to set its rate; a client row's clears its rate.
 TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(design));
   ASSERT_NE(actionTitled(menu.get(), "Set Rate…"), nullptr);

@@ -58,7 +58,7 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   shownRows(popup)[3]->findChild<QToolButton*>("timerButton")->click();
   settle();
   EXPECT_TRUE(tasks[8]->running());
-  EXPECT_EQ(runningTimesOf(tasks[8]).size(), 1);
+  EXPECT_EQ(tasks[8]->runningTimes().size(), 1);
   EXPECT_TRUE(popup.isVisible());
   EXPECT_EQ(rowsOf(popup),
             QStringList({"T8:Stop 00:00", "T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T7:Start"}));

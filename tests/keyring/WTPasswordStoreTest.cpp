@@ -8,7 +8,6 @@
 #include <gtest/gtest.h>
 
 #include <QCoreApplication>
-#include <QDeadlineTimer>
 #include <QFile>
 #include <QLibrary>
 #include <QProcess>
@@ -18,6 +17,7 @@
 
 #include <sys/stat.h>
 
+#include <functional>
 #include <memory>
 #include <optional>
 
@@ -30,12 +30,8 @@ const QString kInFile = QStringLiteral("WTSyncPassword");
 const QString kKey = QStringLiteral("sync-password");
 
 // Runs the event loop until `answered` holds, for at most 30 seconds.
-template <class Answered>
-void waitUntil(Answered answered) {
-  const QDeadlineTimer deadline(30000);
-  while (!answered() && !deadline.hasExpired())
-    QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents, 50);
-  EXPECT_TRUE(answered()) << "no answer within 30 seconds";
+void waitUntil(const std::function<bool()>& answered) {
+  EXPECT_TRUE(waitForBus(answered, 30000)) << "no answer within 30 seconds";
 }
 
 Result<QString> readNow(WTKeychain& keychain) {

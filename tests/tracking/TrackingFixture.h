@@ -95,7 +95,6 @@ class TrackingTest : public ModelTest {
     time->setRunning(true);
     return time;
   }
-  QList<WTTime*> runningTimesOf(WTTask* task) const { return task->runningTimes(); }
   // The updater's saves go to the store file, counted in `saves`.
   void countSaves() {
     updater->setSaveCallback([this] { return ++saves, context->save().ok(); });

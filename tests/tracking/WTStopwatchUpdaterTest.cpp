@@ -10,7 +10,6 @@ namespace {
 
 using Answer = WTTrackingAlertAnswer;
 
-// Ticks total the running entries into badge and title, moving once per minute boundary.
 TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   WTTask* task = makeTask();
   WTTask* other = makeTask(nullptr, "Other");
@@ -157,10 +156,10 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
   for (WTTime* time : stopped)
     EXPECT_TRUE(!time->running() && time->endDate() == std::optional<Date>(idleStart));
   for (WTTime* time : untouched) EXPECT_TRUE(time->running() && !time->endDate());
-  ASSERT_EQ(runningTimesOf(twice).size() + runningTimesOf(once).size(), 2);
-  EXPECT_EQ(runningTimesOf(late).size(), 2) << "no new entry for a task whose entries all started later";
+  ASSERT_EQ(twice->runningTimes().size() + once->runningTimes().size(), 2);
+  EXPECT_EQ(late->runningTimes().size(), 2) << "no new entry for a task whose entries all started later";
   EXPECT_EQ(twice->times().size(), 3);
-  EXPECT_EQ(runningTimesOf(twice).front()->startDate(), std::optional<Date>(asked.addingSeconds(120)));
+  EXPECT_EQ(twice->runningTimes().front()->startDate(), std::optional<Date>(asked.addingSeconds(120)));
   EXPECT_EQ(updater->times().size(), 4);
   EXPECT_FALSE(updater->times().contains(stopped[0]));
 }
@@ -215,14 +214,14 @@ TEST_F(TrackingTest, SleepAndUnannouncedPausesOfferTheTimeAwayAsIdle) {
   updater->update();
   EXPECT_EQ(presenter.shown.size(), 1u);
   const Date lastAwake = clockNow;
-  WTTime* restarted = runningTimesOf(task).value(0);
+  WTTime* restarted = task->runningTimes().value(0);
   advance(2 * 3600);
   presenter.answers = {Answer::Alternate};
   updater->update();
   ASSERT_EQ(presenter.shown.size(), 2u);
   EXPECT_EQ(restarted->endDate(), std::optional<Date>(lastAwake))
       << "cut where the machine was last seen awake";
-  EXPECT_EQ(runningTimesOf(task).size(), 1);
+  EXPECT_EQ(task->runningTimes().size(), 1);
   advance(5);
   updater->update();
   ASSERT_EQ(presenter.shown.size(), 2u);
