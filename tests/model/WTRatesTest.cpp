@@ -124,21 +124,14 @@ TEST_F(WTRatesTest, RoundingRulesBillEachTimeEntryAndAreInheritedLikeRates) {
     defaults->setValue("WTRoundingMode",
                        preference.value(1).isEmpty() ? QVariant() : QVariant(preference[1]));
     for (const auto& [record, rule] :
-         {std::pair<WTObject*, const char*>{client, clientRule}, {project, projectRule}, {task, taskRule}}) {
-      for (const QString& part : QString::fromLatin1(rule).split(' ')) {
-        if (part == "-") continue;
-        bool number = false;
-        const int minutes = part.toInt(&number);
-        EXPECT_TRUE(number ? record->setValue("roundingMinutes", minutes)
-                           : record->setValue("roundingMode", part));
-      }
-    }
+         {std::pair<WTObject*, const char*>{client, clientRule}, {project, projectRule}, {task, taskRule}})
+      for (const QString& part : QString::fromLatin1(rule).split(' '))
+        EXPECT_TRUE(part == "-" ||
+                    record->setValue(part[0].isDigit() ? "roundingMinutes" : "roundingMode", part));
     QStringList minutes;
     int sum = 0;
-    for (const WTItem* item : items) {
-      minutes << QString::number(item->billedDuration());
-      sum += item->billedDuration();
-    }
+    for (const WTItem* item : items)
+      minutes << QString::number(item->billedDuration()), sum += item->billedDuration();
     EXPECT_EQ(minutes.join(' '), billed);
     EXPECT_EQ((std::vector{task->billedDuration(), project->billedDuration(), client->billedDuration()}),
               (std::vector{sum, sum, sum}));
@@ -309,18 +302,14 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
 // names none, and without a budget above zero nothing is measured.
 TEST(WTBudgetTest, LevelsAndTheLineAStepCrosses) {
   using L = WTBudget::Level;
+  // clang-format off
   const std::tuple<const char*, const char*, const char*, std::optional<L>, std::optional<L>> rows[] = {
       // billed before, after, budget; level after; line crossed
-      {"0", "79.99", "100", L::Within, {}},
-      {"79.99", "80", "100", L::Warning, L::Warning},
-      {"80", "100", "100", L::Warning, {}},
-      {"100", "100.01", "100", L::Over, L::Over},
-      {"10", "150", "100", L::Over, L::Over},
-      {"150", "10", "100", L::Within, {}},
-      {"0.0007", "0.0008", "0.001", L::Warning, L::Warning},
-      {"0", "5", "0", {}, {}},
-      {"0", "5", "-1", {}, {}},
-  };
+      {"0", "79.99", "100", L::Within, {}}, {"79.99", "80", "100", L::Warning, L::Warning},
+      {"80", "100", "100", L::Warning, {}}, {"100", "100.01", "100", L::Over, L::Over}, {"10", "150", "100", L::Over, L::Over},
+      {"150", "10", "100", L::Within, {}}, {"0.0007", "0.0008", "0.001", L::Warning, L::Warning},
+      {"0", "5", "0", {}, {}}, {"0", "5", "-1", {}, {}}};
+  // clang-format on
   for (const auto& [before, after, budget, level, crossed] : rows) {
     SCOPED_TRACE(std::string(before) + " → " + after + " of " + budget);
     EXPECT_EQ(WTBudget::level(dec(after), dec(budget)), level);
