@@ -40,7 +40,6 @@ std::string messageOf(Call&& call) {
   return "(nothing raised)";
 }
 
-// Only a match wholly within the range counts; ranges beyond the text raise.
 TEST(RXRegexRanges, AMatchCountsOnlyWithinTheRangeAndRangesBeyondTheTextRaise) {
   const QString digits = "0123456789", letters = "abcdef";
   const struct {
@@ -140,7 +139,6 @@ TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
             "flagged\nRXICURegexRegexOptions=2147483648");
 }
 
-// A pattern used again is not compiled again; a text changed after a search is searched anew.
 TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgainAndChangedTextsAreSearchedAnew) {
   const QString regex = "re(us)ed";
   RXRegex::rangeOfRegex("reused", regex);

@@ -66,18 +66,16 @@ QMap<QString, QString> storedValues(WTObjectContext& context) {
 
 TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   auto* client = WTClient::insertNewObject(context.get());
-  for (const auto& [key, value] : QVariantMap{
-           {"name", "Client Ü"},
-           {"addressBookUID", "ab:1"},
-           {"totalsUID", "tot"},
-           {"rate", "120.00"},
-           {"color", QColor(10, 20, 30, 40)},
-           {"archived", true},
-           {"currency", "KWD"},
-           {"address", "1 Main St\nSpringfield"},
-           {"roundingMinutes", 15},
-           {"roundingMode", "up"}}.asKeyValueRange())
-    EXPECT_TRUE(client->setValue(key, value)) << key.toStdString();
+  client->setName("Client Ü");
+  client->setAddressBookUID("ab:1");
+  client->setTotalsUID("tot");
+  client->setRate(dec("120.00"));
+  client->setColor(QColor(10, 20, 30, 40));
+  client->setArchived(true);
+  client->setCurrency("KWD");
+  client->setAddress("1 Main St\nSpringfield");
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
   auto* project = WTProject::insertNewObject(context.get());
   project->setClient(client);
   project->setBudget(dec("2500.00"));

@@ -83,8 +83,7 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   EXPECT_EQ(unanswered, 0);
 }
 
-// Bodies being read draw on one budget, as their bytes arrive: past it a request is answered 503 at
-// once, and what a request held goes back when its connection closes.
+// Past the bodies' budget a request is answered 503 at once; a closed connection gives back what it held.
 TEST_P(ServerHardeningTest, BodiesInFlightShareOneBudget) {
   options.maxBodyBytes = 96 << 10;
   options.limits.maxBodyMemory = 128 << 10;
@@ -154,8 +153,7 @@ TEST_P(ServerHardeningTest, RepliesWaitingForTheirReadersShareOneBudget) {
   EXPECT_LT(dropped, whole.size()) << "the reader that did not read was dropped";
 }
 
-// One address holds a few connections at most; the next one is answered 503 at once, and every other
-// address is served.
+// An address past its connections is answered 503 at once, and every other address is served.
 TEST_P(ServerHardeningTest, ConnectionsAreCappedPerAddress) {
   options.limits.maxConnectionsPerAddress = 3;
   startServer();

@@ -208,8 +208,7 @@ TEST_F(RZSyncManagerTest, ServerValueDropsThePendingKeyOfItsOwnSectionOnly) {
   EXPECT_EQ(client.find<WTTask>("A@WTTask")->notes(), "theirs");
 }
 
-// A save without answer keeps the journal; edits made while one is on its way outlive its reply and a
-// relaunch.
+// A save without answer keeps the journal; edits made while one is on its way outlive its reply, a relaunch.
 TEST_F(RZSyncManagerTest, SavesInFlightKeepTheJournal) {
   WTTask* task = syncedTask();
   task->setName("First");

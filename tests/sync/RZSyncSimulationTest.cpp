@@ -42,10 +42,8 @@ struct Expected {
       changed = false;
       for (auto it = values.begin(); it != values.end();) {
         const QString entity = it.key().section(u'@', -1);
-        const QString ownerKey = entity == "WTTask"      ? "project"
-                                 : entity == "WTProject" ? "client"
-                                 : entity == "WTClient"  ? ""
-                                                         : "task";
+        static const QHash<QString, QString> kOwners{{"WTTask", "project"}, {"WTProject", "client"}};
+        const QString ownerKey = entity == "WTClient" ? "" : kOwners.value(entity, "task");
         const QVariant owner = ownerKey.isEmpty() ? QVariant() : it.value().value(ownerKey);
         if (owner.typeId() != QMetaType::QString || !deleted.contains(owner.toString())) {
           ++it;
