@@ -31,6 +31,7 @@ class RecordingDelegate : public GXTemplateEngineDelegate {
   };
   void templateEngineBlockStarted(GXTemplateEngine*, const GXBlockInfo& b) override {
     events << "start " + b.name;
+    started.push_back(b);
   }
   void templateEngineBlockEnded(GXTemplateEngine*, const GXBlockInfo& b) override {
     events << "end " + b.name;
@@ -48,6 +49,7 @@ class RecordingDelegate : public GXTemplateEngineDelegate {
   }
   std::vector<Error> errors;
   QStringList events;
+  std::vector<GXBlockInfo> started;
 };
 
 // An engine with the ICU matcher and a recording delegate, as the report window sets one up.
@@ -128,26 +130,17 @@ TEST(TemplateGolden, EverySeedRendersItsGoldenOutput) {
 }
 
 TEST_F(EngineRunTest, BlockEventsCarryTheBlockAndHandlersKeepTheirNames) {
-  struct Blocks : RecordingDelegate {
-    void templateEngineBlockStarted(GXTemplateEngine* engine, const GXBlockInfo& block) override {
-      RecordingDelegate::templateEngineBlockStarted(engine, block);
-      started.push_back(block);
-    }
-    std::vector<GXBlockInfo> started;
-  } blocks;
-  engine.setDelegate(&blocks);
-  EXPECT_EQ(engine.processTemplate("ab{% for 1 to 2 %}x{% /for %}", {}), "abxx");
+  EXPECT_EQ(render("ab{% for 1 to 2 %}x{% /for %}"), "abxx");
   // One start and one end for the whole loop, not one per pass; the block's variables come after the event.
-  EXPECT_EQ(blocks.events, (QStringList{"start for", "end for", "finished"}));
-  ASSERT_EQ(blocks.started.size(), 1u);
-  const GXBlockInfo& b = blocks.started[0];
+  EXPECT_EQ(delegate.events, (QStringList{"start for", "end for", "finished"}));
+  ASSERT_EQ(delegate.started.size(), 1u);
+  const GXBlockInfo& b = delegate.started[0];
   EXPECT_TRUE(b.args == QStringList({"1", "to", "2"}) && b.endNames == QStringList{"/for"} &&
               b.startMarkerRange == (GXRange{2, 16}) && b.vars.isEmpty());
   // The first handler loaded for a name keeps it; each name a handler holds hears of a run's end.
   auto probe = std::make_shared<ProbeMarkers>(QStringList{"for", "both", "jump"});
   engine.loadMarker(probe);
   engine.loadMarker(nullptr);
-  engine.setDelegate(&delegate);
   EXPECT_EQ(render("{% for 1 to 3 %}{{ currentLoop.currentIndex }}{% /for %}{% both %}"), "123BOTH");
   EXPECT_EQ(probe->finishedCalls, 2);  // "both" and "jump"; "for" was taken
 }
