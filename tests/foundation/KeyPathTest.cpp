@@ -78,7 +78,8 @@ TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
       {{1, 2, qlonglong(3), 4u}, qlonglong(10), decVar("2.5")},
       {{true, false, true}, qlonglong(2), decVar("0.66666666666666666666666666666666666667")},
       {{QVariant(), 2, QVariant(), 4}, qlonglong(6), decVar("3")}, {{}, qlonglong(0), QVariant()},
-      {{QVariant(), QVariant()}, qlonglong(0), QVariant()}, {{decVar("12.30"), 1}, decVar("13.30"), decVar("6.65")},
+      {{QVariant(), QVariant()}, qlonglong(0), QVariant()},
+      {{decVar("12.30"), 1}, decVar("13.30"), decVar("6.65")},
       {{0.1, 0.2}, decVar("0.3"), decVar("0.15")},
       {{5, decVar("0.5"), -3}, decVar("2.5"), decVar("0.83333333333333333333333333333333333333")},
       {{big, big}, decVar("18446744073709551614"), decVar("9223372036854775807")},
@@ -116,12 +117,14 @@ TEST(KeyPathTest, ListsAndOperators) {
   const std::tuple<QVariant, const char*, QVariant> cases[] = {
       {named, "name", QVariantList{QString("Design"), {}, QString("Build"), {}}},
       {nested, "a", QVariantList{QVariantList{1, 2}, QVariantList{}}},
-      {words, "length", QVariantList{{}, {}, {}}}, {words, "@count", qlonglong(3)}, {words, "@min", QString("apple")},
+      {words, "length", QVariantList{{}, {}, {}}}, {words, "@count", qlonglong(3)},
+      {words, "@min", QString("apple")},
       {task, "items.@sum.duration", qlonglong(120)}, {items, "@sum.duration", qlonglong(120)},
       {project, "tasks.@sum.duration", qlonglong(0)},  // these tasks answer no duration
       {project, "tasks.items.@count", qlonglong(2)},  // a list of two lists
       {tasks, "@max.items.@count", qlonglong(3)}, {tasks, "@sum.items.@sum.duration", qlonglong(120)},
-      {QVariantList{1, QVariant(), 3}, "@count", qlonglong(3)}, {QVariantMap{{"a", 1}, {"b", 2}}, "@count", qlonglong(2)}};
+      {QVariantList{1, QVariant(), 3}, "@count", qlonglong(3)},
+      {QVariantMap{{"a", 1}, {"b", 2}}, "@count", qlonglong(2)}};
   // clang-format on
   for (const auto& [root, path, expected] : cases) EXPECT_EQ(eval(root, path), expected) << path;
   EXPECT_TRUE(eval(task, "items.@sum.cost").value<Decimal>().isIdenticalTo(dec("169.80")));

@@ -12,6 +12,7 @@ class WTRatesTest : public ModelTest {};
 
 // A broken chain has a literal at each level until a default rate is set; a client answers for its projects.
 TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
+  // clang-format off
   const std::tuple<bool, const char*, const char*, const char*, QVariant, QStringList> rows[] = {
       // linked, rates of client, project and task, the default rate; inherited rates of task, project, client
       {true, "120", nullptr, nullptr, {}, {"120", "120", "120"}},
@@ -21,6 +22,7 @@ TEST_F(WTRatesTest, RatesAreInheritedDownwardWithTheirOwnFallbacks) {
       {false, nullptr, nullptr, nullptr, {}, {"75", "50", "100"}},
       {false, nullptr, nullptr, nullptr, "90", {"90", "90", "90"}},
       {true, "110", nullptr, nullptr, "90", {"110", "110", "110"}}};
+  // clang-format on
   for (const auto& [linked, clientRate, projectRate, taskRate, defaultRate, expected] : rows) {
     SCOPED_TRACE(expected.join(' ').toStdString() + " default " + defaultRate.toString().toStdString());
     defaultRate.isNull() ? defaults->removeValue("WTDefaultRate")
@@ -92,18 +94,17 @@ TEST_F(WTRatesTest, ItemCostsAndSumsUpToClients) {
 // Each time entry is billed by the rule in force for its task, worked out anew on every read; the raw
 // minutes stay. Entries of 0, 7, 46, 5 and 14 minutes, one running for 7, and a flat fee of 7 minutes.
 TEST_F(WTRatesTest, RoundingRulesBillEachTimeEntryAndAreInheritedLikeRates) {
-  // Rules as "minutes mode", either part alone, or "-" for none: preferences, client, project, task.
+  // Rules as "minutes mode", either part alone, or "-" for none: preferences, client, project, task. A half
+  // goes up to the nearest.
+  // clang-format off
   const std::tuple<const char*, const char*, const char*, const char*, const char*> rows[] = {
-      {"-", "-", "-", "-", "0 7 46 5 14 7 7"},
-      {"-", "15 up", "-", "-", "0 15 60 15 15 15 7"},
-      {"-", "15 down", "-", "-", "0 0 45 0 0 0 7"},
-      {"-", "10 nearest", "-", "-", "0 10 50 10 10 10 7"},  // a half goes up
-      {"-", "15 up", "6", "-", "0 12 48 6 18 12 7"},
-      {"-", "15 up", "6 down", "30", "0 0 30 0 0 0 7"},
-      {"15 up", "-", "-", "-", "0 15 60 15 15 15 7"},
-      {"15 up", "1", "-", "-", "0 7 46 5 14 7 7"},
+      {"-", "-", "-", "-", "0 7 46 5 14 7 7"}, {"-", "15 up", "-", "-", "0 15 60 15 15 15 7"},
+      {"-", "15 down", "-", "-", "0 0 45 0 0 0 7"}, {"-", "10 nearest", "-", "-", "0 10 50 10 10 10 7"},
+      {"-", "15 up", "6", "-", "0 12 48 6 18 12 7"}, {"-", "15 up", "6 down", "30", "0 0 30 0 0 0 7"},
+      {"15 up", "-", "-", "-", "0 15 60 15 15 15 7"}, {"15 up", "1", "-", "-", "0 7 46 5 14 7 7"},
       {"15 nearest", "-", "-", "up", "0 15 60 15 15 15 7"},
       {"15 up", "-", "-", "0 nearest", "0 0 45 0 15 0 7"}};
+  // clang-format on
   setNow(berlin(2026, 3, 2, 12, 7));
   for (const auto& [preferences, clientRule, projectRule, taskRule, billed] : rows) {
     SCOPED_TRACE(std::string(preferences) + " / " + clientRule + " / " + projectRule + " / " + taskRule);
@@ -251,7 +252,8 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
       // A rule or a currency bills anew what is there: the raw totals stay.
       {"task rule", {}, [](Records& r) { r.task->setRoundingMinutes(45); }, "!task.duration !client.cost", "60 60 100"},
       {"task rule undone", [](Records& r) { r.task->setRoundingMinutes(45), r.task->setRoundingMode("down"); }, undo, "", "60 60 100"},
-      {"project rule", [](Records& r) { r.project->setRoundingMinutes(20); }, [](Records& r) { r.project->setRoundingMode("down"); }, "task.roundingRule", "60 60 100"},
+      {"project rule", [](Records& r) { r.project->setRoundingMinutes(20); },
+       [](Records& r) { r.project->setRoundingMode("down"); }, "task.roundingRule", "60 60 100"},
       {"client rule", {}, [](Records& r) { r.client->setRoundingMinutes(20); }, "", "60 60 100"},
       {"client currency", {}, [](Records& r) { r.client->setCurrency("JPY"); }, "!task.billedDuration", "60 60 100"},
       {"preferred rule", {}, [this](Records&) { defaults->setValue("WTRoundingMinutes", 45); }, "", "60 60 100"},
@@ -318,7 +320,8 @@ TEST(WTBudgetTest, LevelsAndTheLineAStepCrosses) {
   const std::tuple<const char*, const char*, const char*, std::optional<L>, std::optional<L>> rows[] = {
       // billed before, after, budget; level after; line crossed
       {"0", "79.99", "100", L::Within, {}}, {"79.99", "80", "100", L::Warning, L::Warning},
-      {"80", "100", "100", L::Warning, {}}, {"100", "100.01", "100", L::Over, L::Over}, {"10", "150", "100", L::Over, L::Over},
+      {"80", "100", "100", L::Warning, {}}, {"100", "100.01", "100", L::Over, L::Over},
+      {"10", "150", "100", L::Over, L::Over},
       {"150", "10", "100", L::Within, {}}, {"0.0007", "0.0008", "0.001", L::Warning, L::Warning},
       {"0", "5", "0", {}, {}}, {"0", "5", "-1", {}, {}}};
   // clang-format on

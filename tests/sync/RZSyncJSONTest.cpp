@@ -8,10 +8,11 @@ using synctest::dec;
 
 // Integers stay integers; other numbers are decimals written as they came (exponents written out).
 TEST(RZSyncJSON, NumbersKeepTheirKindAndDigits) {
+  // clang-format off
   const struct {
     const char *text, *written;  // written: "" for the text itself; "int" for an integer written as it came
-  } rows[] = {                   // clang-format off
-      {"7", "int"}, {"80", "int"}, {"-9223372036854775808", "int"}, {"18446744073709551615", ""},  // beyond qint64
+  } rows[] = {  // 18446744073709551615 is beyond qint64
+      {"7", "int"}, {"80", "int"}, {"-9223372036854775808", "int"}, {"18446744073709551615", ""},
       {"99999999999999999999999999999999999999", ""}, {"12.30", ""}, {"-0.5", ""}, {"0.10", ""},
       {"1234567890123456789012345678.0123456789", ""}, {"0.000000000000000000000000000000000001", ""},
       {"1e3", "1000"}, {"2.5E-1", "0.25"}};

@@ -85,11 +85,9 @@ TEST(RZSyncManagerEndpoint, ServerAddressBecomesTheEndpoint) {
       {"  sync.example.org:8443 ", "https://sync.example.org:8443/sync/tessal/sync.php"},
       {"http://127.0.0.1:8080/", "http://127.0.0.1:8080/sync/tessal/sync.php"},
       {"https://example.org/tessal/", "https://example.org/tessal/sync/tessal/sync.php"},
-      {"", ""},
-      {"ftp://example.org", ""},
-      {"https://", ""},
-      {"https://example.org/?a=b", ""},
-  };
+      // clang-format off
+      {"", ""}, {"ftp://example.org", ""}, {"https://", ""}, {"https://example.org/?a=b", ""}};
+  // clang-format on
   for (const auto& [server, endpoint] : cases)
     EXPECT_EQ(RZSyncManager::endpointURL(QString::fromLatin1(server)).toString(), endpoint) << server;
 }

@@ -110,16 +110,19 @@ TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
     const char* error;  // what the failure says; null when the reply is delivered
   } rows[] = {
       // clang-format off
-      {LoopbackHttpServer::json(QVariantMap{{"iteration", 3}}), nullptr}, {LoopbackHttpServer::raw("[1, 2]"), nullptr},
+      {LoopbackHttpServer::json(QVariantMap{{"iteration", 3}}), nullptr},
+      {LoopbackHttpServer::raw("[1, 2]"), nullptr},
       {LoopbackHttpServer::raw("{\"error\": \"x\", \"code\": 9}", 500), nullptr},
-      {LoopbackHttpServer::raw("\"just text\""), ""}, {LoopbackHttpServer::raw("42"), ""}, {LoopbackHttpServer::raw(""), ""},
+      {LoopbackHttpServer::raw("\"just text\""), ""}, {LoopbackHttpServer::raw("42"), ""},
+      {LoopbackHttpServer::raw(""), ""},
       {LoopbackHttpServer::raw("<html>Bad gateway</html>", 502, "text/html"), "502"},
       {LoopbackHttpServer::raw("The sync service cannot reach its storage; try again later.\n", 503, "text/plain"),
        "try again later"},
       {LoopbackHttpServer::raw("{\"iteration\": 6}", 307, "application/json",
                                "Location: " + elsewhere.url().toEncoded() + "\r\n"), "307"},
       {LoopbackHttpServer::raw("{\"pad\": \"" + QByteArray(4096, 'x') + "\"}"), "larger than 1024 bytes"},
-      {chunked + "2\r\n{}\r\n0\r\n\r\n", "larger than 1024 bytes"}, {arrays(64), nullptr}, {arrays(65), "more than 64 values"},
+      {chunked + "2\r\n{}\r\n0\r\n\r\n", "larger than 1024 bytes"}, {arrays(64), nullptr},
+      {arrays(65), "more than 64 values"},
       {LoopbackHttpServer::raw(R"({"result": {"i": {"a": {"b": [)" + QByteArray("1,").repeated(59) + "1]}}}}"),
        "more than 64 values"},
       {QByteArray(), ""}, {"closed", ""},
