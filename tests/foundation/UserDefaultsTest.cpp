@@ -19,10 +19,8 @@ QString described(const QVariant& value) {
     return "Date " + QString::number(value.value<Date>().secondsSince1970(), 'f', 6);
   return QString::fromLatin1(value.typeName()) + " " + value.toString();
 }
-QString described(const std::optional<Decimal>& value) {
-  return value ? described(QVariant::fromValue(*value)) : "-";
-}
-QString described(const std::optional<Date>& value) {
+template <class T>
+QString described(const std::optional<T>& value) {
   return value ? described(QVariant::fromValue(*value)) : "-";
 }
 
@@ -64,11 +62,9 @@ TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
       {"WTDefaultRate", QVariant::fromValue(dec("12.30"))},
       {"Tiny", QVariant::fromValue(dec("-0.000000000000000000000000000000000001"))},
       {"WTCustomRangeBegin", QVariant::fromValue(Date::fromSeconds(1709632800.123456))},
-      {"Old", QVariant::fromValue(Date::fromSeconds(-86399.75))},
-      {"Whole", QVariant::fromValue(Date::fromSeconds(1700000000))},
+      {"Old", QVariant::fromValue(Date::fromSeconds(-86399.75))}, {"Whole", QVariant::fromValue(Date::fromSeconds(1700000000))},
       {"DateTime", QDateTime::fromMSecsSinceEpoch(1700000000250, Qt::UTC)}, {"At", "@home"},
-      {"LooksLikeMarker", "@Decimal(1)"}, {"WTStopsOtherTimes", true},
-      {"WTLastSelectedProject", qlonglong(1) << 40},
+      {"LooksLikeMarker", "@Decimal(1)"}, {"WTStopsOtherTimes", true}, {"WTLastSelectedProject", qlonglong(1) << 40},
       {"Ratio", 1234567.5}};
   const QStringList expected = {"Decimal 12.30", "Decimal -0.000000000000000000000000000000000001",
       "Date 1709632800.123456", "Date -86399.750000", "Date 1700000000.000000", "Date 1700000000.250000",
@@ -112,8 +108,7 @@ TEST_F(UserDefaultsTest, TypedReads) {
       {"yes", "1 1 - - YES"}, {"no", "0 0 - - no"}, {"true", "1 1 - - true"}, {"false", "0 0 - - False"},
       {"one", "1 1 Decimal 1 - 1"}, {"zero", "0 0 Decimal 0 - 0"}, {"fraction", "1 2 Decimal 2.9 - 2.9"},
       {"negative", "1 -3 Decimal -3 - -3"}, {"word", "0 0 - - abc"}, {"rate", "1 80 Decimal 80 - 80"},
-      {"rate2", "1 80 Decimal 80.5 - 80.5"}, {"spaced", "1 12 Decimal 12.30 -  12.30 "},
-      {"missing", "0 0 - - "},
+      {"rate2", "1 80 Decimal 80.5 - 80.5"}, {"spaced", "1 12 Decimal 12.30 -  12.30 "}, {"missing", "0 0 - - "},
       {"date", "0 0 - Date 1709632800.000000 2024-03-05T10:00:00Z"},
       {"zoned", "0 0 - Date 1709632800.000000 2024-03-05T11:00:00+01:00"},
       {"registeredRate", "1 80 Decimal 80.5 - 80.5"}, {"decimal", "1 90 Decimal 90.00 - 90.00"},

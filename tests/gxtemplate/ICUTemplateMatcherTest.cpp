@@ -16,11 +16,6 @@ class MatcherTest : public ::testing::Test {
     matcher.engineSettingsChanged();
   }
 
-  std::shared_ptr<const GXTemplateMatch> first(const QString& text) {
-    use(text);
-    return matcher.firstMarkerWithinRange({0, std::uint64_t(text.size())});
-  }
-
   GXTemplateEngine engine;
   ICUTemplateMatcher matcher;
 };
@@ -40,9 +35,11 @@ TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
       // clang-format on
   };
   for (const auto& [text, expected] : cases) {
-    const std::shared_ptr<const GXTemplateMatch> m = first(QString::fromUtf8(text));
+    const GXRange whole{0, std::uint64_t(QString::fromUtf8(text).size())};
+    use(QString::fromUtf8(text));
+    const std::shared_ptr<const GXTemplateMatch> m = matcher.firstMarkerWithinRange(whole);
     ASSERT_TRUE(m) << text;
-    EXPECT_EQ(m->range, (GXRange{0, std::uint64_t(QString::fromUtf8(text).size())})) << text;
+    EXPECT_EQ(m->range, whole) << text;
     const QString described =
         QStringList{m->type, m->name.isNull() ? "-" : m->name, "[" + m->args.join(',') + "]",
                     m->filter.isNull() ? "-" : m->filter, "[" + m->filterArgs.join(',') + "]"}

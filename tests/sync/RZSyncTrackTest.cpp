@@ -109,10 +109,8 @@ TEST(RZSyncTrackStore, ALargeSaveIsJournaledInPiecesAndEachEntryStaysWhole) {
   RZSyncTrack track(context.store(), RZSyncTrack::Loading::OnDemand);
   context.setChangeJournal(&track);
   QList<WTTask*> tasks;
-  for (int i = 0; i < 10000; ++i) {
-    tasks.append(context.insertNewObject<WTTask>());
-    tasks.last()->setName(QString::number(i));
-  }
+  for (int i = 0; i < 10000; ++i)
+    (tasks << context.insertNewObject<WTTask>()).last()->setName(QString::number(i));
   ASSERT_TRUE(context.save().ok());
   EXPECT_FALSE(track.hasChanges());
   tasks.first()->setNotes("later");
@@ -141,8 +139,7 @@ TEST(RZSyncTrackStore, AnOlderStoresJournalFileMovesIntoItOnce) {
       {R"({"iteration": 3, "track": {"i": {"B@WTTask": {}}, "u": {"A@WTTask": {"name": "a", "rate": 12.30}},)"
        R"( "x": ["D@WTNote", "C@WTNote"]}})",
        3, R"({"i":{"B@WTTask":{}},"u":{"A@WTTask":{"name":"a","rate":12.30}},"x":["D@WTNote","C@WTNote"]})"},
-      {"", 0, nullptr}, {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr} /* cut short */,
-      {"[1, 2]", 0, nullptr},
+      {"", 0, nullptr}, {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr} /* cut short */, {"[1, 2]", 0, nullptr},
       {R"({"iteration": "7", "track": {}})", 0, nullptr}, {R"({"iteration": 7, "track": []})", 0, nullptr},
       {R"({"iteration": 7, "track": {"i": {"A@WTTask": 5}}})", 0, nullptr},
       {R"({"iteration": 7, "track": {"x": ["A@WTTask", 5]}})", 0, nullptr},
