@@ -265,8 +265,8 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
       {"a", "", "?email=a%40example.com", 415, ""},  // the fields in the query instead
       // From the server's own page (no headers given): the first of five attempts in the window.
       {"b", nullptr, "", 400, "The password is too long"}, {"c0", nullptr, "", 201, ""},
-      {"c1", nullptr, "", 201, ""},
-      {"c2", nullptr, "", 201, ""}, {"c3", nullptr, "", 201, ""}, {"d", nullptr, "", 429, "Retry-After:"},
+      {"c1", nullptr, "", 201, ""}, {"c2", nullptr, "", 201, ""}, {"c3", nullptr, "", 201, ""},
+      {"d", nullptr, "", 429, "Retry-After:"},
       // clang-format on
   };
   for (const auto& row : rows) {
