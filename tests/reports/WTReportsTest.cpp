@@ -15,8 +15,6 @@
 #include <QProcess>
 #include <QRegularExpression>
 
-#include <algorithm>
-
 namespace {
 
 QString readAll(const QString& path) {
@@ -52,18 +50,14 @@ class ReportTest : public ModelTest {
     setup->setMinutes(120);
 
     // The report sees what was saved: the store is read back from its file, and the records found again.
+    const QStringList uuids{client->uuid(), web->uuid(), backend->uuid(), design->uuid(), api->uuid()};
     saveAndReopen();
-    const auto named = [&](auto list, const char* name) {
-      const auto found = std::find_if(list.begin(), list.end(),
-                                      [&](auto* o) { return o->name() == QString::fromUtf8(name); });
-      EXPECT_NE(found, list.end()) << "no record named " << name;
-      return found == list.end() ? nullptr : *found;
-    };
-    client = named(context->fetch<WTClient>(), "Acme");
-    web = named(context->fetch<WTProject>(), "Web \"Site\"");
-    backend = named(context->fetch<WTProject>(), "Backend");
-    design = named(context->fetch<WTTask>(), "Design");
-    api = named(context->fetch<WTTask>(), "API");
+    client = WTClient::objectWithUUID(uuids[0], context.get());
+    web = WTProject::objectWithUUID(uuids[1], context.get());
+    backend = WTProject::objectWithUUID(uuids[2], context.get());
+    design = WTTask::objectWithUUID(uuids[3], context.get());
+    api = WTTask::objectWithUUID(uuids[4], context.get());
+    ASSERT_TRUE(client && web && backend && design && api);
   }
 
   void TearDown() override {
