@@ -1,7 +1,7 @@
 // Undo and redo after the autosave: file and journal follow as they follow the user's own changes.
 #include "ModelFixture.h"
 
-#include <algorithm>
+#include <utility>
 
 namespace {
 

@@ -19,7 +19,6 @@
 #include <future>
 #include <iostream>
 #include <random>
-#include <thread>
 
 using namespace synctest;
 
