@@ -147,7 +147,6 @@ TEST(DecimalTest, ComparesValuesAcrossScalesAndSigns) {
       EXPECT_EQ(dec(ascending[i]) <=> dec(ascending[j]), i <=> j) << ascending[i] << " vs " << ascending[j];
 }
 
-// Results beyond the largest value saturate, the other end fades to zero; negation makes no negative zero.
 TEST(DecimalTest, ResultsBeyondTheLargestValueSaturateAndNegationMakesNoNegativeZero) {
   const Decimal largest = dec("9.9999999999999999999999999999999999999E+999999"), tiny = dec("1E-999999");
   for (const Decimal& result :

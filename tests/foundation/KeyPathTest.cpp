@@ -73,22 +73,19 @@ TEST(KeyPathTest, NestedPathsThroughMapsHashesAndRecords) {
 TEST(KeyPathTest, SumAndAverageKeepIntegersAndTurnExactOnceDecimalsAppear) {
   const qlonglong big = std::numeric_limits<qlonglong>::max();
   const std::tuple<QVariantList, QVariant, QVariant> cases[] = {
-      // values, sum, average
+      // values, sum, average; booleans count as integers, doubles are summed exactly, other text is skipped
+      // clang-format off
       {{1, 2, qlonglong(3), 4u}, qlonglong(10), decVar("2.5")},
-      {{true, false, true},
-       qlonglong(2),
-       decVar("0.66666666666666666666666666666666666667")},  // booleans count as integers
-      {{QVariant(), 2, QVariant(), 4}, qlonglong(6), decVar("3")},
-      {{}, qlonglong(0), QVariant()},
+      {{true, false, true}, qlonglong(2), decVar("0.66666666666666666666666666666666666667")},
+      {{QVariant(), 2, QVariant(), 4}, qlonglong(6), decVar("3")}, {{}, qlonglong(0), QVariant()},
       {{QVariant(), QVariant()}, qlonglong(0), QVariant()},
       {{decVar("12.30"), 1}, decVar("13.30"), decVar("6.65")},
-      {{0.1, 0.2}, decVar("0.3"), decVar("0.15")},  // doubles are summed exactly
+      {{0.1, 0.2}, decVar("0.3"), decVar("0.15")},
       {{5, decVar("0.5"), -3}, decVar("2.5"), decVar("0.83333333333333333333333333333333333333")},
       {{big, big}, decVar("18446744073709551614"), decVar("9223372036854775807")},
-      {{std::numeric_limits<qulonglong>::max(), 1},
-       decVar("18446744073709551616"),
-       decVar("9223372036854775808")},
-      {{QString("2.25"), QString("n/a"), 1}, decVar("3.25"), decVar("1.625")},  // other text is skipped
+      {{std::numeric_limits<qulonglong>::max(), 1}, decVar("18446744073709551616"), decVar("9223372036854775808")},
+      {{QString("2.25"), QString("n/a"), 1}, decVar("3.25"), decVar("1.625")},
+      // clang-format on
   };
   for (const auto& [values, sum, avg] : cases) {
     SCOPED_TRACE(QVariant(values).toStringList().join(' ').toStdString());
@@ -120,12 +117,14 @@ TEST(KeyPathTest, ListsAndOperators) {
   const std::tuple<QVariant, const char*, QVariant> cases[] = {
       {named, "name", QVariantList{QString("Design"), {}, QString("Build"), {}}},
       {nested, "a", QVariantList{QVariantList{1, 2}, QVariantList{}}},
-      {words, "length", QVariantList{{}, {}, {}}}, {words, "@count", qlonglong(3)}, {words, "@min", QString("apple")},
+      {words, "length", QVariantList{{}, {}, {}}}, {words, "@count", qlonglong(3)},
+      {words, "@min", QString("apple")},
       {task, "items.@sum.duration", qlonglong(120)}, {items, "@sum.duration", qlonglong(120)},
       {project, "tasks.@sum.duration", qlonglong(0)},  // these tasks answer no duration
       {project, "tasks.items.@count", qlonglong(2)},  // a list of two lists
       {tasks, "@max.items.@count", qlonglong(3)}, {tasks, "@sum.items.@sum.duration", qlonglong(120)},
-      {QVariantList{1, QVariant(), 3}, "@count", qlonglong(3)}, {QVariantMap{{"a", 1}, {"b", 2}}, "@count", qlonglong(2)}};
+      {QVariantList{1, QVariant(), 3}, "@count", qlonglong(3)},
+      {QVariantMap{{"a", 1}, {"b", 2}}, "@count", qlonglong(2)}};
   // clang-format on
   for (const auto& [root, path, expected] : cases) EXPECT_EQ(eval(root, path), expected) << path;
   EXPECT_TRUE(eval(task, "items.@sum.cost").value<Decimal>().isIdenticalTo(dec("169.80")));

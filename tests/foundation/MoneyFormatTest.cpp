@@ -94,12 +94,10 @@ TEST(MoneyFormat, CurrenciesBillToTheirMinorUnit) {
     EXPECT_EQ(MoneyFormat::billed(value, currency).toString(), billed);
     EXPECT_EQ(MoneyFormat::format(value, currency), shown);
   }
-  for (const auto& [locale, currency] : {std::pair{"de_DE", "EUR"},
-                                         {"ja_JP", "JPY"},
-                                         {"en_US", "USD"},
-                                         {"de_CH", "CHF"},
-                                         {"ar_KW", "KWD"},
-                                         {"en", "USD"}}) {
+  // clang-format off
+  for (const auto& [locale, currency] :
+       {std::pair{"de_DE", "EUR"}, {"ja_JP", "JPY"}, {"en_US", "USD"}, {"de_CH", "CHF"}, {"ar_KW", "KWD"}, {"en", "USD"}}) {
+    // clang-format on
     const UserLocale there(locale);
     EXPECT_EQ(MoneyFormat::localeCurrency(), currency) << locale;
   }

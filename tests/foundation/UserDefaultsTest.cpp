@@ -19,10 +19,8 @@ QString described(const QVariant& value) {
     return "Date " + QString::number(value.value<Date>().secondsSince1970(), 'f', 6);
   return QString::fromLatin1(value.typeName()) + " " + value.toString();
 }
-QString described(const std::optional<Decimal>& value) {
-  return value ? described(QVariant::fromValue(*value)) : "-";
-}
-QString described(const std::optional<Date>& value) {
+template <class T>
+QString described(const std::optional<T>& value) {
   return value ? described(QVariant::fromValue(*value)) : "-";
 }
 
@@ -59,24 +57,19 @@ TEST_F(UserDefaultsTest, StoredValuesOverrideRegisteredDefaultsUntilRemovedAndAr
 
 // Decimals keep places, dates fractions; plain numbers and booleans read back as the file's text.
 TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
+  // clang-format off
   const std::pair<const char*, QVariant> written[] = {
       {"WTDefaultRate", QVariant::fromValue(dec("12.30"))},
       {"Tiny", QVariant::fromValue(dec("-0.000000000000000000000000000000000001"))},
       {"WTCustomRangeBegin", QVariant::fromValue(Date::fromSeconds(1709632800.123456))},
-      {"Old", QVariant::fromValue(Date::fromSeconds(-86399.75))},
-      {"Whole", QVariant::fromValue(Date::fromSeconds(1700000000))},
-      {"DateTime", QDateTime::fromMSecsSinceEpoch(1700000000250, Qt::UTC)},
-      {"At", "@home"},
-      {"LooksLikeMarker", "@Decimal(1)"},
-      {"WTStopsOtherTimes", true},
-      {"WTLastSelectedProject", qlonglong(1) << 40},
+      {"Old", QVariant::fromValue(Date::fromSeconds(-86399.75))}, {"Whole", QVariant::fromValue(Date::fromSeconds(1700000000))},
+      {"DateTime", QDateTime::fromMSecsSinceEpoch(1700000000250, Qt::UTC)}, {"At", "@home"},
+      {"LooksLikeMarker", "@Decimal(1)"}, {"WTStopsOtherTimes", true}, {"WTLastSelectedProject", qlonglong(1) << 40},
       {"Ratio", 1234567.5}};
-  const QStringList expected = {"Decimal 12.30",          "Decimal -0.000000000000000000000000000000000001",
-                                "Date 1709632800.123456", "Date -86399.750000",
-                                "Date 1700000000.000000", "Date 1700000000.250000",
-                                "QString @home",          "QString @Decimal(1)",
-                                "QString true",           "QString 1099511627776",
-                                "QString 1234567.5"};
+  const QStringList expected = {"Decimal 12.30", "Decimal -0.000000000000000000000000000000000001",
+      "Date 1709632800.123456", "Date -86399.750000", "Date 1700000000.000000", "Date 1700000000.250000",
+      "QString @home", "QString @Decimal(1)", "QString true", "QString 1099511627776", "QString 1234567.5"};
+  // clang-format on
   UserDefaults writer(path());
   for (const auto& [key, value] : written) writer.setValue(key, value);
   // `writer` stays alive: everything must already be in the file.

@@ -16,11 +16,6 @@ class MatcherTest : public ::testing::Test {
     matcher.engineSettingsChanged();
   }
 
-  std::shared_ptr<const GXTemplateMatch> first(const QString& text) {
-    use(text);
-    return matcher.firstMarkerWithinRange({0, std::uint64_t(text.size())});
-  }
-
   GXTemplateEngine engine;
   ICUTemplateMatcher matcher;
 };
@@ -40,9 +35,11 @@ TEST_F(MatcherTest, SplitsMarkersAndExpressions) {
       // clang-format on
   };
   for (const auto& [text, expected] : cases) {
-    const std::shared_ptr<const GXTemplateMatch> m = first(QString::fromUtf8(text));
+    const GXRange whole{0, std::uint64_t(QString::fromUtf8(text).size())};
+    use(QString::fromUtf8(text));
+    const std::shared_ptr<const GXTemplateMatch> m = matcher.firstMarkerWithinRange(whole);
     ASSERT_TRUE(m) << text;
-    EXPECT_EQ(m->range, (GXRange{0, std::uint64_t(QString::fromUtf8(text).size())})) << text;
+    EXPECT_EQ(m->range, whole) << text;
     const QString described =
         QStringList{m->type, m->name.isNull() ? "-" : m->name, "[" + m->args.join(',') + "]",
                     m->filter.isNull() ? "-" : m->filter, "[" + m->filterArgs.join(',') + "]"}
@@ -69,14 +66,11 @@ TEST_F(MatcherTest, FindsTheFirstMatchWithinTheRangeOnly) {
   auto at = [&](std::uint64_t location, std::uint64_t length) {
     return matcher.firstMarkerWithinRange({location, length});
   };
-  ASSERT_TRUE(at(0, text.size()));
-  EXPECT_EQ(at(0, text.size())->range, (GXRange{3, 7}));
-  EXPECT_EQ(at(4, text.size() - 4)->range, (GXRange{14, 7}));
+  ASSERT_TRUE(at(0, text.size()) && at(4, text.size() - 4));
+  EXPECT_EQ(std::pair(at(0, text.size())->range, at(4, text.size() - 4)->range),
+            std::pair(GXRange{3, 7}, GXRange{14, 7}));
   // A match reaching past the range is none, whatever was found from the same place before.
-  EXPECT_FALSE(at(0, 9));
-  EXPECT_TRUE(at(0, 10));
-  EXPECT_FALSE(at(10, 10));
-  EXPECT_FALSE(at(21, 3));
+  EXPECT_TRUE(!at(0, 9) && at(0, 10) && !at(10, 10) && !at(21, 3));
   EXPECT_THROW(at(0, text.size() + 1), RXRegex::RangeException);
 }
 

@@ -40,7 +40,6 @@ std::string messageOf(Call&& call) {
   return "(nothing raised)";
 }
 
-// Only a match wholly within the range counts; ranges beyond the text raise.
 TEST(RXRegexRanges, AMatchCountsOnlyWithinTheRangeAndRangesBeyondTheTextRaise) {
   const QString digits = "0123456789", letters = "abcdef";
   const struct {
@@ -140,7 +139,6 @@ TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
             "flagged\nRXICURegexRegexOptions=2147483648");
 }
 
-// A pattern used again is not compiled again; a text changed after a search is searched anew.
 TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgainAndChangedTextsAreSearchedAnew) {
   const QString regex = "re(us)ed";
   RXRegex::rangeOfRegex("reused", regex);
@@ -178,12 +176,11 @@ TEST(RXRegexCache, CollidingPatternsEvictEachOtherAndStillWork) {
 TEST(RXRegexCache, TextsThatDoNotOwnTheirCharactersAreCopied) {
   // Short and long texts of two slots share a buffer: each search must see its own characters.
   for (const qsizetype length : {qsizetype(40), qsizetype(5000)}) {
-    std::vector<QChar> one(size_t(length), u'a');
-    std::vector<QChar> two(size_t(length), u'b');
+    std::vector<QChar> one(size_t(length), u'a'), two(size_t(length), u'b');
     one[size_t(length - 3)] = u'X';
     two[size_t(length - 7)] = u'Y';
-    const QString rawOne = QString::fromRawData(one.data(), length);
-    const QString rawTwo = QString::fromRawData(two.data(), length);
+    const QString rawOne = QString::fromRawData(one.data(), length),
+                  rawTwo = QString::fromRawData(two.data(), length);
     for (int round = 0; round < 3; ++round) {
       EXPECT_EQ(RXRegex::rangeOfRegex(rawOne, "X"), range(length - 3, 1)) << length;
       EXPECT_EQ(RXRegex::rangeOfRegex(rawTwo, "Y"), range(length - 7, 1)) << length;

@@ -42,32 +42,6 @@ TEST_F(WTObjectContextTest, IdentitiesAndFetchesByEntityName) {
   EXPECT_EQ(WTProject::fetchByPredicate({}, context.get()).size(), 2);
 }
 
-// Saved records are journalled once each; a record made and removed between two saves leaves no trace.
-TEST_F(WTObjectContextTest, SavedRecordsAreJournalledOnceEach) {
-  auto* project = WTProject::insertNewObject(context.get());
-  WTTask* task = makeTask(project, "first");
-  task->setName("renamed before saving");
-  ASSERT_TRUE(context->save().ok());
-  const auto inserted = journal.callsFor(task->uuid());
-  ASSERT_EQ(inserted.size(), 1u);
-  EXPECT_EQ(QStringList({inserted[0].kind, inserted[0].values.value("name").toString()}),
-            QStringList({"insert", "renamed before saving"}));
-  EXPECT_EQ(KeyPath::objectFromVariant(inserted[0].values.value("project")), project);
-  EXPECT_TRUE(inserted[0].values.contains("uuid"));
-  const auto projectCalls = journal.callsFor(project->uuid());
-  ASSERT_EQ(projectCalls.size(), 1u);
-  EXPECT_EQ(projectCalls[0].values.value("tasks").value<WTOrderedRelationship>().objects,
-            QList<WTObject*>{task});
-
-  journal.calls.clear();
-  task->setBudget(dec("500"));
-  context->deleteObject(makeTask());
-  ASSERT_TRUE(context->save().ok());
-  ASSERT_EQ(journal.calls.size(), 1u);
-  EXPECT_EQ(journal.calls[0].uuid + journal.calls[0].kind + journal.calls[0].values.keys().join(','),
-            task->uuid() + "updatebudget");
-}
-
 // Every stored value of every record as text: decimals with their places, dates to the millisecond,
 // colours with their alpha, relationships by identity.
 QMap<QString, QString> storedValues(WTObjectContext& context) {

@@ -73,19 +73,16 @@ TEST_P(ServerCommandLineTest, AddUserServeWithFewDescriptorsStopAndRefusals) {
   ::kill(static_cast<pid_t>(server.processId()), SIGTERM);
   EXPECT_TRUE(server.waitForFinished(10000) && server.exitStatus() == QProcess::NormalExit &&
               server.exitCode() == 0);
-  const std::tuple<QStringList, int, const char*> rows[] = {
-      // arguments, exit code, standard input
+  // clang-format off
+  const std::tuple<QStringList, int, const char*> rows[] = {  // arguments, exit code, standard input
       {{"add-user", "cli@example.com", "--db", db}, 1, "another password\n"},  // taken
-      {{"add-user", "short@example.com", "--db", db}, 1, "short\n"},
-      {{}, 2, ""},
-      {{"start"}, 2, ""},
-      {{"serve", "--db", db}, 2, ""},
-      {{"serve", "--listen", "127.0.0.1:0"}, 2, ""},
+      {{"add-user", "short@example.com", "--db", db}, 1, "short\n"}, {{}, 2, ""}, {{"start"}, 2, ""},
+      {{"serve", "--db", db}, 2, ""}, {{"serve", "--listen", "127.0.0.1:0"}, 2, ""},
       {{"serve", "--listen", "localhost", "--db", db}, 2, ""},
       {{"serve", "--listen", "127.0.0.1:70000", "--db", db}, 2, ""},
       {{"serve", "--listen", "127.0.0.1:0", "--db", db, "--threads", "many"}, 2, ""},
-      {{"add-user", "--db", db}, 2, ""},
-  };
+      {{"add-user", "--db", db}, 2, ""}};
+  // clang-format on
   for (const auto& [arguments, exitCode, input] : rows) {
     const Outcome result = run(arguments, input);
     EXPECT_EQ(result.exitCode, exitCode) << arguments.join(' ').toStdString();

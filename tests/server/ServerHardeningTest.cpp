@@ -43,7 +43,6 @@ class ServerHardeningTest : public ServerTest {
   }
 };
 
-// Chunked floods are cut off as they arrive; slow connections and guesses never starve the owner's polls.
 TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPolls) {
   options.maxBodyBytes = 64 * 1024;
   options.threads = 4;
@@ -84,8 +83,7 @@ TEST_P(ServerHardeningTest, FloodsSlowConnectionsAndGuessesDoNotStarveADevicesPo
   EXPECT_EQ(unanswered, 0);
 }
 
-// Bodies being read draw on one budget, as their bytes arrive: past it a request is answered 503 at
-// once, and what a request held goes back when its connection closes.
+// Past the bodies' budget a request is answered 503 at once; a closed connection gives back what it held.
 TEST_P(ServerHardeningTest, BodiesInFlightShareOneBudget) {
   options.maxBodyBytes = 96 << 10;
   options.limits.maxBodyMemory = 128 << 10;
@@ -101,28 +99,19 @@ TEST_P(ServerHardeningTest, BodiesInFlightShareOneBudget) {
   auto holder = std::make_unique<RawConnection>(port());
   ASSERT_TRUE(holder->send(sized + padding));  // and never the rest
   std::this_thread::sleep_for(300ms);          // read by the server
-  const struct {
-    bool holderGone;
-    std::string request;
-    int status;
-  } rows[] = {
-      {false, sized + padding + body, 503},
-      {false,
-       requestHead("Connection: close\r\nTransfer-Encoding: chunked\r\n") + chunk(padding) + chunk(body) +
+  const std::pair<std::string, int> rows[] = {
+      {sized + padding + body, 503},
+      {requestHead("Connection: close\r\nTransfer-Encoding: chunked\r\n") + chunk(padding) + chunk(body) +
            "0\r\n\r\n",
        503},
-      {true, sized + padding + body, 200},
-  };
+      {sized + padding + body, 200}};  // once the holder is gone
   for (const auto& row : rows) {
-    if (row.holderGone) {
-      holder.reset();
-      std::this_thread::sleep_for(200ms);  // the server has seen it close
-    }
+    if (row.second == 200) holder.reset(), std::this_thread::sleep_for(200ms);  // the server saw it close
     RawConnection connection(port());
-    connection.send(row.request);
+    connection.send(row.first);
     const std::string reply = connection.readAll();
-    EXPECT_EQ(RawConnection::status(reply), row.status) << reply.substr(0, 300);
-    EXPECT_EQ(row.status == 503, reply.find("Retry-After: ") != std::string::npos) << reply.substr(0, 300);
+    EXPECT_EQ(RawConnection::status(reply), row.second) << reply.substr(0, 300);
+    EXPECT_EQ(row.second == 503, reply.find("Retry-After: ") != std::string::npos) << reply.substr(0, 300);
   }
 }
 
@@ -164,8 +153,7 @@ TEST_P(ServerHardeningTest, RepliesWaitingForTheirReadersShareOneBudget) {
   EXPECT_LT(dropped, whole.size()) << "the reader that did not read was dropped";
 }
 
-// One address holds a few connections at most; the next one is answered 503 at once, and every other
-// address is served.
+// An address past its connections is answered 503 at once, and every other address is served.
 TEST_P(ServerHardeningTest, ConnectionsAreCappedPerAddress) {
   options.limits.maxConnectionsPerAddress = 3;
   startServer();
@@ -176,19 +164,16 @@ TEST_P(ServerHardeningTest, ConnectionsAreCappedPerAddress) {
   std::vector<std::unique_ptr<RawConnection>> held;
   for (int i = 0; i < 3; ++i) held.push_back(std::make_unique<RawConnection>(port()));
   std::this_thread::sleep_for(200ms);  // accepted
-  const struct {
-    const char* from;
-    size_t stillHeld;
-    int status;
-  } rows[] = {{"127.0.0.1", 3, 503}, {"127.0.0.2", 3, 200}, {"127.0.0.1", 2, 200}};
-  for (const auto& row : rows) {
-    held.resize(row.stillHeld);
+  // From where, with how many still held: the status.
+  for (const auto& [from, stillHeld, status] :
+       {std::tuple{"127.0.0.1", 3, 503}, {"127.0.0.2", 3, 200}, {"127.0.0.1", 2, 200}}) {
+    held.resize(size_t(stillHeld));
     std::this_thread::sleep_for(200ms);  // the closed one is gone
-    RawConnection connection(port(), row.from);
+    RawConnection connection(port(), from);
     ASSERT_TRUE(connection.connected());
     connection.send(ask);
     const std::string reply = connection.readAll();
-    EXPECT_EQ(RawConnection::status(reply), row.status) << row.from << ": " << reply.substr(0, 300);
+    EXPECT_EQ(RawConnection::status(reply), status) << from << ": " << reply.substr(0, 300);
   }
 }
 
@@ -233,23 +218,19 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   std::string error;
   const std::unique_ptr<SyncServer> replica = SyncServer::create(storage_->location(), fresh, error);
   ASSERT_TRUE(replica && replica->start(error)) << error;
-  const struct {
-    const char *secret, *device, *from;  // from: X-Forwarded-For, as a proxy on loopback names a client
-    int outcome;                         // a status, or 2 for the error code
-  } replicaRows[] = {
-      {"guess", "", "", 2},
-      {"guess", "", "", 429},
-      {"password-of-", "laptop", "", 200},  // proven: past the lock on its address
-      {"password-of-", "phone", "", 429},   // new, at the guesser's address
-      {"password-of-", "phone", "198.51.100.7", 200},
-      {"password-of-", "phone", "", 200},  // proven now
-  };
-  for (const auto& row : replicaRows) {
-    const std::string secret = *row.secret == 'p' ? row.secret + user : row.secret;
-    const Reply reply = post(replica->port(), kSyncPath, requestBody(user, secret, "head", 0, row.device),
-                             "application/json", row.from);
-    EXPECT_EQ(row.outcome == 2 ? reply.code() : reply.status, row.outcome)
-        << row.secret << " " << row.device << " " << row.from << ": " << reply.body;
+  // Secret, device, X-Forwarded-For (as a proxy on loopback names a client): a status, or 2 for the error
+  // code. The laptop is proven: past the lock on its address; the phone is new, at the guesser's address.
+  // clang-format off
+  for (const auto& [secret, device, from, outcome] :
+       {std::tuple{"guess", "", "", 2}, {"guess", "", "", 429}, {"password-of-", "laptop", "", 200},
+        {"password-of-", "phone", "", 429}, {"password-of-", "phone", "198.51.100.7", 200},
+        {"password-of-", "phone", "", 200}}) {
+    // clang-format on
+    const Reply reply = post(replica->port(), kSyncPath,
+                             requestBody(user, *secret == 'p' ? secret + user : secret, "head", 0, device),
+                             "application/json", from);
+    EXPECT_EQ(outcome == 2 ? reply.code() : reply.status, outcome)
+        << secret << " " << device << " " << from << ": " << reply.body;
   }
 
   // Sign-ups from other sites, with the fields in the query or too often are refused, saying what is wrong.
@@ -278,17 +259,15 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
     int status;
     const char* says;  // a fragment of the reply
   } rows[] = {
-      {"a", "Origin: https://evil.example\r\n", "", 403, ""},
-      {"a", "Origin: null\r\n", "", 403, ""},
+      // clang-format off
+      {"a", "Origin: https://evil.example\r\n", "", 403, ""}, {"a", "Origin: null\r\n", "", 403, ""},
       {"a", "Referer: https://evil.example/form.html\r\n", "", 403, ""},
       {"a", "", "?email=a%40example.com", 415, ""},  // the fields in the query instead
       // From the server's own page (no headers given): the first of five attempts in the window.
-      {"b", nullptr, "", 400, "The password is too long"},
-      {"c0", nullptr, "", 201, ""},
-      {"c1", nullptr, "", 201, ""},
-      {"c2", nullptr, "", 201, ""},
-      {"c3", nullptr, "", 201, ""},
+      {"b", nullptr, "", 400, "The password is too long"}, {"c0", nullptr, "", 201, ""},
+      {"c1", nullptr, "", 201, ""}, {"c2", nullptr, "", 201, ""}, {"c3", nullptr, "", 201, ""},
       {"d", nullptr, "", 429, "Retry-After:"},
+      // clang-format on
   };
   for (const auto& row : rows) {
     const auto [reply, exists] = signUp(row.name, *row.name == 'b' ? tooLong : password,

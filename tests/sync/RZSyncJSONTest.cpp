@@ -8,20 +8,15 @@ using synctest::dec;
 
 // Integers stay integers; other numbers are decimals written as they came (exponents written out).
 TEST(RZSyncJSON, NumbersKeepTheirKindAndDigits) {
+  // clang-format off
   const struct {
     const char *text, *written;  // written: "" for the text itself; "int" for an integer written as it came
-  } rows[] = {{"7", "int"},
-              {"80", "int"},
-              {"-9223372036854775808", "int"},
-              {"18446744073709551615", ""},  // beyond qint64
-              {"99999999999999999999999999999999999999", ""},
-              {"12.30", ""},
-              {"-0.5", ""},
-              {"0.10", ""},
-              {"1234567890123456789012345678.0123456789", ""},
-              {"0.000000000000000000000000000000000001", ""},
-              {"1e3", "1000"},
-              {"2.5E-1", "0.25"}};
+  } rows[] = {  // 18446744073709551615 is beyond qint64
+      {"7", "int"}, {"80", "int"}, {"-9223372036854775808", "int"}, {"18446744073709551615", ""},
+      {"99999999999999999999999999999999999999", ""}, {"12.30", ""}, {"-0.5", ""}, {"0.10", ""},
+      {"1234567890123456789012345678.0123456789", ""}, {"0.000000000000000000000000000000000001", ""},
+      {"1e3", "1000"}, {"2.5E-1", "0.25"}};
+  // clang-format on
   for (const auto& [text, written] : rows) {
     const bool integer = QByteArray(written) == "int", asCame = integer || !*written;
     const QVariant value = RZSyncJSON::parse(text).value_or(QVariant());
@@ -46,8 +41,7 @@ TEST(RZSyncJSON, StringsAndContainers) {
   const QVariant value =
       *RZSyncJSON::parse(R"({"a": [1, true, false, null, "x", {}], "b": {"c": []}, "b": {"d": 1}})");
   const QVariantList a = value.toMap().value("a").toList();
-  EXPECT_EQ(a.value(1).typeId(), QMetaType::Bool);
-  EXPECT_FALSE(a.value(3).isValid());
+  EXPECT_TRUE(a.value(1).typeId() == QMetaType::Bool && !a.value(3).isValid());
   EXPECT_EQ(synctest::compact(value), R"({"a":[1,true,false,null,"x",{}],"b":{"d":1}})");
 }
 

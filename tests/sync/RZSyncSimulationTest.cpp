@@ -19,7 +19,6 @@
 #include <future>
 #include <iostream>
 #include <random>
-#include <thread>
 
 using namespace synctest;
 
@@ -42,10 +41,8 @@ struct Expected {
       changed = false;
       for (auto it = values.begin(); it != values.end();) {
         const QString entity = it.key().section(u'@', -1);
-        const QString ownerKey = entity == "WTTask"      ? "project"
-                                 : entity == "WTProject" ? "client"
-                                 : entity == "WTClient"  ? ""
-                                                         : "task";
+        static const QHash<QString, QString> kOwners{{"WTTask", "project"}, {"WTProject", "client"}};
+        const QString ownerKey = entity == "WTClient" ? "" : kOwners.value(entity, "task");
         const QVariant owner = ownerKey.isEmpty() ? QVariant() : it.value().value(ownerKey);
         if (owner.typeId() != QMetaType::QString || !deleted.contains(owner.toString())) {
           ++it;
@@ -457,9 +454,8 @@ TEST(RZSyncReplicaSimulation, RandomEditsOnThreeReplicasKilledWhileTheyAnswerCon
 // started again, it gets back what was saved since, and the server neither brings back what was deleted
 // since nor loses what the copy lacks.
 TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
-  const servertest::StorageLocation storage(GetParam());
   const QString user = Simulation::kUser, password = Simulation::kPassword;
-  servertest::LocalServer server(storage.location(), user.toStdString(), password.toStdString());
+  servertest::LocalServer server(storage_->location(), user.toStdString(), password.toStdString());
   SyncClient here(server.address(), user, password), there(server.address(), user, password);
   auto task = [](SyncClient& client, const QString& name, WTProject* project) {
     auto* task = client.context->insertNewObject<WTTask>();
@@ -513,11 +509,9 @@ TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
 // A journal larger than one save may carry (an import's) goes out in pieces, one after another within
 // the same poll, and reaches the other devices whole.
 TEST_P(RZSyncSimulation, ALargeJournalIsSentInPieces) {
-  const servertest::StorageLocation storage(GetParam());
-  servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
-                                 Simulation::kPassword.toStdString());
-  SyncClient here(server.address(), Simulation::kUser, Simulation::kPassword);
-  SyncClient there(server.address(), Simulation::kUser, Simulation::kPassword);
+  const QString user = Simulation::kUser, password = Simulation::kPassword;
+  servertest::LocalServer server(storage_->location(), user.toStdString(), password.toStdString());
+  SyncClient here(server.address(), user, password), there(server.address(), user, password);
   RZSyncManager::Intervals intervals = here.manager->intervals();
   intervals.recordsPerSave = 3;
   here.manager->setIntervals(intervals);

@@ -71,24 +71,15 @@ TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
   EXPECT_EQ(saved, R"({"i":{"C@WTClient":{"archived":false,"uuid":"C@WTClient"},)"
                    R"("T@WTTask":{"archived":false,"budget":12.30,"uuid":"T@WTTask"}},)"
                    R"("u":{"E@WTTime":{"endDate":1700000000}},"x":["C@WTClient"]})");
-  const auto stored = [&] {
-    const synctest::StoredJournal journal(path);
-    return std::to_string(journal.track.iteration()) + ' ' + compact(journal.track.dictionary());
-  };
-  EXPECT_EQ(stored(), "12 " + saved);
-  EXPECT_TRUE(synctest::StoredJournal(path)
-                  .track.entry(Section::Inserted, "T@WTTask")
-                  .value("budget")
-                  .value<Decimal>()
-                  .isIdenticalTo(dec("12.30")));
+  const auto stored = [&] { return synctest::storedJournal(path); };
+  EXPECT_EQ(stored(), "12 " + saved);  // 12.30 keeps its places
 
   task->setName("Design");
   task->setNotes(QString(64 * 1024, u'x'));
   struct rlimit old {};
   ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
   const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
-  struct rlimit small = old;
-  small.rlim_cur = 4096;
+  const rlimit small{4096, old.rlim_max};
   ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
   const Result<void> failed = context.save();
   setrlimit(RLIMIT_FSIZE, &old);
@@ -118,10 +109,8 @@ TEST(RZSyncTrackStore, ALargeSaveIsJournaledInPiecesAndEachEntryStaysWhole) {
   RZSyncTrack track(context.store(), RZSyncTrack::Loading::OnDemand);
   context.setChangeJournal(&track);
   QList<WTTask*> tasks;
-  for (int i = 0; i < 10000; ++i) {
-    tasks.append(context.insertNewObject<WTTask>());
-    tasks.last()->setName(QString::number(i));
-  }
+  for (int i = 0; i < 10000; ++i)
+    (tasks << context.insertNewObject<WTTask>()).last()->setName(QString::number(i));
   ASSERT_TRUE(context.save().ok());
   EXPECT_FALSE(track.hasChanges());
   tasks.first()->setNotes("later");
@@ -145,17 +134,16 @@ TEST(RZSyncTrackStore, AnOlderStoresJournalFileMovesIntoItOnce) {
     qint64 iteration;
     const char* loaded;  // null: kept aside
   } rows[] = {
+      // clang-format off
       {nullptr, 0, kEmpty},
       {R"({"iteration": 3, "track": {"i": {"B@WTTask": {}}, "u": {"A@WTTask": {"name": "a", "rate": 12.30}},)"
        R"( "x": ["D@WTNote", "C@WTNote"]}})",
        3, R"({"i":{"B@WTTask":{}},"u":{"A@WTTask":{"name":"a","rate":12.30}},"x":["D@WTNote","C@WTNote"]})"},
-      {"", 0, nullptr},
-      {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr},  // cut short
-      {"[1, 2]", 0, nullptr},
-      {R"({"iteration": "7", "track": {}})", 0, nullptr},
-      {R"({"iteration": 7, "track": []})", 0, nullptr},
+      {"", 0, nullptr}, {"{\"iteration\": 3, \"track\": {\"i\": {", 0, nullptr} /* cut short */, {"[1, 2]", 0, nullptr},
+      {R"({"iteration": "7", "track": {}})", 0, nullptr}, {R"({"iteration": 7, "track": []})", 0, nullptr},
       {R"({"iteration": 7, "track": {"i": {"A@WTTask": 5}}})", 0, nullptr},
       {R"({"iteration": 7, "track": {"x": ["A@WTTask", 5]}})", 0, nullptr},
+      // clang-format on
   };
   for (const auto& row : rows) {
     SCOPED_TRACE(row.text ? row.text : "(no file)");
@@ -247,7 +235,7 @@ TEST(RZSyncTrackSections, ChangesCombinePerRecord) {
   EXPECT_FALSE(track.hasChanges());
 }
 
-// Saves fill the journal; unordered sides are left out and cleared values go out as null.
+// Saves fill the journal, once per record; unordered sides are left out and cleared values go out as null.
 TEST(RZSyncTrackContext, SavesReportInsertionsUpdatesAndDeletions) {
   QTemporaryDir dir;
   WTObjectContext context;
@@ -288,6 +276,7 @@ TEST(RZSyncTrackContext, SavesReportInsertionsUpdatesAndDeletions) {
   second->setProject(project);
   project->moveTask(second, 0);
   expense->setExpense(dec("7.05"));
+  context.deleteObject(make((WTTask*)nullptr, "G"));  // made and removed between two saves: no trace
   EXPECT_EQ(saved(),
             R"({"i":{"S@WTTask":{"archived":false,"project":"P@WTProject","uuid":"S@WTTask"}},"u":{)"
             R"("E@WTExpense":{"expense":7.05},"P@WTProject":{"tasks":["S@WTTask","T@WTTask"]}},"x":[]})");

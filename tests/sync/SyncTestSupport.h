@@ -220,6 +220,11 @@ struct StoredJournal {
   std::unique_ptr<WTStore> store;
   RZSyncTrack track;
 };
+// The same as one line: "iteration {changes}".
+inline std::string storedJournal(const QString& storePath) {
+  const StoredJournal stored(storePath);
+  return std::to_string(stored.track.iteration()) + ' ' + compact(stored.track.dictionary());
+}
 
 // A stored value in journal form (an item's own rate, not its task's; a task order as uuids).
 inline QVariant storedValue(const WTObject* object, const QString& key) {
