@@ -395,7 +395,10 @@ void GXTemplateStandardMarkers::endForMarker(bool& blockEnded, bool& outputEnabl
 
 bool GXTemplateStandardMarkers::condition(const QStringList& args) {
   if (args.size() == 1) return argIsTrue(args[0]);
-  const QString op = args[1].toLower();
+  // Most operators are symbols: no lowered copy for those.
+  const QString& written = args[1];
+  const bool lettered = std::any_of(written.cbegin(), written.cend(), [](QChar c) { return c.isUpper(); });
+  const QString op = lettered ? written.toLower() : written;
   const bool logical = op == QLatin1String("and") || op == QLatin1String("&&") || op == QLatin1String("or") ||
                        op == QLatin1String("||");
   const bool textual = op == QLatin1String("equalsstring") || op == QLatin1String("notequalsstring");
