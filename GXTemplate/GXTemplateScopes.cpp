@@ -79,11 +79,16 @@ struct GXTemplateScopes::Place {
 };
 
 GXTemplateScopes::Name& GXTemplateScopes::nameOf(const QString& variable) {
+  Recent& recent = recent_[(reinterpret_cast<quintptr>(variable.constData()) / sizeof(char16_t)) % recent_.size()];
+  if (recent.name && QStringView(recent.text) == QStringView(variable)) return *recent.name;
   auto it = names_.find(variable);
-  if (it != names_.end()) return it->second;
-  Name name;
-  name.components = variable.split(u'.');
-  return names_.emplace(variable, std::move(name)).first->second;
+  if (it == names_.end()) {
+    Name name;
+    name.components = variable.split(u'.');
+    it = names_.emplace(variable, std::move(name)).first;
+  }
+  recent = {variable, &it->second};
+  return it->second;
 }
 
 QVariantMap* GXTemplateScopes::rootFor(Name& name, const QVariant** entry) {
@@ -321,7 +326,10 @@ void GXTemplateScopes::addGlobals(const QVariantMap& entries) {
 
 void GXTemplateScopes::beginRun(const QVariantMap& variables) {
   // Names are kept from run to run, but not without bound.
-  if (names_.size() > 4096) names_.clear();
+  if (names_.size() > 4096) {
+    recent_.fill({});
+    names_.clear();
+  }
   runVariables_ = variables;  // values, not references: the caller's variables stay as they are
   ++valuesVersion_;
   ++rootKeysVersion_;
