@@ -73,9 +73,9 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     return failure(err, WTStore::openReadOnly(storePath).error().message);
   }
   // A few records change and a failed save is reported at once: no need to read the whole file first.
-  Result<std::unique_ptr<WTStore>> store = RZSyncTrack::openStore(storePath, nullptr, WTStore::Check::Header);
+  Result<std::unique_ptr<WTStore>> store =
+      RZSyncTrack::openStore(storePath, nullptr, WTStore::Check::Header, WTStore::LogOnClose::KeepWhileShort);
   if (!store) return storeFailure(err, store.error());
-  store.value()->keepLogOnClose();
   WTStore::Records which =
       WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;
   QStringList tasks;
