@@ -79,7 +79,11 @@ struct GXTemplateScopes::Place {
 };
 
 GXTemplateScopes::Name& GXTemplateScopes::nameOf(const QString& variable) {
-  Recent& recent = recent_[(reinterpret_cast<quintptr>(variable.constData()) / sizeof(char16_t)) % recent_.size()];
+  // Texts are allocated on 16-byte boundaries: the address is mixed, and the product's top six bits
+  // choose one of the 64 slots.
+  const quint64 mixed = quint64(reinterpret_cast<quintptr>(variable.constData())) * 0x9E3779B97F4A7C15ull;
+  static_assert(std::tuple_size_v<decltype(recent_)> == 64);
+  Recent& recent = recent_[size_t(mixed >> 58)];
   if (recent.name && QStringView(recent.text) == QStringView(variable)) return *recent.name;
   auto it = names_.find(variable);
   if (it == names_.end()) {
