@@ -138,6 +138,7 @@ void GXTemplateEngine::beginRun(const QString& templateText, const QVariantMap& 
   openBlockHandlers_.clear();
   // Before the scopes begin: prepared entries point into the names they may forget.
   prepared_.clear();
+  preparedAt_.assign(size_t(templateText.size()) + 1, -1);
   const QVariantMap delimiters{{QStringLiteral("markerStart"), markerStartDelimiter_},
                                {QStringLiteral("markerEnd"), markerEndDelimiter_},
                                {QStringLiteral("expressionStart"), expressionStartDelimiter_},
@@ -224,9 +225,14 @@ bool GXTemplateEngine::handleLiteralMarker(const GXTemplateMatch& match, Run& ru
 }
 
 GXTemplateEngine::Prepared& GXTemplateEngine::prepared(const std::shared_ptr<const GXTemplateMatch>& match) {
-  Prepared& entry = prepared_[match.get()];
-  if (!entry.match) entry.match = match;
-  return entry;
+  const size_t at = size_t(match->range.location);
+  if (at >= preparedAt_.size()) preparedAt_.resize(at + 1, -1);
+  std::int32_t& slot = preparedAt_[at];
+  if (slot < 0 || prepared_[size_t(slot)].match != match) {
+    slot = std::int32_t(prepared_.size());
+    prepared_.push_back({match});
+  }
+  return prepared_[size_t(slot)];
 }
 
 void GXTemplateEngine::handleExpression(const std::shared_ptr<const GXTemplateMatch>& match, Run& run) {

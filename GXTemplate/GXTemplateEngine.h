@@ -15,6 +15,7 @@
 #include <QVariant>
 #include <QVariantMap>
 
+#include <cstdint>
 #include <memory>
 #include <unordered_map>
 #include <vector>
@@ -166,14 +167,17 @@ class GXTemplateEngine {
 
   qint64 maximumSteps_ = 200'000'000;
   qint64 maximumOutputLength_ = qint64(256) * 1024 * 1024;
-  // What the engine looked up for each match of the current run, found again by the match's address (the
-  // match is held, so its address is not reused). Only handlers and filters that exist are kept: a name
-  // unknown now may be loaded later in the run.
+  // What the engine looked up for each match of the current run, found again by where the match starts
+  // in the template: preparedAt_ holds the entry's index in prepared_, or -1. An entry is the match's
+  // only while it holds that match (a handler may have run a template of its own meanwhile). Only
+  // handlers and filters that exist are kept: a name unknown now may be loaded later in the run. An
+  // entry is good until the next call of prepared().
   struct Prepared {
     std::shared_ptr<const GXTemplateMatch> match;
     GXTemplateMarker* handler = nullptr;
     GXTemplateFilter* filter = nullptr;
     GXTemplateScopes::Name* name = nullptr;
   };
-  std::unordered_map<const GXTemplateMatch*, Prepared> prepared_;
+  std::vector<std::int32_t> preparedAt_;
+  std::vector<Prepared> prepared_;
 };

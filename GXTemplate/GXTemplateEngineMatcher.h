@@ -17,7 +17,7 @@ struct GXTemplateMatch {
   QString filter;          // null when there was no filter part
   QStringList filterArgs;  // empty when there were none
 
-  bool isMarker() const { return type == QLatin1String("marker"); }
+  bool isMarker() const { return QStringView(type) == QStringView(u"marker"); }
 };
 
 // Finds markers and expressions for the engine. Made over an engine, which it does not own.

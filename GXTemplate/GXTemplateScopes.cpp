@@ -79,11 +79,20 @@ struct GXTemplateScopes::Place {
 };
 
 GXTemplateScopes::Name& GXTemplateScopes::nameOf(const QString& variable) {
+  // Texts are allocated on 16-byte boundaries: the address is mixed, and the product's top six bits
+  // choose one of the 64 slots.
+  const quint64 mixed = quint64(reinterpret_cast<quintptr>(variable.constData())) * 0x9E3779B97F4A7C15ull;
+  static_assert(std::tuple_size_v<decltype(recent_)> == 64);
+  Recent& recent = recent_[size_t(mixed >> 58)];
+  if (recent.name && QStringView(recent.text) == QStringView(variable)) return *recent.name;
   auto it = names_.find(variable);
-  if (it != names_.end()) return it->second;
-  Name name;
-  name.components = variable.split(u'.');
-  return names_.emplace(variable, std::move(name)).first->second;
+  if (it == names_.end()) {
+    Name name;
+    name.components = variable.split(u'.');
+    it = names_.emplace(variable, std::move(name)).first;
+  }
+  recent = {variable, &it->second};
+  return it->second;
 }
 
 QVariantMap* GXTemplateScopes::rootFor(Name& name, const QVariant** entry) {
@@ -321,7 +330,10 @@ void GXTemplateScopes::addGlobals(const QVariantMap& entries) {
 
 void GXTemplateScopes::beginRun(const QVariantMap& variables) {
   // Names are kept from run to run, but not without bound.
-  if (names_.size() > 4096) names_.clear();
+  if (names_.size() > 4096) {
+    recent_.fill({});
+    names_.clear();
+  }
   runVariables_ = variables;  // values, not references: the caller's variables stay as they are
   ++valuesVersion_;
   ++rootKeysVersion_;

@@ -8,6 +8,7 @@
 #include <QVariant>
 #include <QVariantMap>
 
+#include <array>
 #include <unordered_map>
 #include <vector>
 
@@ -80,6 +81,15 @@ class GXTemplateScopes {
   QVariantMap globals_;
   QVariantMap runVariables_;
   std::unordered_map<QString, Name, GXTemplateValue::StringHash> names_;
+  // The names last asked for, each in a slot chosen by the address of its text: a run asks for the same
+  // name through the same argument of the same marker again and again, and comparing a short text costs
+  // less than hashing it. A slot's text is compared whole, so an address used again by another text
+  // finds nothing wrong.
+  struct Recent {
+    QString text;
+    Name* name = nullptr;
+  };
+  std::array<Recent, 64> recent_;
   // Moves on whenever a variable may have changed: a value set, a block with values closed, a run begun.
   quint64 valuesVersion_ = 1;
   // Moves on whenever the run's variables or the globals may have gained a key.

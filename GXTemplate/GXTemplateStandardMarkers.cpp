@@ -48,27 +48,27 @@ enum class Marker {
 
 // The marker a name stands for: its length narrows the candidates to one or a few comparisons.
 Marker markerKind(const QString& name) {
-  auto is = [&name](const char* text) { return name == QLatin1String(text); };
+  auto is = [&name](QStringView text) { return QStringView(name) == text; };
   switch (name.size()) {
     case 2:
-      return is("if") ? Marker::If : Marker::None;
+      return is(u"if") ? Marker::If : Marker::None;
     case 3:
-      return is("for")   ? Marker::For
-             : is("/if") ? Marker::EndIf
-             : is("now") ? Marker::Now
-             : is("set") ? Marker::Set
+      return is(u"for")   ? Marker::For
+             : is(u"/if") ? Marker::EndIf
+             : is(u"now") ? Marker::Now
+             : is(u"set") ? Marker::Set
                          : Marker::None;
     case 4:
-      return is("/for")   ? Marker::EndFor
-             : is("else") ? Marker::Else
-             : is("load") ? Marker::Load
+      return is(u"/for")   ? Marker::EndFor
+             : is(u"else") ? Marker::Else
+             : is(u"load") ? Marker::Load
                           : Marker::None;
     case 5:
-      return is("cycle") ? Marker::Cycle : Marker::None;
+      return is(u"cycle") ? Marker::Cycle : Marker::None;
     case 7:
-      return is("section") ? Marker::Section : is("comment") ? Marker::Comment : Marker::None;
+      return is(u"section") ? Marker::Section : is(u"comment") ? Marker::Comment : Marker::None;
     case 8:
-      return is("/section") ? Marker::EndSection : is("/comment") ? Marker::EndComment : Marker::None;
+      return is(u"/section") ? Marker::EndSection : is(u"/comment") ? Marker::EndComment : Marker::None;
     default:
       return Marker::None;
   }
@@ -395,7 +395,10 @@ void GXTemplateStandardMarkers::endForMarker(bool& blockEnded, bool& outputEnabl
 
 bool GXTemplateStandardMarkers::condition(const QStringList& args) {
   if (args.size() == 1) return argIsTrue(args[0]);
-  const QString op = args[1].toLower();
+  // Most operators are symbols: no lowered copy for those.
+  const QString& written = args[1];
+  const bool lettered = std::any_of(written.cbegin(), written.cend(), [](QChar c) { return c.isUpper(); });
+  const QString op = lettered ? written.toLower() : written;
   const bool logical = op == QLatin1String("and") || op == QLatin1String("&&") || op == QLatin1String("or") ||
                        op == QLatin1String("||");
   const bool textual = op == QLatin1String("equalsstring") || op == QLatin1String("notequalsstring");

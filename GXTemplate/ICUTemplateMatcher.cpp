@@ -5,6 +5,8 @@
 
 #include <unicode/uchar.h>
 
+#include <limits>
+
 namespace {
 
 // Start delimiter, optional blanks, the body (lazy, so the first filter delimiter ends it), an optional
@@ -35,6 +37,7 @@ ICUTemplateMatcher::ICUTemplateMatcher(GXTemplateEngine* engine) : engine_(engin
 
 void ICUTemplateMatcher::engineSettingsChanged() {
   found_.clear();
+  foundAt_.clear();
   if (!engine_) return;
   markerStart_ = engine_->markerStartDelimiter();
   markerEnd_ = engine_->markerEndDelimiter();
@@ -46,6 +49,9 @@ void ICUTemplateMatcher::engineSettingsChanged() {
   const QString markerPattern = kPartPattern.arg(markerStart_, filterDelimiter_, markerEnd_);
   const QString expressionPattern = kPartPattern.arg(exprStart_, filterDelimiter_, exprEnd_);
   regex_ = QStringLiteral("(?m)(?:%1|%2)").arg(markerPattern, expressionPattern);
+  // A template too long for the index is searched afresh from every position.
+  if (templateString_.size() < std::numeric_limits<std::int32_t>::max())
+    foundAt_.assign(size_t(templateString_.size()) + 1, -1);
   possibleStart_.assign(size_t(templateString_.size()) + 1, 0);
   markPossibleStarts(markerStart_, markerEnd_);
   markPossibleStarts(exprStart_, exprEnd_);
@@ -103,20 +109,25 @@ std::shared_ptr<const GXTemplateMatch> ICUTemplateMatcher::firstMarkerWithinRang
   }
   // The search is not bounded by the range's end, so what it finds from a position is the same for every
   // range starting there; only the check against the end differs.
-  // Looked up without detaching: the table is only ever written below.
-  auto it = found_.constFind(range.location);
-  if (it == found_.cend()) {
-    Found found;
+  const bool indexed = range.location < foundAt_.size();
+  if (!indexed || foundAt_[range.location] < 0) {
+    std::shared_ptr<const GXTemplateMatch> found;
     std::uint64_t from = range.location;
     while (from < possibleStart_.size() && !possibleStart_[from]) ++from;
     if (from < possibleStart_.size()) {
       const GXRange toEnd{from, length - from};
       const GXRange match = RXRegex::rangeOfRegex(templateString_, regex_, 0, toEnd, 0, nullptr);
-      if (isFound(match)) found.match = std::make_shared<const GXTemplateMatch>(parse(match));
+      if (isFound(match)) found = std::make_shared<const GXTemplateMatch>(parse(match));
     }
-    it = found_.insert(range.location, found);
+    if (!indexed) return within(found, range);
+    foundAt_[range.location] = std::int32_t(found_.size());
+    found_.push_back(std::move(found));
   }
-  const std::shared_ptr<const GXTemplateMatch>& match = it->match;
+  return within(found_[size_t(foundAt_[range.location])], range);
+}
+
+std::shared_ptr<const GXTemplateMatch> ICUTemplateMatcher::within(
+    const std::shared_ptr<const GXTemplateMatch>& match, GXRange range) {
   if (!match || match->range.location + match->range.length > range.location + range.length) return nullptr;
   return match;
 }

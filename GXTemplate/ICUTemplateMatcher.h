@@ -2,10 +2,10 @@
 
 #include "GXTemplateEngineMatcher.h"
 
-#include <QHash>
 #include <QString>
 #include <QStringList>
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <vector>
@@ -53,12 +53,10 @@ class ICUTemplateMatcher : public GXTemplateEngineMatcher {
   static bool isPatternLineEnd(char16_t c);
 
  private:
-  // What a search from one position found: the match (not yet checked against a range), or nothing.
-  struct Found {
-    std::shared_ptr<const GXTemplateMatch> match;
-  };
-
   GXTemplateMatch parse(GXRange matchRange) const;
+  // `match` when it lies wholly within `range`, else null.
+  static std::shared_ptr<const GXTemplateMatch> within(const std::shared_ptr<const GXTemplateMatch>& match,
+                                                       GXRange range);
   // Marks the positions where a part (marker or expression) with these delimiters can begin.
   void markPossibleStarts(const QString& start, const QString& end);
 
@@ -70,7 +68,11 @@ class ICUTemplateMatcher : public GXTemplateEngineMatcher {
   QString filterDelimiter_;
   QString templateString_;
   QString regex_;
-  QHash<std::uint64_t, Found> found_;
+  // What a search from each template position found (the match, not yet checked against a range, or
+  // null for nothing), read by the position: foundAt_ holds its index in found_, or -1 before the first
+  // search from there. A loop body read again and again finds its markers with one index each.
+  std::vector<std::int32_t> foundAt_;
+  std::vector<std::shared_ptr<const GXTemplateMatch>> found_;
   // For each template position, whether a match can begin there. A search that fails from a position
   // costs the regular expression time in proportion to the rest of the line for every start delimiter
   // on it (and more with filter delimiters), which lets a hostile template of a few kilobytes run for

@@ -1,5 +1,10 @@
 #include "WTCommandArguments.h"
 
+#include "WTObjectContext.h"
+
+#include <cstdio>
+#include <cstdlib>
+
 namespace WTCommandArguments {
 
 int usage(QTextStream& err, const char* usageLine, const QString& problem) {
@@ -26,6 +31,14 @@ QString parse(QCommandLineParser& parser, const QStringList& arguments, const QS
     if (parser.values(name).size() > 1) return QStringLiteral("--%1 given more than once").arg(name);
   }
   return {};
+}
+
+void endProcess(int status, QTextStream& out, QTextStream& err, WTObjectContext& context) {
+  out.flush();
+  err.flush();
+  context.closeStore();
+  std::fflush(nullptr);
+  std::_Exit(status);
 }
 
 }  // namespace WTCommandArguments

@@ -5,6 +5,8 @@
 #include <QStringList>
 #include <QTextStream>
 
+class WTObjectContext;
+
 // What the commands share in reading their arguments and saying what went wrong, in one voice:
 // "tessal: PROBLEM" on stderr.
 namespace WTCommandArguments {
@@ -16,5 +18,9 @@ int failure(QTextStream& err, const QString& message);
 // Parses `arguments` (those after the command's name) for options that each take one value, given at
 // most once; nothing else is allowed. Gives the problem, or an empty text.
 QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options);
+// Ends the process with `status` once a command is done: its output is flushed and `context`'s store
+// closed, as any end would, but the records are not freed one by one, since the system takes the
+// process's memory back whole. Only for a process that runs one command.
+[[noreturn]] void endProcess(int status, QTextStream& out, QTextStream& err, WTObjectContext& context);
 
 }  // namespace WTCommandArguments

@@ -128,9 +128,10 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
     return usageError(argv[1]);
   }
 
-  QCoreApplication app(argc, argv);
-  app.setApplicationName(QStringLiteral("Tessal"));
-  app.setOrganizationName(QStringLiteral("Tessal"));
+  // No application object: nothing a command does waits for events, and making one would load the C
+  // library's locale files and an event dispatcher first. The names still place the settings.
+  QCoreApplication::setApplicationName(QStringLiteral("Tessal"));
+  QCoreApplication::setOrganizationName(QStringLiteral("Tessal"));
   QTextStream out(stdout), err(stderr);
   if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
   if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);

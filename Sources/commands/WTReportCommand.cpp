@@ -14,6 +14,7 @@
 
 namespace {
 
+using WTCommandArguments::endProcess;
 using WTCommandArguments::failure;
 using WTCommandArguments::parse;
 using WTCommandArguments::usage;
@@ -102,8 +103,7 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
     }
     if (outPath.isEmpty()) {
       out << report.html;
-      out.flush();
-      return 0;
+      endProcess(0, out, err, named->snapshot->context());
     }
     if (format == ReportFormat::HTML) {
       written = WTCSVExport::writeTextAtomically(outPath, report.html);
@@ -114,7 +114,7 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
     }
   }
   if (!written) return failure(err, written.error().message);
-  return 0;
+  endProcess(0, out, err, named->snapshot->context());
 }
 
 int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {

@@ -361,7 +361,10 @@ WTCommandOutcome run(WTObjectContext& context, const QString& command, const QSt
 }
 
 WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments) {
-  return run(context, command, arguments, QTimeZone::systemTimeZone());
+  // Only adding and importing read times of day: starting and stopping need not have the system's zone
+  // read from its files first.
+  const bool readsTimesOfDay = command == kAdd || command == kImport;
+  return run(context, command, arguments, readsTimesOfDay ? QTimeZone::systemTimeZone() : QTimeZone::utc());
 }
 
 QJsonObject request(const QString& command, const QStringList& arguments) {

@@ -73,9 +73,9 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     return failure(err, WTStore::openReadOnly(storePath).error().message);
   }
   // A few records change and a failed save is reported at once: no need to read the whole file first.
-  Result<std::unique_ptr<WTStore>> store = RZSyncTrack::openStore(storePath, nullptr, WTStore::Check::Header);
+  Result<std::unique_ptr<WTStore>> store =
+      RZSyncTrack::openStore(storePath, nullptr, WTStore::Check::Header, WTStore::LogOnClose::KeepWhileShort);
   if (!store) return storeFailure(err, store.error());
-  store.value()->keepLogOnClose();
   WTStore::Records which =
       WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;
   QStringList tasks;
@@ -103,7 +103,7 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
     if (!saved) return failure(err, saved.error().message);
   }
   context.setChangeJournal(nullptr);
-  return print(outcome, out, err);
+  WTCommandArguments::endProcess(print(outcome, out, err), out, err, context);
 }
 
 int runChangingCommand(const QString& command, const QStringList& arguments, QTextStream& out,
@@ -149,7 +149,9 @@ int runTrackCommand(const QString& command, const QStringList& arguments, QTextS
   if (WTTimerCommands::changesData(command)) return runChangingCommand(command, arguments, out, err);
   std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
   if (!snapshot) return 1;
-  return print(WTTimerCommands::run(snapshot->context(), command, arguments), out, err);
+  WTCommandArguments::endProcess(
+      print(WTTimerCommands::run(snapshot->context(), command, arguments), out, err), out, err,
+      snapshot->context());
 }
 
 int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {

@@ -229,6 +229,8 @@ void WTItemContainer::stopObserving() {
 }
 
 QString WTItemContainer::itemNames() const {
+  // Most days of a report hold one item.
+  if (items_.size() == 1) return items_.first()->name().trimmed();
   QStringList names;
   QSet<QString> seen;
   for (const WTItem* item : items_) {

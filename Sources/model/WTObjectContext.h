@@ -59,6 +59,9 @@ class WTObjectContext : public QObject {
   Result<void> attachStore(std::unique_ptr<WTStore> store);
   Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which, const QStringList& tasks = {});
   bool hasStore() const { return store_ != nullptr; }
+  // Closes the store's file for a process that ends next; the records stay in memory, and a later save
+  // fails as it does without a store.
+  void closeStore() { store_.reset(); }
   WTStore* store() const { return store_.get(); }
 
   // The journal that saved records report to; null restores the one that records nothing.

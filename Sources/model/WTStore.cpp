@@ -305,17 +305,18 @@ WTStore::~WTStore() {
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, Check check,
-                                               const JournalImport& import) {
-  return open(path, vfs, false, check, import);
+                                               const JournalImport& import, LogOnClose logOnClose) {
+  return open(path, vfs, false, check, import, logOnClose);
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::openReadOnly(const QString& path, Check check) {
   if (!QFileInfo::exists(path)) return Error{OpenFailed, tr("There is no data file at “%1”.").arg(path)};
-  return open(path, nullptr, true, check, {});
+  return open(path, nullptr, true, check, {}, LogOnClose::Fold);
 }
 
 Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* vfs, bool readOnly,
-                                               Check check, const JournalImport& import) {
+                                               Check check, const JournalImport& import,
+                                               LogOnClose logOnClose) {
   const QFileInfo file(path);
   const bool existed = file.exists();
   if (!existed && !file.dir().exists()) {
@@ -325,8 +326,10 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   if (existed && !file.isFile()) return notAStoreError(path);
 
   // Until the file is accepted nothing may write to it. A connection that closes checkpoints what a
-  // leftover write-ahead log holds into the file; when there is such a log, keep it where it is.
+  // leftover write-ahead log holds into the file; when there is such a log, keep it where it is. The
+  // setting is changed as seldom as may be: each change makes SQLite compile every statement again.
   const bool logHasFrames = QFileInfo(path + QStringLiteral("-wal")).size() > 0;
+  const bool keepsLog = logOnClose == LogOnClose::KeepWhileShort && !readOnly;
 
   sqlite3* db = nullptr;
   const int flags = SQLITE_OPEN_NOMUTEX | (readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE) |
@@ -338,7 +341,7 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   }
   sqlite3_extended_result_codes(db, 1);
   sqlite3_busy_timeout(db, kBusyTimeoutMs);
-  if (logHasFrames) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+  if (logHasFrames || keepsLog) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
   // Opening reads the whole file twice (the check, then the rows) and a merge visits pages all over it:
   // mapped, the pages are read in place instead of copied through a system call each.
   sqlite3_exec(db, "PRAGMA mmap_size = 268435456", nullptr, nullptr, nullptr);
@@ -397,7 +400,11 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   }
 
   // Accepted: from here on the file may change.
-  if (logHasFrames) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
+  if (keepsLog) {
+    store->keepLogWhileShort();
+  } else if (logHasFrames) {
+    sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
+  }
   QByteArray mode;
   code = readText(db, "PRAGMA journal_mode = WAL", &mode);
   if (code == SQLITE_OK && mode != "wal") code = SQLITE_CANTOPEN;
@@ -445,8 +452,7 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   return store;
 }
 
-void WTStore::keepLogOnClose() {
-  sqlite3_db_config(db_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+void WTStore::keepLogWhileShort() {
   // The hook takes the place of SQLite's own folding-in at 1,000 pages, so it does that too.
   sqlite3_wal_hook(
       db_,

@@ -44,6 +44,15 @@ class WTStore {
   // anything is written, and the window does not wait for the check. A command that reads or changes a
   // few records, and reports a failed save at once, checks the header.
   enum class Check { WholeFile, WholeFileBeforeSaving, Header };
+  // What closing does with the write-ahead log. A process that saves once and ends (a command) keeps a
+  // short log as it is instead of folding it into the file, which costs two more waits for the disk on
+  // every command. The log is as durable as the file. A log kept is read whole by the next process that
+  // opens the file, so once it has grown past kLogFramesKeptOnClose pages the close folds it in after
+  // all. Folding in costs that command two more waits for the disk and the next save a fresh log, and a
+  // kept page costs every opening about two microseconds: a megabyte (some twenty starts or stops)
+  // balances the two.
+  enum class LogOnClose { Fold, KeepWhileShort };
+  static constexpr int kLogFramesKeptOnClose = 256;
 
   // The journal's rows, which the store keeps without knowing what they mean: per record its pending
   // changes as the text of a JSON object, in section 'i' (inserted) or 'u' (updated); the pending
@@ -79,7 +88,8 @@ class WTStore {
   // use; none for the default (tests pass one that injects faults).
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs = nullptr,
                                                Check check = Check::WholeFile,
-                                               const JournalImport& import = {});
+                                               const JournalImport& import = {},
+                                               LogOnClose logOnClose = LogOnClose::Fold);
   // Opens an existing store for reading only, beside a process that may be writing it: nothing is
   // created, migrated or changed, and save() fails. A file that holds no records yet reads as empty; one
   // written by a version older than kOldestReadableVersion is refused (the application updates it).
@@ -90,13 +100,6 @@ class WTStore {
   WTStore& operator=(const WTStore&) = delete;
 
   QString path() const { return path_; }
-
-  // For a process that saves once and ends (a command): its close leaves a short write-ahead log as it
-  // is instead of folding it into the file, which costs two more waits for the disk on every command. The
-  // log is as durable as the file. A log kept is read whole by the next process that opens the file, so
-  // once it has grown past kLogFramesKeptOnClose pages the close folds it in after all.
-  void keepLogOnClose();
-  static constexpr int kLogFramesKeptOnClose = 64;
 
   enum class Records {
     All,
@@ -146,7 +149,9 @@ class WTStore {
  private:
   WTStore(QString path, sqlite3* db);
   static Result<std::unique_ptr<WTStore>> open(const QString& path, const char* vfs, bool readOnly,
-                                               Check check, const JournalImport& import);
+                                               Check check, const JournalImport& import,
+                                               LogOnClose logOnClose);
+  void keepLogWhileShort();
   // The journal's statements, prepared on first use: a command that never saves never needs them.
   enum JournalStatement {
     SetEntry,

@@ -248,11 +248,13 @@ QString RZSyncTrack::legacyFilePath(const QString& storePath) {
 }
 
 Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, const char* vfs,
-                                                        WTStore::Check check) {
+                                                        WTStore::Check check,
+                                                        WTStore::LogOnClose logOnClose) {
   const QString file = legacyFilePath(path);
   bool imported = false;
-  Result<std::unique_ptr<WTStore>> store =
-      WTStore::open(path, vfs, check, [&](WTStore::JournalWriter& writer) -> Result<void> {
+  Result<std::unique_ptr<WTStore>> store = WTStore::open(
+      path, vfs, check,
+      [&](WTStore::JournalWriter& writer) -> Result<void> {
         if (!QFileInfo::exists(file)) return {};
         RZSyncTrack legacy;
         QString problem;
@@ -266,7 +268,8 @@ Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, con
         }
         imported = true;
         return legacy.writeChanges(writer);
-      });
+      },
+      logOnClose);
   if (store && imported) {
     // The journal is in the store now; the file stays, under another name, for whoever looks for it.
     if (!QFile::rename(file, freeName(file, QStringLiteral(".migrated"))))

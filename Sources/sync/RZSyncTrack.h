@@ -58,8 +58,9 @@ class RZSyncTrack final : public WTChangeJournal {
   // number added when that name is taken, and nothing is imported), then renames it to ".migrated"
   // (numbered the same way): nothing in it is ever lost. A journal file beside a store that is up to date
   // already is ignored, and logged.
-  static Result<std::unique_ptr<WTStore>> openStore(const QString& path, const char* vfs = nullptr,
-                                                    WTStore::Check check = WTStore::Check::WholeFile);
+  static Result<std::unique_ptr<WTStore>> openStore(
+      const QString& path, const char* vfs = nullptr, WTStore::Check check = WTStore::Check::WholeFile,
+      WTStore::LogOnClose logOnClose = WTStore::LogOnClose::Fold);
 
   // Writes what changed since the last write, in a transaction of its own. On failure the journal is
   // read back from the rows it changed, which are as they were.
