@@ -7,6 +7,7 @@
 #include <nlohmann/json.hpp>
 
 #include <cmath>
+#include <utility>
 #include <vector>
 
 namespace RZSyncJSON {
@@ -300,6 +301,18 @@ void write(const QVariant& value, Style style, const Spill& spill) {
   out.reserve(kSpillBytes + kSpillBytes / 4);
   writeValue(out, value, style, 0, &spill);
   spill(out);
+}
+
+void CompactObject::add(const QString& key, const QVariant& value) {
+  text_.append(text_.isEmpty() ? '{' : ',');
+  writeString(text_, key);
+  text_.append(':');
+  writeValue(text_, value, Style::Compact, 1);
+}
+
+QByteArray CompactObject::take() {
+  text_.append(text_.isEmpty() ? "{}" : "}");
+  return std::exchange(text_, QByteArray());
 }
 
 bool sameValue(const QVariant& a, const QVariant& b) {
