@@ -204,6 +204,16 @@ WTObject* WTObjectContext::insertNewObject(WTEntity entity, const QString& ident
   return object;
 }
 
+void WTObjectContext::reserveForInsertions(WTEntity entity, size_t records) {
+  // Growing the sets one rehash at a time visits every record they hold again at each step.
+  auto& list = objects_[static_cast<int>(entity)];
+  list.reserve(list.size() + records);
+  inserted_.reserve(inserted_.size() + records);
+  turnAnnounced_.reserve(turnAnnounced_.size() + records);
+  turnInserted_.reserve(turnInserted_.size() + qsizetype(records));
+  owned_.reserve(owned_.size() + records);
+}
+
 void WTObjectContext::removeFromGraph(WTObject* object) {
   if (!object->registered_) return;
   unregisterObject(object);
@@ -319,7 +329,7 @@ void WTObjectContext::storedValueChanged(WTObject* object, const QString& key, c
   markChanged(object, key);
   // Identity is never undone: an undone insertion leaves the graph under the identity it was saved
   // with, so that the store can remove that row and the journal can name it to the other devices.
-  if (key == QLatin1String("uuid")) return;
+  if (key == QLatin1String("uuid") || !undo_.isRecording()) return;
   undo_.registerUndo([object, key, oldValue] { object->setStoredValue(key, oldValue); });
 }
 
@@ -330,7 +340,8 @@ void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int old
   markChanged(object, key);
   if (oldOwner) markChanged(oldOwner, inverse);
   if (newOwner && newOwner != oldOwner) markChanged(newOwner, inverse);
-  undo_.registerUndo([object, oldOwner, oldIndex] { object->changeOwner(oldOwner, oldIndex); });
+  if (undo_.isRecording())
+    undo_.registerUndo([object, oldOwner, oldIndex] { object->changeOwner(oldOwner, oldIndex); });
 
   announce(object, key);
   for (WTObject* owner : {oldOwner, newOwner == oldOwner ? nullptr : newOwner}) {
