@@ -471,7 +471,7 @@ void WTObject::visitReportedValues(const std::function<void(const QString&, cons
       if (const WTObject* related = owner()) visit(key.name, KeyPath::variantFromObject(related));
     } else if (key.stored) {
       if (const QVariant value = fieldValue(key); !value.isNull()) visit(key.name, value);
-    } else if (changedKeys_.contains(key.name)) {
+    } else if (key.journaled && changedKeys_.contains(key.name)) {  // a change marks journaled keys alone
       visit(key.name, reportedValue(key));
     }
   }
