@@ -450,7 +450,7 @@ Result<void> WTObjectContext::save() {
     size_t reported = 0;
     Result<void> written;
     const auto report = [&](WTObject* object) {
-      if (object->unsavedNewIdentity_ && inserted_.count(object))
+      if (object->hasUnsavedNewIdentity() && inserted_.count(object))
         written = journal_->insertNew(*object, writer);
       else
         object->willSave();
