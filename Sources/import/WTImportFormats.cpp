@@ -304,8 +304,10 @@ class ZoneDays {
     auto offset = offsets_.constFind(day.toJulianDay());
     if (offset == offsets_.constEnd()) offset = offsets_.insert(day.toJulianDay(), steadyOffset(day));
     if (!*offset) return Date::fromQDateTime(QDateTime(day, time, zone_));
-    const QDateTime utc(day, time, QTimeZone::utc());
-    return Date::fromSeconds(double(utc.toSecsSinceEpoch() - **offset) + time.msec() / 1000.0);
+    // The seconds a QDateTime in UTC would count, without making one for every row.
+    static const qint64 kDayOf1970 = QDate(1970, 1, 1).toJulianDay();
+    const qint64 utc = (day.toJulianDay() - kDayOf1970) * 86400 + time.msecsSinceStartOfDay() / 1000;
+    return Date::fromSeconds(double(utc - **offset) + time.msec() / 1000.0);
   }
 
  private:

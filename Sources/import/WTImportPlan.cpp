@@ -152,8 +152,10 @@ QString notesFor(const WTImportRow& row) {
 
 WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Options& options, bool make) {
   WTImportPlan plan;
+  const QList<WTTime*> times = context.fetch<WTTime>();
   QSet<QString> present;
-  for (const WTTime* time : context.fetch<WTTime>())
+  present.reserve(times.size() + qsizetype(file.rows.size()));
+  for (const WTTime* time : times)
     if (!time->importId().isNull()) present.insert(time->importId());
 
   const QList<WTClient*> clients = context.fetch<WTClient>();
@@ -251,6 +253,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
     }
     placeRates(*client, plan);
   }
+  context.reserveForInsertions(WTEntity::Time, entries.size());
   for (const auto& [row, node] : entries) {
     auto* time = WTTime::insertNewObject(&context);
     time->setTask(node->task());

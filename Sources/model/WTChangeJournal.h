@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Result.h"
+#include "WTObject.h"
 #include "WTStore.h"
 
 #include <QString>
@@ -20,6 +21,15 @@ class WTChangeJournal {
   virtual void insertValues(const QVariantMap& values, const QString& uuid) = 0;
   virtual void updateValues(const QVariantMap& values, const QString& uuid) = 0;
   virtual void deleteObjectWithId(const QString& uuid) = 0;
+  // A new record whose identity no journal row names yet (WTObject::hasUnsavedNewIdentity), reported
+  // inside the save's transaction with the writer of the journal's rows: a journal that does not hold
+  // its entries in memory may write the entry at once, straight from the record's values. By default it
+  // is reported as every new record is.
+  virtual Result<void> insertNew(const WTObject& record, WTStore::JournalWriter& writer) {
+    Q_UNUSED(writer);
+    insertValues(record.changedValues(), record.uuid());
+    return {};
+  }
   // Whether the other devices hold `uuid` as deleted for good, so that nothing sent under it again would
   // reach them: a record coming back (by undo or redo) must come back under a new identity.
   virtual bool isRetired(const QString& uuid) const {

@@ -1,5 +1,7 @@
 #include "WTKeyTable.h"
 
+#include <algorithm>
+
 WTKeyTable::WTKeyTable(const WTKeyTable* base, std::initializer_list<WTKeyDescriptor> keys) {
   if (base) {
     keys_ = base->keys_;
@@ -24,5 +26,8 @@ WTKeyTable::WTKeyTable(const WTKeyTable* base, std::initializer_list<WTKeyDescri
   for (int i = 0; i < int(keys_.size()); ++i) {
     if (keys_[size_t(i)].stored) stored_.append(keys_[size_t(i)].name);
     if (keys_[size_t(i)].type == WTKeyType::ToOne) owner_ = i;
+    byName_.push_back(i);
   }
+  std::sort(byName_.begin(), byName_.end(),
+            [this](int a, int b) { return keys_[size_t(a)].name < keys_[size_t(b)].name; });
 }

@@ -80,12 +80,15 @@ class WTKeyTable {
   const QStringList& storedKeys() const { return stored_; }
   // The to-one relationship to the owner, or none.
   const WTKeyDescriptor* ownerKey() const { return owner_ < 0 ? nullptr : &keys_[size_t(owner_)]; }
+  // Every key's place in keys(), in the order of their names (the order a map of values by key keeps).
+  const std::vector<int>& byName() const { return byName_; }
 
  private:
   std::vector<WTKeyDescriptor> keys_;
   QHash<QString, int> index_;
   QStringList stored_;
   int owner_ = -1;
+  std::vector<int> byName_;
 };
 
 // Declarations for the tables; each entity class declares its keys in its own source file.

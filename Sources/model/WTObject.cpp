@@ -14,9 +14,10 @@
 #include "WTToDo.h"
 
 #include <QRandomGenerator>
-#include <QUuid>
 
+#include <algorithm>
 #include <array>
+#include <cstring>
 #include <type_traits>
 
 namespace {
@@ -329,15 +330,29 @@ void WTObject::assignNewIdentity() {
   // identity otherwise, and an import makes a hundred thousand.
   std::array<quint32, 4> words;
   QRandomGenerator::global()->fillRange(words.data(), qsizetype(words.size()));
-  QByteArray bytes(reinterpret_cast<const char*>(words.data()), sizeof(words));
-  bytes[6] = char((bytes[6] & 0x0f) | 0x40);
-  bytes[8] = char((bytes[8] & 0x3f) | 0x80);
-  const QString unique = QUuid::fromRfc4122(bytes).toString(QUuid::WithoutBraces).toUpper();
-  setUuid(unique + u'@' + entityName());
+  std::array<unsigned char, 16> bytes;
+  std::memcpy(bytes.data(), words.data(), bytes.size());
+  bytes[6] = (bytes[6] & 0x0f) | 0x40;
+  bytes[8] = (bytes[8] & 0x3f) | 0x80;
+  // Its text in capitals, "8-4-4-4-12" digits, written at once: an import makes a hundred thousand.
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  const QString entity = entityName();
+  QString identity(36 + 1 + entity.size(), Qt::Uninitialized);
+  QChar* out = identity.data();
+  for (size_t i = 0; i < bytes.size(); ++i) {
+    if (i == 4 || i == 6 || i == 8 || i == 10) *out++ = u'-';
+    *out++ = QLatin1Char(kDigits[bytes[i] >> 4]);
+    *out++ = QLatin1Char(kDigits[bytes[i] & 0xf]);
+  }
+  *out++ = u'@';
+  std::copy(entity.begin(), entity.end(), out);
+  setUuid(identity);
+  unsavedNewIdentity_ = true;
 }
 
 void WTObject::setUuid(const QString& uuid) {
   if (uuid == uuid_) return;
+  unsavedNewIdentity_ = false;
   const QString old = uuid_;
   setStoredValue(QStringLiteral("uuid"), uuid);
   context_->uuidChanged(this, old);
@@ -423,38 +438,43 @@ QVariantMap WTObject::changedValues() const {
 
 QVariantMap WTObject::changedValues(bool everySetValue) const {
   QVariantMap values;
-  auto add = [&](const QString& name) {
-    const WTKeyDescriptor* key = keys_->find(name);
-    if (!key) return;
-    switch (key->type) {
-      case WTKeyType::ToOne: {
-        WTObject* related = owner();
-        values.insert(name, related ? KeyPath::variantFromObject(related) : QVariant());
-        return;
-      }
-      case WTKeyType::Ordered:
-        values.insert(name, QVariant::fromValue(WTOrderedRelationship{key->members(*this)}));
-        return;
-      case WTKeyType::Unordered:
-        values.insert(name, QVariant::fromValue(WTUnorderedRelationship{key->members(*this)}));
-        return;
-      default:
-        values.insert(name, fieldValue(*key));
-    }
-  };
   if (everySetValue) {
-    // A new record reports every value it has; unset ones stay out.
-    for (const WTKeyDescriptor& key : keys_->keys()) {
-      if (!key.stored) continue;
-      if (key.type == WTKeyType::ToOne ? owner() != nullptr : !fieldValue(key).isNull()) add(key.name);
-    }
-    for (const QString& key : changedKeys_) {
-      if (!values.contains(key) && !keys_->storedKeys().contains(key)) add(key);
-    }
+    visitReportedValues([&](const QString& key, const QVariant& value) { values.insert(key, value); });
     return values;
   }
-  for (const QString& key : changedKeys_) add(key);
+  for (const QString& name : changedKeys_) {
+    if (const WTKeyDescriptor* key = keys_->find(name)) values.insert(name, reportedValue(*key));
+  }
   return values;
+}
+
+QVariant WTObject::reportedValue(const WTKeyDescriptor& key) const {
+  switch (key.type) {
+    case WTKeyType::ToOne: {
+      WTObject* related = owner();
+      return related ? KeyPath::variantFromObject(related) : QVariant();
+    }
+    case WTKeyType::Ordered:
+      return QVariant::fromValue(WTOrderedRelationship{key.members(*this)});
+    case WTKeyType::Unordered:
+      return QVariant::fromValue(WTUnorderedRelationship{key.members(*this)});
+    default:
+      return fieldValue(key);
+  }
+}
+
+void WTObject::visitReportedValues(const std::function<void(const QString&, const QVariant&)>& visit) const {
+  // A new record reports every stored value it has (unset ones stay out) and the other keys it changed.
+  for (const int index : keys_->byName()) {
+    const WTKeyDescriptor& key = keys_->keys()[size_t(index)];
+    if (key.stored && key.type == WTKeyType::ToOne) {
+      if (const WTObject* related = owner()) visit(key.name, KeyPath::variantFromObject(related));
+    } else if (key.stored) {
+      if (const QVariant value = fieldValue(key); !value.isNull()) visit(key.name, value);
+    } else if (key.journaled && changedKeys_.contains(key.name)) {  // a change marks journaled keys alone
+      visit(key.name, reportedValue(key));
+    }
+  }
 }
 
 void WTObject::willSave() {

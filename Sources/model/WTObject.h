@@ -11,6 +11,7 @@
 #include <QStringList>
 #include <QVariant>
 
+#include <functional>
 #include <optional>
 
 class WTObjectContext;
@@ -102,6 +103,12 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   QVariantMap changedValues() const;
   // Every value that is set, as a new record reports them, and the ordered members (a project's tasks).
   QVariantMap setValues() const;
+  // The values changedValues() reports of a new record, one at a time in the order of their keys' names
+  // (a QVariantMap's order), without building the map.
+  void visitReportedValues(const std::function<void(const QString& key, const QVariant& value)>& visit) const;
+  // Whether the identity was drawn at random here for a record never saved since: no journal row can
+  // name it yet.
+  bool hasUnsavedNewIdentity() const { return unsavedNewIdentity_; }
   // Reports this record to the context's change journal as it is about to be saved.
   void willSave();
 
@@ -159,6 +166,8 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   QVariantMap changedValues(bool everySetValue) const;
   // The generic paths by a key's declaration.
   QVariant fieldValue(const WTKeyDescriptor& key) const;
+  // A key's value as the journal is told it (relationships as WTChangeJournal.h describes).
+  QVariant reportedValue(const WTKeyDescriptor& key) const;
   void writeField(const WTKeyDescriptor& key, const QVariant& value);
   bool setByType(const WTKeyDescriptor& key, const QVariant& value);
   void setStoredValue(const WTKeyDescriptor& key, const QVariant& value);
@@ -187,6 +196,7 @@ class WTObject : public KeyValueCoding, public RZSyncObject {
   int registryIndex_ = -1;   // place in the context's list of its entity
   bool persisted_ = false;   // a row for it is in the store file
   QStringList changedKeys_;  // since the last save
+  bool unsavedNewIdentity_ = false;
 };
 
 // Each entity class declares its entity and the class operations that act on the default context.

@@ -204,6 +204,16 @@ WTObject* WTObjectContext::insertNewObject(WTEntity entity, const QString& ident
   return object;
 }
 
+void WTObjectContext::reserveForInsertions(WTEntity entity, size_t records) {
+  // Growing the sets one rehash at a time visits every record they hold again at each step.
+  auto& list = objects_[static_cast<int>(entity)];
+  list.reserve(list.size() + records);
+  inserted_.reserve(inserted_.size() + records);
+  turnAnnounced_.reserve(turnAnnounced_.size() + records);
+  turnInserted_.reserve(turnInserted_.size() + qsizetype(records));
+  owned_.reserve(owned_.size() + records);
+}
+
 void WTObjectContext::removeFromGraph(WTObject* object) {
   if (!object->registered_) return;
   unregisterObject(object);
@@ -276,7 +286,8 @@ WTObject* WTObjectContext::objectWithUUID(const QVariant& uuid, bool forceInsert
 
 void WTObjectContext::uuidChanged(WTObject* object, const QString& oldUuid) {
   if (!object->registered_) return;
-  indexItems();
+  // Items not yet in the map join it under the identity they have when it is first needed.
+  if (!itemsIndexed_ && WTEntities::isItem(object->entity())) return;
   auto it = byUuid_.find(oldUuid);
   if (it != byUuid_.end() && it.value() == object) byUuid_.erase(it);
   byUuid_.insert(object->uuid_, object);
@@ -318,7 +329,7 @@ void WTObjectContext::storedValueChanged(WTObject* object, const QString& key, c
   markChanged(object, key);
   // Identity is never undone: an undone insertion leaves the graph under the identity it was saved
   // with, so that the store can remove that row and the journal can name it to the other devices.
-  if (key == QLatin1String("uuid")) return;
+  if (key == QLatin1String("uuid") || !undo_.isRecording()) return;
   undo_.registerUndo([object, key, oldValue] { object->setStoredValue(key, oldValue); });
 }
 
@@ -329,7 +340,8 @@ void WTObjectContext::ownerChanged(WTObject* object, WTObject* oldOwner, int old
   markChanged(object, key);
   if (oldOwner) markChanged(oldOwner, inverse);
   if (newOwner && newOwner != oldOwner) markChanged(newOwner, inverse);
-  undo_.registerUndo([object, oldOwner, oldIndex] { object->changeOwner(oldOwner, oldIndex); });
+  if (undo_.isRecording())
+    undo_.registerUndo([object, oldOwner, oldIndex] { object->changeOwner(oldOwner, oldIndex); });
 
   announce(object, key);
   for (WTObject* owner : {oldOwner, newOwner == oldOwner ? nullptr : newOwner}) {
@@ -393,6 +405,23 @@ Result<void> WTObjectContext::save() {
         rows.push_back(task);
     }
   }
+  // By identity, the key of the records and of the journal: new rows of a large save (an import) go
+  // into the B-trees one after another instead of splitting pages all over them. Sorted by the first
+  // characters, held beside each record, before whole identities are compared.
+  {
+    std::vector<std::pair<quint64, WTObject*>> byIdentity;
+    byIdentity.reserve(rows.size());
+    for (WTObject* object : rows) {
+      quint64 prefix = 0;
+      for (qsizetype i = 0; i < 4; ++i)
+        prefix = prefix << 16 | (i < object->uuid_.size() ? object->uuid_.at(i).unicode() : 0u);
+      byIdentity.emplace_back(prefix, object);
+    }
+    std::sort(byIdentity.begin(), byIdentity.end(), [](const auto& a, const auto& b) {
+      return a.first != b.first ? a.first < b.first : a.second->uuid_ < b.second->uuid_;
+    });
+    for (size_t i = 0; i < rows.size(); ++i) rows[i] = byIdentity[i].second;
+  }
   // One row at a time: a save of many records never holds all their rows at once.
   auto next = rows.begin();
   WTStoreRecord record;
@@ -421,8 +450,11 @@ Result<void> WTObjectContext::save() {
     size_t reported = 0;
     Result<void> written;
     const auto report = [&](WTObject* object) {
-      object->willSave();
-      if (++reported % kReportsPerWrite == 0) written = journal_->writeChanges(writer);
+      if (object->hasUnsavedNewIdentity() && inserted_.count(object))
+        written = journal_->insertNew(*object, writer);
+      else
+        object->willSave();
+      if (written && ++reported % kReportsPerWrite == 0) written = journal_->writeChanges(writer);
     };
     for (auto it = rows.begin(); written && it != rows.end(); ++it)
       if (!reordered.count(*it)) report(*it);
@@ -433,6 +465,7 @@ Result<void> WTObjectContext::save() {
   if (!result) return result;
   for (WTObject* object : rows) {
     object->persisted_ = true;
+    object->unsavedNewIdentity_ = false;
     object->changedKeys_ = QStringList();
   }
   for (WTObject* object : deleted_) {

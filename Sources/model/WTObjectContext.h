@@ -74,6 +74,8 @@ class WTObjectContext : public QObject {
   T* insertNewObject() {
     return static_cast<T*>(insertNewObject(T::kEntity));
   }
+  // Makes room for `records` more records of `entity` about to be inserted (an import of many).
+  void reserveForInsertions(WTEntity entity, size_t records);
   // Removes a record; a client's projects stay (without client), a project's tasks and a task's items
   // go with their owner.
   void deleteObject(WTObject* object);

@@ -54,6 +54,8 @@ class WTUndoManager {
   // While disabled nothing is recorded (loading, merging from elsewhere).
   void disableRegistration() { ++disabled_; }
   void enableRegistration() { --disabled_; }
+  // Whether registered actions are kept: a caller may skip making one that would be dropped.
+  bool isRecording() const { return disabled_ == 0; }
 
   // Runs whenever what undo or redo would do may have changed: a group closed, an undo or redo ran,
   // the redo steps were dropped or everything was removed.

@@ -6,7 +6,9 @@
 
 #include <nlohmann/json.hpp>
 
+#include <algorithm>
 #include <cmath>
+#include <utility>
 #include <vector>
 
 namespace RZSyncJSON {
@@ -113,6 +115,20 @@ class VariantBuilder final : public nlohmann::json_sax<nlohmann::json> {
 
 void writeString(QByteArray& out, const QString& text) {
   static const char kHex[] = "0123456789abcdef";
+  // Most texts (identities, names, dates) are plain ASCII that needs no escape: those go in as they are,
+  // without their UTF-8 copy.
+  const auto plain = [](QChar c) {
+    return c.unicode() >= 0x20 && c.unicode() < 0x7f && c != u'"' && c != u'\\';
+  };
+  if (std::all_of(text.begin(), text.end(), plain)) {
+    const qsizetype at = out.size();
+    out.resize(at + text.size() + 2);
+    char* to = out.data() + at;
+    *to++ = '"';
+    for (const QChar c : text) *to++ = char(c.unicode());
+    *to = '"';
+    return;
+  }
   const QByteArray utf8 = text.toUtf8();
   out.append('"');
   // Runs of bytes that need no escape go in whole: most text is nothing but such a run.
@@ -300,6 +316,24 @@ void write(const QVariant& value, Style style, const Spill& spill) {
   out.reserve(kSpillBytes + kSpillBytes / 4);
   writeValue(out, value, style, 0, &spill);
   spill(out);
+}
+
+void CompactObject::add(const QString& key, const QVariant& value) {
+  if (text_.isEmpty()) {
+    // Room for the entry of a typical record, so that it is not moved as it grows.
+    text_.reserve(512);
+    text_.append('{');
+  } else {
+    text_.append(',');
+  }
+  writeString(text_, key);
+  text_.append(':');
+  writeValue(text_, value, Style::Compact, 1);
+}
+
+QByteArray CompactObject::take() {
+  text_.append(text_.isEmpty() ? "{}" : "}");
+  return std::exchange(text_, QByteArray());
 }
 
 bool sameValue(const QVariant& a, const QVariant& b) {

@@ -40,6 +40,18 @@ enum class Style {
 // double (through its shortest decimal text; NaN and infinities become null). Any other type is
 // written as its text when it converts to one, else as null.
 QByteArray write(const QVariant& value, Style style = Style::Pretty);
+// The compact text of an object given member by member in the order a QVariantMap keeps its keys: the
+// text write() gives that map, without the map being built.
+class CompactObject {
+ public:
+  void add(const QString& key, const QVariant& value);
+  // The object's text; the writer starts a new object after it.
+  QByteArray take();
+
+ private:
+  QByteArray text_;
+};
+
 // An object of objects written in place, as the QVariantMap holding the same would be (a journal's
 // sections are not copied into one to be written).
 struct ObjectOfObjects {

@@ -202,9 +202,10 @@ void RZSyncTrack::saveEnded(bool written) {
     if (!changed.contains(it.key())) changed.insert(it.key(), it.value());
   changed_.clear();
   const bool cleared = std::exchange(cleared_, false);
+  const bool wroteNew = std::exchange(wroteNew_, false);
   const bool everything = std::exchange(iterationChanged_, false) || cleared;
   clearWritten_ = false;
-  if (written && !changed.isEmpty()) nothingStored_ = false;
+  if (written && (!changed.isEmpty() || wroteNew)) nothingStored_ = false;
   if (written || !store_) return;
   // Nothing of it reached the rows: what changed is read back from them (on demand, when next needed).
   if (everything) {
@@ -410,6 +411,25 @@ void RZSyncTrack::insertValues(const QVariantMap& values, const QString& uuid) {
                                                     RZSyncJSON::write(logged, RZSyncJSON::Style::Compact)));
   }
   updateValues(values, uuid, Section::Inserted);
+}
+
+Result<void> RZSyncTrack::insertNew(const WTObject& record, WTStore::JournalWriter& writer) {
+  // What the journal was told of it otherwise is merged with the rest.
+  if (!onDemand_ || changed_.contains(record.uuid()) || flushed_.contains(record.uuid()))
+    return WTChangeJournal::insertNew(record, writer);
+  // Emptied rows are emptied before anything is written to them.
+  if (cleared_ && !std::exchange(clearWritten_, true)) {
+    if (Result<void> emptied = writer.clear(); !emptied) return emptied;
+  }
+  RZSyncJSON::CompactObject entry;
+  record.visitReportedValues([&](const QString& key, const QVariant& value) {
+    if (std::optional<QVariant> transformed = transformedValue(value)) entry.add(key, *transformed);
+  });
+  const QByteArray text = entry.take();
+  if (lcSync().isDebugEnabled())
+    qCDebug(lcSync).noquote() << QStringLiteral("INSERT(%1) %2").arg(record.uuid(), QString::fromUtf8(text));
+  wroteNew_ = true;
+  return writer.setEntry(record.uuid(), kInsertedRow, text);
 }
 
 void RZSyncTrack::deleteObjectWithId(const QString& uuid) {

@@ -88,6 +88,9 @@ class RZSyncTrack final : public WTChangeJournal {
   void updateValues(const QVariantMap& values, const QString& uuid) override;
   // Logs "INSERT(%@) %@" and merges into "i".
   void insertValues(const QVariantMap& values, const QString& uuid) override;
+  // A journal read on demand writes the entry at once, as insertValues would have it written; one held
+  // whole keeps it in memory as insertValues does.
+  Result<void> insertNew(const WTObject& record, WTStore::JournalWriter& writer) override;
   // Logs "DELETE(%@)" and adds the uuid to "x" (once); an empty uuid is ignored. Entries under "i" and
   // "u" stay: the server receives both.
   void deleteObjectWithId(const QString& uuid) override;
@@ -168,6 +171,7 @@ class RZSyncTrack final : public WTChangeJournal {
   // Written already in the save under way (a large save writes its rows as the records are reported).
   QHash<QString, Stored> flushed_;
   bool cleared_ = false;
+  bool wroteNew_ = false;      // insertNew wrote rows in the save under way
   bool clearWritten_ = false;  // the rows were emptied in the save under way
   bool iterationChanged_ = false;
 };

@@ -9,6 +9,7 @@
 
 #include <QColor>
 #include <QFile>
+#include <QUuid>
 
 #include <sqlite3.h>
 
@@ -100,7 +101,8 @@ TEST(RZSyncTrackStore, RowsFollowEachSaveAndAFailedSaveLeavesThemAsTheyWere) {
 }
 
 // A command's journal writes a large save in pieces as its records are reported, holding none of them
-// afterwards; a record saved again later in the same run keeps what its first save journaled.
+// afterwards, each entry as the text a journal held in memory writes; a record saved again later in the
+// same run keeps what its first save journaled.
 TEST(RZSyncTrackStore, ALargeSaveIsJournaledInPiecesAndEachEntryStaysWhole) {
   QTemporaryDir dir;
   const QString path = dir.filePath("Tessal.sqlite");
@@ -111,13 +113,38 @@ TEST(RZSyncTrackStore, ALargeSaveIsJournaledInPiecesAndEachEntryStaysWhole) {
   QList<WTTask*> tasks;
   for (int i = 0; i < 10000; ++i)
     (tasks << context.insertNewObject<WTTask>()).last()->setName(QString::number(i));
+  // Every kind of value a new record reports.
+  auto* client = context.insertNewObject<WTClient>();
+  client->setName("Ann \"A\" \\ \u00e9\n\t\x01");
+  client->setRate(dec("12.30"));
+  client->setColor(QColor(255, 0, 0, 128));
+  auto* project = context.insertNewObject<WTProject>();
+  project->setClient(client);
+  tasks[1]->setProject(project);
+  tasks[0]->setProject(project);
+  auto* expense = context.insertNewObject<WTExpense>();
+  expense->setTask(tasks[0]);
+  expense->setStartDate(Date::fromSeconds(-1.5));
+  expense->setExpense(dec("7.05"));
+  RZSyncTrack held;
+  const QList<WTObject*> records = *context.fetchObjectsForEntityName("WTObject");
+  for (const WTObject* record : records) held.insertValues(record->changedValues(), record->uuid());
   ASSERT_TRUE(context.save().ok());
   EXPECT_FALSE(track.hasChanges());
+  for (const WTObject* record : records) {
+    const QString uuid = record->uuid();
+    const QUuid drawn(uuid.section(u'@', 0, 0));
+    ASSERT_TRUE(drawn.version() == QUuid::Random && drawn.variant() == QUuid::DCE &&
+                uuid == drawn.toString(QUuid::WithoutBraces).toUpper() + '@' + record->entityName())
+        << uuid.toStdString();
+    ASSERT_EQ(context.store()->journalRecord(uuid).value().inserted.toStdString(),
+              compact(held.entry(Section::Inserted, uuid)));
+  }
   tasks.first()->setNotes("later");
   tasks.last()->setNotes("later");
   ASSERT_TRUE(context.save().ok());
   const synctest::StoredJournal journal(path);
-  EXPECT_EQ(journal.track.entries(Section::Inserted).size(), 10000);
+  EXPECT_EQ(journal.track.entries(Section::Inserted).size(), records.size());
   for (const WTTask* task : {tasks.first(), tasks.last()}) {
     const QVariantMap entry = journal.track.entry(Section::Inserted, task->uuid());
     EXPECT_EQ(entry.value("name"), task->name());
