@@ -137,20 +137,22 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStor
   // keeps a large store quick to open. Their owners are few and needed at once.
   itemsIndexed_ = false;
   undo_.disableRegistration();
-  Result<void> loaded = store->loadAll([&](WTStoreRecord&& record) {
-    const std::optional<WTEntity> entity = WTEntities::fromName(record.entity);
-    if (!entity) return;  // rows of entities this version does not know stay in the file untouched
-    WTObject* object = makeObject(*entity);
-    object->readRecord(record);
-    object->persisted_ = true;
-    registerObject(object, true);
-    QString& ownerUuid = *entity == WTEntity::Project ? record.clientUuid
-                         : *entity == WTEntity::Task  ? record.projectUuid
-                                                      : record.taskUuid;
-    if (ownerUuid.isEmpty()) return;
-    (*entity == WTEntity::Task ? taskLinks : links)
-        .push_back({object, std::move(ownerUuid), record.position});
-  }, which, tasks);
+  Result<void> loaded = store->loadAll(
+      [&](WTStoreRecord&& record) {
+        const std::optional<WTEntity> entity = WTEntities::fromName(record.entity);
+        if (!entity) return;  // rows of entities this version does not know stay in the file untouched
+        WTObject* object = makeObject(*entity);
+        object->readRecord(record);
+        object->persisted_ = true;
+        registerObject(object, true);
+        QString& ownerUuid = *entity == WTEntity::Project ? record.clientUuid
+                             : *entity == WTEntity::Task  ? record.projectUuid
+                                                          : record.taskUuid;
+        if (ownerUuid.isEmpty()) return;
+        (*entity == WTEntity::Task ? taskLinks : links)
+            .push_back({object, std::move(ownerUuid), record.position});
+      },
+      which, tasks);
   if (loaded) {
     // Tasks join their projects in stored order.
     std::stable_sort(taskLinks.begin(), taskLinks.end(),
