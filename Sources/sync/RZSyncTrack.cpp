@@ -277,8 +277,15 @@ Result<std::unique_ptr<WTStore>> RZSyncTrack::openStore(const QString& path, con
       qCWarning(lcSync).noquote()
           << QStringLiteral("Could not rename the journal %1, which is in the data file now").arg(file);
   } else if (store && QFileInfo::exists(file)) {
-    qCWarning(lcSync).noquote()
-        << QStringLiteral("Ignoring %1: the journal is kept in the data file now").arg(file);
+    // Set aside, not deleted, so that it is said once rather than at every opening.
+    const QString aside = freeName(file, QStringLiteral(".ignored"));
+    if (QFile::rename(file, aside))
+      qCWarning(lcSync).noquote() << QStringLiteral(
+                                         "Ignoring %1 (kept as %2): the journal is kept in the data file now")
+                                         .arg(file, aside);
+    else
+      qCWarning(lcSync).noquote()
+          << QStringLiteral("Ignoring %1: the journal is kept in the data file now").arg(file);
   }
   return store;
 }
