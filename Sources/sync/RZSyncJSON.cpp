@@ -177,32 +177,9 @@ void newline(QByteArray& out, Style style, int depth) {
   out.append(qsizetype(depth) * 2, ' ');
 }
 
-// Hands what is written so far on once it has grown past this, between two members of a container.
-constexpr qsizetype kSpillBytes = 1 << 20;
-
-void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
-                const Spill* spill = nullptr) {
+void writeValue(QByteArray& out, const QVariant& value, Style style, int depth) {
   if (!value.isValid() || value.isNull()) {
     out.append("null");
-    return;
-  }
-  if (value.metaType() == QMetaType::fromType<ObjectOfObjects>()) {
-    const QMap<QString, QVariantMap>& members = *value.value<ObjectOfObjects>().members;
-    if (members.isEmpty()) {
-      out.append("{}");
-      return;
-    }
-    out.append('{');
-    for (auto it = members.begin(); it != members.end(); ++it) {
-      if (it != members.begin()) out.append(',');
-      newline(out, style, depth + 1);
-      writeString(out, it.key());
-      out.append(style == Style::Pretty ? ": " : ":");
-      writeValue(out, QVariant(it.value()), style, depth + 1, spill);
-      if (spill && out.size() >= kSpillBytes) (*spill)(out);
-    }
-    newline(out, style, depth);
-    out.append('}');
     return;
   }
   if (value.metaType() == QMetaType::fromType<Decimal>()) {
@@ -230,8 +207,7 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
         newline(out, style, depth + 1);
         writeString(out, it.key());
         out.append(style == Style::Pretty ? ": " : ":");
-        writeValue(out, it.value(), style, depth + 1, spill);
-        if (spill && out.size() >= kSpillBytes) (*spill)(out);
+        writeValue(out, it.value(), style, depth + 1);
       }
       newline(out, style, depth);
       out.append('}');
@@ -250,8 +226,7 @@ void writeValue(QByteArray& out, const QVariant& value, Style style, int depth,
         if (!first) out.append(',');
         first = false;
         newline(out, style, depth + 1);
-        writeValue(out, element, style, depth + 1, spill);
-        if (spill && out.size() >= kSpillBytes) (*spill)(out);
+        writeValue(out, element, style, depth + 1);
       }
       newline(out, style, depth);
       out.append(']');
@@ -309,13 +284,6 @@ QByteArray write(const QVariant& value, Style style) {
   QByteArray out;
   writeValue(out, value, style, 0);
   return out;
-}
-
-void write(const QVariant& value, Style style, const Spill& spill) {
-  QByteArray out;
-  out.reserve(kSpillBytes + kSpillBytes / 4);
-  writeValue(out, value, style, 0, &spill);
-  spill(out);
 }
 
 void CompactObject::add(const QString& key, const QVariant& value) {

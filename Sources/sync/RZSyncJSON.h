@@ -6,7 +6,6 @@
 #include <QString>
 #include <QVariant>
 
-#include <functional>
 #include <limits>
 #include <optional>
 
@@ -52,17 +51,6 @@ class CompactObject {
   QByteArray text_;
 };
 
-// An object of objects written in place, as the QVariantMap holding the same would be (a journal's
-// sections are not copied into one to be written).
-struct ObjectOfObjects {
-  const QMap<QString, QVariantMap>* members = nullptr;
-};
-
-// The same text handed to `spill` piece by piece as it is written (a large journal never lies in memory
-// whole): each call takes what the buffer holds and leaves it empty.
-using Spill = std::function<void(QByteArray& bytes)>;
-void write(const QVariant& value, Style style, const Spill& spill);
-
 // Whether two values are the same JSON text (so 12.30 and 12.3 differ, as a server would see them).
 bool sameValue(const QVariant& a, const QVariant& b);
 
@@ -70,5 +58,3 @@ bool sameValue(const QVariant& a, const QVariant& b);
 bool isContainer(const QVariant& value);
 
 }  // namespace RZSyncJSON
-
-Q_DECLARE_METATYPE(RZSyncJSON::ObjectOfObjects)
