@@ -2,6 +2,8 @@
 
 #include "WTObjectContext.h"
 
+#include <QCollator>
+
 #include <cstdio>
 #include <cstdlib>
 
@@ -31,6 +33,11 @@ QString parse(QCommandLineParser& parser, const QStringList& arguments, const QS
     if (parser.values(name).size() > 1) return QStringLiteral("--%1 given more than once").arg(name);
   }
   return {};
+}
+
+bool sortsBefore(const QString& a, const QString& b) {
+  static const QCollator collator;
+  return collator.compare(a, b) < 0;
 }
 
 void endProcess(int status, QTextStream& out, QTextStream& err, WTObjectContext& context) {

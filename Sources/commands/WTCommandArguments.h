@@ -18,6 +18,10 @@ int failure(QTextStream& err, const QString& message);
 // Parses `arguments` (those after the command's name) for options that each take one value, given at
 // most once; nothing else is allowed. Gives the problem, or an empty text.
 QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options);
+// Whether `a` comes before `b` in a list of names shown to the user (their language's order). One collator
+// serves the whole process and goes with it: QString::localeAwareCompare keeps one per thread, which a
+// process without an application object never gives back.
+bool sortsBefore(const QString& a, const QString& b);
 // Ends the process with `status` once a command is done: its output is flushed and `context`'s store
 // closed, as any end would, but the records are not freed one by one, since the system takes the
 // process's memory back whole. Only for a process that runs one command.

@@ -60,7 +60,7 @@ Result<WTNamedProjects> namedIn(std::unique_ptr<WTStoreSnapshot> snapshot, WTNam
     if (!client) return client.error();
     named.projects = client.value()->projects();
     std::sort(named.projects.begin(), named.projects.end(), [](const WTProject* a, const WTProject* b) {
-      return a->name().localeAwareCompare(b->name()) < 0;
+      return WTCommandArguments::sortsBefore(a->name(), b->name());
     });
     named.title = client.value()->name();
   }
@@ -130,8 +130,7 @@ Result<T*> named(const QList<T*>& all, const QString& name, const char* kind, co
   const QList<T*>& listed = matches.isEmpty() ? all : matches;
   QStringList names;
   for (T* record : listed) names.append(describe(record));
-  std::sort(names.begin(), names.end(),
-            [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+  std::sort(names.begin(), names.end(), WTCommandArguments::sortsBefore);
   const qsizetype more = names.size() - kNamesShown;
   if (more > 0) {
     names.resize(kNamesShown);
@@ -258,8 +257,7 @@ Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name,
   } else {
     QStringList names;
     for (const WTProject* candidate : projects) names.append(describeProject(candidate));
-    std::sort(names.begin(), names.end(),
-              [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+    std::sort(names.begin(), names.end(), WTCommandArguments::sortsBefore);
     if (names.size() > kNamesShown) {
       const qsizetype more = names.size() - kNamesShown;
       names.resize(kNamesShown);

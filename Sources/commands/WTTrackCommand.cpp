@@ -197,8 +197,7 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     for (const WTClient* client : context.fetch<WTClient>()) names.append(client->name());
   }
   names.removeAll(QString());
-  std::sort(names.begin(), names.end(),
-            [](const QString& a, const QString& b) { return a.localeAwareCompare(b) < 0; });
+  std::sort(names.begin(), names.end(), WTCommandArguments::sortsBefore);
   names.erase(std::unique(names.begin(), names.end()), names.end());
   for (const QString& name : names) {
     // One name a line: a line break inside a name would read as two.
