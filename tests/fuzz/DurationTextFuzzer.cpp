@@ -1,15 +1,10 @@
 // libFuzzer target over typed durations (see README.md): what the strict reading takes is written as the
 // lists write it, and that text reads back, strictly and leniently, as the same number of minutes.
 #include "DurationText.h"
+#include "FuzzCheck.h"
 #include "LocaleFuzzInput.h"
 
 #include <cstdlib>
-
-namespace {
-void check(bool condition) {
-  if (!condition) std::abort();
-}
-}  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 1) return 0;

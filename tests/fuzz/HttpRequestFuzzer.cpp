@@ -1,4 +1,5 @@
 // libFuzzer target over the sync server's request parsing, delivered in pieces (see README.md).
+#include "FuzzCheck.h"
 #include "HttpRequestParser.h"
 
 #include <cstddef>
@@ -15,10 +16,6 @@ using Kind = HttpRequestParser::Outcome::Kind;
 // Small caps, so that short inputs reach every one of them; the line cap comes from the input, so the
 // fuzzer can move it onto a line's end.
 HttpRequestParser::Limits kLimits{64, 256, 48, 6};
-
-void check(bool condition) {
-  if (!condition) std::abort();
-}
 
 void note(std::string& seen, const HttpRequestParser::Outcome& outcome) {
   if (outcome.continueFirst) seen += "continue\n";

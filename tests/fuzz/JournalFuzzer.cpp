@@ -1,5 +1,6 @@
 // libFuzzer target over the journal file's text, as an older version left it beside the store (see
 // README.md): whatever is taken, written out as those versions wrote it, is taken again as the same.
+#include "FuzzCheck.h"
 #include "RZSyncJSON.h"
 #include "RZSyncTrack.h"
 
@@ -10,10 +11,6 @@
 #include <cstdlib>
 
 namespace {
-
-void check(bool condition) {
-  if (!condition) std::abort();
-}
 
 QVariantMap section(const RZSyncTrack::Entries& entries) {
   QVariantMap map;

@@ -2,17 +2,12 @@
 // the second the currency. What is taken reads back the same from the editor's text, and as the
 // amount billed from the text a list shows; what Decimal reads, it writes back to text of the same value.
 #include "Decimal.h"
+#include "FuzzCheck.h"
 #include "LocaleFuzzInput.h"
 #include "MoneyFormat.h"
 #include "TypedNumber.h"
 
 #include <cstdlib>
-
-namespace {
-void check(bool condition) {
-  if (!condition) std::abort();
-}
-}  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 2) return 0;

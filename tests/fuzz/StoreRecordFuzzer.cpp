@@ -1,6 +1,7 @@
 // libFuzzer target over the store's reading of rows (see README.md): the input becomes up to four rows
 // of a real store file, each column a NULL, an integer, a real, a text or a blob. Loading either refuses
 // the file as damaged or gives records; records given, saved and loaded again, are the same records.
+#include "FuzzCheck.h"
 #include "WTStore.h"
 #include "WTStoreRows.h"
 
@@ -16,10 +17,6 @@
 #include <vector>
 
 namespace {
-
-void check(bool condition) {
-  if (!condition) std::abort();
-}
 
 constexpr int kColumns = WTStoreRows::kImportId + 1;
 
