@@ -4,8 +4,6 @@
 #include "FuzzCheck.h"
 #include "LocaleFuzzInput.h"
 
-#include <cstdlib>
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 1) return 0;
   UErrorCode status = U_ZERO_ERROR;

@@ -7,8 +7,6 @@
 #include "MoneyFormat.h"
 #include "TypedNumber.h"
 
-#include <cstdlib>
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 2) return 0;
   static const QString currencies[] = {QStringLiteral("EUR"), QStringLiteral("JPY"), QStringLiteral("KWD"),
