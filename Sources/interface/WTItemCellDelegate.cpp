@@ -92,7 +92,10 @@ void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QMo
 }  // namespace
 
 WTItemCellDelegate::WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view)
-    : QStyledItemDelegate(view), controller_(controller), view_(view) {}
+    : QStyledItemDelegate(view), controller_(controller), view_(view) {
+  view->installEventFilter(this);
+  view->viewport()->installEventFilter(this);
+}
 
 bool WTItemCellDelegate::isEditingNotes(const QModelIndex& index) const {
   return notesEditor_ && notesIndex_.isValid() && notesIndex_ == index;

@@ -68,6 +68,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
   // Whether `line`, a duration or amount editor, holds text that would be refused; if so it is marked
   // and the reason shown.
   bool refuses(QLineEdit* line) const;
+  // Whether an event of the outline is held back because the open field refuses its text.
+  bool keepsRefusedEdit(const QEvent* event);
   void paintHoverBar(QPainter& painter, const QRectF& row, const WTTableCellView& cell,
                      const QModelIndex& index) const;
 
@@ -77,4 +79,5 @@ class WTItemCellDelegate : public QStyledItemDelegate {
   mutable Field openField_ = Field::Name;
   mutable QPersistentModelIndex notesIndex_;
   mutable QPointer<WTNotesTextView> notesEditor_;
+  bool pressKept_ = false;
 };

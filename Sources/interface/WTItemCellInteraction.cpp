@@ -312,7 +312,22 @@ bool WTItemCellDelegate::refuses(QLineEdit* line) const {
   return true;
 }
 
+// A click or a key in the outline would commit and close the open field; while the field refuses its
+// text, the event only gives the focus back to it, so what was typed stays.
+bool WTItemCellDelegate::keepsRefusedEdit(const QEvent* event) {
+  const QEvent::Type type = event->type();
+  if (type == QEvent::MouseButtonRelease) return std::exchange(pressKept_, false);
+  if (type != QEvent::MouseButtonPress && type != QEvent::MouseButtonDblClick && type != QEvent::KeyPress)
+    return false;
+  auto* line = qobject_cast<QLineEdit*>(view_->indexWidget(view_->currentIndex()));
+  const bool kept = line && refuses(line);
+  if (kept) line->setFocus(Qt::OtherFocusReason);
+  if (type != QEvent::KeyPress) pressKept_ = kept;
+  return kept;
+}
+
 bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
+  if (object == view_ || object == view_->viewport()) return keepsRefusedEdit(event);
   auto* line = qobject_cast<QLineEdit*>(object);
   if (line && (event->type() == QEvent::KeyPress || event->type() == QEvent::FocusOut)) {
     // A duration or amount that is not one stays in its field, as typed, with the reason in view:

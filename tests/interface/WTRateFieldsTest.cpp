@@ -32,14 +32,18 @@ class WTRateFieldsTest : public OutlineTest {
   static bool refusedIn(QLineEdit* field, const QString& text) {
     return WTRateField::isRefused(field) && field->text() == text && !field->toolTip().isEmpty();
   }
-  // Types into an item's field editor with Return; answers whether it was refused in place.
+  // Types into an item's field editor, clicks the task's row, then presses Return in the editor if it
+  // is still open; answers whether it was refused in place.
   bool typeIntoRow(WTItem* item, Field field, const QString& text) {
     outline()->setCurrentIndex(rowOf(item));
     controller->cellDelegate()->setEditField(field);
     outline()->edit(rowOf(item));
     QLineEdit* editor = shown->openEditor();
     if (!editor) return false;
-    type(editor, text, true);
+    type(editor, text);
+    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {},
+                      shown->centreOf(design, WTTableCellView::Part::Name));
+    if ((editor = shown->openEditor())) QTest::keyClick(editor, Qt::Key_Return);
     editor = shown->openEditor();
     const bool refused = editor && outline()->isEditing() && refusedIn(editor, text);
     if (editor) QTest::keyClick(editor, Qt::Key_Escape);
