@@ -106,15 +106,22 @@ void WTPreferencesWindowController::passwordDidLoad() {
 }
 
 void WTPreferencesWindowController::updateKeychainNote() {
-  const bool kept = passwords_->location() == WTPasswordStore::Location::SettingsFile &&
-                    !passwords_->keychainError().isEmpty();
-  keychainNoteLabel_->setText(kept
-                                  ? tr("The keyring did not take the password (%1). It stays in Tessal's "
-                                       "settings file, which only you can read; Start Sync tries the keyring "
-                                       "again.")
-                                        .arg(passwords_->keychainError())
-                                  : QString());
-  keychainNoteLabel_->setVisible(kept);
+  const QString error = passwords_->keychainError();
+  const WTPasswordStore::Location location = passwords_->location();
+  QString note;
+  if (!error.isEmpty() && location == WTPasswordStore::Location::SettingsFile) {
+    note = tr("The keyring did not take the password (%1). It stays in Tessal's settings file, which only "
+              "you can read; Start Sync tries the keyring again.")
+               .arg(error);
+  } else if (!error.isEmpty() && location == WTPasswordStore::Location::None &&
+             defaults_->hasStoredValue(SettingsKeys::kSyncUser)) {
+    // Empty account fields would look like an account that is gone.
+    note = tr("The keyring could not be read (%1), so the account is not shown; nothing was removed. Type "
+              "the account again and press Start Sync to go on syncing.")
+               .arg(error);
+  }
+  keychainNoteLabel_->setText(note);
+  keychainNoteLabel_->setVisible(!note.isEmpty());
 }
 
 WTPreferencesWindowController::~WTPreferencesWindowController() {
@@ -122,8 +129,7 @@ WTPreferencesWindowController::~WTPreferencesWindowController() {
   // still whole: left to QDialog's destructor, the field's editingFinished would reach a half-destroyed one.
   hide();
   billingAddressField_->removeEventFilter(this);
-  for (QObject* child : findChildren<QObject*>())
-    disconnect(child, nullptr, this, nullptr);
+  for (QObject* child : findChildren<QObject*>()) disconnect(child, nullptr, this, nullptr);
 }
 
 void WTPreferencesWindowController::buildInterface() {

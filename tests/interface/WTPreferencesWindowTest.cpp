@@ -109,10 +109,15 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountAndTheLightFollowsSynci
   EXPECT_TRUE(manager->syncEnabled());
 }
 
-// A keyring that refused the password is said under the field, not in a dialog, even from start.
+// A keyring that could not be read or refused the password is said under the field, not in a dialog,
+// even from start.
 TEST_F(WTPreferencesWindowTest, AKeyringThatDidNotTakeThePasswordIsSaidUnderIt) {
   keychain.available = false;
   defaults->setValue("WTSyncUser", kUser);
+  WTPasswordStore unread(defaults.get(), std::make_unique<SharedKeychain>(keychain));
+  unread.load();
+  WTPreferencesWindowController shown(defaults.get(), manager.get(), &unread);
+  EXPECT_TRUE(shown.keychainNoteLabel()->text().contains("could not be read"));
   defaults->setValue("WTSyncPassword", kPassword);
   passwords->load();
   open();
