@@ -109,7 +109,7 @@ TEST(TemplateGolden, EverySeedRendersItsGoldenOutput) {
   } restore;
   const QDir corpus(TESSAL_TEST_DATA_DIR "/../fuzz/corpus");
   const QStringList names = corpus.entryList(QDir::Files);
-  EXPECT_GE(names.size(), 24);
+  EXPECT_GE(names.size(), 25);
   for (const QString& name : names) {
     QFile seed(corpus.filePath(name));
     QFile golden(corpus.filePath("../golden/" + name));
@@ -145,11 +145,9 @@ TEST_F(EngineRunTest, BlockEventsCarryTheBlockAndHandlersKeepTheirNames) {
   EXPECT_EQ(probe->finishedCalls, 2);  // "both" and "jump"; "for" was taken
 }
 
-TEST_F(EngineRunTest, AnEngineIsReusableAfterAStoppedRunAndCompilesNoPatternAgain) {
-  EXPECT_EQ(render("{% for 1 to 2 %}a{% if x y %}{% /if %}b{% /for %}"), "a");
-  EXPECT_EQ(delegate.codes(), QList<int>{1});
-  EXPECT_EQ(render("{% for 1 to 2 %}{% cycle p q %}{% /for %}{% if true %}ok{% /if %}"), "pqok");
-  EXPECT_TRUE(delegate.errors.empty());
+// However many markers a template holds, and however many templates an engine renders, it compiles the
+// matcher's patterns once. (That a run stopped by an error leaves nothing behind, the golden seeds show.)
+TEST_F(EngineRunTest, AnEngineCompilesNoPatternAgain) {
   QString text;
   for (int i = 0; i < 200; ++i)
     text += QStringLiteral("<p>{{ x | uppercase }} {% if n > %1 %}b{% /if %}</p>").arg(i);
@@ -296,14 +294,7 @@ TEST_F(EngineRunTest, LoadFindsClassesByNameAndAFilterWithoutAValueWritesNothing
   EXPECT_EQ(other.processTemplate(text, vars), "hihiHI");
 }
 
-TEST(FilterFunctions, CapitalizedStartsEveryWordAndOnlyDayPatternsShareADaysText) {
-  const std::pair<const char*, const char*> cases[] = {
-      {"hello world", "Hello World"},           {"HELLO wORLD", "Hello World"},
-      {"o'neil-smith", "O'neil-Smith"},         {"123abc 4U", "123Abc 4U"},
-      {"élan\tvital\nend", "Élan\tVital\nEnd"}, {"", ""}};
-  for (const auto& [text, capitalized] : cases)
-    EXPECT_EQ(GXTemplateStandardFilters::capitalized(QString::fromUtf8(text)),
-              QString::fromUtf8(capitalized));
+TEST(FilterFunctions, OnlyDayPatternsShareADaysText) {
   for (const char* pattern : {"yyyy-MM-dd", "EEEE d. MMMM y 'um' QQQ", "w/W D F g e c", "'HH:mm' yy"})
     EXPECT_TRUE(GXTemplateStandardFilters::patternHasOnlyDayFields(QString::fromUtf8(pattern))) << pattern;
   for (const char* pattern : {"HH:mm", "yyyy a", "d z", "dd 'x''' ss", "yyyy-MM-dd'T'HH"})
