@@ -90,6 +90,7 @@ class WTTask final : public WTBillingRecord {
   WTItemContainerList monthlyItems() const;
 
   // Groups for the items outline: "Pending" first, then one group per day, newest first.
+  const WTItemContainerList& cachedChildren() const { return cachedChildren_; }
   const WTItemContainerList& children();
   void updateChildren();
   // The cached group that holds `item` (its day's group, or "Pending" for an open to-do); never rebuilds.
