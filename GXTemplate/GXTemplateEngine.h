@@ -89,11 +89,7 @@ class GXTemplateEngine {
   // The value of a dotted variable, looked up first among the run's variables, then the globals, then the
   // open blocks' frames from the innermost outward; null when there is none. A component that no map,
   // record or list answers may index a list by its leading digits ("items.2" is the third item).
-  // `parent` and `parentKey`, when given, receive the container that holds the value and its key there.
-  QVariant valueForVariable(const QString& variable, QVariant* parent = nullptr,
-                            QString* parentKey = nullptr) {
-    return scopes_.valueForVariable(variable, parent, parentKey);
-  }
+  QVariant valueForVariable(const QString& variable) { return scopes_.valueForVariable(variable); }
   // Stores a value: where the variable already lives (unless forced), else in the innermost block's frame
   // (or the run's variables when no block is open) under the whole dotted name.
   void setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame) {

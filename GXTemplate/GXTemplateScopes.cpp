@@ -74,8 +74,6 @@ struct GXTemplateScopes::Place {
   std::vector<Step> steps;
   bool navigable = true;
   QString key;
-  bool wantsParent = false;  // only callers of valueForVariable ask for the container itself
-  QVariant parent;
 };
 
 GXTemplateScopes::Name& GXTemplateScopes::nameOf(const QString& variable) {
@@ -160,7 +158,6 @@ QVariant GXTemplateScopes::resolve(Name& name, const QString& variable, Place* p
       place->root = root;
       if (count == 1) {
         place->key = variable;
-        if (place->wantsParent) place->parent = QVariant(*root);
       } else {
         place->key = components.last();
         QVariant parent = start;
@@ -170,7 +167,6 @@ QVariant GXTemplateScopes::resolve(Name& name, const QString& variable, Place* p
           place->steps.push_back({false, components[i], 0});
           parent = valueForComponents(parent, components, i, i + 1);
         }
-        if (place->wantsParent) place->parent = valueForComponents(start, components, 1, count - 1);
       }
     }
     return value;
@@ -179,12 +175,10 @@ QVariant GXTemplateScopes::resolve(Name& name, const QString& variable, Place* p
 
   // Then component by component, where a component that nothing answers may index a list.
   QVariant current = start;
-  QVariant container = QVariant(*root);
   std::vector<Step> steps{{false, first, 0}};
   bool navigable = true;
   qsizetype i = 1;
   for (; i < count; ++i) {
-    container = current;
     const QString& component = components[i];
     QVariant next = component.startsWith(u'@') ? KeyPath::valueForKeyPath(current, component)
                                                : valueForKey(current, component);
@@ -205,21 +199,14 @@ QVariant GXTemplateScopes::resolve(Name& name, const QString& variable, Place* p
   if (place) {
     place->root = root;
     place->key = components[qMin(i, count - 1)];
-    place->parent = container;
     place->steps = std::move(steps);
     place->navigable = navigable && i >= count;
   }
   return current;
 }
 
-QVariant GXTemplateScopes::valueForVariable(const QString& variable, QVariant* parent, QString* parentKey) {
-  if (!parent && !parentKey) return lookUp(variable, nullptr);
-  Place place;
-  place.wantsParent = parent != nullptr;
-  QVariant value = lookUp(variable, &place);
-  if (parent) *parent = GXTemplateValue::isNil(value) && place.root == nullptr ? QVariant() : place.parent;
-  if (parentKey) *parentKey = place.key;
-  return value;
+QVariant GXTemplateScopes::valueForVariable(const QString& variable) {
+  return lookUp(variable, nullptr);
 }
 
 void GXTemplateScopes::assign(const Place& place, const QVariant& value) {

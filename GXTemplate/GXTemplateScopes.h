@@ -63,7 +63,7 @@ class GXTemplateScopes {
   }
 
   // As the engine's functions of the same names describe them.
-  QVariant valueForVariable(const QString& variable, QVariant* parent, QString* parentKey);
+  QVariant valueForVariable(const QString& variable);
   void setValue(const QVariant& value, const QString& variable, bool forceCurrentStackFrame);
   QVariant* variableInInnermostBlock(const QString& name);
 

@@ -89,33 +89,6 @@ std::vector<std::shared_ptr<WTItemContainer>> WTItemContainer::containersByKeyPa
   return containersByKeyPath(keyPath, items);
 }
 
-bool WTItemContainer::isValidUUID(const QVariant& uuid) {
-  return uuid.metaType() == QMetaType::fromType<QVariantMap>();
-}
-
-std::shared_ptr<WTItemContainer> WTItemContainer::objectWithUUID(const QVariant& uuid,
-                                                                 WTObjectContext* context) {
-  if (!isValidUUID(uuid)) return nullptr;
-  const QVariantMap identity = uuid.toMap();
-  const QVariant taskUuid = identity.value(QStringLiteral("task"));
-  if (taskUuid.isNull()) return nullptr;
-  auto* task = dynamic_cast<WTTask*>(WTObjectContext::resolve(context)->objectWithUUID(taskUuid, false));
-  if (!task) return nullptr;
-  task->updateChildren();
-  const QVariant date = identity.value(QStringLiteral("date"));
-  // The "Pending" group stores no date, which matches no group: it is not found again this way.
-  if (date.metaType() != QMetaType::fromType<Date>()) return nullptr;
-  const auto& children = task->cachedChildren();
-  for (auto it = children.rbegin(); it != children.rend(); ++it) {
-    if ((*it)->date() == date.value<Date>()) return *it;
-  }
-  return nullptr;
-}
-
-bool WTItemContainer::isEqual(const WTItemContainer& other) const {
-  return date_ == other.date_ && task_ == other.task_;
-}
-
 QString WTItemContainer::title() const {
   if (date_) return RZDate::shortFormat(*date_);
   return QCoreApplication::translate("WTItemContainer", "Pending");

@@ -40,13 +40,6 @@ class WTItemContainer : public QObject, public KeyValueCoding {
   static std::vector<std::shared_ptr<WTItemContainer>> containersByKeyPath(const QString& keyPath,
                                                                            const QList<WTTask*>& tasks);
 
-  // True when `uuid` has the shape of a group identity (a map).
-  static bool isValidUUID(const QVariant& uuid);
-  // Finds the group of that identity again by rebuilding its task's groups; none for the "Pending"
-  // group, which has no date to match.
-  static std::shared_ptr<WTItemContainer> objectWithUUID(const QVariant& uuid, WTObjectContext* context);
-
-  bool isEqual(const WTItemContainer& other) const;
   // The names its items carry, each once, in the items' order, joined by "; " (for a report's line of a
   // day or a month); empty when none of them has a name.
   QString itemNames() const;
@@ -72,7 +65,6 @@ class WTItemContainer : public QObject, public KeyValueCoding {
 
   void startObserving();
   void stopObserving();
-  bool isObserving() const { return !observers_.empty(); }
 
   QVariant valueForKey(const QString& key) const override;
 

@@ -94,10 +94,8 @@ TEST(MoneyFormat, CurrenciesBillToTheirMinorUnit) {
     EXPECT_EQ(MoneyFormat::billed(value, currency).toString(), billed);
     EXPECT_EQ(MoneyFormat::format(value, currency), shown);
   }
-  // clang-format off
-  for (const auto& [locale, currency] :
-       {std::pair{"de_DE", "EUR"}, {"ja_JP", "JPY"}, {"en_US", "USD"}, {"de_CH", "CHF"}, {"ar_KW", "KWD"}, {"en", "USD"}}) {
-    // clang-format on
+  // The currency of the locale the user works in, also of one that names no country.
+  for (const auto& [locale, currency] : {std::pair{"ja_JP", "JPY"}, {"en", "USD"}}) {
     const UserLocale there(locale);
     EXPECT_EQ(MoneyFormat::localeCurrency(), currency) << locale;
   }

@@ -269,11 +269,8 @@ TEST_F(RZDateTest, ZoneChangesAndSundayWeeks) {
 TEST_F(RZDateTest, ShortFormatsFollowLocaleAndZone) {
   const Date afternoon = utc(2024, 5, 14, 12, 30, 40), lateEvening = utc(2024, 5, 14, 23, 30);
   const std::tuple<const char*, const char*, Date, QString, QString> cases[] = {
-      {"en_US", "Europe/Berlin", afternoon, "5/14/24", u"5/14/24, 2:30\u202fPM"_s},
-      {"en_US", "America/New_York", afternoon, "5/14/24", u"5/14/24, 8:30\u202fAM"_s},
       {"en_US", "Europe/Berlin", lateEvening, "5/15/24", u"5/15/24, 1:30\u202fAM"_s},
       {"en_US", "America/New_York", lateEvening, "5/14/24", u"5/14/24, 7:30\u202fPM"_s},
-      {"de_DE", "Europe/Berlin", afternoon, "14.05.24", "14.05.24, 14:30"},
       {"de_DE", "Australia/Lord_Howe", afternoon, "14.05.24", "14.05.24, 23:00"},
   };
   for (const auto& [locale, zone, date, dateText, dateTimeText] : cases) {

@@ -40,10 +40,8 @@ void note(std::string& seen, const HttpRequestParser::Outcome& outcome) {
 std::string parse(std::string_view bytes, size_t piece) {
   HttpRequestParser parser(kLimits);
   std::string seen;
-  for (size_t at = 0; at < bytes.size();) {
-    const size_t size = std::min(piece, bytes.size() - at);
-    HttpRequestParser::Outcome outcome = parser.feed(bytes.substr(at, size));
-    at += size;
+  for (size_t at = 0; at < bytes.size(); at += piece) {
+    HttpRequestParser::Outcome outcome = parser.feed(bytes.substr(at, piece));
     for (;;) {
       note(seen, outcome);
       if (outcome.kind == Kind::Refusal) return seen;

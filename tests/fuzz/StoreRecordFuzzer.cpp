@@ -23,31 +23,18 @@ constexpr int kColumns = WTStoreRows::kImportId + 1;
 const char* const kEntities[] = {"WTClient", "WTProject", "WTTask", "WTTime",
                                  "WTFlat",   "WTExpense", "WTNote", "WTToDo"};
 
+// A NULL, an integer, a real, a text, a blob or an entity's name.
 void bindColumn(sqlite3_stmt* insert, int column, FuzzedDataProvider& input) {
-  const int parameter = column + 1;
-  switch (input.ConsumeIntegralInRange(0, 5)) {
-    case 0:
-      sqlite3_bind_null(insert, parameter);
-      break;
-    case 1:
-      sqlite3_bind_int64(insert, parameter, input.ConsumeIntegral<sqlite3_int64>());
-      break;
-    case 2:
-      sqlite3_bind_double(insert, parameter, input.ConsumeFloatingPoint<double>());
-      break;
-    case 3: {
-      const std::string text = input.ConsumeRandomLengthString(64);
-      sqlite3_bind_text(insert, parameter, text.data(), int(text.size()), SQLITE_TRANSIENT);
-      break;
-    }
-    case 4: {
-      const std::string bytes = input.ConsumeRandomLengthString(64);
-      sqlite3_bind_blob(insert, parameter, bytes.data(), int(bytes.size()), SQLITE_TRANSIENT);
-      break;
-    }
-    default:
-      sqlite3_bind_text(insert, parameter, input.PickValueInArray(kEntities), -1, SQLITE_STATIC);
+  const int parameter = column + 1, kind = input.ConsumeIntegralInRange(0, 5);
+  if (kind == 0) sqlite3_bind_null(insert, parameter);
+  if (kind == 1) sqlite3_bind_int64(insert, parameter, input.ConsumeIntegral<sqlite3_int64>());
+  if (kind == 2) sqlite3_bind_double(insert, parameter, input.ConsumeFloatingPoint<double>());
+  if (kind == 3 || kind == 4) {
+    const std::string bytes = input.ConsumeRandomLengthString(64);
+    if (kind == 3) sqlite3_bind_text(insert, parameter, bytes.data(), int(bytes.size()), SQLITE_TRANSIENT);
+    if (kind == 4) sqlite3_bind_blob(insert, parameter, bytes.data(), int(bytes.size()), SQLITE_TRANSIENT);
   }
+  if (kind == 5) sqlite3_bind_text(insert, parameter, input.PickValueInArray(kEntities), -1, SQLITE_STATIC);
 }
 
 struct Fixture {

@@ -46,7 +46,8 @@ inline QVariantMap variables() {
           {"inner", QStringList{"1", "2"}}, {"n", 2}, {"x", 5}, {"y", QStringLiteral("5")}, {"name", QStringLiteral("abc")},
           {"kind", QStringLiteral("time")}, {"word", QStringLiteral("abc")}, {"text", QStringLiteral("no")},
           {"empty", QString()}, {"one", 1}, {"zero", 0}, {"dzero", QVariant::fromValue(Decimal())},
-          {"dhalf", decimal("0.5")}, {"fzero", 0.0}, {"up", QStringLiteral("Straße")}, {"low", QStringLiteral("ÀB c")}};
+          {"dhalf", decimal("0.5")}, {"fzero", 0.0}, {"up", QStringLiteral("Straße")}, {"low", QStringLiteral("ÀB c")},
+          {"words", QStringLiteral("hello wORLD o'neil-smith 123abc 4U élan\tvital\nend")}};
   // clang-format on
 }
 

@@ -107,45 +107,20 @@ TEST(RXRegexCaptures, CapturesAndTheirBoundsAndANullPatternRaises) {
             null);
 }
 
-// The error's whole user info, one "key=value" a line, in its order.
-std::string describe(const RXRegex::Error& error) {
-  QString text = error.domain + QStringLiteral(" %1").arg(error.code);
-  for (const auto& [key, value] : error.userInfo) text += u'\n' + key + u'=' + value.toString();
-  return text.toStdString();
-}
-
-TEST(RXRegexErrors, CompileErrorDescribesWhereItHappened) {
+// A pattern that does not compile finds nothing and, when asked, says so; a later good search clears it.
+TEST(RXRegexErrors, ACompileErrorFindsNothingAndIsDescribedWhenAsked) {
   RXRegex::Error error;
-  error.domain = "stale";
   EXPECT_EQ(RXRegex::rangeOfRegex("abc", "ab(", 0, RXRegex::kWholeString, 0, &error), kNone);
-  EXPECT_EQ(
-      describe(error),
-      "RXICURegexErrorDomain 66310\nNSLocalizedDescription=There was an error compiling the regular "
-      "expression.\nNSLocalizedFailureReason=The error U_REGEX_MISMATCHED_PAREN occured at line 1, column "
-      "3: ab(<<HERE>>\nRXICURegexRegex=ab(\nRXICURegexRegexOptions=0\nRXICURegexLine=1\nRXICURegexOffset=3"
-      "\nRXICURegexPreContext=ab(\nRXICURegexPostContext=\nRXICURegexErrorName=U_REGEX_MISMATCHED_PAREN");
-  EXPECT_EQ(error.value("RXICURegexOffset").toInt(), 3) << "looked up by its key";
+  EXPECT_EQ(std::pair(error.domain, error.value("RXICURegexOffset").toInt()),
+            std::pair(QStringLiteral("RXICURegexErrorDomain"), 3));
   EXPECT_EQ(RXRegex::captureCountForRegex("ab("), -1);
-  // Without an out-parameter the search just finds nothing; a later good search clears the error.
   EXPECT_EQ(RXRegex::rangeOfRegex("abc", "ab("), kNone);
   EXPECT_EQ(RXRegex::rangeOfRegex("abc", "b", 0, RXRegex::kWholeString, 0, &error), range(1, 1));
   EXPECT_TRUE(error.isNull());
-
-  // An error without a line ends after the options.
-  EXPECT_EQ(RXRegex::captureCountForRegex("flagged", 0x80000000u, &error), -1);
-  EXPECT_EQ(describe(error),
-            "RXICURegexErrorDomain 66315\nNSLocalizedDescription=There was an error compiling the regular "
-            "expression.\nNSLocalizedFailureReason=The error U_REGEX_INVALID_FLAG occured.\nRXICURegexRegex="
-            "flagged\nRXICURegexRegexOptions=2147483648");
 }
 
-TEST(RXRegexCache, ReusedPatternsAreNotCompiledAgainAndChangedTextsAreSearchedAnew) {
-  const QString regex = "re(us)ed";
-  RXRegex::rangeOfRegex("reused", regex);
-  const std::uint64_t before = RXRegex::compileCount();
-  for (int i = 0; i < 100; ++i)
-    EXPECT_EQ(RXRegex::rangeOfRegex(QStringLiteral("a reused text %1").arg(i), regex, 1), range(4, 2));
-  EXPECT_EQ(RXRegex::compileCount(), before);
+// A text changed in place is searched anew, not answered from the match remembered for it.
+TEST(RXRegexCache, ChangedTextsAreSearchedAnew) {
   QString text = "one two three";
   EXPECT_EQ(RXRegex::rangeOfRegex(text, "t\\w+"), range(4, 3));
   text.replace(4, 3, "TWO");

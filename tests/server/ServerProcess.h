@@ -46,19 +46,14 @@ class ServerProcess {
     close(out[0]);
     const size_t colon = line.rfind(':');
     port_ = colon == std::string::npos ? 0 : std::atoi(line.c_str() + colon + 1);
-    if (port_ > 0) return true;
-    kill();
-    return false;
+    if (port_ <= 0) kill();
+    return port_ > 0;
   }
 
   // SIGKILL, whatever it is doing, and reaps it.
   void kill() {
-    if (pid_ > 0) {
-      ::kill(pid_, SIGKILL);
-      waitpid(pid_, nullptr, 0);
-    }
-    pid_ = -1;
-    port_ = 0;
+    if (pid_ > 0) ::kill(pid_, SIGKILL), waitpid(pid_, nullptr, 0);
+    pid_ = -1, port_ = 0;
   }
 
   bool running() const { return pid_ > 0; }

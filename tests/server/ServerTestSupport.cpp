@@ -141,11 +141,6 @@ bool LocalServer::start() {
   return server_ != nullptr;
 }
 
-void LocalServer::stop() {
-  if (server_) server_->stop();
-  server_.reset();
-}
-
 void StorageTest::SetUp() {
   if (GetParam() == Storage::PostgreSQL && postgresUri().empty())
     GTEST_SKIP() << "TESSAL_TEST_POSTGRES is not set (scripts/pg-test-cluster.sh run ... sets it)";
@@ -162,11 +157,6 @@ void ServerTest::SetUp() {
 void ServerTest::startServer() {
   server_ = startedServer(storage_->location(), options);
   ASSERT_TRUE(server_);
-}
-
-void ServerTest::stopServer() {
-  if (server_) server_->stop();
-  server_.reset();
 }
 
 std::string ServerTest::newUser(const std::string& name) {

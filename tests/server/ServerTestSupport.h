@@ -78,7 +78,7 @@ class LocalServer {
   LocalServer(const std::string& location, const std::string& email, const std::string& password);
   ~LocalServer() { stop(); }
   bool start();
-  void stop();
+  void stop() { server_.reset(); }  // a server stops as it goes
   int port() const { return options_.port; }
   QString address() const { return QStringLiteral("http://127.0.0.1:%1").arg(options_.port); }
 
@@ -103,7 +103,7 @@ class ServerTest : public StorageTest {
 
   SyncServer::Options options;  // for the next startServer()
   void startServer();
-  void stopServer();
+  void stopServer() { server_.reset(); }
   int port() const { return server_->port(); }
 
   // A user with an account whose password is "password-of-" + email, and its sync requests.

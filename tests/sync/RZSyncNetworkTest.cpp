@@ -171,12 +171,3 @@ TEST_F(RZSyncNetworkTest, AnEndlessReplyIsCutOffAtTheLimit) {
   EXPECT_TRUE(
       waitUntil([&] { return !connection || connection->state() != QAbstractSocket::ConnectedState; }));
 }
-
-#ifndef QT_NO_DEBUG
-TEST_F(RZSyncNetworkTest, SecondRequestInFlightIsAProgrammingError) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  server.handler = [](const HttpRequest&) { return QByteArray(); };
-  network.postJSONObject({}, QStringLiteral("head"), 1);
-  EXPECT_DEATH(network.postJSONObject({}, QStringLiteral("head"), 1), "RZSyncNetwork");
-}
-#endif

@@ -1,6 +1,7 @@
 // Random edits synced through a lossy proxy and a server restart converge on every accepted change, also
 // over three server processes on one database that are killed while they answer.
 // Seeded: TESSAL_SYNC_SEED=<n> replays one run; TESSAL_SYNC_RUNS=<n> runs that many seeds.
+#include "RZSyncCommand.h"
 #include "RZSyncReplacedStore.h"
 #include "ServerProcess.h"
 #include "ServerTestSupport.h"
@@ -18,6 +19,7 @@
 
 #include <future>
 #include <iostream>
+#include <map>
 #include <random>
 
 using namespace synctest;
@@ -450,13 +452,27 @@ TEST(RZSyncReplicaSimulation, RandomEditsOnThreeReplicasKilledWhileTheyAnswerCon
   }
 }
 
+// One account on a real server over the storage under test, used from two devices.
+class RZSyncTwoDevices : public servertest::StorageTest {
+ protected:
+  void SetUp() override {
+    StorageTest::SetUp();
+    if (IsSkipped()) return;
+    const QString user = Simulation::kUser, password = Simulation::kPassword;
+    server = std::make_unique<servertest::LocalServer>(storage_->location(), user.toStdString(),
+                                                       password.toStdString());
+    here = std::make_unique<SyncClient>(server->address(), user, password);
+    there = std::make_unique<SyncClient>(server->address(), user, password);
+  }
+  std::unique_ptr<servertest::LocalServer> server;
+  std::unique_ptr<SyncClient> here, there;
+};
+
 // A device puts back a copy of its store from before its own and another device's saves: the journal
 // started again, it gets back what was saved since, and the server neither brings back what was deleted
 // since nor loses what the copy lacks.
-TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
-  const QString user = Simulation::kUser, password = Simulation::kPassword;
-  servertest::LocalServer server(storage_->location(), user.toStdString(), password.toStdString());
-  SyncClient here(server.address(), user, password), there(server.address(), user, password);
+TEST_P(RZSyncTwoDevices, ARestoredCopyNeitherResurrectsNorDrops) {
+  SyncClient &here = *this->here, &there = *this->there;
   auto task = [](SyncClient& client, const QString& name, WTProject* project) {
     auto* task = client.context->insertNewObject<WTTask>();
     task->setName(name);
@@ -501,17 +517,15 @@ TEST_P(RZSyncSimulation, ARestoredCopyNeitherResurrectsNorDrops) {
   EXPECT_EQ(names, QStringList({"Added here", "Added there", "Renamed since"}));
   EXPECT_EQ(snapshot(*here.context), snapshot(*there.context));
   // A device set up afresh gets the same from the server.
-  SyncClient fresh(server.address(), user, password);
+  SyncClient fresh(server->address(), Simulation::kUser, Simulation::kPassword);
   ASSERT_TRUE(fresh.syncOnce());
   EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
 
 // A journal larger than one save may carry (an import's) goes out in pieces, one after another within
 // the same poll, and reaches the other devices whole.
-TEST_P(RZSyncSimulation, ALargeJournalIsSentInPieces) {
-  const QString user = Simulation::kUser, password = Simulation::kPassword;
-  servertest::LocalServer server(storage_->location(), user.toStdString(), password.toStdString());
-  SyncClient here(server.address(), user, password), there(server.address(), user, password);
+TEST_P(RZSyncTwoDevices, ALargeJournalIsSentInPieces) {
+  SyncClient &here = *this->here, &there = *this->there;
   RZSyncManager::Intervals intervals = here.manager->intervals();
   intervals.recordsPerSave = 3;
   here.manager->setIntervals(intervals);
@@ -535,6 +549,102 @@ TEST_P(RZSyncSimulation, ALargeJournalIsSentInPieces) {
   EXPECT_EQ(snapshot(*there.context), snapshot(*here.context));
 }
 
+// Undo, redo, and undoing a deletion the server kept for good, all after the autosave, reach the other
+// device, each record with every key it has.
+TEST_P(RZSyncTwoDevices, AnotherDeviceFollowsUndoAfterTheSave) {
+  SyncClient &a = *here, &b = *there;
+  // Ends A's turn, undoes (or redoes) `steps` steps each in its own turn and saves; then A, and B, run the
+  // sync command until in step.
+  const auto undoThenSync = [&](qsizetype steps, bool undo = true, bool sync = true) {
+    a.context->processPendingChanges();
+    for (qsizetype i = 0; i < steps; ++i) {
+      undo ? a.context->undoManager().undo() : a.context->undoManager().redo();
+      a.context->processPendingChanges();
+    }
+    a.save();
+    for (SyncClient* client : {&a, &b}) {
+      QString out, err;
+      QTextStream outStream(&out), errStream(&err);
+      ASSERT_TRUE(!sync || runSyncCommand(*client->manager, {"--timeout", "30"}, outStream, errStream) == 0)
+          << err.toStdString();
+    }
+  };
+  const auto madeHere = [&] {
+    QStringList made;
+    for (WTObject* record : a.context->fetchObjectsForEntityName("WTObject").value_or(QList<WTObject*>()))
+      if (record->name().startsWith("one ")) made.append(record->uuid());
+    return made;
+  };
+  auto* task = a.context->insertNewObject<WTTask>();
+  task->setName("Design");
+  task->setProject(a.context->insertNewObject<WTProject>());
+  task->project()->setName("Atlas");
+  a.context->processPendingChanges();
+  // clang-format off
+  const std::map<WTEntity, QVariantMap> billing = {
+      {WTEntity::Client, {{"currency", "JPY"}, {"address", "1 Main St"}, {"roundingMinutes", 15}, {"roundingMode", "up"}}},
+      {WTEntity::Project, {{"budget", "2500.50"}, {"roundingMode", "down"}}},
+      {WTEntity::Task, {{"roundingMinutes", 6}}}};
+  // clang-format on
+  for (WTEntity entity : WTEntities::kAll) {  // each its own undo step
+    WTObject* record = a.context->insertNewObject(entity);
+    record->setName(QStringLiteral("one ") + WTEntities::name(entity));
+    const QVariantMap values = billing.count(entity) ? billing.at(entity) : QVariantMap();
+    for (const auto& [key, value] : values.asKeyValueRange())
+      EXPECT_TRUE(record->setValue(key, value)) << key.toStdString();
+    if (entity == WTEntity::Task) static_cast<WTTask*>(record)->setProject(task->project());
+    if (WTEntities::isItem(entity)) static_cast<WTItem*>(record)->setTask(task);
+    a.context->processPendingChanges();
+  }
+  const qsizetype count = madeHere().size();
+  undoThenSync(0);
+  ASSERT_EQ(b.context->count(), 2 + count);
+  EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  const QList<WTClient*> clients = b.context->fetch<WTClient>();
+  ASSERT_EQ(clients.size(), 1);
+  EXPECT_EQ(clients[0]->billingCurrency() + ' ' + clients[0]->address(), "JPY 1 Main St");
+  undoThenSync(count);
+  ASSERT_EQ(b.context->count(), 2);  // only the project and task the records are filed under
+  undoThenSync(count, false);
+  ASSERT_EQ(b.context->count(), 2 + count);
+  EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+
+  const QStringList made = madeHere();
+  undoThenSync(count, true, false);
+  undoThenSync(count, false);
+  EXPECT_EQ(madeHere(), made);  // the same identities: nothing reached the server in between
+  EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  undoThenSync(count);
+  a.reopen(), b.reopen();
+  EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  ASSERT_EQ(b.context->count(), 2);
+
+  task = a.context->fetch<WTTask>().value(0);
+  const auto entry = [&](const char* name) {
+    auto* time = a.context->insertNewObject<WTTime>();
+    time->setName(name);
+    time->setTask(task);
+    undoThenSync(0);
+  };
+  entry("before");
+  a.context->deleteObject(task);
+  undoThenSync(0);
+  ASSERT_EQ(b.context->count(), 1) << "the deletion reached the other device";
+  a.context->undoManager().undo();
+  entry("after");
+  a.reopen(), b.reopen();
+  EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  const QList<WTTask*> tasks = b.context->fetch<WTTask>();
+  ASSERT_TRUE(tasks.size() == 1 && tasks[0]->project());
+  QStringList entries{tasks[0]->name(), tasks[0]->project()->name()};
+  for (const WTItem* item : tasks[0]->items()) entries.append(item->name());
+  std::sort(entries.begin() + 2, entries.end());
+  EXPECT_EQ(entries, QStringList({"Design", "Atlas", "after", "before"}));
+}
+
 INSTANTIATE_TEST_SUITE_P(Storage, RZSyncSimulation,
+                         testing::Values(servertest::Storage::SQLite, servertest::Storage::PostgreSQL),
+                         servertest::storageName);
+INSTANTIATE_TEST_SUITE_P(Storage, RZSyncTwoDevices,
                          testing::Values(servertest::Storage::SQLite, servertest::Storage::PostgreSQL),
                          servertest::storageName);
