@@ -191,42 +191,6 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
   EXPECT_EQ(build->items(), QList<WTItem*>{kept});
 }
 
-// The header's parts never overlap and its totals stand over the columns, with or without a scroll bar.
-TEST_F(WTItemsViewControllerTest, TheHeaderTotalsStandOverTheRowsDurationAndCostColumns) {
-  project->setName("The new website of the regional library and its branches");
-  for (int day = 1; day <= 25; ++day) makeItem<WTTime>(design, "Sketches", at(2024, 3, day));
-  endTurn();
-  auto* title = controller->view()->findChild<QLabel*>("projectTitle");
-  auto* duration = controller->view()->findChild<QLabel*>("projectDuration");
-  auto* cost = controller->view()->findChild<QLabel*>("projectCost");
-  QLineEdit* rate = controller->rateField();
-  ASSERT_TRUE(title && duration && cost);
-  EXPECT_EQ(duration->text(), "12:30");
-  for (const bool scrolls : {false, true}) {
-    if (scrolls) outline()->expandAll();
-    for (const int width : {620, 900, 1200}) {
-      shown->window.resize(width, 600);
-      QApplication::processEvents();
-      SCOPED_TRACE(testing::Message() << width << (scrolls ? " with a scroll bar" : ""));
-      ASSERT_EQ(outline()->verticalScrollBar()->isVisible(), scrolls);
-      EXPECT_EQ(controller->view()->width(), width);  // the header does not widen the window
-      const QRect row = outline()->visualRect(rowOf(design));
-      const QRectF line(0, row.y(), outline()->viewport()->width(), row.height());
-      for (const auto& [label, part] : {std::pair{duration, Part::Duration}, std::pair{cost, Part::Cost}}) {
-        const QRect column =
-            controller->cellViewPrototypeForIndex(rowOf(design)).partRect(part, line).toRect();
-        EXPECT_EQ(label->mapToGlobal(QPoint(0, 0)).x(),
-                  outline()->viewport()->mapToGlobal(column.topLeft()).x());
-        EXPECT_EQ(label->width(), column.width());
-      }
-      EXPECT_LT(rate->geometry().right(), duration->geometry().left());
-      EXPECT_LT(title->geometry().right(), rate->geometry().left());
-      EXPECT_LE(title->fontMetrics().horizontalAdvance(title->text()), title->contentsRect().width());
-      EXPECT_TRUE(title->text() == project->name() || title->toolTip() == project->name());
-    }
-  }
-}
-
 // Time already spent is entered stopped by typing its duration: it ends now, not that long from now.
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));

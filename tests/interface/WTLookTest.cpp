@@ -2,32 +2,6 @@
 
 namespace {
 
-// A selected row is mostly the palette's highlight, its text in the highlighted text colour.
-void expectHighlighted(QAbstractItemView* view, const QModelIndex& index) {
-  const QColor highlight(10, 90, 200);
-  QPalette palette = view->palette();
-  for (auto group : {QPalette::Active, QPalette::Inactive}) {
-    palette.setColor(group, QPalette::Highlight, highlight);
-    palette.setColor(group, QPalette::HighlightedText, QColor(255, 255, 0));
-  }
-  view->setPalette(palette);
-  view->selectionModel()->select(index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
-  view->clearFocus();  // no hover, no editor: the plain selected row
-  QApplication::processEvents();
-  const QImage image = view->viewport()->grab().toImage();
-  const QRect row = view->visualRect(index).adjusted(0, 0, 0, -3);
-  int highlighted = 0, text = 0;
-  for (int y = row.top(); y <= row.bottom(); ++y) {
-    for (int x = row.left(); x <= row.right(); ++x) {
-      const QColor colour = image.pixelColor(x, y);
-      highlighted += colour == highlight;
-      text += colour.red() > 180 && colour.green() > 180 && colour.blue() < 120;
-    }
-  }
-  EXPECT_GT(highlighted, row.width() * row.height() / 2);
-  EXPECT_GT(text, 20);
-}
-
 // Pixels of the view's middle band that are clearly darker than its background: text.
 int inkInMiddle(QAbstractItemView* view) {
   QApplication::processEvents();
@@ -40,22 +14,6 @@ int inkInMiddle(QAbstractItemView* view) {
 }
 
 class WTLookTest : public UiTest {};
-
-TEST_F(WTLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour) {
-  WTProject* project = makeProject("Website");
-  WTTask* task = makeTask(project, "Design");
-  WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
-  ShownOutline shown(context.get(), project, QSize(800, 400));
-  ShownProjects list(context.get(), QSize(800, 500));
-  endTurn();
-  for (const WTObject* object : QList<const WTObject*>{task, time}) {
-    SCOPED_TRACE(object->name().toStdString());
-    shown.controller.expandContainerOfItem(time);
-    expectHighlighted(shown.outline(), shown.rowOf(object));
-  }
-  ASSERT_TRUE(list.controller.arrayController()->index(0, 0).isValid());
-  expectHighlighted(list.controller.tableView(), list.controller.arrayController()->index(0, 0));
-}
 
 // A budget is a bar under the cost: the palette's highlight within it, amber from 80 %, red past it, the
 // share and what is left in the cost's tip; a changed budget repaints the row.

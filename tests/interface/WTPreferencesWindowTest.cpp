@@ -179,26 +179,6 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");
 }
 
-TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
-  defaults->setValue("WTIdleTime", 20);
-  open();
-  auto shows = [&] {
-    return std::tuple(window->shouldIdleCheckBox()->isChecked(), window->idleTimeSpinBox()->isEnabled(),
-                      window->idleTimeSpinBox()->value(), window->stopsOtherTimesCheckBox()->isChecked());
-  };
-  EXPECT_EQ(shows(), std::tuple(false, false, 20, false));
-  QTest::mouseClick(window->shouldIdleCheckBox(), Qt::LeftButton);
-  window->idleTimeSpinBox()->stepUp();
-  QTest::mouseClick(window->stopsOtherTimesCheckBox(), Qt::LeftButton);
-  EXPECT_EQ(std::tuple(defaults->boolForKey("WTShouldIdle"), defaults->integerForKey("WTIdleTime"),
-                       defaults->boolForKey("WTStopsOtherTimes")),
-            std::tuple(true, 21, true));
-  open();
-  EXPECT_EQ(shows(), std::tuple(true, true, 21, true));
-  QTest::mouseClick(window->shouldIdleCheckBox(), Qt::LeftButton);
-  EXPECT_FALSE(defaults->boolForKey("WTShouldIdle") || window->idleTimeSpinBox()->isEnabled());
-}
-
 // The details for a report's head are stored as each field is left (the address, on several lines, when
 // the focus goes), or when the window closes; an emptied field stores none. The currency is a code ICU
 // knows, in any case; the rounding rule is stored as it is changed.
