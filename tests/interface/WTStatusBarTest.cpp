@@ -52,7 +52,6 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
   ASSERT_TRUE(popup.isVisible());
   EXPECT_EQ(rowsOf(popup),
             QStringList({"T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T8:Start", "T7:Start"}));
-  EXPECT_GE(popup.y(), 24) << "below the icon it opened from";
 
   ASSERT_EQ(rowsOf(popup).indexOf("T8:Start"), 3);
   shownRows(popup)[3]->findChild<QToolButton*>("timerButton")->click();
@@ -64,7 +63,6 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndClosesWhenNoTaskIsLeft) {
             QStringList({"T8:Stop 00:00", "T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T7:Start"}));
 
   statusBar.statusBarClicked(QRect(0, 0, 24, 24));
-  EXPECT_GE(popup.y(), 24);
   for (WTTask* task : tasks) context->deleteObject(task);
   settle();
   EXPECT_FALSE(popup.isVisible());

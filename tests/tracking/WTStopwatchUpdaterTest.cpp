@@ -3,7 +3,6 @@
 #include "WTRecentTasks.h"
 
 #include <QSignalSpy>
-#include <QTranslator>
 
 namespace {
 
@@ -115,25 +114,6 @@ INSTANTIATE_TEST_SUITE_P(Rows, IdleQuestionTest, ::testing::Values(
     IdleRow{true, 10, 599, true, false}, IdleRow{true, 10, 600, true, true}, IdleRow{std::nullopt, 5, 100000, true, false},
     IdleRow{false, 5, 100000, true, false}, IdleRow{true, 5, -1, true, false}, IdleRow{true, 5, 100000, false, false}));
 // clang-format on
-
-// A translation that shows the minutes gets the whole minutes of the idle time.
-TEST_F(TrackingTest, TheIdleQuestionCanNameTheMinutes) {
-  turnIdleHandlingOn(5);
-  startTimer(makeTask(), clockNow.addingSeconds(-3600));
-  idle.seconds = 659;
-  class Translator final : public QTranslator {
-   public:
-    QString translate(const char*, const char* source, const char*, int) const override {
-      return QLatin1String(source) == QLatin1String("Idle time") ? "Untätig seit %ld Minuten" : QString();
-    }
-    bool isEmpty() const override { return false; }
-  } translator;
-  QCoreApplication::installTranslator(&translator);
-  updater->start();
-  QCoreApplication::removeTranslator(&translator);
-  ASSERT_EQ(presenter.shown.size(), 1u);
-  EXPECT_EQ(presenter.shown.back().messageText, "Untätig seit 10 Minuten");
-}
 
 TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestartsEachTaskOnce) {
   turnIdleHandlingOn(5);
