@@ -22,9 +22,7 @@ TEST_F(WindowTest, HelpMenuNamesTheLicenceAndListsTheMenusShortcuts) {
       all << shortcut.menu + "/" + shortcut.action + "/" + shortcut.keys;
     return all;
   };
-  const QString undoKeys = QKeySequence(QKeySequence::Undo).toString(QKeySequence::NativeText);
-  ASSERT_FALSE(undoKeys.isEmpty());
-  for (const QString& shortcut : {"Edit/Undo/" + undoKeys, QString("File/Add/Ctrl+N"),
+  for (const QString& shortcut : {QString("Edit/Undo/Ctrl+Z"), QString("File/Add/Ctrl+N"),
                                   QString("Record/Start/Stop Timer/Ctrl+T"), QString("View/Clients/Ctrl+2")})
     EXPECT_TRUE(listed().contains(shortcut)) << shortcut.toStdString();
   for (const QString& shortcut : listed()) EXPECT_FALSE(shortcut.endsWith('/')) << shortcut.toStdString();

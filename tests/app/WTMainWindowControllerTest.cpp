@@ -83,15 +83,16 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 1);
 }
 
-TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsOfferReports) {
+// The archive item and the export's project follow the selection, or the project open.
+TEST_F(WTMainWindowControllerTest, TheArchiveItemAndTheExportFollowTheSelectionAndTheListsOfferReports) {
   open();
   WTProject* active = nullptr;
   WTProject* archived = addProject("Archived", true, &active);
   // "validated label" of the archive item: with nothing selected, then each project.
   auto label = [&] { return QStringLiteral("%1 %2").arg(validate("archive")).arg(item("archive")->text()); };
-  EXPECT_EQ(label(), "1 Archive");
+  EXPECT_TRUE(label() == "1 Archive" && !window->selectedProject());
   select(archived);
-  EXPECT_EQ(label(), "1 Unarchive");
+  EXPECT_TRUE(label() == "1 Unarchive" && window->selectedProject() == archived);
   select(active);
   EXPECT_EQ(label(), "1 Archive");
   // The command goes to the list, on the selection; the label follows once validated.
@@ -109,6 +110,12 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsO
   active->setArchived(true);
   EXPECT_EQ(label(), "1 Unarchive");
   EXPECT_TRUE(validate("toggleTimer") && validate("back"));
+  ASSERT_NE(action("export"), nullptr);
+  WTExportController* exporter = window->exportData();
+  EXPECT_TRUE(exporter->isVisible());
+  exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
+  EXPECT_EQ(exporter->projectLimit(), active);
+  exporter->reject();
 }
 
 TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnTheStore) {
@@ -212,23 +219,6 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
   EXPECT_EQ(presenter.deletionQuestions.join(" | "),
             "Delete “Default Task” and its 1 item? A timer is running in it.");
   EXPECT_TRUE(project->tasks().contains(task) && task->running());
-}
-
-TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
-  open();
-  WTProject* first = nullptr;
-  WTProject* other = addProject("Other", false, &first);
-  EXPECT_EQ(window->selectedProject(), nullptr);
-  select(other);
-  EXPECT_EQ(window->selectedProject(), other);
-  ASSERT_TRUE(openOutline(first));
-  EXPECT_EQ(window->selectedProject(), first);
-  ASSERT_NE(action("export"), nullptr);
-  WTExportController* exporter = window->exportData();
-  EXPECT_TRUE(exporter->isVisible());
-  exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
-  EXPECT_EQ(exporter->projectLimit(), first);
-  exporter->reject();
 }
 
 // File › Import… shows what it makes first, then makes it as one step of undo; a file with a bad row

@@ -69,10 +69,8 @@ TEST_F(WTLookTest, ABudgetBarUnderTheCostTakesItsColourFromTheShareBilled) {
 
 // An empty list says how to add the first row, and forgets it once there is one; the outline says its own.
 TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
-  WTClientsViewController clients(context.get());
-  clients.view()->resize(600, 400);
-  clients.view()->show();
-  ASSERT_TRUE(QTest::qWaitForWindowExposed(clients.view()));
+  Shown<WTClientsViewController> shown(context.get(), QSize(600, 400));
+  WTClientsViewController& clients = shown.controller;
   EXPECT_EQ(clients.tableView()->emptyHint(), "No clients yet — press Ctrl+N");
   EXPECT_GT(inkInMiddle(clients.tableView()), 30);
   makeClient("Acme");

@@ -200,8 +200,6 @@ TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
   EXPECT_EQ(design->storedRate(), Decimal(90));
 
   WTClientsViewController clients(context.get());
-  clients.view()->resize(600, 400);
-  clients.view()->show();
   endTurn();
   EXPECT_TRUE(clients.respondsTo(WTViewController::Command::AddObject));
   EXPECT_FALSE(clients.respondsTo(WTViewController::Command::ToggleTimer));
