@@ -1,13 +1,18 @@
 #include "AppFixture.h"
 #include "WTDialogAlertPresenter.h"
 #include "WTExportController.h"
+#include "WTHelpDialogs.h"
 #include "WTItemsModel.h"
 #include "WTReportWindowController.h"
 
 #include <QAbstractButton>
 #include <QButtonGroup>
+#include <QDialog>
+#include <QLabel>
+#include <QMenuBar>
 #include <QMessageBox>
 #include <QPushButton>
+#include <QTableView>
 #include <QTimer>
 
 #include <functional>
@@ -257,6 +262,36 @@ TEST_F(WTMainWindowControllerTest, ARangeIsRegisteredAndTheWindowKeepsItsSize) {
   window.reset();
   open();
   EXPECT_EQ(window->size(), QSize(700, 480));
+}
+
+// The shortcuts list is read from the menus' actions, so a changed key shows next time.
+TEST_F(WindowTest, HelpMenuNamesTheLicenceAndListsTheMenusShortcuts) {
+  open();
+  action("about")->trigger();
+  auto* about = window->findChild<QDialog*>("aboutDialog");
+  ASSERT_TRUE(about && about->isVisible());
+  EXPECT_TRUE(about->findChild<QLabel*>("aboutText")->text().contains("GNU General Public License"));
+  about->close();
+  auto listed = [&] {
+    QStringList all;  // "Menu/Command/Keys"
+    for (const auto& shortcut : WTHelpDialogs::shortcutsOf(window->menuBar()))
+      all << shortcut.menu + "/" + shortcut.action + "/" + shortcut.keys;
+    return all;
+  };
+  for (const QString& shortcut : {QString("Edit/Undo/Ctrl+Z"), QString("File/Add/Ctrl+N"),
+                                  QString("Record/Start/Stop Timer/Ctrl+T"), QString("View/Clients/Ctrl+2")})
+    EXPECT_TRUE(listed().contains(shortcut)) << shortcut.toStdString();
+  for (const QString& shortcut : listed()) EXPECT_FALSE(shortcut.endsWith('/')) << shortcut.toStdString();
+  action("toggleTimer")->setShortcut(QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_Y));
+  EXPECT_FALSE(listed().contains("Record/Start/Stop Timer/Ctrl+T"));
+  EXPECT_TRUE(listed().contains("Record/Start/Stop Timer/Ctrl+Shift+Y"));
+  action("keyboardShortcuts")->trigger();
+  auto* dialog = window->findChild<QDialog*>("shortcutsDialog");
+  ASSERT_TRUE(dialog && dialog->isVisible());
+  auto* table = dialog->findChild<QTableView*>("shortcutsTable");
+  ASSERT_NE(table, nullptr);
+  EXPECT_EQ(table->model()->rowCount(), listed().size());
+  dialog->close();
 }
 
 // The desktop's question before a deletion: Return keeps everything, only "Delete" deletes.

@@ -282,4 +282,16 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   outline()->endEditing();
 }
 
+// A task's add buttons answer only while shown; an entry's row has none.
+TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
+  WTTableCellView task("WTTask"), time("WTTime");
+  const QRectF row(0, 0, 800, 36);
+  const QPointF addTime = task.partRect(Part::AddTime, row).center();
+  EXPECT_EQ(task.partAt(addTime, row, true), Part::AddTime);
+  EXPECT_NE(task.partAt(addTime, row, false), Part::AddTime);
+  EXPECT_EQ(task.partAt(task.partRect(Part::TimerButton, row).center(), row, false), Part::TimerButton);
+  EXPECT_TRUE(time.partRect(Part::AddTime, row).isEmpty());
+  EXPECT_FALSE(time.partRect(Part::DateButton, row).isEmpty());
+}
+
 }  // namespace

@@ -15,55 +15,42 @@ int inkInMiddle(QAbstractItemView* view) {
 
 class WTLookTest : public UiTest {};
 
-// A budget is a bar under the cost: the palette's highlight within it, amber from 80 %, red past it, the
-// share and what is left in the cost's tip; a changed budget repaints the row.
+// A budget is a bar under a task's cost: the palette's highlight within it, amber from 80 %, red past it,
+// the share and what is left in the cost's tip; a changed budget repaints the row.
 TEST_F(WTLookTest, ABudgetBarUnderTheCostTakesItsColourFromTheShareBilled) {
   WTProject* project = makeProject("Website");
   project->setRate(Decimal(200));
   WTTask* task = makeTask(project, "Design");
   makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));  // half an hour: 100.00
   ShownOutline shown(context.get(), project, QSize(800, 400));
-  ShownProjects list(context.get(), QSize(800, 400));
+  WTOutlineView* view = shown.outline();
   const QColor highlight(10, 90, 200);
-  struct Place {
-    WTObject* record;
-    QAbstractItemView* view;
-    QModelIndex row;
-    const char* cell;
-  };
+  QPalette palette = view->palette();
+  palette.setColor(QPalette::Highlight, highlight);
+  view->setPalette(palette);
   endTurn();
-  const Place places[] = {{task, shown.outline(), shown.rowOf(task), "WTTask"},
-                          {project, list.controller.tableView(),
-                           list.controller.arrayController()->indexOfObject(project), "Project"}};
+  view->selectionModel()->clearSelection();
   const std::tuple<const char*, std::optional<QColor>, const char*> rows[] = {
       {"200", highlight, "50 % of the budget of 200.00 · 100.00 left"},
       {"125", QColor(0xe8, 0x9a, 0x00), "80 % of the budget of 125.00 · 25.00 left"},
       {"99.99", QColor(0xd0, 0x30, 0x30), "100 % of the budget of 99.99 · 0.01 over"},
       {nullptr, std::nullopt, ""},  // no bar: the row as it is beside it
   };
-  for (const Place& place : places) {
-    QPalette palette = place.view->palette();
-    palette.setColor(QPalette::Highlight, highlight);
-    place.view->setPalette(palette);
-    place.view->selectionModel()->clearSelection();
-    for (const auto& [budget, colour, tip] : rows) {
-      SCOPED_TRACE(std::string(place.cell) + ' ' + (budget ? budget : "none"));
-      QSignalSpy repainted(place.row.model(), &QAbstractItemModel::dataChanged);
-      const std::optional<Decimal> value = budget ? std::optional(dec(budget)) : std::nullopt;
-      place.record == task ? task->setBudget(value) : project->setBudget(value);
-      endTurn();
-      ASSERT_FALSE(repainted.isEmpty());
-      EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), place.row);
-      const QImage image = place.view->viewport()->grab().toImage();
-      const QRect visual = place.view->visualRect(place.row);
-      const QRectF row(0, visual.y(), image.width(), visual.height());
-      const WTTableCellView cell(place.cell);
-      const QRectF bar = cell.partRect(WTTableCellView::Part::BudgetBar, row);
-      const int y = int(bar.top()) + 1;
-      EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, y),
-                colour.value_or(image.pixelColor(int(bar.left()) - 4, y)));
-      EXPECT_EQ(tipAt(place.view, cell.partRect(WTTableCellView::Part::Cost, row).center().toPoint()), tip);
-    }
+  for (const auto& [budget, colour, tip] : rows) {
+    SCOPED_TRACE(budget ? budget : "none");
+    QSignalSpy repainted(view->model(), &QAbstractItemModel::dataChanged);
+    task->setBudget(budget ? std::optional(dec(budget)) : std::nullopt);
+    endTurn();
+    ASSERT_FALSE(repainted.isEmpty());
+    EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), shown.rowOf(task));
+    const QImage image = view->viewport()->grab().toImage();
+    const QRect visual = view->visualRect(shown.rowOf(task));
+    const QRectF bar = WTTableCellView("WTTask").partRect(
+        WTTableCellView::Part::BudgetBar, QRectF(0, visual.y(), image.width(), visual.height()));
+    const int y = int(bar.top()) + 1;
+    EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, y),
+              colour.value_or(image.pixelColor(int(bar.left()) - 4, y)));
+    EXPECT_EQ(tipAt(view, shown.centreOf(task, WTTableCellView::Part::Cost)), tip);
   }
 }
 
