@@ -66,8 +66,7 @@ TEST_F(WTItemsModelTest, TasksInStoredOrderThenPendingThenDaysNewestFirst) {
   EXPECT_EQ(pending.data(WTItemsModel::NameRole).toString(), "Pending");
   const QModelIndex day = model->index(0, 0, model->index(1, 0));
   for (const auto& [name, heading] :
-       {std::pair{"en_GB", "Tue, 24 Nov 2026"}, std::pair{"en_US", "Tue, Nov 24, 2026"},
-        std::pair{"de_DE", "Di., 24. Nov. 2026"}}) {
+       {std::pair{"en_US", "Tue, Nov 24, 2026"}, std::pair{"de_DE", "Di., 24. Nov. 2026"}}) {
     const UserLocale user(name);
     EXPECT_EQ(day.data(WTItemsModel::NameRole).toString().toStdString(), heading) << name;
   }

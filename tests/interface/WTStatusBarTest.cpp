@@ -60,9 +60,8 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndTheXEmbedIconCarriesTheRunn
   updater->start();
   statusBar.statusBarClicked(QRect(600, 0, 24, 24));
   ASSERT_TRUE(popup.isVisible());
-  EXPECT_EQ(rowsOf(popup),
+  ASSERT_EQ(rowsOf(popup),
             QStringList({"T4:Stop 00:30", "T1:Stop 01:00", "T9:Start", "T8:Start", "T7:Start"}));
-  ASSERT_EQ(rowsOf(popup).indexOf("T8:Start"), 3);
   shownRows(popup)[3]->findChild<QToolButton*>("timerButton")->click();
   settle();
   EXPECT_EQ(tasks[8]->runningTimes().size(), 1);

