@@ -31,9 +31,7 @@ class StoreCredentials final : public RZSyncNetworkCredentialDelegate {
 class WTPreferencesWindowTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword", "WTBillingName",
-                            "WTBillingAddress", "WTBillingTaxNumber", "WTBillingPaymentTerms"})
-      defaults->removeValue(key);
+    for (const char* key : {"WTSyncServer", "WTSyncUser", "WTSyncPassword"}) defaults->removeValue(key);
     manager->syncNetwork()->setCredentialDelegate(&credentials);
     manager->setIntervals({600000, 600000, 600000});
   }
