@@ -11,8 +11,6 @@ class RZBackgroundView : public QWidget {
  public:
   explicit RZBackgroundView(QWidget* parent = nullptr) : QWidget(parent) {}
 
-  QColor beginColor() const { return beginColor_; }
-  QColor endColor() const { return endColor_; }
   void setIBGradientBeginHexColor(const QString& hex);
   void setIBGradientEndHexColor(const QString& hex);
 

@@ -61,9 +61,6 @@ class WTPreferencesWindowController : public QDialog {
   QPushButton* startSyncButton() const { return startSyncButton_; }
   QPushButton* signUpButton() const { return signUpButton_; }
   QLineEdit* serverField() const { return serverField_; }
-  QCheckBox* shouldIdleCheckBox() const { return shouldIdleCheckBox_; }
-  QSpinBox* idleTimeSpinBox() const { return idleTimeSpinBox_; }
-  QCheckBox* stopsOtherTimesCheckBox() const { return stopsOtherTimesCheckBox_; }
   QLineEdit* defaultRateField() const { return defaultRateField_; }
   QTabWidget* pages() const { return pages_; }
   QLineEdit* billingNameField() const { return billingNameField_; }

@@ -26,7 +26,7 @@ QColor WTTableRowView::effectiveSelectionColor() const {
 }
 
 void WTTableRowView::drawBackgroundInRect(QPainter& painter, const QRectF& bounds) const {
-  if (drawsBackground_) painter.fillRect(bounds, effectiveBackColor());
+  painter.fillRect(bounds, effectiveBackColor());
 }
 
 void WTTableRowView::drawSelectionInRect(QPainter& painter, const QRectF& bounds) const {

