@@ -19,6 +19,26 @@ class Unknowing final : public WTIdleSource {
   int asked = 0;
 };
 
+// A Wayland session's X server is XWayland, whose counter does not see the user's input.
+TEST(X11IdleSourceTest, OnlyAnX11SessionUsesTheServersCounter) {
+  const char* names[] = {"DISPLAY", "WAYLAND_DISPLAY", "XDG_SESSION_TYPE"};
+  // Each variable as given, or unset when null.
+  auto set = [&](const std::array<QByteArray, 3>& values) {
+    for (int i = 0; i < 3; ++i) values[i].isNull() ? qunsetenv(names[i]) : qputenv(names[i], values[i]);
+  };
+  const std::array<QByteArray, 3> saved = {qgetenv(names[0]), qgetenv(names[1]), qgetenv(names[2])};
+  const std::pair<std::array<QByteArray, 3>, bool> cases[] = {
+      {{":0", {}, {}}, true},         {{":0", {}, "x11"}, true},          {{":0", "wayland-0", {}}, false},
+      {{":0", {}, "wayland"}, false}, {{QByteArray(), {}, "x11"}, false},
+  };
+  for (const auto& [values, x11] : cases) {
+    set(values);
+    EXPECT_EQ(WTX11IdleSource::sessionIsX11(), x11)
+        << values[0].data() << "|" << values[1].data() << "|" << values[2].data();
+  }
+  set(saved);
+}
+
 // The counter grows without input and restarts with it; a chain moves past a source that does not know.
 TEST(X11IdleSourceTest, TheServersCounterGrowsWithoutInputAndRestartsWithIt) {
   EXPECT_FALSE(WTX11IdleSource(":999").isAvailable());
