@@ -9,6 +9,7 @@
 #include <QFileInfo>
 #include <QTemporaryDir>
 
+#include <array>
 #include <functional>
 #include <map>
 #include <memory>
@@ -373,26 +374,62 @@ TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
     records[task] = record(task, "WTTask");
     records[task + "-item@WTNote"] = record(task + "-item@WTNote", "WTNote", task);
   }
+  // Names as the commands look for them: case and accents folded, nothing else.
+  for (const auto& [uuid, name, project] :
+       std::initializer_list<std::array<QString, 3>>{{"T2@WTTask", "Review ", "P1@WTProject"},
+                                                     {"E@WTTask", "École", "P2@WTProject"},
+                                                     {"X@WTTask", "Other", "P2@WTProject"},
+                                                     {"K@WTTask", "\u212Aelvin", "P3@WTProject"},
+                                                     {"O@WTTask", "ÉCOLE", {}},
+                                                     {"S@WTTask", "Straße", "P4@WTProject"}})
+    records[uuid] = {.uuid = uuid, .entity = "WTTask", .name = name, .projectUuid = project};
+  for (const auto& [uuid, client] :
+       {std::pair{"P2@WTProject", "C2@WTClient"}, {"P3@WTProject", ""}, {"P4@WTProject", "C4@WTClient"}})
+    records[uuid] = {.uuid = uuid, .entity = "WTProject", .clientUuid = *client ? client : QString()};
+  for (const char* client : {"C2@WTClient", "C4@WTClient"}) records[client] = record(client, "WTClient");
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
   using Pick = std::function<bool(const WTStoreRecord&)>;
-  const auto ofTasks = [](QStringList tasks) -> Pick {
-    return [=](auto& r) { return tasks.contains(r.taskUuid); };
+  const auto owner = [](const WTStoreRecord& r) {
+    return r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask";
+  };
+  const auto ownersAnd = [&](Pick item) -> Pick { return [=](auto& r) { return owner(r) || item(r); }; };
+  const auto ofTasks = [&](QStringList tasks) -> Pick {
+    return ownersAnd([=](auto& r) { return tasks.contains(r.taskUuid); });
+  };
+  // The running entries and the tasks `named`, with their projects, every task of those and their clients.
+  const auto runningAnd = [&](QStringList tasks) -> Pick {
+    QStringList projects, clients;
+    for (const auto& [uuid, r] : records)
+      if (r.running && !owner(r)) tasks.append(r.taskUuid);
+    for (const auto& [uuid, r] : records)
+      if (tasks.contains(uuid) && !r.projectUuid.isNull()) projects.append(r.projectUuid);
+    for (const auto& [uuid, r] : records)
+      if (projects.contains(uuid) && !r.clientUuid.isNull()) clients.append(r.clientUuid);
+    return [=](auto& r) {
+      return (r.running && !owner(r)) || tasks.contains(r.uuid) || projects.contains(r.uuid) ||
+             clients.contains(r.uuid) || (r.entity == u"WTTask" && projects.contains(r.projectUuid));
+    };
   };
   // The statement is used again: the next load's tasks replace the last one's.
   const std::tuple<WTStore::Records, QStringList, Pick> cases[] = {
-      {WTStore::Records::Timers, {"T1@WTTask"}, [](const WTStoreRecord& r) { return r.running; }},
+      {WTStore::Records::Timers, {"T1@WTTask"}, ownersAnd([](auto& r) { return r.running; })},
       {WTStore::Records::ItemsOfTasks, {"T1@WTTask", quoted}, ofTasks({"T1@WTTask", quoted})},
       {WTStore::Records::ItemsOfTasks, {}, ofTasks({})},
-      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})}};
-  for (const auto& [which, tasks, item] : cases) {
+      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})},
+      {WTStore::Records::RunningAndNamed, {}, runningAnd({})},
+      {WTStore::Records::RunningAndNamed,
+       {"école", "KELVIN"},
+       runningAnd({"E@WTTask", "O@WTTask", "K@WTTask"})},
+      {WTStore::Records::RunningAndNamed, {"STRASSE", "Review", " other"}, runningAnd({})}};
+  for (const auto& [which, keys, picked] : cases) {
+    SCOPED_TRACE(keys.join(',').toStdString());
     Records expected;
     for (const auto& [uuid, r] : records)
-      if (r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask" || item(r))
-        expected[uuid] = r;
+      if (picked(r)) expected[uuid] = r;
     ASSERT_LT(expected.size(), records.size());
-    expectSameRecords(loadAll(*store, which, tasks), expected);
+    expectSameRecords(loadAll(*store, which, keys), expected);
   }
 }
 
