@@ -18,7 +18,7 @@
 namespace {
 
 // The loads' statements: one for each of the first three WTStore::Records, three for RunningAndNamed.
-enum Statement { All, Timers, ItemsOfTasks, Running, Owners, ByRowid };
+enum Statement { All, Timers, ItemsOfTasks, Running, Owners, ByUuid };
 
 // Each half of the timers' load is read through its own small index (version 2), so a large store's
 // items are never visited. Task uuids arrive as one JSON array, so a single prepared statement serves
@@ -31,9 +31,9 @@ constexpr const char* kSql[] = {
     " FROM records WHERE taskUuid IN (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS,
     // Through the same two indexes, apart: the running entries and their tasks, then what links the owners
     // and the tasks' names; last a record chosen by them.
-    "SELECT rowid, taskUuid FROM records WHERE " WT_STORE_RUNNING " AND NOT " WT_STORE_OWNERS,
-    "SELECT rowid, entity, uuid, projectUuid, clientUuid, name FROM records WHERE " WT_STORE_OWNERS,
-    "SELECT " WT_STORE_COLUMNS " FROM records WHERE rowid = ?1",
+    "SELECT uuid, taskUuid FROM records WHERE " WT_STORE_RUNNING " AND NOT " WT_STORE_OWNERS,
+    "SELECT entity, uuid, projectUuid, clientUuid, name FROM records WHERE " WT_STORE_OWNERS,
+    "SELECT " WT_STORE_COLUMNS " FROM records WHERE uuid = ?1",
 };
 
 QByteArrayView text(sqlite3_stmt* statement, int column) {
@@ -83,66 +83,56 @@ Result<void> WTStore::loadRunningAndNamed(const std::function<void(WTStoreRecord
                                           const QStringList& names) {
   int code = sqlite3_exec(db_, "BEGIN", nullptr, nullptr, nullptr);
   if (code != SQLITE_OK) return readError(code);
-  std::vector<qint64> chosen;  // rows
-  QList<QByteArray> runningTasks;
+  QList<QByteArray> chosen, runningTasks;
   sqlite3_stmt* running = loadStatement(Running, &code);
   while (code == SQLITE_OK && (code = sqlite3_step(running)) == SQLITE_ROW) {
     code = SQLITE_OK;
-    chosen.push_back(sqlite3_column_int64(running, 0));
+    chosen.append(text(running, 0).toByteArray());
     runningTasks.append(text(running, 1).toByteArray());
   }
   if (running) sqlite3_reset(running);
 
   struct Task {
-    qint64 row;
-    QByteArray project;
+    QByteArray uuid, project;
     bool wanted;
   };
   std::vector<Task> tasks;
   QSet<QByteArray> wantedProjects;
-  QHash<QByteArray, std::pair<qint64, QByteArray>> projects;  // row and client by uuid
-  QHash<QByteArray, qint64> clients;
+  QHash<QByteArray, QByteArray> clientOfProject;
   sqlite3_stmt* owners = code == SQLITE_DONE ? loadStatement(Owners, &code) : nullptr;
   while (code == SQLITE_OK && (code = sqlite3_step(owners)) == SQLITE_ROW) {
     code = SQLITE_OK;
-    const qint64 row = sqlite3_column_int64(owners, 0);
-    const QByteArrayView entity = text(owners, 1), uuid = text(owners, 2);
+    const QByteArrayView entity = text(owners, 0), uuid = text(owners, 1);
     if (entity == "WTTask") {
-      const QByteArrayView name = text(owners, 5);
-      const QString decoded = QString::fromUtf8(name);
-      const bool wanted =
-          runningTasks.contains(uuid) || std::any_of(names.begin(), names.end(), [&](const QString& wanted) {
-            return WTObject::sameName(decoded, wanted);
-          });
-      tasks.push_back({row, text(owners, 3).toByteArray(), wanted});
+      const QString name = QString::fromUtf8(text(owners, 4));
+      const bool wanted = runningTasks.contains(uuid) ||
+                          std::any_of(names.begin(), names.end(),
+                                      [&](const QString& named) { return WTObject::sameName(name, named); });
+      tasks.push_back({uuid.toByteArray(), text(owners, 2).toByteArray(), wanted});
       if (wanted && !tasks.back().project.isNull()) wantedProjects.insert(tasks.back().project);
     } else if (entity == "WTProject") {
-      projects.insert(uuid.toByteArray(), {row, text(owners, 4).toByteArray()});
-    } else {
-      clients.insert(uuid.toByteArray(), row);
+      clientOfProject.insert(uuid.toByteArray(), text(owners, 3).toByteArray());
     }
   }
   if (owners) sqlite3_reset(owners);
 
   for (const Task& task : tasks) {
-    if (task.wanted || wantedProjects.contains(task.project)) chosen.push_back(task.row);
+    if (task.wanted || wantedProjects.contains(task.project)) chosen.append(task.uuid);
   }
-  QSet<qint64> wantedClients;
-  for (const QByteArray& uuid : wantedProjects) {
-    const auto project = projects.constFind(uuid);
-    if (project == projects.cend()) continue;
-    chosen.push_back(project->first);
-    const auto client = clients.constFind(project->second);
-    if (client != clients.cend() && !wantedClients.contains(*client)) {
-      wantedClients.insert(*client);
-      chosen.push_back(*client);
+  QSet<QByteArray> wantedClients;
+  for (const QByteArray& project : wantedProjects) {
+    chosen.append(project);
+    const QByteArray client = clientOfProject.value(project);
+    if (!client.isNull() && !wantedClients.contains(client)) {
+      wantedClients.insert(client);
+      chosen.append(client);
     }
   }
 
-  sqlite3_stmt* s = code == SQLITE_DONE ? loadStatement(ByRowid, &code) : nullptr;
+  sqlite3_stmt* s = code == SQLITE_DONE ? loadStatement(ByUuid, &code) : nullptr;
   WTStoreRecord record;
-  for (auto row = chosen.cbegin(); code == SQLITE_OK && row != chosen.cend(); ++row) {
-    sqlite3_bind_int64(s, 1, *row);
+  for (auto uuid = chosen.cbegin(); code == SQLITE_OK && uuid != chosen.cend(); ++uuid) {
+    sqlite3_bind_text(s, 1, uuid->constData(), int(uuid->size()), SQLITE_STATIC);
     if ((code = sqlite3_step(s)) == SQLITE_ROW) {
       code = WTStoreRows::readRecord(s, record) ? SQLITE_OK : SQLITE_CORRUPT;
       if (code == SQLITE_OK) sink(std::move(record));

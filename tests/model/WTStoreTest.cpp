@@ -319,13 +319,15 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
           "PRAGMA user_version = 4;");
     RawDatabase(path()).exec(
         "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
-        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
+        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233'),"
+        " ('T@WTTask', 'WTTask', 'Sketch', NULL, 0, NULL);"
         "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
         " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
     // clang-format off
   Records expected = {
       {"C@WTClient", {.uuid = "C@WTClient", .entity = "WTClient", .name = "Acme", .rate = decimal(u"80.00"),
                       .color = "#ff112233", .archived = true}},
+      {"T@WTTask", {.uuid = "T@WTTask", .entity = "WTTask", .name = "Sketch"}},
       {"F@WTFlat", {.uuid = "F@WTFlat", .entity = "WTFlat", .taskUuid = "T@WTTask",
                     .startDate = Date::fromSeconds(1700000000.5), .minutes = 90, .expense = decimal(u"-0.10"),
                     .completed = true}}};
@@ -335,6 +337,8 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
       auto reader = WTStore::openReadOnly(path());
       ASSERT_TRUE(reader) << reader.error().message.toStdString();
       expectSameRecords(loadAll(*reader.value()), expected);
+      expectSameRecords(loadAll(*reader.value(), WTStore::Records::RunningAndNamed, {"sketch"}),
+                        {{"T@WTTask", expected["T@WTTask"]}});
     }
     EXPECT_EQ(fileBytes(path()), before);
     auto writer = open();
@@ -346,7 +350,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     ASSERT_EQ(copies.size(), 1);
     const QString copy = dir.filePath("Backups/" + copies[0]);
     EXPECT_TRUE(WTStoreBackup::check(copy).ok());
-    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "2", version == 1 ? "0" : "3"}));
+    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "3", version == 1 ? "0" : "3"}));
     EXPECT_EQ(int(QFileInfo(dir.filePath("Backups")).permissions() & 0x0777), 0x0700);
     EXPECT_EQ(QFileInfo(copy).permissions(),
               QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
@@ -355,7 +359,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     added.roundingMinutes = 6;
     ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
     expected[added.uuid] = added;
-    EXPECT_EQ(shape(path()), QStringList({"6", "wal", "3", "3"}));
+    EXPECT_EQ(shape(path()), QStringList({"6", "wal", "4", "3"}));
 
     auto reader = WTStore::openReadOnly(path());
     ASSERT_TRUE(reader) << reader.error().message.toStdString();
