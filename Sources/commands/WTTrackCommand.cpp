@@ -44,7 +44,7 @@ int print(const WTCommandOutcome& outcome, QTextStream& out, QTextStream& err) {
 using WTCommandArguments::failure;
 
 // The uuids of the tasks named `name` (or, for "PROJECT › TASK", the part after the separator), read from
-// those tasks and their projects' alone: the tasks whose items a command needs besides the running ones.
+// the running and named records alone: the tasks whose items a command needs besides the running ones.
 Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
   const QStringList names = WTNamedRecords::taskNames(name);
   QStringList uuids;
@@ -101,8 +101,8 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
   if (names && outcome.status != 0) {
-    // Every task of the name was read: a name that finds none among them finds none at all, and says
-    // what there is, which takes every owner. Nothing was saved.
+    // Every task of the name was read, so the command fails over every owner too; but what the failure
+    // lists (the tasks there are) may take them all. Nothing was saved.
     context.closeStore();
     return runOnStore(storePath, command, arguments, out, err, false);
   }

@@ -92,13 +92,27 @@ Result<void> WTStore::loadRunningAndNamed(const std::function<void(WTStoreRecord
   }
   if (running) sqlite3_reset(running);
 
+  // Every task is kept until the projects wanted are known, its uuid among the others' in one array.
   struct Task {
-    QByteArray uuid, project;
+    qsizetype end;
+    int project;  // -1 for none
     bool wanted;
   };
+  struct Project {
+    QByteArray uuid, client;
+    bool wanted = false;
+  };
+  QByteArray taskUuids;
   std::vector<Task> tasks;
-  QSet<QByteArray> wantedProjects;
-  QHash<QByteArray, QByteArray> clientOfProject;
+  std::vector<Project> projects;
+  QHash<QByteArray, int> projectIndex;
+  const auto project = [&](QByteArrayView uuid) {
+    if (uuid.isNull()) return -1;
+    const auto found = projectIndex.constFind(QByteArray::fromRawData(uuid.data(), uuid.size()));
+    if (found != projectIndex.cend()) return *found;
+    projects.push_back({uuid.toByteArray(), {}});
+    return *projectIndex.insert(projects.back().uuid, int(projects.size() - 1));
+  };
   sqlite3_stmt* owners = code == SQLITE_DONE ? loadStatement(Owners, &code) : nullptr;
   while (code == SQLITE_OK && (code = sqlite3_step(owners)) == SQLITE_ROW) {
     code = SQLITE_OK;
@@ -108,24 +122,30 @@ Result<void> WTStore::loadRunningAndNamed(const std::function<void(WTStoreRecord
       const bool wanted = runningTasks.contains(uuid) ||
                           std::any_of(names.begin(), names.end(),
                                       [&](const QString& named) { return WTObject::sameName(name, named); });
-      tasks.push_back({uuid.toByteArray(), text(owners, 2).toByteArray(), wanted});
-      if (wanted && !tasks.back().project.isNull()) wantedProjects.insert(tasks.back().project);
+      const int of = project(text(owners, 2));
+      if (wanted && of >= 0) projects[of].wanted = true;
+      taskUuids.append(uuid);
+      tasks.push_back({taskUuids.size(), of, wanted});
     } else if (entity == "WTProject") {
-      clientOfProject.insert(uuid.toByteArray(), text(owners, 3).toByteArray());
+      const int index = project(uuid);
+      projects[index].client = text(owners, 3).toByteArray();
     }
   }
   if (owners) sqlite3_reset(owners);
 
+  qsizetype start = 0;
   for (const Task& task : tasks) {
-    if (task.wanted || wantedProjects.contains(task.project)) chosen.append(task.uuid);
+    if (task.wanted || (task.project >= 0 && projects[task.project].wanted))
+      chosen.append(taskUuids.sliced(start, task.end - start));
+    start = task.end;
   }
-  QSet<QByteArray> wantedClients;
-  for (const QByteArray& project : wantedProjects) {
-    chosen.append(project);
-    const QByteArray client = clientOfProject.value(project);
-    if (!client.isNull() && !wantedClients.contains(client)) {
-      wantedClients.insert(client);
-      chosen.append(client);
+  QSet<QByteArray> clients;
+  for (const Project& project : projects) {
+    if (!project.wanted) continue;
+    chosen.append(project.uuid);
+    if (!project.client.isNull() && !clients.contains(project.client)) {
+      clients.insert(project.client);
+      chosen.append(project.client);
     }
   }
 
