@@ -31,7 +31,10 @@ sed "s|/usr/bin/tessal-sync-server|$work/root/usr/bin/tessal-sync-server|" \
   "$work/root/usr/lib/systemd/system/tessal-sync-server.service" >"$work/tessal-sync-server.service"
 systemd-analyze verify --man=no "$work/tessal-sync-server.service"
 depends=$(dpkg-deb -f "$deb" Depends)
-for lib in libqt6widgets6 libicu72 libsqlite3-0 libsodium23 libpq5 qt6-qpa-plugins; do
+# SQLite is linked in unless the build chose its shared library (TESSAL_STATIC_SQLITE=OFF).
+sqlite=
+case "$(readelf -d "$work/root/usr/bin/tessal")" in *libsqlite3*) sqlite=libsqlite3-0 ;; esac
+for lib in libqt6widgets6 libicu72 $sqlite libsodium23 libpq5 qt6-qpa-plugins; do
   case "$depends" in *"$lib"*) ;; *) fail "Depends lacks $lib: $depends" ;; esac
 done
 "$work/root/usr/bin/tessal" --version >/dev/null

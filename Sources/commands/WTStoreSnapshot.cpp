@@ -278,6 +278,13 @@ Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name,
   return created;
 }
 
+QStringList taskNames(const QString& name) {
+  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
+  QStringList names(name);
+  if (separator > 0) names.append(name.mid(separator + 3));
+  return names;
+}
+
 QString label(const WTTask& task) {
   const QString project = task.project() && !task.project()->name().isEmpty() ? task.project()->name()
                                                                               : QStringLiteral("(untitled)");

@@ -80,6 +80,10 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
 Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name, const QString& projectName,
                                   const QString& clientName, QStringList& made);
 
+// The names a task that task() finds by `name` may carry: `name`, and for "PROJECT › TASK" the part after
+// the separator.
+QStringList taskNames(const QString& name);
+
 // How the commands name a task: "PROJECT › TASK", "(untitled)" standing in for a missing name.
 QString label(const WTTask& task);
 

@@ -349,6 +349,13 @@ QString taskWithItems(const QString& command, const QStringList& arguments) {
   return command == kAdd ? parse(command, arguments).task : QString();
 }
 
+std::optional<QStringList> namedTasksToRead(const QString& command, const QStringList& arguments) {
+  if (command != kStart && command != kStop) return std::nullopt;
+  const Arguments parsed = parse(command, arguments);
+  if (parsed.create) return std::nullopt;
+  return parsed.task.isNull() ? QStringList() : WTNamedRecords::taskNames(parsed.task);
+}
+
 WTCommandOutcome run(WTObjectContext& context, const QString& command, const QStringList& arguments,
                      const QTimeZone& zone) {
   if (command == kImport) return WTImportCommand::run(context, arguments, zone);

@@ -53,6 +53,11 @@ bool createsRecords(const QString& command, const QStringList& arguments);
 // The task name whose items the command reads besides the running entries (add checks an entry against
 // the task's others); null for the commands that need only the running entries.
 QString taskWithItems(const QString& command, const QStringList& arguments);
+// The task names to read (WTStore::Records::RunningAndNamed) for start and stop, which find what they name
+// among those tasks as among all (none for stop alone); none when every owner may be needed: start
+// --create may make its task in any project. Only a command that fails there (its name found no task, or
+// several) needs every owner read to say what there is.
+std::optional<QStringList> namedTasksToRead(const QString& command, const QStringList& arguments);
 
 // The arguments' problem as an outcome of status 2 with a usage line; none when they are fine.
 std::optional<WTCommandOutcome> checkArguments(const QString& command, const QStringList& arguments);

@@ -44,19 +44,18 @@ int print(const WTCommandOutcome& outcome, QTextStream& out, QTextStream& err) {
 using WTCommandArguments::failure;
 
 // The uuids of the tasks named `name` (or, for "PROJECT › TASK", the part after the separator), read from
-// the clients, projects and tasks alone: the tasks whose items a command needs besides the running ones.
+// the running and named records alone: the tasks whose items a command needs besides the running ones.
 Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
-  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
-  const QString last = separator > 0 ? name.mid(separator + 3) : name;
+  const QStringList names = WTNamedRecords::taskNames(name);
   QStringList uuids;
   const Result<void> read = store.loadAll(
       [&](WTStoreRecord&& record) {
         if (record.entity == QLatin1String("WTTask") &&
-            (record.name.compare(name, Qt::CaseInsensitive) == 0 ||
-             record.name.compare(last, Qt::CaseInsensitive) == 0))
+            std::any_of(names.begin(), names.end(),
+                        [&](const QString& wanted) { return WTObject::sameName(record.name, wanted); }))
           uuids.append(record.uuid);
       },
-      WTStore::Records::ItemsOfTasks);
+      WTStore::Records::RunningAndNamed, names);
   if (!read) return read.error();
   return uuids;
 }
@@ -64,9 +63,11 @@ Result<QStringList> tasksNamed(WTStore& store, const QString& name) {
 // Carries a command that changes data out on the store itself, while this process holds its writer lock.
 // Only the records the command needs are read; what changes is saved together with its sync journal
 // entries, as the desktop copy would have done, so that the next sync sends it. A command that may make
-// records makes the store when there is none, filled as the desktop copy fills a store it makes.
+// records makes the store when there is none, filled as the desktop copy fills a store it makes. Start and
+// stop read first only the tasks of the name they are given and the running entries (`narrowed`), and
+// everything only when that was not enough.
 int runOnStore(const QString& storePath, const QString& command, const QStringList& arguments,
-               QTextStream& out, QTextStream& err) {
+               QTextStream& out, QTextStream& err, bool narrowed = true) {
   const bool storeIsNew = !QFileInfo::exists(storePath);
   if (storeIsNew && !WTTimerCommands::createsRecords(command, arguments)) {
     // The read-only opening says what is missing in the words every command uses.
@@ -79,7 +80,12 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   WTStore::Records which =
       WTTimerCommands::readsEveryRecord(command) ? WTStore::Records::All : WTStore::Records::Timers;
   QStringList tasks;
-  if (const QString name = WTTimerCommands::taskWithItems(command, arguments); !name.isNull()) {
+  const std::optional<QStringList> names =
+      narrowed ? WTTimerCommands::namedTasksToRead(command, arguments) : std::nullopt;
+  if (names) {
+    which = WTStore::Records::RunningAndNamed;
+    tasks = *names;
+  } else if (const QString name = WTTimerCommands::taskWithItems(command, arguments); !name.isNull()) {
     Result<QStringList> named = tasksNamed(*store.value(), name);
     if (!named) return failure(err, named.error().message);
     which = WTStore::Records::ItemsOfTasks;
@@ -94,6 +100,12 @@ int runOnStore(const QString& storePath, const QString& command, const QStringLi
   context.undoManager().disableRegistration();
   if (storeIsNew) WTStoreSetup::fillNewStore(context);
   const WTCommandOutcome outcome = WTTimerCommands::run(context, command, arguments);
+  if (names && outcome.status != 0) {
+    // Every task of the name was read, so the command fails over every owner too; but what the failure
+    // lists (the tasks there are) may take them all. Nothing was saved.
+    context.closeStore();
+    return runOnStore(storePath, command, arguments, out, err, false);
+  }
   if (context.hasChanges()) {
     // The save journals what it saved, in its own transaction, reading only those records' entries.
     RZSyncTrack journal(context.store(), RZSyncTrack::Loading::OnDemand);
@@ -147,7 +159,8 @@ int runTrackCommand(const QString& command, const QStringList& arguments, QTextS
   if (std::optional<WTCommandOutcome> problem = WTTimerCommands::checkArguments(command, arguments))
     return print(*problem, out, err);
   if (WTTimerCommands::changesData(command)) return runChangingCommand(command, arguments, out, err);
-  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::Timers);
+  // Status tells of the running entries alone.
+  std::unique_ptr<WTStoreSnapshot> snapshot = WTStoreSnapshot::open(err, WTStore::Records::RunningAndNamed);
   if (!snapshot) return 1;
   WTCommandArguments::endProcess(
       print(WTTimerCommands::run(snapshot->context(), command, arguments), out, err), out, err,

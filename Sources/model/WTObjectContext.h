@@ -55,9 +55,11 @@ class WTObjectContext : public QObject {
 
   // Store. Attaching loads every record of the store into this (empty) context. A context that loads only
   // the timer records sees no other items: it may start and stop timers and save, but must not delete
-  // records (their unloaded items would be left behind in the file) nor answer totals.
+  // records (their unloaded items would be left behind in the file) nor answer totals; one that loads the
+  // running and named records alone must not change the owners it lacks either, nor look for them.
   Result<void> attachStore(std::unique_ptr<WTStore> store);
-  Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which, const QStringList& tasks = {});
+  Result<void> attachStore(std::unique_ptr<WTStore> store, WTStore::Records which,
+                           const QStringList& keys = {});
   bool hasStore() const { return store_ != nullptr; }
   // Closes the store's file for a process that ends next; the records stay in memory, and a later save
   // fails as it does without a store.

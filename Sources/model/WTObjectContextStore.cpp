@@ -125,7 +125,7 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store) {
 }
 
 Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStore::Records which,
-                                          const QStringList& tasks) {
+                                          const QStringList& keys) {
   Q_ASSERT(count() == 0 && !store_);
   struct Link {
     WTObject* object;
@@ -152,7 +152,7 @@ Result<void> WTObjectContext::attachStore(std::unique_ptr<WTStore> store, WTStor
         (*entity == WTEntity::Task ? taskLinks : links)
             .push_back({object, std::move(ownerUuid), record.position});
       },
-      which, tasks);
+      which, keys);
   if (loaded) {
     // Tasks join their projects in stored order.
     std::stable_sort(taskLinks.begin(), taskLinks.end(),

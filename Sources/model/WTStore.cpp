@@ -9,8 +9,6 @@
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
-#include <QJsonArray>
-#include <QJsonDocument>
 
 #include <sqlite3.h>
 
@@ -32,16 +30,6 @@ QString tr(const char* text) {
   return QCoreApplication::translate("WTStore", text);
 }
 
-constexpr char kSelectAllSql[] = "SELECT " WT_STORE_COLUMNS " FROM records";
-// Each half is read through its own small index (version 2), so a large store's items are never visited.
-constexpr char kSelectTimerRecordsSql[] =
-    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
-    " FROM records WHERE " WT_STORE_RUNNING " AND NOT " WT_STORE_OWNERS;
-// The task uuids arrive as one JSON array, so a single prepared statement serves any number of them.
-constexpr char kSelectItemsOfTasksSql[] =
-    "SELECT " WT_STORE_COLUMNS " FROM records WHERE " WT_STORE_OWNERS " UNION ALL SELECT " WT_STORE_COLUMNS
-    " FROM records WHERE taskUuid IN"
-    " (SELECT value FROM json_each(?1)) AND NOT " WT_STORE_OWNERS;
 // A row that is there already is changed in place: replacing it would take it out of every index and put it
 // back, though a save mostly changes a name or a date and leaves the uuid and the task as they were. The
 // entity is part of the uuid and never changes.
@@ -176,9 +164,8 @@ int stepOnce(sqlite3_stmt* statement) {
 WTStore::WTStore(QString path, sqlite3* db) : path_(std::move(path)), db_(db) {}
 
 WTStore::~WTStore() {
-  for (sqlite3_stmt* statement :
-       {begin_, commit_, rollback_, replace_, remove_, selectAll_, selectTimerRecords_, selectItemsOfTasks_})
-    sqlite3_finalize(statement);
+  for (sqlite3_stmt* statement : {begin_, commit_, rollback_, replace_, remove_}) sqlite3_finalize(statement);
+  for (sqlite3_stmt* statement : load_) sqlite3_finalize(statement);
   for (sqlite3_stmt* statement : journal_) sqlite3_finalize(statement);
   sqlite3_close(db_);
 }
@@ -347,56 +334,25 @@ void WTStore::keepLogWhileShort() {
 
 Result<void> WTStore::prepareStatements(bool writing) {
   // A reader has no writing statements: its save() fails before it begins (an older file could not even
-  // prepare them).
+  // prepare them). They name every column, and so check the file's shape; a reader's whole load does that
+  // for it.
+  int code = SQLITE_OK;
+  if (!writing && !loadStatement(int(Records::All), &code)) return Error{ReadFailed, reason(code)};
   const std::pair<sqlite3_stmt**, const char*> statements[] = {
-      {&selectAll_, kSelectAllSql}, {&selectTimerRecords_, kSelectTimerRecordsSql},
-      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},
-      {&rollback_, "ROLLBACK"},     {&replace_, kReplaceSql},
-      {&remove_, kDeleteSql},
+      {&begin_, "BEGIN IMMEDIATE"}, {&commit_, "COMMIT"},   {&rollback_, "ROLLBACK"},
+      {&replace_, kReplaceSql},     {&remove_, kDeleteSql},
   };
-  for (size_t i = 0; i < (writing ? std::size(statements) : 2); ++i) {
+  for (size_t i = 0; writing && i < std::size(statements); ++i) {
     const auto& [statement, sql] = statements[i];
-    const int code = sqlite3_prepare_v3(db_, sql, -1, SQLITE_PREPARE_PERSISTENT, statement, nullptr);
+    code = sqlite3_prepare_v3(db_, sql, -1, SQLITE_PREPARE_PERSISTENT, statement, nullptr);
     if (code != SQLITE_OK) return Error{ReadFailed, reason(code)};
   }
+  shaped_ = true;
   return {};
 }
 
 Error WTStore::writeError(int code) const {
   return {WriteFailed, tr("Changes could not be saved to the data file “%1”: %2.").arg(path_, reason(code))};
-}
-
-Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which,
-                              const QStringList& tasks) {
-  if (!selectAll_) return {};  // a file opened for reading before anything was ever written to it
-  sqlite3_stmt* s = which == Records::All ? selectAll_ : selectTimerRecords_;
-  QByteArray taskList;
-  if (which == Records::ItemsOfTasks) {
-    if (!selectItemsOfTasks_) {
-      const int code = sqlite3_prepare_v3(db_, kSelectItemsOfTasksSql, -1, SQLITE_PREPARE_PERSISTENT,
-                                          &selectItemsOfTasks_, nullptr);
-      if (code != SQLITE_OK)
-        return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
-    }
-    s = selectItemsOfTasks_;
-    taskList = QJsonDocument(QJsonArray::fromStringList(tasks)).toJson(QJsonDocument::Compact);
-    sqlite3_bind_text(s, 1, taskList.constData(), int(taskList.size()), SQLITE_STATIC);
-  }
-  WTStoreRecord record;
-  int code;
-  while ((code = sqlite3_step(s)) == SQLITE_ROW) {
-    if (!WTStoreRows::readRecord(s, record)) {
-      code = SQLITE_CORRUPT;
-      break;
-    }
-    sink(std::move(record));
-  }
-  sqlite3_reset(s);
-  sqlite3_clear_bindings(s);
-  if (code == SQLITE_DONE) return {};
-  if (isDamage(code))
-    return Error{ReadFailed, tr("The data file “%1” is damaged and cannot be read.").arg(path_)};
-  return Error{ReadFailed, tr("The data file “%1” could not be read: %2.").arg(path_, reason(code))};
 }
 
 Result<void> WTStore::save(const std::vector<WTStoreRecord>& records, const QStringList& deletedUuids) {

@@ -108,14 +108,20 @@ class WTStore {
     Timers,
     // The clients, projects and tasks, and the items of the tasks named in the load (none when it names
     // none): what a report or an export of some projects needs.
-    ItemsOfTasks
+    ItemsOfTasks,
+    // The running time entries and the tasks whose name is one the load gives (compared as
+    // WTObject::sameName compares), each task with its project and client and with every other task of
+    // that project, so that a project read holds all its tasks in their order. Starting, stopping and the
+    // status of timers need no more when the name finds its task; the other owners are never read.
+    RunningAndNamed
   };
 
   // Reads every record (or those `which` names), handing each to `sink` in no particular order. The sink
   // may move out of the record it is given.
-  // `tasks` are the uuids of the tasks whose items Records::ItemsOfTasks reads; other loads ignore them.
+  // `keys` are the uuids of the tasks whose items Records::ItemsOfTasks reads, or the task names
+  // Records::RunningAndNamed looks for; other loads ignore them.
   Result<void> loadAll(const std::function<void(WTStoreRecord&&)>& sink, Records which = Records::All,
-                       const QStringList& tasks = {});
+                       const QStringList& keys = {});
 
   // Writes the given records (inserted or replaced whole) and removes the deleted ones, all in one
   // transaction: after a failure nothing of this save is in the file and the store stays usable.
@@ -170,6 +176,9 @@ class WTStore {
     kJournalStatements
   };
   sqlite3_stmt* journalStatement(int which, int* code);
+  sqlite3_stmt* loadStatement(int which, int* code);
+  Result<void> loadRunningAndNamed(const std::function<void(WTStoreRecord&&)>& sink,
+                                   const QStringList& names);
   // The one number a journal statement answers.
   Result<qint64> journalNumber(int which);
   Error readError(int code) const;
@@ -187,8 +196,9 @@ class WTStore {
   sqlite3_stmt* rollback_ = nullptr;
   sqlite3_stmt* replace_ = nullptr;
   sqlite3_stmt* remove_ = nullptr;
-  sqlite3_stmt* selectAll_ = nullptr;
-  sqlite3_stmt* selectTimerRecords_ = nullptr;
-  sqlite3_stmt* selectItemsOfTasks_ = nullptr;  // prepared on first use
+  // The loads' statements (WTStoreLoads.cpp), prepared on first use.
+  static constexpr int kLoadStatements = 6;
+  sqlite3_stmt* load_[kLoadStatements] = {};
+  bool shaped_ = false;  // the file has the tables this version reads: the statements were prepared
   sqlite3_stmt* journal_[kJournalStatements] = {};
 };

@@ -9,6 +9,7 @@
 #include <QFileInfo>
 #include <QTemporaryDir>
 
+#include <array>
 #include <functional>
 #include <map>
 #include <memory>
@@ -318,13 +319,15 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
           "PRAGMA user_version = 4;");
     RawDatabase(path()).exec(
         "INSERT INTO records (uuid, entity, name, rate, archived, color) VALUES"
-        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233');"
+        " ('C@WTClient', 'WTClient', 'Acme', '80.00', 1, '#ff112233'),"
+        " ('T@WTTask', 'WTTask', 'Sketch', NULL, 0, NULL);"
         "INSERT INTO records (uuid, entity, taskUuid, startDate, minutes, expense, completed) VALUES"
         " ('F@WTFlat', 'WTFlat', 'T@WTTask', 1700000000.5, 90, '-0.10', 1);");
     // clang-format off
   Records expected = {
       {"C@WTClient", {.uuid = "C@WTClient", .entity = "WTClient", .name = "Acme", .rate = decimal(u"80.00"),
                       .color = "#ff112233", .archived = true}},
+      {"T@WTTask", {.uuid = "T@WTTask", .entity = "WTTask", .name = "Sketch"}},
       {"F@WTFlat", {.uuid = "F@WTFlat", .entity = "WTFlat", .taskUuid = "T@WTTask",
                     .startDate = Date::fromSeconds(1700000000.5), .minutes = 90, .expense = decimal(u"-0.10"),
                     .completed = true}}};
@@ -334,6 +337,8 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
       auto reader = WTStore::openReadOnly(path());
       ASSERT_TRUE(reader) << reader.error().message.toStdString();
       expectSameRecords(loadAll(*reader.value()), expected);
+      expectSameRecords(loadAll(*reader.value(), WTStore::Records::RunningAndNamed, {"sketch"}),
+                        {{"T@WTTask", expected["T@WTTask"]}});
     }
     EXPECT_EQ(fileBytes(path()), before);
     auto writer = open();
@@ -345,7 +350,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     ASSERT_EQ(copies.size(), 1);
     const QString copy = dir.filePath("Backups/" + copies[0]);
     EXPECT_TRUE(WTStoreBackup::check(copy).ok());
-    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "2", version == 1 ? "0" : "3"}));
+    EXPECT_EQ(shape(copy), QStringList({QString::number(version), "delete", "3", version == 1 ? "0" : "3"}));
     EXPECT_EQ(int(QFileInfo(dir.filePath("Backups")).permissions() & 0x0777), 0x0700);
     EXPECT_EQ(QFileInfo(copy).permissions(),
               QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
@@ -354,7 +359,7 @@ TEST_F(WTStoreTest, AnOlderFileIsMigratedOnlyByAWriterAndReadersSeeWhatWritersSa
     added.roundingMinutes = 6;
     ASSERT_TRUE(writer->save({added}, {}).ok());  // still in the writer's log, not yet in the file
     expected[added.uuid] = added;
-    EXPECT_EQ(shape(path()), QStringList({"6", "wal", "3", "3"}));
+    EXPECT_EQ(shape(path()), QStringList({"6", "wal", "4", "3"}));
 
     auto reader = WTStore::openReadOnly(path());
     ASSERT_TRUE(reader) << reader.error().message.toStdString();
@@ -373,26 +378,62 @@ TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
     records[task] = record(task, "WTTask");
     records[task + "-item@WTNote"] = record(task + "-item@WTNote", "WTNote", task);
   }
+  // Names as the commands look for them: case and accents folded, nothing else.
+  for (const auto& [uuid, name, project] :
+       std::initializer_list<std::array<QString, 3>>{{"T2@WTTask", "Review ", "P1@WTProject"},
+                                                     {"E@WTTask", "École", "P2@WTProject"},
+                                                     {"X@WTTask", "Other", "P2@WTProject"},
+                                                     {"K@WTTask", "\u212Aelvin", "P3@WTProject"},
+                                                     {"O@WTTask", "ÉCOLE", {}},
+                                                     {"S@WTTask", "Straße", "P4@WTProject"}})
+    records[uuid] = {.uuid = uuid, .entity = "WTTask", .name = name, .projectUuid = project};
+  for (const auto& [uuid, client] :
+       {std::pair{"P2@WTProject", "C2@WTClient"}, {"P3@WTProject", ""}, {"P4@WTProject", "C4@WTClient"}})
+    records[uuid] = {.uuid = uuid, .entity = "WTProject", .clientUuid = *client ? client : QString()};
+  for (const char* client : {"C2@WTClient", "C4@WTClient"}) records[client] = record(client, "WTClient");
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
   using Pick = std::function<bool(const WTStoreRecord&)>;
-  const auto ofTasks = [](QStringList tasks) -> Pick {
-    return [=](auto& r) { return tasks.contains(r.taskUuid); };
+  const auto owner = [](const WTStoreRecord& r) {
+    return r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask";
+  };
+  const auto ownersAnd = [&](Pick item) -> Pick { return [=](auto& r) { return owner(r) || item(r); }; };
+  const auto ofTasks = [&](QStringList tasks) -> Pick {
+    return ownersAnd([=](auto& r) { return tasks.contains(r.taskUuid); });
+  };
+  // The running entries and the tasks `named`, with their projects, every task of those and their clients.
+  const auto runningAnd = [&](QStringList tasks) -> Pick {
+    QStringList projects, clients;
+    for (const auto& [uuid, r] : records)
+      if (r.running && !owner(r)) tasks.append(r.taskUuid);
+    for (const auto& [uuid, r] : records)
+      if (tasks.contains(uuid) && !r.projectUuid.isNull()) projects.append(r.projectUuid);
+    for (const auto& [uuid, r] : records)
+      if (projects.contains(uuid) && !r.clientUuid.isNull()) clients.append(r.clientUuid);
+    return [=](auto& r) {
+      return (r.running && !owner(r)) || tasks.contains(r.uuid) || projects.contains(r.uuid) ||
+             clients.contains(r.uuid) || (r.entity == u"WTTask" && projects.contains(r.projectUuid));
+    };
   };
   // The statement is used again: the next load's tasks replace the last one's.
   const std::tuple<WTStore::Records, QStringList, Pick> cases[] = {
-      {WTStore::Records::Timers, {"T1@WTTask"}, [](const WTStoreRecord& r) { return r.running; }},
+      {WTStore::Records::Timers, {"T1@WTTask"}, ownersAnd([](auto& r) { return r.running; })},
       {WTStore::Records::ItemsOfTasks, {"T1@WTTask", quoted}, ofTasks({"T1@WTTask", quoted})},
       {WTStore::Records::ItemsOfTasks, {}, ofTasks({})},
-      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})}};
-  for (const auto& [which, tasks, item] : cases) {
+      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})},
+      {WTStore::Records::RunningAndNamed, {}, runningAnd({})},
+      {WTStore::Records::RunningAndNamed,
+       {"école", "KELVIN"},
+       runningAnd({"E@WTTask", "O@WTTask", "K@WTTask"})},
+      {WTStore::Records::RunningAndNamed, {"STRASSE", "Review", " other"}, runningAnd({})}};
+  for (const auto& [which, keys, picked] : cases) {
+    SCOPED_TRACE(keys.join(',').toStdString());
     Records expected;
     for (const auto& [uuid, r] : records)
-      if (r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask" || item(r))
-        expected[uuid] = r;
+      if (picked(r)) expected[uuid] = r;
     ASSERT_LT(expected.size(), records.size());
-    expectSameRecords(loadAll(*store, which, tasks), expected);
+    expectSameRecords(loadAll(*store, which, keys), expected);
   }
 }
 
