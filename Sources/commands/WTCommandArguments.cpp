@@ -7,6 +7,10 @@
 #include <cstdio>
 #include <cstdlib>
 
+#ifdef TESSAL_COVERAGE
+extern "C" void __gcov_dump();
+#endif
+
 namespace WTCommandArguments {
 
 int usage(QTextStream& err, const char* usageLine, const QString& problem) {
@@ -45,6 +49,9 @@ void endProcess(int status, QTextStream& out, QTextStream& err, WTObjectContext&
   err.flush();
   context.closeStore();
   std::fflush(nullptr);
+#ifdef TESSAL_COVERAGE
+  __gcov_dump();  // a coverage build writes its counts in the exit handlers _Exit skips
+#endif
   std::_Exit(status);
 }
 
