@@ -17,8 +17,6 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   updater->start();
   EXPECT_EQ(ticker(), "1 ticks, 2 running, badge \"01:15\", ticking");
   EXPECT_EQ(updater->windowTitle("Tessal"), "Tessal — 01:15");
-  updater->update();
-  EXPECT_EQ(ticker(), "2 ticks, 2 running, badge \"01:15\", ticking");
   advance(35);  // 12:01:05
   updater->update();
   EXPECT_EQ(updater->totalActiveDuration(), 77);  // 45:35 + 31:05
@@ -124,7 +122,6 @@ TEST_F(TrackingTest, AnsweringYesStopsEntriesStartedBeforeTheIdleStartAndRestart
   updater->start();
   settle();
   ASSERT_EQ(presenter.shown.size(), 1u);
-  EXPECT_EQ(presenter.shown.front().messageText, "Idle time");
   for (WTTime* time : stopped)
     EXPECT_TRUE(!time->running() && time->endDate() == std::optional<Date>(idleStart));
   for (WTTime* time : untouched) EXPECT_TRUE(time->running() && !time->endDate());
@@ -202,7 +199,8 @@ TEST_F(TrackingTest, SleepAndUnannouncedPausesOfferTheTimeAwayAsIdle) {
 
 // Quitting asks and saves the choice; a session's end asks nothing and stores the timers running.
 TEST_F(TrackingTest, QuitPromptAndSessionEndStoreTheTimersAsChosen) {
-  countSaves();
+  int saves = 0;
+  updater->setSaveCallback([&] { return ++saves, context->save().ok(); });
   updater->start();
   updater->applicationWillTerminate();
   updater->sessionWillEnd();
