@@ -79,7 +79,6 @@ TEST_F(WTMainWindowControllerTest, StacksSwitchAndKeepTheirDepth) {
   window->showClients();
   EXPECT_EQ(window->selectedToolbarItemIdentifier(), "clients");
   EXPECT_EQ(window->topViewController(), window->clientsViewController());
-  EXPECT_EQ(window->contentView()->findChildren<QWidget*>(Qt::FindDirectChildrenOnly).size(), 1);
   window->showProjects();
   EXPECT_EQ(window->projectsNavigationController()->viewControllers().size(), 2);
   // The root, deliberately, even with the outline on top.
@@ -106,7 +105,6 @@ TEST_F(WTMainWindowControllerTest, TheArchiveItemAndTheExportFollowTheSelectionA
   EXPECT_FALSE(archived->archived());
   QCoreApplication::processEvents();
   EXPECT_EQ(item("archive")->text(), "Archive");
-  EXPECT_TRUE(item("archive")->isEnabled());
   for (const char* identifier : {"report", "projects", "clients", "add", "remove"})
     EXPECT_TRUE(validate(identifier)) << identifier;
   EXPECT_FALSE(validate("toggleTimer"));  // no task to time in the lists

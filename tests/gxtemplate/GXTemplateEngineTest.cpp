@@ -333,7 +333,6 @@ TEST_F(EngineRunTest, ColorFormatWritesHexForHexOnly) {
   EXPECT_EQ(hex, QStringList({"ff0000", "123456", "0000ff", "000000", "ff0000"}));
   GXTemplateStandardFilters filters;  // anything else leaves the value as it is
   EXPECT_EQ(filters.filterInvoked("color_format", {"rgb"}, red), red);
-  EXPECT_EQ(filters.filterInvoked("color_format", {}, red), red);
   EXPECT_EQ(filters.filterInvoked("color_format", {"hex"}, QStringLiteral("ff0000")), QVariant("ff0000"));
   EXPECT_EQ(filters.filterInvoked("nosuch", {}, red), red);
 }

