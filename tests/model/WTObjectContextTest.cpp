@@ -245,4 +245,16 @@ TEST_F(WTObjectContextTest, DeletionsAndIdentitiesMadeAgain) {
   EXPECT_NE(context->objectWithUUID(keptId), nullptr);
   ASSERT_NE(WTProject::objectWithUUID(projectId, context.get()), nullptr);
   EXPECT_EQ(WTProject::objectWithUUID(projectId, context.get())->name(), "second life");
+
+  // A record that lost its identity is refused loudly, before anything is written or journaled.
+  auto* flat = WTFlat::insertNewObject(context.get());
+  const QString flatId = flat->uuid();
+  flat->setUuid(QString());
+  journal.calls.clear();
+  const Result<void> refused = context->save();
+  EXPECT_TRUE(!refused.ok() && refused.error().message.contains("WTFlat") && journal.calls.empty() &&
+              context->hasChanges());
+  flat->setUuid(flatId);
+  saveAndReopen();
+  EXPECT_NE(context->objectWithUUID(flatId), nullptr);
 }

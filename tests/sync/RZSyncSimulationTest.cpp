@@ -592,6 +592,7 @@ TEST_P(RZSyncTwoDevices, AnotherDeviceFollowsUndoAfterTheSave) {
     const QVariantMap values = billing.count(entity) ? billing.at(entity) : QVariantMap();
     for (const auto& [key, value] : values.asKeyValueRange())
       EXPECT_TRUE(record->setValue(key, value)) << key.toStdString();
+    if (entity == WTEntity::Client) task->project()->setClient(static_cast<WTClient*>(record));
     if (entity == WTEntity::Task) static_cast<WTTask*>(record)->setProject(task->project());
     if (WTEntities::isItem(entity)) static_cast<WTItem*>(record)->setTask(task);
     a.context->processPendingChanges();
@@ -608,6 +609,32 @@ TEST_P(RZSyncTwoDevices, AnotherDeviceFollowsUndoAfterTheSave) {
   undoThenSync(count, false);
   ASSERT_EQ(b.context->count(), 2 + count);
   EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  // A rename, a client deleted from under its project, a project deleted with its tasks and items: each
+  // undone after its save (before a sync) puts back the rows that were in the file, and the other device
+  // follows. Rows and the project's client in the file after each change, and after its undo:
+  const auto rows = [&] {
+    QMap<QString, WTStoreRecord> rows;
+    auto store = WTStore::open(a.storePath());
+    EXPECT_TRUE(store.ok() &&
+                store.value()->loadAll([&](WTStoreRecord&& row) { rows.insert(row.uuid, row); }));
+    return rows;
+  };
+  const QMap<QString, WTStoreRecord> before = rows();
+  WTProject* atlas = task->project();
+  const QString atlasUuid = atlas->uuid(), clientUuid = atlas->client()->uuid();
+  const std::function<void()> changes[] = {[&] { task->setName("Renamed"); },
+                                           [&] { a.context->deleteObject(atlas->client()); },
+                                           [&] { a.context->deleteObject(atlas); }};
+  const std::pair<qsizetype, QString> afterChange[] = {{2 + count, clientUuid}, {1 + count, ""}, {2, ""}};
+  for (int i = 0; i < 3; ++i) {
+    changes[i]();
+    undoThenSync(0, true, false);
+    const QMap<QString, WTStoreRecord> changed = rows();
+    EXPECT_EQ(std::pair(changed.size(), changed.value(atlasUuid).clientUuid), afterChange[i]) << i;
+    undoThenSync(1);
+    EXPECT_EQ(rows(), before) << i;
+    EXPECT_EQ(snapshot(*a.context), snapshot(*b.context)) << i;
+  }
 
   const QStringList made = madeHere();
   undoThenSync(count, true, false);
