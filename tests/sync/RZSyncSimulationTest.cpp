@@ -595,6 +595,8 @@ TEST_P(RZSyncTwoDevices, AnotherDeviceFollowsUndoAfterTheSave) {
   undoThenSync(0);
   ASSERT_EQ(b.context->count(), 2 + count);
   EXPECT_EQ(snapshot(*a.context), snapshot(*b.context));
+  for (const char* value : {R"("address":"1 Main St")", R"("currency":"JPY")"})
+    EXPECT_NE(snapshot(*b.context).find(value), std::string::npos) << value;
   undoThenSync(count);
   ASSERT_EQ(b.context->count(), 2);  // only the project and task the records are filed under
   undoThenSync(count, false);
