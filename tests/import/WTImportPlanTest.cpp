@@ -21,15 +21,20 @@ class ImportPlanTest : public ModelTest {
     EXPECT_TRUE(file.open(QIODevice::ReadOnly));
     return read(file);
   }
-  static QString path(const WTTime* time) {
-    const WTTask* task = time->task();
-    return QStringLiteral("%1/%2/%3")
-        .arg(task->project()->client()->name(), task->project()->name(), task->name());
-  }
   WTTime* entryNamed(const QString& name) {
     const QList<WTTime*> times =
         context->fetch<WTTime>([&](const WTTime* time) { return time->name() == name; });
     return times.size() == 1 ? times.first() : nullptr;
+  }
+  // "client/project/task|notes|minutes", "|running" while it runs; "none" unless one entry has the name.
+  std::string entry(const char* name) {
+    const WTTime* time = entryNamed(QString::fromUtf8(name));
+    if (!time) return "none";
+    const WTProject* project = time->task()->project();
+    return QStringLiteral("%1/%2/%3|%4|%5%6")
+        .arg(project->client() ? project->client()->name() : QString(), project->name(), time->task()->name(),
+             time->notes(), QString::number(time->duration()), time->running() ? "|running" : "")
+        .toStdString();
   }
 };
 
@@ -61,16 +66,9 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
   undo.redo();
   saveAndReopen();
   ASSERT_EQ(context->fetch<WTClient>().size(), 1);
-  WTTime* call = entryNamed(QStringLiteral("Call\nwith client"));
-  ASSERT_TRUE(call);
-  EXPECT_EQ(path(call), QStringLiteral("ACME/website/Default Task"));
-  EXPECT_EQ(call->notes(), QStringLiteral("Not billable"));
-  EXPECT_EQ(call->duration(), 45);
-  WTTime* header = entryNamed(QStringLiteral("Header, \"hero\" image"));
-  ASSERT_TRUE(header);
-  EXPECT_EQ(path(header), QStringLiteral("ACME/website/design"));
-  EXPECT_EQ(header->notes(), QStringLiteral("Tags: web, design"));
-  header->setName(QStringLiteral("Edited here"));
+  EXPECT_EQ(entry("Call\nwith client"), "ACME/website/Default Task|Not billable|45");
+  ASSERT_EQ(entry("Header, \"hero\" image"), "ACME/website/design|Tags: web, design|180");
+  entryNamed(QStringLiteral("Header, \"hero\" image"))->setName(QStringLiteral("Edited here"));
   saveAndReopen();
 
   // Again, now with the running entry stopped where it had got to: only that one is new.
@@ -80,10 +78,7 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
   saveAndReopen();
   EXPECT_TRUE(entryNamed(QStringLiteral("Edited here")));
   EXPECT_EQ(context->fetch<WTTime>().size(), 3);
-  WTTime* running = entryNamed(QStringLiteral("Running thing"));
-  ASSERT_TRUE(running);
-  EXPECT_FALSE(running->running());
-  EXPECT_EQ(running->duration(), 30);
+  EXPECT_EQ(entry("Running thing"), "/Internal/Default Task||30");
 
   WTImport::apply(*context, file, {.stopRunning = true});
   EXPECT_FALSE(context->hasChanges());

@@ -53,7 +53,7 @@ class RZSyncNetworkTest : public ::testing::Test {
 }  // namespace
 
 // Credentials come trimmed from the delegate unless set, blank ones send nothing; a head carries neither
-// data nor an unset device; a save carries its data pretty, money as written.
+// data nor an unset device; a save carries its data, money as written.
 TEST_F(RZSyncNetworkTest, RequestCarriesCredentialsBodyAndHeaders) {
   network.setCredentialDelegate(&delegate);
   for (const auto& [user, password] :
@@ -83,9 +83,6 @@ TEST_F(RZSyncNetworkTest, RequestCarriesCredentialsBodyAndHeaders) {
                 request.headers.value("content-type") + ' ' + request.headers.value("content-length"),
             "POST /sync/tessal/sync.php application/json application/json " +
                 QByteArray::number(request.body.size()));
-  EXPECT_TRUE(request.body.contains("\n  \"action\": \"save\"") &&
-              request.body.contains("\"expense\": 12.30"))
-      << request.body.toStdString();
   EXPECT_EQ(compact(request.json()),
             R"({"action":"save","data":{"i":{"A@WTExpense":{"expense":12.30}},"u":{},"x":[]},)"
             R"("device":"device-1","iteration":9,"password":"secret","user":"carl@example.org"})");
