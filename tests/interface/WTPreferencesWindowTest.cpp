@@ -5,8 +5,10 @@
 #include "WTPasswordStore.h"
 #include "WTPreferencesWindowController.h"
 
+#include <QCheckBox>
 #include <QComboBox>
 #include <QPlainTextEdit>
+#include <QSpinBox>
 #include <QTabWidget>
 
 namespace {
@@ -166,6 +168,21 @@ TEST_F(WTPreferencesWindowTest, TheServerFieldStoresWhatItTakesAndRefusesTheRest
   type(window->serverField(), "sync.example.com");
   window.reset();
   EXPECT_EQ(defaults->stringForKey("WTSyncServer"), "sync.example.com");
+}
+
+// The timer settings are stored as they are changed; the minutes can be set only while idle time is asked.
+TEST_F(WTPreferencesWindowTest, TimerSettingsAreStoredAsTheyAreChanged) {
+  defaults->setValue("WTIdleTime", 20);
+  open();
+  auto* idle = window->findChild<QCheckBox*>("shouldIdleCheckBox");
+  auto* minutes = window->findChild<QSpinBox*>("idleTimeSpinBox");
+  EXPECT_FALSE(idle->isChecked() || minutes->isEnabled());
+  QTest::mouseClick(idle, Qt::LeftButton);
+  minutes->stepUp();
+  QTest::mouseClick(window->findChild<QCheckBox*>("stopsOtherTimesCheckBox"), Qt::LeftButton);
+  EXPECT_EQ(std::tuple(defaults->boolForKey("WTShouldIdle"), minutes->isEnabled(),
+                       defaults->integerForKey("WTIdleTime"), defaults->boolForKey("WTStopsOtherTimes")),
+            std::tuple(true, true, 21, true));
 }
 
 // The details for a report's head are stored as each field is left (the address, on several lines, when
