@@ -1,5 +1,6 @@
 #include "AppFixture.h"
 #include "RZSyncManager.h"
+#include "TestFiles.h"
 #include "TrackingFixture.h"
 #include "WTBudgetWatcher.h"
 #include "WTDesktopNotifier.h"
@@ -83,10 +84,7 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
   const QByteArray garbage = QByteArray("SQLite format 3").append('\0').append(QByteArray(4080, '\x7f'));
   for (const bool restore : {false, true}) {
     SCOPED_TRACE(restore);
-    QFile file(path);
-    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) &&
-                file.write(garbage) == garbage.size());
-    file.close();
+    writeFile(path, garbage);
     presenter.offers.clear();
     presenter.restores = restore;
     auto delegate = makeDelegate();

@@ -1,5 +1,6 @@
 // The real `tessal` commands over a real store file, alone or beside a desktop copy holding the store.
 #include "CommandLineInstallation.h"
+#include "TestFiles.h"
 #include "WTSingleInstance.h"
 
 #include <QColor>
@@ -25,13 +26,9 @@ Date berlin(int month, int day, int hour, int minute = 0) {
       QDateTime(QDate(2026, month, day), QTime(hour, minute), QTimeZone("Europe/Berlin")));
 }
 
-QByteArray bytesOf(const QString& path) {
-  QFile file(path);
-  return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
-}
 // A store file with its write-ahead log.
 QByteArray storeBytes(const QString& path) {
-  return bytesOf(path) + bytesOf(path + "-wal");
+  return fileBytes(path) + fileBytes(path + "-wal");
 }
 
 // Acme's Atlas and client-less Hermes both have a "Design"; one name holds quotes. Nothing runs.
@@ -332,7 +329,7 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   const QList<std::pair<QStringList, QString>> refused = {
       {{"restore"}, "name the backup file"},
       {{"restore", here.file("notes.txt", "Not a data file.\n")}, "is not a Tessal data file"},
-      {{"restore", here.file("half.sqlite", bytesOf(copy).left(bytesOf(copy).size() / 2 + 100))},
+      {{"restore", here.file("half.sqlite", fileBytes(copy).left(fileBytes(copy).size() / 2 + 100))},
        "is damaged"},
       {{"restore", here.path("missing.sqlite")}, "There is no data file at"},
       {{"restore", store}, "is the data file itself"}};
@@ -388,18 +385,18 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
                                  {"--client", "Acme", "--out", csvFile},
                                  {"--client", "Acme", "--mode", "3", "--out", pdfFile}})
     EXPECT_EQ(here.expect(QStringList{"report"} + out, 0, "").out, "");
-  EXPECT_EQ(bytesOf(htmlFile), html.out.toUtf8());
+  EXPECT_EQ(fileBytes(htmlFile), html.out.toUtf8());
   // Projects by name, tasks in their order; durations as the report writes them, money with two decimals.
-  EXPECT_EQ(bytesOf(csvFile),
+  EXPECT_EQ(fileBytes(csvFile),
             "\"Atlas\",\"Design \\\"v2\\\", "
             "final\",\"02:15\",\"180.00\"\n\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
-  EXPECT_TRUE(bytesOf(pdfFile).startsWith("%PDF-"));
+  EXPECT_TRUE(fileBytes(pdfFile).startsWith("%PDF-"));
   EXPECT_FALSE(QFile::exists(pdfFile + ".part"));
   here.expect({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, 1,
               "");  // a trailing space counts
   // A billing period of the export's words: 4 March's entry (the one across midnight started on the 3rd).
   here.expect({"report", "--client", "Acme", "--range", "2026-03-04..2026-03-04", "--out", csvFile}, 0, "");
-  EXPECT_EQ(bytesOf(csvFile), "\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
+  EXPECT_EQ(fileBytes(csvFile), "\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
 
   // The range word reaches the export: 3 March's two entries.
   const Outcome day = here.expect({"export", "--range", "2026-03-03..2026-03-03"}, 0, "");
@@ -407,7 +404,7 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
   const QString file = here.path("times.csv");
   const Outcome written = here.expect({"export", "--range", "2026-03-03..2026-03-03", "--out", file}, 0, "");
   EXPECT_EQ(written.out + written.err, "");
-  EXPECT_EQ(bytesOf(file), day.out.toUtf8());
+  EXPECT_EQ(fileBytes(file), day.out.toUtf8());
   EXPECT_EQ(here.expect({"export", "--range", "2026-03-03..2026-03-03", "--format", "times"}, 0, "").out,
             day.out);
 
@@ -418,7 +415,7 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
               sheet.out.contains(",2026-03-03,23:30,00:15,0:45,0:45,80.00,60.00,"))
       << sheet.out.toStdString();
   here.expect({"export", "--format", "spreadsheet", "--out", file}, 0, "");
-  EXPECT_EQ(bytesOf(file), sheet.out.toUtf8());
+  EXPECT_EQ(fileBytes(file), sheet.out.toUtf8());
 }
 
 // Names that fit no record or several (1, naming the candidates) and broken templates write nothing.
@@ -453,12 +450,12 @@ TEST_F(ReportCommand, ReadsBesideARunningDesktopCopyAndChangesNothing) {
   // Saved by the running copy a moment ago: still in its write-ahead log.
   project(*context, "Late");
   ASSERT_TRUE(context->save());
-  const QByteArray store = bytesOf(here.storePath()), log = bytesOf(here.storePath() + "-wal");
+  const QByteArray store = fileBytes(here.storePath()), log = fileBytes(here.storePath() + "-wal");
   ASSERT_FALSE(log.isEmpty());
   here.expect({"report", "--project", "late"}, 0, "");
   EXPECT_EQ(here.expect({"export", "--project", "Beacon"}, 0, "").out.count('\n'), 1);
-  EXPECT_EQ(bytesOf(here.storePath()), store);
-  EXPECT_EQ(bytesOf(here.storePath() + "-wal"), log);
+  EXPECT_EQ(fileBytes(here.storePath()), store);
+  EXPECT_EQ(fileBytes(here.storePath() + "-wal"), log);
   project(*context, "Later");
   EXPECT_TRUE(context->save()) << "the running copy still writes";
 }

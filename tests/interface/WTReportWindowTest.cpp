@@ -1,3 +1,4 @@
+#include "TestFiles.h"
 #include "UiFixture.h"
 
 #include "WTCustomRangeDialog.h"
@@ -16,12 +17,6 @@ QStringList linesOf(const QString& path) {
                           : QStringList{"<unreadable>"};
   lines.sort();
   return lines;
-}
-void writeFile(const QString& path, const QString& text) {
-  QDir().mkpath(QFileInfo(path).absolutePath());
-  QFile file(path);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-  file.write(text.toUtf8());
 }
 
 // Acme's Website (Design, 2:30 in March) and Backend (API, 2:00 in February), all at 60 an hour.
@@ -50,7 +45,7 @@ class ReportWindowTest : public UiTest {
 
   // Opens the window, with the user's template `text` if given; counts renders from then on.
   void openReport(const QList<WTProject*>& projects, const QString& text = {}) {
-    if (!text.isEmpty()) writeFile(WTReportGenerator::userTemplatePath(), text);
+    if (!text.isEmpty()) writeFile(WTReportGenerator::userTemplatePath(), text.toUtf8());
     window = std::make_unique<WTReportWindowController>(context.get());
     window->resize(700, 400);
     window->show();
@@ -60,7 +55,7 @@ class ReportWindowTest : public UiTest {
     renders = shown = 0;
   }
   void rerender(const QString& text) {
-    writeFile(WTReportGenerator::userTemplatePath(), text);
+    writeFile(WTReportGenerator::userTemplatePath(), text.toUtf8());
     window->refreshWebContent();
   }
   QString text() const { return window->webView()->toPlainText(); }

@@ -1,6 +1,7 @@
 #include "FakeSecretService.h"
 #include "MemoryKeychain.h"
 #include "SettingsKeys.h"
+#include "TestFiles.h"
 #include "UserDefaults.h"
 #include "WTPasswordStore.h"
 #include "WTQtKeychain.h"
@@ -71,10 +72,7 @@ class WTPasswordStoreTest : public ::testing::Test {
   std::unique_ptr<WTPasswordStore> makeStore() {
     return std::make_unique<WTPasswordStore>(defaults.get(), std::make_unique<SharedKeychain>(keychain));
   }
-  QByteArray fileBytes() const {
-    QFile file(settingsPath());
-    return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
-  }
+  QByteArray fileBytes() const { return ::fileBytes(settingsPath()); }
   int fileMode() const {
     struct stat info {};
     return ::stat(QFile::encodeName(settingsPath()).constData(), &info) ? -1 : int(info.st_mode & 07777);

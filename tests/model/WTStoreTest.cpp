@@ -1,3 +1,4 @@
+#include "TestFiles.h"
 #include "WTStore.h"
 #include "WTStoreBackup.h"
 
@@ -155,17 +156,6 @@ Records loadAll(WTStore& store, WTStore::Records which = WTStore::Records::All,
       store.loadAll([&](WTStoreRecord&& r) { records[r.uuid] = std::move(r); }, which, tasks);
   EXPECT_TRUE(loaded.ok()) << loaded.error().message.toStdString();
   return records;
-}
-
-QByteArray fileBytes(const QString& path) {
-  QFile file(path);
-  return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
-}
-
-void writeFile(const QString& path, const QByteArray& bytes) {
-  QFile file(path);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-  file.write(bytes);
 }
 
 // Plain sqlite3 on a file, as another program would see it.
@@ -502,7 +492,7 @@ TEST_F(WTStoreTest, RefusedFilesAreLeftAsTheyWere) {
       make(path());
       const QList<QByteArray> before = allBytes();
       ASSERT_FALSE(before[0].isEmpty());
-      auto store = readOnly          ? WTStore::openReadOnly(path())
+      auto store = readOnly         ? WTStore::openReadOnly(path())
                    : way == Writing ? WTStore::open(path())
                                     : WTStore::open(path(), nullptr, WTStore::Check::WholeFileBeforeSaving);
       if (store && way == CheckingBesideTheLoading) {

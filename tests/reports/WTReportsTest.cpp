@@ -3,6 +3,7 @@
 #include "KeyPath.h"
 #include "LogCapture.h"
 #include "MoneyFormat.h"
+#include "TestFiles.h"
 #include "UserLocale.h"
 #include "WTCSVExport.h"
 #include "WTItemContainer.h"
@@ -405,10 +406,7 @@ TEST_F(ReportTest, UserTemplateWinsAndTheCopyNeverOverwrites) {
   const Result<QString> copied = WTReportGenerator::copyBuiltInTemplateToUserFolder();
   ASSERT_TRUE(copied.ok()) << copied.error().message.toStdString();
   EXPECT_TRUE(copied.value() == user && readAll(user) == readAll(WTReportGenerator::builtInTemplatePath()));
-  QFile file(user);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) &&
-              file.write("Mine: {{ mode }} {{ client.name }}"));
-  file.close();
+  writeFile(user, "Mine: {{ mode }} {{ client.name }}");
   ASSERT_TRUE(WTReportGenerator::copyBuiltInTemplateToUserFolder().ok());
   EXPECT_EQ(readAll(user), QStringLiteral("Mine: {{ mode }} {{ client.name }}"));
   EXPECT_EQ(WTReportGenerator(projects(), 3).render().html, QStringLiteral("Mine: 3 Acme"));

@@ -2,6 +2,7 @@
 
 #include "Date.h"
 #include "SyncTestSupport.h"
+#include "TestFiles.h"
 #include "WTClient.h"
 #include "WTExpense.h"
 #include "WTProject.h"
@@ -22,15 +23,6 @@ using Section = RZSyncTrack::Section;
 
 namespace {
 
-QByteArray readFile(const QString& path) {
-  QFile file(path);
-  return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
-}
-void writeFile(const QString& path, const QByteArray& bytes) {
-  QFile file(path);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-  file.write(bytes);
-}
 constexpr const char* kEmpty = R"({"i":{},"u":{},"x":[]})";
 
 // A store file as the version before the journal moved into it wrote it.
@@ -192,7 +184,7 @@ TEST(RZSyncTrackStore, AnOlderStoresJournalFileMovesIntoItOnce) {
       EXPECT_EQ(log.contains("Can not parse json - "), !row.loaded);
     }
     EXPECT_FALSE(QFile::exists(file));
-    EXPECT_EQ(readFile(file + (row.loaded ? ".migrated" : ".corrupt")), row.text ? row.text : "");
+    EXPECT_EQ(fileBytes(file + (row.loaded ? ".migrated" : ".corrupt")), row.text ? row.text : "");
     EXPECT_EQ(QFile::exists(file + ".migrated"), row.loaded && row.text);
     EXPECT_EQ(QFile::exists(file + ".corrupt"), !row.loaded);
 
@@ -202,7 +194,7 @@ TEST(RZSyncTrackStore, AnOlderStoresJournalFileMovesIntoItOnce) {
       EXPECT_EQ(journal(), std::to_string(row.iteration) + ' ' + (row.loaded ? row.loaded : kEmpty));
       EXPECT_EQ(later.contains("Ignoring " + file), !again) << later.lines.join('\n').toStdString();
     }
-    EXPECT_EQ(readFile(file + ".ignored"), R"({"iteration": 9})");
+    EXPECT_EQ(fileBytes(file + ".ignored"), R"({"iteration": 9})");
   }
 }
 
