@@ -1,5 +1,6 @@
 #pragma once
 // One installation of Tessal whose real `tessal` runs as a separate process: own folders, no display.
+#include "TestFiles.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -113,9 +114,8 @@ class Installation {
     return tessal(arguments, extra).out.toStdString();
   }
   QString file(const QString& name, const QByteArray& contents) const {
-    QFile file(path(name));
-    EXPECT_TRUE(file.open(QIODevice::WriteOnly) && file.write(contents) == contents.size());
-    return file.fileName();
+    writeFile(path(name), contents);
+    return path(name);
   }
 
  private:

@@ -38,9 +38,7 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   const QString path = WTAppDelegate::applicationSupportFolder() + "/Tessal.sqlite";
   ASSERT_TRUE(QDir().mkpath(WTAppDelegate::applicationSupportFolder()));
   const QByteArray garbage = "these are somebody's notes, not a data file\n";
-  QFile file(path);
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly) && file.write(garbage) == garbage.size());
-  file.close();
+  writeFile(path, garbage);
   auto delegate = makeDelegate();
   WTMainWindowController window(*delegate);
   ASSERT_EQ(presenter.errors.size(), 1);
@@ -61,8 +59,7 @@ TEST_F(WTAppDelegateTest, AnUnreadableStoreIsReportedOnceAndLeftAlone) {
   EXPECT_TRUE(context->hasChanges());  // still in memory
   presenter.quitAnyway = true;
   EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
-  ASSERT_TRUE(file.open(QIODevice::ReadOnly));
-  EXPECT_EQ(file.readAll(), garbage);
+  EXPECT_EQ(fileBytes(path), garbage);
   EXPECT_FALSE(QFile::exists(path + "-wal"));
 }
 
@@ -78,9 +75,7 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
   ASSERT_TRUE(QDir(backups).removeRecursively());  // the day's copy the first start made
   ASSERT_TRUE(WTStoreBackup::copy(path, backups + "/Tessal-2026-01-02.sqlite").ok());
   // Newer, but no store: passed over.
-  QFile damagedCopy(backups + "/Tessal-2026-01-03.sqlite");
-  ASSERT_TRUE(damagedCopy.open(QIODevice::WriteOnly) && damagedCopy.write(QByteArray(8192, 'x')) == 8192);
-  damagedCopy.close();
+  writeFile(backups + "/Tessal-2026-01-03.sqlite", QByteArray(8192, 'x'));
   const QByteArray garbage = QByteArray("SQLite format 3").append('\0').append(QByteArray(4080, '\x7f'));
   for (const bool restore : {false, true}) {
     SCOPED_TRACE(restore);
@@ -100,9 +95,8 @@ TEST_F(WTAppDelegateTest, ADamagedStoreIsKeptAndTheNewestGoodBackupOffered) {
         QDir(WTAppDelegate::applicationSupportFolder()).entryList({"Tessal.sqlite.replaced-*"});
     kept.removeIf([](const QString& name) { return name.endsWith("-wal") || name.endsWith("-shm"); });
     EXPECT_EQ(kept.size(), restore ? 1 : 0);
-    QFile damaged(restore ? WTAppDelegate::applicationSupportFolder() + '/' + kept.value(0) : path);
-    ASSERT_TRUE(damaged.open(QIODevice::ReadOnly));
-    EXPECT_EQ(damaged.readAll(), garbage);
+    EXPECT_EQ(fileBytes(restore ? WTAppDelegate::applicationSupportFolder() + '/' + kept.value(0) : path),
+              garbage);
   }
   EXPECT_TRUE(presenter.errors.isEmpty()) << presenter.errors.join('\n').toStdString();
   // Damage only the check beside the loading finds (a page the loading never reads): nothing is written,
@@ -146,10 +140,8 @@ TEST_F(WTAppDelegateTest, TheFirstSaveOfADayLeavesACopyAndTheNewestSevenStay) {
   QStringList older;
   for (int days = 8; days >= 1; --days)
     older << today.addDays(-days).toString(u"'Tessal-'yyyy-MM-dd'.sqlite'");
-  for (const QString& name : older + QStringList{"Tessal-2020-01-01-120000.sqlite"}) {
-    QFile file(backups + '/' + name);
-    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
-  }
+  for (const QString& name : older + QStringList{"Tessal-2020-01-01-120000.sqlite"})
+    writeFile(backups + '/' + name, {});
   auto delegate = makeDelegate();
   WTObjectContext* context = delegate->managedObjectContext();
   WTProject::insertNewObject(context)->setName("Saved today");

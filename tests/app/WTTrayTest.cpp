@@ -1,6 +1,7 @@
 // The tray icon in a real tray (Xvfb, trayer), the real desktop copy driven by pointer and keyboard.
 #include "CommandLineInstallation.h"
 #include "PrivateXServer.h"
+#include "TestFiles.h"
 
 #include <QStandardPaths>
 #include <QTest>
@@ -49,8 +50,7 @@ class TrayTest : public ::testing::Test {
   }
   // What the desktop copy said and whether it still runs, for a failure's message.
   std::string tessalState() const {
-    QFile log(here.path("tessal.log"));
-    const QString said = log.open(QIODevice::ReadOnly) ? QString::fromUtf8(log.readAll()) : QString();
+    const QString said = QString::fromUtf8(fileBytes(here.path("tessal.log")));
     return QStringLiteral("Tessal %1; it said: %2")
         .arg(tessal->state() == QProcess::Running ? "runs" : "ended", said)
         .toStdString();

@@ -1,3 +1,4 @@
+#include "TestFiles.h"
 #include "UserDefaults.h"
 
 #include <gtest/gtest.h>
@@ -87,13 +88,10 @@ TEST_F(UserDefaultsTest, ValuesRoundTripThroughTheFileExactly) {
 
 // Text written by hand and registered values, read as boolean, integer, decimal, date and string.
 TEST_F(UserDefaultsTest, TypedReads) {
-  QFile file(path());
-  ASSERT_TRUE(file.open(QIODevice::WriteOnly));
-  file.write(
-      "[General]\nyes=YES\nno=no\ntrue=true\nfalse=False\none=1\nzero=0\nfraction=2.9\nnegative=-3\n"
-      "word=abc\nrate=80\nrate2=80.5\nspaced=\" 12.30 \"\n"
-      "date=2024-03-05T10:00:00Z\nzoned=2024-03-05T11:00:00+01:00\n");
-  file.close();
+  writeFile(path(),
+            "[General]\nyes=YES\nno=no\ntrue=true\nfalse=False\none=1\nzero=0\nfraction=2.9\nnegative=-3\n"
+            "word=abc\nrate=80\nrate2=80.5\nspaced=\" 12.30 \"\n"
+            "date=2024-03-05T10:00:00Z\nzoned=2024-03-05T11:00:00+01:00\n");
   UserDefaults defaults(path());
   defaults.registerDefaults({{"registeredRate", 80.5},
                              {"decimal", QVariant::fromValue(dec("90.00"))},

@@ -211,9 +211,7 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   EXPECT_EQ(asked.size(), 2);
   EXPECT_FALSE(QFile::exists(csv));
   ASSERT_TRUE(window->saveHTMLToFile(html).ok());
-  QFile saved(html);
-  ASSERT_TRUE(saved.open(QIODevice::ReadOnly));
-  EXPECT_EQ(QString::fromUtf8(saved.readAll()), window->html());
+  EXPECT_EQ(QString::fromUtf8(fileBytes(html)), window->html());
   const Result<void> refused = window->saveHTMLToFile(dir.filePath("missing/report.html"));
   EXPECT_TRUE(!refused.ok() && refused.error().message.contains("missing/report.html"));
   // The period chosen covers the report and its lines: February's entry alone, then every one again.

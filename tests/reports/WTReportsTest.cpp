@@ -19,9 +19,7 @@
 namespace {
 
 QString readAll(const QString& path) {
-  QFile file(path);
-  if (!file.open(QIODevice::ReadOnly)) return QStringLiteral("<unreadable>");
-  return QString::fromUtf8(file.readAll());
+  return QString::fromUtf8(fileBytes(path));
 }
 
 // Acme: "Web "Site"" (Design: entries in March and February, expense, note, to-do), Backend (API: a fee).
