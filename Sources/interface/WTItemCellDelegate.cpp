@@ -92,9 +92,9 @@ void drawBilled(QPainter& painter, const QStyleOptionViewItem& option, const QMo
 }  // namespace
 
 WTItemCellDelegate::WTItemCellDelegate(WTItemsViewController* controller, WTOutlineView* view)
-    : QStyledItemDelegate(view), controller_(controller), view_(view) {
+    : QStyledItemDelegate(view), controller_(controller), view_(view), viewport_(view->viewport()) {
   view->installEventFilter(this);
-  view->viewport()->installEventFilter(this);
+  viewport_->installEventFilter(this);
 }
 
 bool WTItemCellDelegate::isEditingNotes(const QModelIndex& index) const {

@@ -75,6 +75,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
 
   WTItemsViewController* controller_;
   WTOutlineView* view_;
+  // Compared with, never called, in eventFilter: the view sends events while it is destroyed.
+  QWidget* viewport_;
   Field field_ = Field::Name;
   mutable Field openField_ = Field::Name;
   mutable QPersistentModelIndex notesIndex_;

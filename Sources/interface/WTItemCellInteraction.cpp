@@ -327,7 +327,7 @@ bool WTItemCellDelegate::keepsRefusedEdit(const QEvent* event) {
 }
 
 bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
-  if (object == view_ || object == view_->viewport()) return keepsRefusedEdit(event);
+  if (object == view_ || object == viewport_) return keepsRefusedEdit(event);
   auto* line = qobject_cast<QLineEdit*>(object);
   if (line && (event->type() == QEvent::KeyPress || event->type() == QEvent::FocusOut)) {
     // A duration or amount that is not one stays in its field, as typed, with the reason in view:
