@@ -64,8 +64,9 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, 
     sqlite3_bind_text(s, 1, taskList.constData(), int(taskList.size()), SQLITE_STATIC);
   }
   WTStoreRecord record;
+  WTStoreRows::SharedUuids owners;
   while ((code = sqlite3_step(s)) == SQLITE_ROW) {
-    if (!WTStoreRows::readRecord(s, record)) {
+    if (!WTStoreRows::readRecord(s, record, &owners)) {
       code = SQLITE_CORRUPT;
       break;
     }

@@ -136,7 +136,28 @@ int bindRecord(sqlite3_stmt* s, const WTStoreRecord& r) {
   return SQLITE_OK;
 }
 
-bool readRecord(sqlite3_stmt* s, WTStoreRecord& record) {
+void SharedUuids::read(sqlite3_stmt* statement, int column, QString& out) {
+  const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(statement, column));
+  if (!text) {
+    out = QString();
+    return;
+  }
+  const QByteArray bytes = QByteArray::fromRawData(text, sqlite3_column_bytes(statement, column));
+  if (const auto found = known_.constFind(bytes); found != known_.cend()) {
+    out = *found;
+    return;
+  }
+  readString(statement, column, out);
+  known_.insert(QByteArray(bytes.constData(), bytes.size()), out);
+}
+
+bool readRecord(sqlite3_stmt* s, WTStoreRecord& record, SharedUuids* owners) {
+  const auto readOwner = [&](int column, QString& out) {
+    if (owners)
+      owners->read(s, column, out);
+    else
+      readString(s, column, out);
+  };
   readString(s, kUuid, record.uuid);
   readEntity(s, record.entity);
   readString(s, kName, record.name);
@@ -145,10 +166,10 @@ bool readRecord(sqlite3_stmt* s, WTStoreRecord& record) {
   record.archived = sqlite3_column_int(s, kArchived) != 0;
   readString(s, kAddressBookUID, record.addressBookUID);
   readString(s, kTotalsUID, record.totalsUID);
-  readString(s, kClientUuid, record.clientUuid);
-  readString(s, kProjectUuid, record.projectUuid);
+  readOwner(kClientUuid, record.clientUuid);
+  readOwner(kProjectUuid, record.projectUuid);
   record.position = sqlite3_column_int(s, kPosition);
-  readString(s, kTaskUuid, record.taskUuid);
+  readOwner(kTaskUuid, record.taskUuid);
   record.startDate = readDate(s, kStartDate);
   record.endDate = readDate(s, kEndDate);
   record.running = sqlite3_column_int(s, kRunning) != 0;

@@ -4,6 +4,9 @@
 // and a record bound to a statement or read from a row.
 #include "WTStoreRecord.h"
 
+#include <QByteArray>
+#include <QHash>
+
 struct sqlite3_stmt;
 
 namespace WTStoreRows {
@@ -49,8 +52,19 @@ enum Column {
 int bindString(sqlite3_stmt* statement, int column, const QString& text);
 // Binds every column of `record`, which must outlive the statement's step.
 int bindRecord(sqlite3_stmt* statement, const WTStoreRecord& record);
+// The owners' identities a load has read so far, each kept as one string: a hundred thousand items name
+// a few hundred tasks, and a string shared is one not allocated, converted and freed again per row.
+class SharedUuids {
+ public:
+  void read(sqlite3_stmt* statement, int column, QString& out);
+
+ private:
+  QHash<QByteArray, QString> known_;
+};
+
 // Reads the row into `record`, assigning every field (the record may be reused from row to row). False
-// when a money column holds text that is not a number.
-bool readRecord(sqlite3_stmt* statement, WTStoreRecord& record);
+// when a money column holds text that is not a number. `owners`, when given, shares the owner columns'
+// strings between the rows of one load.
+bool readRecord(sqlite3_stmt* statement, WTStoreRecord& record, SharedUuids* owners = nullptr);
 
 }  // namespace WTStoreRows
