@@ -161,15 +161,18 @@ TEST_F(WTObjectContextTest, UndoStepsAreTurnsAndKeepTheirNames) {
 
 TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
   auto* project = WTProject::insertNewObject(context.get());
+  auto* client = WTClient::insertNewObject(context.get());
   WTTask* task = makeTask(project);
   task->setRate(dec("60"));
   const Date start = berlin(2026, 6, 1, 9);
   makeTime(task, start, start.addingSeconds(1800));
   makeTime(task, start, start.addingSeconds(600));
   ASSERT_TRUE(context->save().ok());
+  client->setName(QStringLiteral("Renamed"));  // not saved before the delete: its undo must keep it
   context->processPendingChanges();
 
   context->deleteObject(task);
+  context->deleteObject(client);
   context->processPendingChanges();
   EXPECT_TRUE(project->duration() == 0 && context->fetch<WTTime>().isEmpty());
   context->undoManager().undo();
@@ -179,6 +182,7 @@ TEST_F(WTObjectContextTest, UndoingADeleteBringsBackTheRecordsAndTheirTotals) {
   journal.calls.clear();  // the undone delete must not reach the file or the journal
   saveAndReopen();
   EXPECT_EQ(context->fetch<WTTime>().size(), 2);
+  EXPECT_EQ(context->fetch<WTClient>().value(0)->name(), "Renamed");
   EXPECT_FALSE(journal.calls.contains("delete"));
 }
 
