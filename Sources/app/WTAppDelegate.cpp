@@ -16,6 +16,7 @@
 #include "WTStoreBackup.h"
 #include "WTStoreSetup.h"
 #include "WTTask.h"
+#include "WTTimerCommands.h"
 
 #include <QDir>
 #include <QFileInfo>
@@ -149,6 +150,16 @@ bool WTAppDelegate::saveChanges(Error* error) {
   qCWarning(lcStore, "ERROR: %s", qUtf8Printable(saved.error().message));
   if (error) *error = saved.error();
   return false;
+}
+
+QJsonObject WTAppDelegate::carryOutRequest(const QJsonObject& request) {
+  WTCommandOutcome outcome = WTTimerCommands::answer(*managedObjectContext(), request);
+  Error error;
+  if (!saveChanges(&error)) {
+    outcome.status = 1;
+    outcome.err += QStringLiteral("tessal: %1\n").arg(error.message);
+  }
+  return outcome.toJson();
 }
 
 std::function<bool(const WTObject*)> WTAppDelegate::archivedPredicate() const {

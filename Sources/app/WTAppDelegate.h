@@ -3,6 +3,7 @@
 #include "RZSyncNetwork.h"
 #include "Result.h"
 
+#include <QJsonObject>
 #include <QObject>
 #include <QString>
 
@@ -72,6 +73,10 @@ class WTAppDelegate : public QObject, public RZSyncNetworkCredentialDelegate {
   // nothing changed; otherwise commits an edit in progress through the commit-editing handler (which
   // must not end it) and saves. Logs "ERROR: ..." and fills `error` when it fails.
   bool saveChanges(Error* error = nullptr);
+  // Carries out a change a command hands over while this process holds the store (a start or stop from
+  // the shell while the window or `tessal sync` runs) and saves it at once; the answer is what that
+  // command prints.
+  QJsonObject carryOutRequest(const QJsonObject& request);
 
   // Who speaks to the user for the application (not owned).
   WTAlertPresenter* alertPresenter() const { return presenter_; }

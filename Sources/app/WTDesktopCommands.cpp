@@ -112,6 +112,10 @@ int runSync(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   delegate.setSyncErrorPresenter(&presenter);
   usePassword(delegate, defaults, err);
   if (!delegate.managedObjectContext()->hasStore()) return 1;  // already reported
+  // A start or stop from the shell finds the store held and hands its change here, as it would to the
+  // window: carried out between the exchanges with the server, it is never refused for the sync's sake.
+  instance.setRequestHandler(
+      [&delegate](const QJsonObject& request) { return delegate.carryOutRequest(request); });
   const int status = runSyncCommand(*delegate.syncManager(), arguments, out, err);
   delegate.applicationWillTerminate();
   Error error;

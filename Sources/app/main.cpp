@@ -5,7 +5,6 @@
 #include "WTDesktopCommands.h"
 #include "WTSingleInstance.h"
 #include "WTStoreWriterLock.h"
-#include "WTTimerCommands.h"
 
 #include <QDir>
 #include <QMainWindow>
@@ -29,15 +28,8 @@ int main(int argc, char** argv) {
   if (!writerLock.lock(10000))
     qCWarning(lcStore, "Could not take %s; another process may be changing the store",
               qPrintable(writerLock.filePath()));
-  instance.setRequestHandler([&delegate](const QJsonObject& request) {
-    WTCommandOutcome outcome = WTTimerCommands::answer(*delegate.managedObjectContext(), request);
-    Error error;
-    if (!delegate.saveChanges(&error)) {
-      outcome.status = 1;
-      outcome.err += QStringLiteral("tessal: %1\n").arg(error.message);
-    }
-    return outcome.toJson();
-  });
+  instance.setRequestHandler(
+      [&delegate](const QJsonObject& request) { return delegate.carryOutRequest(request); });
   QObject::connect(&instance, &WTSingleInstance::reopenRequested, &app,
                    [&app] { app.applicationShouldHandleReopen(app.mainWindow()->isVisible()); });
   app.setQuitOnLastWindowClosed(false);  // quitting goes through the delegate's save

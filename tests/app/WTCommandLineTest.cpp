@@ -5,6 +5,7 @@
 #include "WTSingleInstance.h"
 
 #include <QSignalSpy>
+#include <QTcpServer>
 
 #include <atomic>
 #include <thread>
@@ -73,6 +74,21 @@ TEST(WTCommandLine, SyncRefusesWhileTheDesktopCopyRuns) {
   ASSERT_TRUE(desktop.start());
   here.expect({"sync"}, 1, "Tessal is running");
   EXPECT_FALSE(QFile::exists(here.storePath()));  // the running copy's store is not opened twice
+}
+
+// A start while `tessal sync` waits on its server finds the store held by the sync, which carries it out.
+TEST(WTCommandLine, AStartDuringASyncIsCarriedOutByTheSync) {
+  Installation here;
+  QTcpServer silent;  // takes the connection and never answers
+  ASSERT_TRUE(silent.listen(QHostAddress::LocalHost));
+  here.setSetting("WTSyncServer", QStringLiteral("http://127.0.0.1:%1").arg(silent.serverPort()));
+  here.setSetting("WTSyncUser", "ann@example.org");
+  here.setSetting("WTSyncPassword", "a password");
+  const std::unique_ptr<QProcess> sync = here.launch({"sync", "--timeout", "3"});
+  ASSERT_TRUE(silent.waitForNewConnection(20000));
+  here.expect({"start", "Review", "--project", "Work", "--create"}, 0, "Started");
+  EXPECT_EQ(Installation::finish(*sync).code, 1);  // not in step: the server never answered
+  here.expect({"status"}, 0, "Review");
 }
 
 // `tessal sync` says once where its password came from, and never hangs on a keyring.
