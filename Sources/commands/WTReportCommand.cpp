@@ -131,8 +131,12 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const bool spreadsheet = formatWord == QLatin1String("spreadsheet");
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("any");
-  const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
-  if (!predicate) return usage(err, kExportUsage, predicate.error().message);
+  // The time entries count both ends of the range, as they always have; the spreadsheet is what is billed
+  // and takes a billing period, as the report does.
+  const Result<std::optional<RZDate::Range>> period = WTRangePredicate::boundsForRangeWord(rangeWord);
+  if (!period) return usage(err, kExportUsage, period.error().message);
+  const Result<WTItemPredicate> predicate = spreadsheet ? WTRangePredicate::predicateForPeriod(period.value())
+                                                        : WTRangePredicate::predicateForRangeWord(rangeWord);
 
   // One project's entries need only that project's items read.
   const std::optional<WTProjectScope> scope = WTProjectScope::read(err, parser);

@@ -23,6 +23,7 @@
 #include <QDeadlineTimer>
 #include <QDir>
 #include <QFileInfo>
+#include <QMap>
 #include <QThread>
 
 #include <algorithm>
@@ -228,8 +229,9 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
       WTCommandArguments::parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project")});
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("today");
-  const Result<WTItemPredicate> predicate = WTRangePredicate::predicateForRangeWord(rangeWord);
-  if (problem.isEmpty() && !predicate) problem = predicate.error().message;
+  // A billing period, as a report takes it: consecutive ranges never list an entry twice.
+  const Result<std::optional<RZDate::Range>> period = WTRangePredicate::boundsForRangeWord(rangeWord);
+  if (problem.isEmpty() && !period) problem = period.error().message;
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, kUsage, problem);
 
   // One project's entries need only that project's items read.
@@ -237,12 +239,17 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   if (!scope) return 1;
   WTObjectContext& context = scope->snapshot->context();
   const WTProject* project = scope->project;
-  QList<WTTime*> times = WTRangePredicate::timesMatching(context, predicate.value(), project);
+  QList<WTTime*> times =
+      WTRangePredicate::timesMatching(context, WTRangePredicate::predicateForPeriod(period.value()), project);
   std::sort(times.begin(), times.end(), [](const WTTime* a, const WTTime* b) {
     return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
   });
+  // Each amount is what the entry bills, in its client's currency; a total is the sum of its lines.
+  const auto money = [](const Decimal& amount, const QString& currency) {
+    return MoneyFormat::format(amount, currency) + u' ' + currency;
+  };
   int minutes = 0;
-  Decimal cost;
+  QMap<QString, Decimal> billed;
   for (const WTTime* time : times) {
     const QDateTime start = time->startDate() ? time->startDate()->toQDateTime().toLocalTime() : QDateTime();
     const QString end = time->running()   ? QStringLiteral("now  ")
@@ -251,12 +258,15 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
     const QString task = time->task() ? WTNamedRecords::label(*time->task()) : QStringLiteral("(no task)");
     out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         "))
         << "–" << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
-        << MoneyFormat::format(time->cost()) << '\n';
+        << money(time->billedCost(), time->billingCurrency()) << '\n';
     minutes += time->duration();
-    cost += time->cost();
+    billed[time->billingCurrency()] += time->billedCost();
   }
+  if (billed.isEmpty()) billed[context.billingDefaults().currency] = Decimal();
+  QStringList totals;
+  for (const auto& [currency, amount] : billed.asKeyValueRange()) totals << money(amount, currency);
   out << "Total: " << times.size() << (times.size() == 1 ? " entry  " : " entries  ")
-      << DurationText::stringWithMinutes(minutes) << "  " << MoneyFormat::format(cost) << '\n';
+      << DurationText::stringWithMinutes(minutes) << "  " << totals.join(QStringLiteral(", ")) << '\n';
   out.flush();
   return 0;
 }

@@ -105,8 +105,12 @@ WTProject* WTExportController::projectLimit() const {
 
 Result<int> WTExportController::exportToPath(const QString& path) const {
   if (!context_) return Error{1, tr("There is no store to export from.")};
-  if (format() == WTCSVExport::Format::Spreadsheet)
-    return WTCSVExport::exportSpreadsheet(*context_, rangeButton_->selectedPredicate(), projectLimit(), path);
+  // What is billed takes a billing period, as a report does; the time entries count both ends.
+  if (format() == WTCSVExport::Format::Spreadsheet) {
+    return WTCSVExport::exportSpreadsheet(
+        *context_, WTRangePredicate::predicateForPeriod(rangeButton_->selectedPeriod()), projectLimit(),
+        path);
+  }
   return WTCSVExport::exportTimes(*context_, rangeButton_->selectedPredicate(), projectLimit(), path);
 }
 

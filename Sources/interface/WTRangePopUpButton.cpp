@@ -48,6 +48,10 @@ WTItemPredicate WTRangePopUpButton::selectedPredicate() const {
   return WTRangePredicate::predicateForTag(selectedTag(), customRangeBegin_, customRangeEnd_);
 }
 
+std::optional<RZDate::Range> WTRangePopUpButton::selectedPeriod() const {
+  return WTRangePredicate::boundsForTag(selectedTag(), customRangeBegin_, customRangeEnd_);
+}
+
 void WTRangePopUpButton::itemActivated(int index) {
   if (itemData(index).toInt() == WTRangePredicate::Custom) {
     showRangeWindow();

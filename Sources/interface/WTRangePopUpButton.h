@@ -31,6 +31,8 @@ class WTRangePopUpButton : public QComboBox {
   bool selectTag(int tag);
   // The chosen range as a test; empty when the choice gives none (a custom range without both dates).
   WTItemPredicate selectedPredicate() const;
+  // The chosen range as a billing period (see WTRangePredicate::startsIn); none for any date.
+  std::optional<RZDate::Range> selectedPeriod() const;
 
   // Hands the custom dates to the dialog through the settings and opens it over the window; whichever
   // way it is closed, the dates it shows become the custom range and rangeChosen() follows.

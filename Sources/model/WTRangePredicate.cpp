@@ -70,6 +70,16 @@ WTItemPredicate predicateForBounds(const RZDate::Range& bounds) {
   };
 }
 
+bool startsIn(const WTItem* item, const RZDate::Range& period) {
+  const std::optional<Date> start = item ? item->startDate() : std::nullopt;
+  return start && *start >= period[0] && *start < period[1];
+}
+
+WTItemPredicate predicateForPeriod(const std::optional<RZDate::Range>& period) {
+  if (!period) return [](const WTItem*) { return true; };
+  return [bounds = *period](const WTItem* item) { return startsIn(item, bounds); };
+}
+
 std::optional<RZDate::Range> boundsForTag(int tag, std::optional<Date> customBegin,
                                           std::optional<Date> customEnd) {
   if (tag == Custom) {

@@ -48,6 +48,13 @@ Result<std::optional<RZDate::Range>> boundsForRangeWord(const QString& word);
 // The predicate of the items whose dates lie in [bounds[0], bounds[1]], both included.
 WTItemPredicate predicateForBounds(const RZDate::Range& bounds);
 
+// Whether `item` starts in the billing period [period[0], period[1]): the next period's first instant is
+// not in it, so an entry starting at midnight on the 1st is billed in the new month only and consecutive
+// periods never share an item. What is billed (reports, the spreadsheet, the log) takes its items so.
+bool startsIn(const WTItem* item, const RZDate::Range& period);
+// The items that start in `period` (see startsIn); every item when there is none.
+WTItemPredicate predicateForPeriod(const std::optional<RZDate::Range>& period);
+
 // The predicate of a menu tag, read at the present instant (Date::now()). Custom covers the whole of
 // its end day (midnight of `customBegin` to midnight of the day after `customEnd`) and is empty when
 // either date is missing; AnyDate is always true (items without dates too); an unknown tag is empty.

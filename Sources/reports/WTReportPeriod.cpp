@@ -5,6 +5,7 @@
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTProject.h"
+#include "WTRangePredicate.h"
 #include "WTTask.h"
 #include "WTTime.h"
 
@@ -235,8 +236,7 @@ WTReportPeriod::WTReportPeriod(const RZDate::Range& bounds) : bounds_(bounds) {}
 WTReportPeriod::~WTReportPeriod() = default;
 
 bool WTReportPeriod::contains(const WTItem* item) const {
-  const std::optional<Date> start = item->startDate();
-  return start && *start >= bounds_[0] && *start < bounds_[1];
+  return WTRangePredicate::startsIn(item, bounds_);
 }
 
 QList<WTItem*> WTReportPeriod::filtered(const QList<WTItem*>& items) const {

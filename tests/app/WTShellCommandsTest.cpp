@@ -268,7 +268,7 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
     }
   }
   here.expect({"log", "--range", "2026-03-04..2026-03-04"}, 0,
-              "2026-03-04  09:00–10:30  Atlas › Design  01:30  120.00\n"
+              "2026-03-04  09:00–10:30  Atlas › Design  01:30  120.00 USD\n"
               "2026-03-04  11:00–11:30  Zeus › Default Task  00:30");
   EXPECT_TRUE(here.journal().join('\n').contains("importId"));
 }
@@ -276,8 +276,12 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
 TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
   const std::pair<QStringList, std::string> cases[] = {
       // clang-format off
-      {{"log", "--range", "2026-03-03..2026-03-03"}, "2026-03-03  09:00–10:15  Hermes › Review  01:15  125.00\nTotal: 1 entry  01:15  125.00\n"},
-      {{"log", "--range", "2026-03-04..2026-03-05", "--project", "hermes"}, "Total: 0 entries  00:00  0.00\n"},
+      // Each line bills its minutes to the cent and the total is their sum; an entry at midnight is the new day's only.
+      {{"add", "Review", "00:00-00:01", "--date", "2026-03-04"}, "Added Hermes › Review  2026-03-04 00:00–00:01  00:01\n"},
+      {{"add", "Review", "00:01-00:02", "--date", "2026-03-04"}, "Added Hermes › Review  2026-03-04 00:01–00:02  00:01\n"},
+      {{"log", "--range", "2026-03-03..2026-03-03"}, "2026-03-03  09:00–10:15  Hermes › Review  01:15  125.00 USD\nTotal: 1 entry  01:15  125.00 USD\n"},
+      {{"log", "--range", "2026-03-04..2026-03-04"}, "2026-03-04  00:00–00:01  Hermes › Review  00:01  1.67 USD\n2026-03-04  00:01–00:02  Hermes › Review  00:01  1.67 USD\nTotal: 2 entries  00:02  3.34 USD\n"},
+      {{"log", "--range", "2026-03-05..2026-03-05", "--project", "hermes"}, "Total: 0 entries  00:00  0.00 USD\n"},
       {{"list", "tasks"}, "Build \"it\" now\nDesign\nReview\n"},
       {{"list", "tasks", "--project", "HERMES"}, "Design\nReview\n"},
       {{"list", "tasks", "--client", "acme"}, "Build \"it\" now\nDesign\n"},
@@ -363,7 +367,7 @@ class ReportCommand : public ::testing::Test {
     WTProject* beacon = project(*context, "Beacon", acme);
     project(*context, "atlas", other);
     WTTask* design = task(*context, atlas, "Design \"v2\", final");
-    addTime(*context, design, berlin(3, 3, 0, 30), berlin(3, 3, 2));       // 90 minutes: 120.00
+    addTime(*context, design, berlin(3, 3, 0), berlin(3, 3, 1, 30));       // 90 minutes: 120.00
     addTime(*context, design, berlin(3, 3, 23, 30), berlin(3, 4, 0, 15));  // 45 minutes: 60.00
     addTime(*context, task(*context, beacon, "Build"), berlin(3, 4, 10), berlin(3, 4, 11));
     ASSERT_TRUE(context->save());
@@ -416,6 +420,10 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
       << sheet.out.toStdString();
   here.expect({"export", "--format", "spreadsheet", "--out", file}, 0, "");
   EXPECT_EQ(fileBytes(file), sheet.out.toUtf8());
+  // What is billed takes a billing period: the entry at midnight on 3 March is not the 2nd's.
+  EXPECT_EQ(
+      here.out({"export", "--format", "spreadsheet", "--range", "2026-03-02..2026-03-02"}).find("Design"),
+      std::string::npos);
 }
 
 // Names that fit no record or several (1, naming the candidates) and broken templates write nothing.
