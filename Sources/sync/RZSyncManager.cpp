@@ -81,11 +81,13 @@ RZSyncManager::RZSyncManager(WTObjectContext* context, QObject* parent)
   connect(&timer_, &QTimer::timeout, this, &RZSyncManager::sync);
   network_->setUrl(configuredEndpoint());
 
-  // One identity per installation, kept with the user's settings.
+  // One identity per installation, kept with the user's settings. A store that never synced has sent
+  // nothing under any identity, so it takes a new one: settings copied from another installation name
+  // that one's, and the server would hold back that installation's records as this one's own.
   QString device;
   if (UserDefaults* defaults = userDefaults()) {
     device = defaults->stringForKey(SettingsKeys::kSyncDevice);
-    if (device.isEmpty()) {
+    if (device.isEmpty() || track_->iteration() == 0) {
       device = QUuid::createUuid().toString(QUuid::WithoutBraces);
       defaults->setValue(SettingsKeys::kSyncDevice, device);
     }

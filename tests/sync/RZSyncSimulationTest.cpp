@@ -516,8 +516,10 @@ TEST_P(RZSyncTwoDevices, ARestoredCopyNeitherResurrectsNorDrops) {
   names.sort();
   EXPECT_EQ(names, QStringList({"Added here", "Added there", "Renamed since"}));
   EXPECT_EQ(snapshot(*here.context), snapshot(*there.context));
-  // A device set up afresh gets the same from the server.
+  // A device set up afresh gets the same from the server, also with settings copied from another device.
   SyncClient fresh(server->address(), Simulation::kUser, Simulation::kPassword);
+  fresh.defaults->setValue("WTSyncDevice", there.defaults->stringForKey("WTSyncDevice"));
+  fresh.reopen();
   ASSERT_TRUE(fresh.syncOnce());
   EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
