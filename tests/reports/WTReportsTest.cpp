@@ -367,6 +367,7 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
   html = WTReportGenerator({billed}, 0).render().html;
   EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 138 % of the budget of 100.00 · 38.47 over</td>")))
       << html.toStdString();
+  EXPECT_EQ(html.count("class=\"budget\""), 2);  // tasks 2 and 3 have none
 }
 
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
