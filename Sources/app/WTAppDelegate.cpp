@@ -95,7 +95,10 @@ WTObjectContext* WTAppDelegate::managedObjectContext() {
 }
 
 void WTAppDelegate::fillNewStore(WTObjectContext& context) {
+  // The first project is the program's, not a step of the user's: Undo must not take it away for good.
+  context.undoManager().disableRegistration();
   WTStoreSetup::fillNewStore(context);
+  context.undoManager().enableRegistration();
 }
 
 WTStopwatchUpdater* WTAppDelegate::startStopwatchUpdater(WTIdleSource* idle, WTTrackingAlertPresenter* presenter,

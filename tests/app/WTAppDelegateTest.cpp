@@ -29,6 +29,7 @@ TEST_F(WTAppDelegateTest, TheFirstRunMakesADefaultProjectThatQuittingKeeps) {
   const QList<WTProject*> projects = window.fetchProjects();
   ASSERT_TRUE(projects.size() == 1 && projects[0]->tasks().size() == 1);
   EXPECT_EQ(projects[0]->name() + " › " + projects[0]->tasks()[0]->name(), "Default Project › Default Task");
+  EXPECT_FALSE(delegate->managedObjectContext()->undoManager().canUndo());  // not the user's step
   EXPECT_EQ(delegate->applicationShouldTerminate(), WTAppDelegate::TerminateReply::TerminateNow);
   EXPECT_FALSE(delegate->managedObjectContext()->hasChanges());
   EXPECT_TRUE(presenter.errors.isEmpty());
