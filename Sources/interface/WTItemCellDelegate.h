@@ -65,8 +65,8 @@ class WTItemCellDelegate : public QStyledItemDelegate {
                  const WTTableCellView& cell) const;
   void paintNotes(QPainter& painter, const QRectF& row, const QModelIndex& index,
                   const WTTableCellView& cell) const;
-  // Whether `line`, a duration or amount editor, holds text that would be refused; if so it is marked
-  // and the reason shown.
+  // Whether `line`, a duration, amount, start or end editor, holds text that would be refused; if so it
+  // is marked and the reason shown.
   bool refuses(QLineEdit* line) const;
   // Whether an event of the outline is held back because the open field refuses its text.
   bool keepsRefusedEdit(const QEvent* event);

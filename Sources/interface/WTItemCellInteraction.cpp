@@ -53,6 +53,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
   auto* editor = new QLineEdit(parent);
   editor->setFrame(false);
   editor->setProperty("field", static_cast<int>(field));
+  editor->setProperty("row", QVariant::fromValue(QPersistentModelIndex(index)));
   if (field == Field::Name) {
     editor->setObjectName(QStringLiteral("nameEditor"));
     QFont font = editor->font();
@@ -302,10 +303,27 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
 }
 
 bool WTItemCellDelegate::refuses(QLineEdit* line) const {
-  const auto field = static_cast<Field>(line->property("field").toInt());
-  if (field != Field::Duration && field != Field::Amount) return false;
-  const QString refusal = WTItemsModel::refusalFor(
-      field == Field::Duration ? WTItemsModel::DurationEditRole : WTItemsModel::AmountEditRole, line->text());
+  int role = 0;
+  switch (static_cast<Field>(line->property("field").toInt())) {
+    case Field::Duration:
+      role = WTItemsModel::DurationEditRole;
+      break;
+    case Field::Amount:
+      role = WTItemsModel::AmountEditRole;
+      break;
+    case Field::Start:
+      role = WTItemsModel::StartTimeEditRole;
+      break;
+    case Field::End:
+      role = WTItemsModel::EndTimeEditRole;
+      break;
+    default:
+      return false;
+  }
+  const QModelIndex row = line->property("row").value<QPersistentModelIndex>();
+  const auto* model = qobject_cast<const WTItemsModel*>(row.model());
+  if (!model) return false;
+  const QString refusal = model->refusalFor(row, role, line->text());
   if (refusal.isEmpty()) return false;
   WTRateField::setRefused(line, refusal);
   if (line->isVisible()) QToolTip::showText(line->mapToGlobal(QPoint(0, line->height())), refusal, line);
@@ -330,7 +348,7 @@ bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
   if (object == view_ || object == viewport_) return keepsRefusedEdit(event);
   auto* line = qobject_cast<QLineEdit*>(object);
   if (line && (event->type() == QEvent::KeyPress || event->type() == QEvent::FocusOut)) {
-    // A duration or amount that is not one stays in its field, as typed, with the reason in view:
+    // A duration, amount or time of day that is not one stays in its field, as typed, with the reason:
     // neither Return, Tab nor leaving the field stores it or throws it away.
     const bool ends = event->type() == QEvent::FocusOut || [&] {
       const int key = static_cast<QKeyEvent*>(event)->key();

@@ -403,6 +403,24 @@ QString WTItemsModel::refusalFor(int role, const QString& text) {
   return refusal;
 }
 
+QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QString& text) const {
+  if (role != StartTimeEditRole && role != EndTimeEditRole) return refusalFor(role, text);
+  const Node* node = checkIndex(index, CheckIndexOption::IndexIsValid) ? nodeOf(index) : nullptr;
+  if (!node || !node->object || node->object->entity() != WTEntity::Time) return {};
+  const auto* time = static_cast<const WTTime*>(node->object);
+  const bool start = role == StartTimeEditRole;
+  const std::optional<Date> day = start ? time->startDate() : time->endDate();
+  if (!day || (!start && time->running())) return {};
+  const std::optional<Date> moved = timeOnDay(*day, text);
+  if (!moved) return tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed());
+  const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
+  if (start && !time->running() && time->endDate() && *moved > *time->endDate())
+    return tr("The start would come after the end (%1).").arg(clock(*time->endDate()));
+  if (!start && time->startDate() && *moved < *time->startDate())
+    return tr("The end would come before the start (%1).").arg(clock(*time->startDate()));
+  return {};
+}
+
 bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int role) {
   if (!checkIndex(index, CheckIndexOption::IndexIsValid)) return false;
   Node* node = nodeOf(index);

@@ -109,6 +109,9 @@ class WTItemsModel : public QAbstractItemModel {
   // Why `text` set under `role` (a duration or an amount) would be refused, for the person who typed
   // it; empty when it would be taken.
   static QString refusalFor(int role, const QString& text);
+  // The same for the row at `index`, which also answers a start or end time of day: one that is not a
+  // time, or that would put the start after the end.
+  QString refusalFor(const QModelIndex& index, int role, const QString& text) const;
   Qt::ItemFlags flags(const QModelIndex& index) const override;
 
   // Drag and drop (WTItemsModelDragAndDrop.cpp).

@@ -86,6 +86,7 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
 TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) {
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 11, 10));
   auto* flat = makeItem<WTFlat>(design, "Review", at(2024, 3, 11, 11));
+  auto* entry = makeItem<WTTime>(design, "Call", at(2024, 3, 11, 0, 30));
   WTPasswordStore passwords(defaults.get(), std::make_unique<MemoryKeychain>());
   WTPreferencesWindowController preferences(defaults.get(), nullptr, &passwords);
   preferences.showWindow();
@@ -130,15 +131,22 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
          const bool refused = typeIntoRow(flat, Field::Duration, text);
          return Outcome{Decimal(std::int64_t(flat->minutes().value_or(-1))), refused};
        }},
+      {"end",  // minutes into the day
+       [&](auto text) {
+         const bool refused = typeIntoRow(entry, Field::End, text);
+         const QTime end = QTime::fromString(span(entry).section(u'-', 1), u"HH:mm");
+         return Outcome{Decimal(std::int64_t(end.msecsSinceStartOfDay() / 60000)), refused};
+       }},
       {"preferences",
        [&](auto text) {
          const bool refused = typedWithReturn(preferences.defaultRateField(), text);
          return Outcome{defaults->decimalForKey("WTDefaultRate"), refused};
        }},
   };
-  // German takes money typed "1.250,5", American refuses it; a duration is taken as "1:15", never as "1.5".
-  for (const char* field : {"project", "client", "budget", "expense", "preferences", "duration"}) {
-    const bool money = std::string(field) != "duration";
+  // German takes money typed "1.250,5", American refuses it; a duration or a time of day is taken as
+  // "1:15", never as "1.5".
+  for (const char* field : {"project", "client", "budget", "expense", "preferences", "duration", "end"}) {
+    const bool money = std::string(field) != "duration" && std::string(field) != "end";
     for (const bool refused : {false, true}) {
       SCOPED_TRACE(std::string(field) + (refused ? " refused" : " taken"));
       const UserLocale user(money && !refused ? "de_DE" : "en_US");
