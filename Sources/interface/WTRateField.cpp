@@ -5,7 +5,9 @@
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTUndoManager.h"
 
+#include <QCoreApplication>
 #include <QDialogButtonBox>
 #include <QLabel>
 #include <QLineEdit>
@@ -55,7 +57,11 @@ bool apply(QLineEdit* field, WTObject* object) {
   const Parsed parsed = parse(field->text());
   setRefused(field, parsed.refusal);
   if (!parsed.valid) return false;
-  if (object->storedRate() != parsed.rate) object->setRate(parsed.rate);
+  if (object->storedRate() != parsed.rate) {
+    const WTUndoManager::NamedStep step(object->context()->undoManager(),
+                                        QCoreApplication::translate("WTRateField", "Change Rate"));
+    object->setRate(parsed.rate);
+  }
   return true;
 }
 

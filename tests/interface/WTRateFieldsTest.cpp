@@ -77,6 +77,7 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   EXPECT_FALSE(WTRateField::isRefused(field) || !field->toolTip().isEmpty());
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), Decimal(7));
+  EXPECT_EQ(context->undoManager().undoActionName(), "Change Rate");
   field->clear();
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), std::nullopt);
