@@ -72,10 +72,21 @@ std::optional<Decimal> sharedRate(const std::vector<const WTImportRow*>& rows, b
   return shared;
 }
 
-// Gives `object` the rate unless it is in force there already; a record the import did not make keeps its
-// own rate, and the rate goes to the level below.
+// The rate a record's own or its owners' stored rates put in force; none where only the preferences or the
+// built-in rate would, which may change after the import and re-bill what it brought.
+std::optional<Decimal> storedRateInForce(const WTObject* object) {
+  if (!object || object->storedRate()) return object ? object->storedRate() : std::nullopt;
+  if (object->entity() == WTEntity::Task)
+    return storedRateInForce(static_cast<const WTTask*>(object)->project());
+  if (object->entity() == WTEntity::Project)
+    return storedRateInForce(static_cast<const WTProject*>(object)->client());
+  return std::nullopt;
+}
+
+// Gives `object` the rate unless a stored rate puts it in force there already; a record the import did
+// not make keeps its own rate, and the rate goes to the level below.
 bool placeRate(WTObject* object, bool made, const Decimal& rate) {
-  if (object->inheritedRate() == rate) return true;
+  if (storedRateInForce(object) == rate) return true;
   if (!made) return false;
   object->setRate(rate);
   return true;

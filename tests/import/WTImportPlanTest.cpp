@@ -142,8 +142,9 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
   EXPECT_EQ(entriesOf(empty), entriesOf(*context));
 }
 
-// Each rate lands on the highest level across which the file keeps it, and nowhere it would be inherited
-// anyway; a client that was there keeps its own rate.
+// Each rate lands on the highest level across which the file keeps it, and nowhere a stored rate would
+// pass it down anyway (Four's 100 is set: the built-in rate may be changed); a client that was there keeps
+// its own rate.
 TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
   auto* five = makeClient(QStringLiteral("Five"));
   five->setRate(Decimal(50));
@@ -177,7 +178,7 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
     }
     rates.append(line);
   }
-  EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four - | G - x -", "One 80 | A - x - | B - y -",
+  EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four 100 | G - x -", "One 80 | A - x - | B - y -",
                                 "Three - | E - x 70 y 60", "Two - | C 80 x - | D 90 x - y -"}));
   EXPECT_EQ(clients[0]->storedRate(), Decimal(50));
   const QStringList currencies = {clients[2]->currency(), clients[4]->currency()};
