@@ -45,10 +45,11 @@ struct Span {
   QTime end;
 };
 
-// "DURATION" ("45", "0:45", "1:30") or "START-END" ("09:00-10:30"); the problem when it is neither.
+// "DURATION" ("45", "0:45", "1:30", as the window takes them also days, "1:00:00") or "START-END"
+// ("09:00-10:30"); the problem when it is neither.
 std::optional<Span> parseSpan(const QString& text, QString& problem) {
   static const QRegularExpression range(QStringLiteral("^(\\d{1,2}:\\d{2})-(\\d{1,2}:\\d{2})$"));
-  static const QRegularExpression duration(QStringLiteral("^\\d{1,4}(:\\d{1,2})?$"));
+  static const QRegularExpression duration(QStringLiteral("^\\d{1,4}(:\\d{1,2}){0,2}$"));
   Span span;
   if (const QRegularExpressionMatch match = range.match(text); match.hasMatch()) {
     span.start = QTime::fromString(match.captured(1), u"H:mm");

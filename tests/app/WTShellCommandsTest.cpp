@@ -206,6 +206,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "Review", "11:00-10:30", "--date", "2026-03-02"}, 1, "would end (10:30) before it starts (11:00)"},
       {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
+      {{"add", "Review", "1:00:00", "--date", tomorrow}, 1, "is not over yet"},  // a day, read as a duration
       {{"add", "Review", "12:00-12:30", "--date", "yesterday"}, 0, "Added Hermes › Review  " + yesterday + " 12:00–12:30  00:30\n"},
       {{"add", "Design", "0:30"}, 1, "2 tasks are named “Design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"},
       {{"add", "Design", "45", "--project", "Atlas"}, 0, "Added Atlas › Design  "},
