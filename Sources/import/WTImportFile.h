@@ -55,6 +55,9 @@ struct WTImportFile {
       ++moreProblems;
   }
   qint64 problemCount() const { return qint64(problems.size()) + moreProblems; }
+  // Rows of a kind that is not imported (the flat fees and expenses of Tessal's own file), with their
+  // line and kind: told, so that nothing is left out unseen, but no reason to refuse the file.
+  std::vector<WTImportProblem> leftOut;
   QString mapping;  // how the format's fields were placed, when that is a choice worth telling
 };
 

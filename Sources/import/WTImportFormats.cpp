@@ -327,17 +327,18 @@ class ZoneDays {
   QHash<qint64, std::optional<int>> offsets_;
 };
 
-// One CSV record as an entry, or the reason it is none.
+// One CSV record as an entry, or the reason it is none; `leftOut` when that reason is its kind alone.
 std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& header,
                                       const QStringList& fields, const Options& options, ZoneDays& days,
-                                      QString& problem) {
+                                      QString& problem, bool& leftOut) {
   const auto value = [&](const char* name) {
     const qsizetype column = header.column(name);
     return column >= 0 && column < fields.size() ? fields[column].trimmed() : QString();
   };
   WTImportRow row;
   if (format.kind[0] && !value(format.kind).isEmpty() && value(format.kind) != u"time") {
-    problem = QStringLiteral("only time entries are imported, not a %1").arg(value(format.kind));
+    problem = value(format.kind);
+    leftOut = true;
     return std::nullopt;
   }
   // Tessal's own file writes text a spreadsheet would take for a formula behind an apostrophe.
@@ -460,9 +461,13 @@ Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
     if (next == WTCSVReader::Status::Failed) return Error{1, reader.error()};
     if (next == WTCSVReader::Status::End) break;
     QString problem;
-    if (std::optional<WTImportRow> row = readRecord(*format, header, fields, options, days, problem)) {
+    bool leftOut = false;
+    if (std::optional<WTImportRow> row =
+            readRecord(*format, header, fields, options, days, problem, leftOut)) {
       row->line = reader.line();
       file.rows.push_back(std::move(*row));
+    } else if (leftOut) {
+      file.leftOut.push_back({reader.line(), problem});
     } else {
       file.addProblem(reader.line(), problem);
     }

@@ -13,6 +13,7 @@
 #include <QSet>
 #include <QTimeZone>
 
+#include <algorithm>
 #include <map>
 
 namespace WTImport {
@@ -327,6 +328,15 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
           QStringLiteral("  line %1: %2, since %3\n")
               .arg(row->line)
               .arg(taskLabel(*row), row->start.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd HH:mm"));
+  }
+  if (!file.leftOut.empty()) {
+    constexpr size_t kListed = 20;
+    out += QStringLiteral("Left out, as only time entries are imported: %1\n")
+               .arg(counted(int(file.leftOut.size()), "row", "rows"));
+    for (size_t i = 0; i < std::min(kListed, file.leftOut.size()); ++i)
+      out += QStringLiteral("  line %1: %2\n").arg(file.leftOut[i].line).arg(file.leftOut[i].reason);
+    if (file.leftOut.size() > kListed)
+      out += QStringLiteral("  and %1 more\n").arg(file.leftOut.size() - kListed);
   }
   if (!file.problems.empty()) {
     out += QStringLiteral("Rows that cannot be read:\n");

@@ -245,6 +245,11 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
       here.file("good.csv", header +
                                 "ACME,atlas,design,Sketch,Yes,2026-03-04,09:00,1:30:00\n"
                                 ",Zeus,,\"Plan, \"\"big\"\"\",No,2026-03-04,11:00,0:30:00\n");
+  const QString sheet = here.file("sheet.csv",
+                                  "client,project,task,kind,name,date,start,end,duration,billed "
+                                  "duration,rate,amount,currency,notes\n"
+                                  "Acme,Atlas,Design,time,Sketch,2026-03-06,09:00,10:00,,,,,,\n"
+                                  "Acme,Atlas,Design,expense,Train,2026-03-06,,,,,,45.60,EUR,\n");
   const QString bad = here.file("bad.csv", header +
                                                ",Zeus,,Early,Yes,2026-03-05,08:00,1:00:00\n"
                                                ",Zeus,,Late,Yes,2026-03-05,25:00,1:00:00\n");
@@ -256,6 +261,7 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
       // clang-format off
       {{"import", good, "--dry-run"}, 0, "A toggl file\nNew: 0 clients, 1 project, 1 task, 2 entries\nFound: 1 client, 1 project, 1 task\nAlready there: 0 entries\n  ACME  01:30\n  (no client)  00:30\nNothing was changed (--dry-run)\n"},
       {{"import", bad}, 1, "tessal: " + bad + ": 1 row cannot be read; nothing was imported\n"},
+      {{"import", sheet, "--dry-run"}, 0, "Left out, as only time entries are imported: 1 row\n  line 3: expense\n"},
       {{"import", here.path("missing.csv")}, 1, "cannot read " + here.path("missing.csv")},
       {{"import", good}, 0, "Imported 2 entries\n"},
       {{"import", good}, 0, "Already there: 2 entries\n"},

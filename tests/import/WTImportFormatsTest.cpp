@@ -48,6 +48,8 @@ TEST_P(ImportSampleTest, ReadsEveryAwkwardCase) {
   for (const WTImportRow& row : read.value().rows) rows.append(summary(row));
   for (const WTImportProblem& problem : read.value().problems)
     problems.append(QStringLiteral("%1: %2").arg(problem.line).arg(problem.reason));
+  for (const WTImportProblem& row : read.value().leftOut)
+    problems.append(QStringLiteral("%1: left out, a %2").arg(row.line).arg(row.reason));
   EXPECT_EQ(rows, sample.rows);
   EXPECT_EQ(problems, sample.problems);
 }
@@ -91,7 +93,7 @@ INSTANTIATE_TEST_SUITE_P(
         Sample{"tessal.csv", "", "Europe/Berlin", {}, "tessal",
                {"2 Acme/Website/Design|Late, late|2024-03-30T22:30:00Z|90|50.00 EUR|billable||two\nlines",
                 "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||"},
-               {"4: only time entries are imported, not a flat fee"}}));
+               {"4: left out, a flat fee"}}));
 // clang-format on
 
 struct Refusal {
