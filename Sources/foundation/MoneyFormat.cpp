@@ -118,8 +118,9 @@ QString format(const Decimal& amount) {
   return formatter.format(amount);
 }
 
-QString format(const Decimal& amount, const QString& currency) {
-  const int places = minorUnitDigits(currency);
+namespace {
+
+QString formatWithPlaces(const Decimal& amount, int places) {
   if (places == 2) return format(amount);
   // Made once per number of places, in the default locale of their first use.
   static const std::array<Formatter, 5> formatters = {
@@ -128,6 +129,18 @@ QString format(const Decimal& amount, const QString& currency) {
       Formatter(icu::Locale::getDefault(), 4)};
   if (places < int(formatters.size())) return formatters[size_t(places)].format(amount);
   return Formatter(icu::Locale::getDefault(), places).format(amount);
+}
+
+}  // namespace
+
+QString format(const Decimal& amount, const QString& currency) {
+  return formatWithPlaces(amount, minorUnitDigits(currency));
+}
+
+QString formatRate(const Decimal& rate, const QString& currency) {
+  int places = minorUnitDigits(currency);
+  while (places < 6 && rate.rounded(places) != rate) ++places;
+  return formatWithPlaces(rate, places);
 }
 
 QString format(const Decimal& amount, const QString& currency, const icu::Locale& locale) {

@@ -19,6 +19,9 @@ inline QString format(const Decimal& amount, const char* currency) {
 }
 // The same in `locale`.
 QString format(const Decimal& amount, const QString& currency, const icu::Locale& locale);
+// A rate for people: in the places of `currency`'s minor unit, and more where the rate has them (85.50 yen
+// an hour is "85.5", not a rounded "86" that the billed amounts would not follow), up to six.
+QString formatRate(const Decimal& rate, const QString& currency);
 // How many places a currency (ISO 4217 code) bills to, as ICU knows it; 2 for a code it does not know.
 int minorUnitDigits(const QString& currency);
 // The currency of the user's locale (its ISO 4217 code); "USD" where the locale names none.

@@ -191,7 +191,7 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
         const auto* client = static_cast<const WTClient*>(object);
         const auto count = client->projects().size();
         const QString projects = count == 1 ? tr("1 project") : tr("%1 projects").arg(count);
-        const QString rate = MoneyFormat::format(object->inheritedRate(), client->billingCurrency());
+        const QString rate = MoneyFormat::formatRate(object->inheritedRate(), client->billingCurrency());
         if (client->currency().isEmpty()) return tr("%1 · %2 an hour").arg(projects, rate);
         return tr("%1 · %2 %3 an hour").arg(projects, rate, client->currency());
       }

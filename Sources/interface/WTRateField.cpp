@@ -24,7 +24,7 @@ const char* const kRefusedProperty = "rateRefused";
 QString placeholder(const WTObject* object) {
   // In the places of the currency the record bills in (every client, project and task answers it).
   const QString currency = object->valueForKey(QStringLiteral("billingCurrency")).toString();
-  return QObject::tr("Inherited: %1").arg(MoneyFormat::format(object->rateFromAbove(), currency));
+  return QObject::tr("Inherited: %1").arg(MoneyFormat::formatRate(object->rateFromAbove(), currency));
 }
 
 Parsed parse(const QString& typed) {

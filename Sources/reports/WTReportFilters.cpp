@@ -44,11 +44,12 @@ bool isCurrencyCode(const QString& text) {
 }  // namespace
 
 QStringList WTMoneyFilter::filters() const {
-  return {QStringLiteral("money")};
+  return {QStringLiteral("money"), QStringLiteral("rate")};
 }
 
 QVariant WTMoneyFilter::filterInvoked(const QString& filter, const QStringList& args, const QVariant& value) {
-  if (filter != QLatin1String("money")) return {};
+  const bool rate = filter == QLatin1String("rate");
+  if (!rate && filter != QLatin1String("money")) return {};
   const std::optional<Decimal> amount = number(value);
   if (!amount) return {};
   QString currency;
@@ -56,5 +57,7 @@ QVariant WTMoneyFilter::filterInvoked(const QString& filter, const QStringList& 
     const QVariant named = engine_ ? engine_->valueForVariable(args.first()) : QVariant();
     currency = GXTemplateValue::isNil(named) ? args.first() : GXTemplateValue::description(named);
   }
-  return isCurrencyCode(currency) ? MoneyFormat::format(*amount, currency) : MoneyFormat::format(*amount);
+  if (!isCurrencyCode(currency)) currency.clear();
+  if (rate) return MoneyFormat::formatRate(*amount, currency);
+  return currency.isEmpty() ? MoneyFormat::format(*amount) : MoneyFormat::format(*amount, currency);
 }

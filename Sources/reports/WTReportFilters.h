@@ -18,8 +18,9 @@ class GXTemplateEngine;
 // unit (none for JPY, three for KWD) and no sign. CURRENCY is the key path of a variable of the run
 // (`{{ task.billedCost | money: task.billingCurrency }}`) or an ISO 4217 code as written (`money: EUR`);
 // without one, or when the variable has no value, the amount gets two places, as "decimal" writes it.
-// Anything but a number gives no value. Loaded on each engine that renders a report; the engine must
-// outlive the filter's use.
+// "rate: CURRENCY" writes a rate the same way, with more places where the rate has them (85.5 yen, not
+// 86). Anything but a number gives no value. Loaded on each engine that renders a report; the engine
+// must outlive the filter's use.
 class WTMoneyFilter : public GXTemplateFilter {
  public:
   explicit WTMoneyFilter(GXTemplateEngine* engine) : engine_(engine) {}

@@ -56,6 +56,11 @@ TEST_F(WTReportFiltersTest, MoneyWritesAnAmountInTheMinorUnitOfItsCurrency) {
     EXPECT_EQ(filter.filterInvoked(QStringLiteral("money"), c.args, c.value),
               c.text ? QVariant(QString::fromUtf8(c.text)) : QVariant())
         << c.value.toString().toStdString() << " " << c.args.join(' ').toStdString();
+  // A rate keeps the places it has beyond the currency's: the yen's 85.5, a cent's fraction.
+  const QStringList rates = {filter.filterInvoked("rate", {"currency"}, dec("85.50")).toString(),
+                             filter.filterInvoked("rate", {"EUR"}, dec("12.345")).toString(),
+                             filter.filterInvoked("rate", {"KWD"}, dec("2")).toString()};
+  EXPECT_EQ(rates, QStringList({"85.5", "12.345", "2.000"}));
 }
 
 }  // namespace
