@@ -256,11 +256,13 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
                         : time->endDate() ? time->endDate()->toQDateTime().toLocalTime().toString(u"HH:mm")
                                           : QStringLiteral("     ");
     const QString task = time->task() ? WTNamedRecords::label(*time->task()) : QStringLiteral("(no task)");
+    const Decimal amount = time->billedCost();
+    const QString currency = time->billingCurrency();
     out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         "))
         << "–" << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
-        << money(time->billedCost(), time->billingCurrency()) << '\n';
+        << money(amount, currency) << '\n';
     minutes += time->duration();
-    billed[time->billingCurrency()] += time->billedCost();
+    billed[currency] += amount;
   }
   if (billed.isEmpty()) billed[context.billingDefaults().currency] = Decimal();
   QStringList totals;

@@ -20,6 +20,28 @@
 // What a row of the items outline answers to: its editors, the tips of its parts and the clicks on its
 // buttons.
 
+namespace {
+
+// The model role an editor's text is stored, and checked, under: that of the field it was opened on.
+int editRole(const QWidget* editor) {
+  switch (static_cast<WTItemCellDelegate::Field>(editor->property("field").toInt())) {
+    case WTItemCellDelegate::Field::Duration:
+      return WTItemsModel::DurationEditRole;
+    case WTItemCellDelegate::Field::SpentDuration:
+      return WTItemsModel::SpentDurationEditRole;
+    case WTItemCellDelegate::Field::Start:
+      return WTItemsModel::StartTimeEditRole;
+    case WTItemCellDelegate::Field::End:
+      return WTItemsModel::EndTimeEditRole;
+    case WTItemCellDelegate::Field::Amount:
+      return WTItemsModel::AmountEditRole;
+    default:
+      return WTItemsModel::NameRole;
+  }
+}
+
+}  // namespace
+
 QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionViewItem&,
                                           const QModelIndex& index) const {
   const auto* model = static_cast<const WTItemsModel*>(index.model());
@@ -129,27 +151,7 @@ void WTItemCellDelegate::setModelData(QWidget* editor, QAbstractItemModel* model
     model->setData(index, notes->toPlainText(), WTItemsModel::NotesRole);
     return;
   }
-  auto* line = static_cast<QLineEdit*>(editor);
-  switch (static_cast<Field>(editor->property("field").toInt())) {
-    case Field::Duration:
-      model->setData(index, line->text(), WTItemsModel::DurationEditRole);
-      break;
-    case Field::SpentDuration:
-      model->setData(index, line->text(), WTItemsModel::SpentDurationEditRole);
-      break;
-    case Field::End:
-      model->setData(index, line->text(), WTItemsModel::EndTimeEditRole);
-      break;
-    case Field::Amount:
-      model->setData(index, line->text(), WTItemsModel::AmountEditRole);
-      break;
-    case Field::Start:
-      model->setData(index, line->text(), WTItemsModel::StartTimeEditRole);
-      break;
-    default:
-      model->setData(index, line->text(), WTItemsModel::NameRole);
-      break;
-  }
+  model->setData(index, static_cast<QLineEdit*>(editor)->text(), editRole(editor));
 }
 
 void WTItemCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptionViewItem& option,
@@ -303,27 +305,10 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
 }
 
 bool WTItemCellDelegate::refuses(QLineEdit* line) const {
-  int role = 0;
-  switch (static_cast<Field>(line->property("field").toInt())) {
-    case Field::Duration:
-      role = WTItemsModel::DurationEditRole;
-      break;
-    case Field::Amount:
-      role = WTItemsModel::AmountEditRole;
-      break;
-    case Field::Start:
-      role = WTItemsModel::StartTimeEditRole;
-      break;
-    case Field::End:
-      role = WTItemsModel::EndTimeEditRole;
-      break;
-    default:
-      return false;
-  }
   const QModelIndex row = line->property("row").value<QPersistentModelIndex>();
   const auto* model = qobject_cast<const WTItemsModel*>(row.model());
   if (!model) return false;
-  const QString refusal = model->refusalFor(row, role, line->text());
+  const QString refusal = model->refusalFor(row, editRole(line), line->text());
   if (refusal.isEmpty()) return false;
   WTRateField::setRefused(line, refusal);
   if (line->isVisible()) QToolTip::showText(line->mapToGlobal(QPoint(0, line->height())), refusal, line);

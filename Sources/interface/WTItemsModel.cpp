@@ -455,27 +455,18 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
       }
       return false;
     }
-    case StartTimeEditRole: {
-      if (object->entity() != WTEntity::Time) return false;
-      auto* time = static_cast<WTTime*>(object);
-      const std::optional<Date> start = time->startDate();
-      const std::optional<Date> moved = start ? timeOnDay(*start, value.toString()) : std::nullopt;
-      // Only the beginning moves: the end stays, so a start after it is refused.
-      if (!moved || (!time->running() && time->endDate() && *moved > *time->endDate())) return false;
-      if (*moved == *start) return false;
-      time->setStartDate(moved);
-      return true;
-    }
+    case StartTimeEditRole:
     case EndTimeEditRole: {
-      if (object->entity() != WTEntity::Time) return false;
+      // Only the one end moves and the other stays: what refusalFor refuses changes nothing.
+      if (object->entity() != WTEntity::Time || !refusalFor(index, role, value.toString()).isEmpty())
+        return false;
       auto* time = static_cast<WTTime*>(object);
-      const std::optional<Date> end = time->endDate();
-      if (time->running() || !end) return false;
-      const std::optional<Date> moved = timeOnDay(*end, value.toString());
-      // Only the end moves: the start stays, so an end before it is refused.
-      if (!moved || (time->startDate() && *moved < *time->startDate())) return false;
-      if (*moved == RZDate::beginOfMinute(*end)) return false;
-      time->setEndDate(moved);
+      const bool start = role == StartTimeEditRole;
+      const std::optional<Date> day = start ? time->startDate() : time->endDate();
+      if (!day || (!start && time->running())) return false;
+      const std::optional<Date> moved = timeOnDay(*day, value.toString());
+      if (*moved == (start ? *day : RZDate::beginOfMinute(*day))) return false;
+      start ? time->setStartDate(moved) : time->setEndDate(moved);
       return true;
     }
     case SpentDurationEditRole: {

@@ -71,4 +71,9 @@ QString standing(const WTObject* object) {
       .arg(percent, MoneyFormat::format(*limit, currency), rest);
 }
 
+QVariant reportedStanding(const WTObject* object) {
+  const QString text = standing(object);
+  return text.isEmpty() ? QVariant() : QVariant(text);
+}
+
 }  // namespace WTBudget

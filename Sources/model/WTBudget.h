@@ -3,6 +3,7 @@
 #include "Decimal.h"
 
 #include <QString>
+#include <QVariant>
 
 #include <optional>
 
@@ -31,5 +32,8 @@ std::optional<Decimal> budget(const WTObject* object);
 // Where `object` stands, for people: "72 % of the budget of 1,000.00 · 280.00 left" ("… · 40.00 over"
 // past it); empty without a budget.
 QString standing(const WTObject* object);
+// The same as a report's "budgetStanding": no value at all without a budget, since an empty text would
+// pass a template's "if".
+QVariant reportedStanding(const WTObject* object);
 
 }  // namespace WTBudget

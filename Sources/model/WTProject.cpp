@@ -39,13 +39,9 @@ const WTKeyTable& WTProject::keys() {
                  {"roundingMinutes", "roundingMode", "client", "client.roundingRule"}),
           derived<&WTProject::billingCurrency>("billingCurrency", {"client", "client.billingCurrency"}),
           derived<&WTProject::billedDuration>("billedDuration", {"duration", "roundingRule"}),
-          // Where the billed cost stands against the budget, for a report: none without a budget (an
-          // empty text would pass a template's "if").
+          // Where the billed cost stands against the budget, for a report: none without a budget.
           derived("budgetStanding", WTKeyType::Text,
-                  [](const WTObject& object) {
-                    const QString standing = WTBudget::standing(&object);
-                    return standing.isEmpty() ? QVariant() : QVariant(standing);
-                  },
+                  [](const WTObject& object) { return WTBudget::reportedStanding(&object); },
                   {"budget", "billedCost"}),
           derived<&WTProject::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
       });

@@ -78,13 +78,9 @@ const WTKeyTable& WTTask::keys() {
                  {"roundingMinutes", "roundingMode", "project", "project.roundingRule"}),
           derived<&WTTask::billingCurrency>("billingCurrency", {"project", "project.billingCurrency"}),
           derived<&WTTask::billedDuration>("billedDuration", {"duration", "roundingRule"}),
-          // Where the billed cost stands against the budget, for a report: none without a budget (an
-          // empty text would pass a template's "if").
+          // Where the billed cost stands against the budget, for a report: none without a budget.
           derived("budgetStanding", WTKeyType::Text,
-                  [](const WTObject& object) {
-                    const QString standing = WTBudget::standing(&object);
-                    return standing.isEmpty() ? QVariant() : QVariant(standing);
-                  },
+                  [](const WTObject& object) { return WTBudget::reportedStanding(&object); },
                   {"budget", "billedCost"}),
           derived<&WTTask::billedCost>("billedCost", {"cost", "billedDuration", "billingCurrency"}),
           // The time-entry export reads a task's "title": it is the task's name.
