@@ -233,6 +233,12 @@ WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const
       arguments.day.date.isValid() ? arguments.day.date : here.date().addDays(-arguments.day.daysBack);
   Date start, end;
   if (arguments.span.start.isValid()) {
+    // A time the clocks skip on that day would otherwise be moved by the zone's shift, unseen.
+    for (const QTime& typed : {arguments.span.start, arguments.span.end}) {
+      if (const QDateTime at(day, typed, zone); !at.isValid() || at.time() != typed)
+        return failure(QStringLiteral("there is no %1 on %2 here: the clocks go forward then")
+                           .arg(typed.toString(u"HH:mm"), day.toString(Qt::ISODate)));
+    }
     start = Date::fromQDateTime(QDateTime(day, arguments.span.start, zone));
     end = Date::fromQDateTime(QDateTime(day, arguments.span.end, zone));
     if (end < start)

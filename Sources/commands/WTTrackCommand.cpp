@@ -196,8 +196,20 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     return (!byProject || named(project, parser.value(QStringLiteral("project")))) &&
            (!byClient || (project && named(project->client(), parser.value(QStringLiteral("client")))));
   };
-  QStringList names;
   const WTObjectContext& context = snapshot->context();
+  // A filter that names nothing is a mistake to say, not an empty list (completion drops what it says).
+  const auto unknown = [&](const auto& records, const QString& option, const auto& find) {
+    if (!parser.isSet(option)) return false;
+    const QString name = parser.value(option);
+    const auto isNamed = [&](const WTObject* record) { return named(record, name); };
+    if (std::any_of(records.begin(), records.end(), isNamed)) return false;
+    err << "tessal: " << find(context, name).error().message << '\n';
+    return true;
+  };
+  if (unknown(context.fetch<WTProject>(), QStringLiteral("project"), WTNamedRecords::project) ||
+      unknown(context.fetch<WTClient>(), QStringLiteral("client"), WTNamedRecords::client))
+    return 1;
+  QStringList names;
   if (kind == QLatin1String("tasks")) {
     // Qualified, every task has a name of its own that start and stop take back: what a picker needs.
     const bool qualified = parser.isSet(QStringLiteral("qualified"));

@@ -204,6 +204,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "review", "10:15-11:00", "--date", "2026-03-03", "--note", "Call"}, 0, "Added Hermes › Review  2026-03-03 10:15–11:00  00:45\n"},
       {{"add", "Review", "8:30-9:01", "--date", "2026-03-03"}, 1, "the entry 2026-03-03 08:30–09:01 overlaps the entry 2026-03-03 09:00–10:15 of Hermes › Review"},
       {{"add", "Review", "11:00-10:30", "--date", "2026-03-02"}, 1, "would end (10:30) before it starts (11:00)"},
+      {{"add", "Review", "02:30-03:15", "--date", "2026-03-29"}, 1, "there is no 02:30 on 2026-03-29 here: the clocks go forward then"},
       {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00:00", "--date", tomorrow}, 1, "is not over yet"},  // a day, read as a duration
@@ -220,6 +221,8 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "Atlas › Plan", "0:10", "--date", "2026-03-04", "--create"}, 0, "Created task Atlas › Plan\nAdded Atlas › Plan  "},
       {{"start", "Design", "--create"}, 1, "2 tasks are named “Design”"},
       {{"log", "--project", "nowhere"}, 1, "no project is named “nowhere”"},
+      {{"list", "tasks", "--project", "nowhere"}, 1, "no project is named “nowhere”"},
+      {{"list", "projects", "--client", "nobody"}, 1, "no client is named “nobody”"},
       // clang-format on
   };
   for (const auto& c : cases) here.expect(c.arguments, c.code, c.says);
