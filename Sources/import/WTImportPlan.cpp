@@ -227,6 +227,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
     const qint64 minutes = minutesOf(row->start, *row->end);
     client.total.minutes += minutes;
     client.total.priced = client.total.priced || (row->billable && row->rate);
+    if (!row->billable) client.total.notBillable += minutes;
     if (row->billable && row->rate)
       client.total.money +=
           Decimal::divide(*row->rate * Decimal(std::int64_t(minutes)), Decimal(60)).value_or(Decimal());
@@ -317,6 +318,11 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
       out += QStringLiteral("  %1%2").arg(
           total.money.rounded(2).toString(),
           total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
+    }
+    // The file's money leaves that time out; what Tessal bills for it is not the file's to say.
+    if (total.notBillable > 0) {
+      out += QStringLiteral("; %1 of it marked not billable, which Tessal bills as well")
+                 .arg(DurationText::stringWithMinutes(int(total.notBillable)));
     }
     out += QLatin1Char('\n');
   }

@@ -25,7 +25,8 @@ struct WTImportPlan {
     QString client;
     qint64 minutes = 0;
     Decimal money;
-    bool priced = false;  // whether the file gives a rate for any of the client's entries
+    bool priced = false;     // whether the file gives a rate for any of the client's entries
+    qint64 notBillable = 0;  // minutes the file marks not billable, which Tessal bills like the others
     QString currency;
   };
   std::vector<ClientTotal> totals;  // in the order of the file

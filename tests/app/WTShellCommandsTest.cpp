@@ -262,7 +262,7 @@ TEST_F(TrackCommand, ImportsAFileOnceAndAllOrNothing) {
     QString says;
   } cases[] = {
       // clang-format off
-      {{"import", good, "--dry-run"}, 0, "A toggl file\nNew: 0 clients, 1 project, 1 task, 2 entries\nFound: 1 client, 1 project, 1 task\nAlready there: 0 entries\n  ACME  01:30\n  (no client)  00:30\nNothing was changed (--dry-run)\n"},
+      {{"import", good, "--dry-run"}, 0, "A toggl file\nNew: 0 clients, 1 project, 1 task, 2 entries\nFound: 1 client, 1 project, 1 task\nAlready there: 0 entries\n  ACME  01:30\n  (no client)  00:30; 00:30 of it marked not billable, which Tessal bills as well\nNothing was changed (--dry-run)\n"},
       {{"import", bad}, 1, "tessal: " + bad + ": 1 row cannot be read; nothing was imported\n"},
       {{"import", sheet, "--dry-run"}, 0, "Left out, as only time entries are imported: 1 row\n  line 3: expense\n"},
       {{"import", here.path("missing.csv")}, 1, "cannot read " + here.path("missing.csv")},
