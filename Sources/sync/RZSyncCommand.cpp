@@ -7,16 +7,21 @@
 
 int runSyncCommand(RZSyncManager& manager, const QStringList& arguments, QTextStream& out, QTextStream& err) {
   int timeoutSeconds = 120;
-  for (qsizetype i = 0; i < arguments.size(); ++i) {
+  QString problem;
+  for (qsizetype i = 0; problem.isEmpty() && i < arguments.size(); ++i) {
+    if (arguments[i] != QLatin1String("--timeout")) {
+      problem = QStringLiteral("unexpected “%1”").arg(arguments[i]);
+      continue;
+    }
     bool ok = false;
-    if (arguments[i] == QLatin1String("--timeout") && i + 1 < arguments.size()) {
-      timeoutSeconds = arguments[++i].toInt(&ok);
-    }
-    if (!ok || timeoutSeconds < 1) {
-      err << "usage: tessal sync [--timeout SECONDS]\n";
-      err.flush();
-      return 2;
-    }
+    timeoutSeconds = i + 1 < arguments.size() ? arguments[++i].toInt(&ok) : 0;
+    if (!ok || timeoutSeconds < 1)
+      problem = QStringLiteral("--timeout takes a whole number of seconds, 1 or more");
+  }
+  if (!problem.isEmpty()) {
+    err << "tessal: " << problem << "\nusage: tessal sync [--timeout SECONDS]\n";
+    err.flush();
+    return 2;
   }
 
   RZSyncNetwork& network = *manager.syncNetwork();
@@ -49,7 +54,8 @@ int runSyncCommand(RZSyncManager& manager, const QStringList& arguments, QTextSt
           case RZSyncExchange::Outcome::Refused:
             return stop(1, QStringLiteral("The server refused: %1").arg(exchange.message));
           case RZSyncExchange::Outcome::Failed:
-            return stop(1, QStringLiteral("Sync failed: %1").arg(exchange.message));
+            return stop(1,
+                        QStringLiteral("Sync with %1 failed: %2").arg(endpoint.toString(), exchange.message));
           case RZSyncExchange::Outcome::Answered:
             break;
         }

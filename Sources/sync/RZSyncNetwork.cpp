@@ -109,7 +109,8 @@ void RZSyncNetwork::replyFinished() {
   const bool answered = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).isValid();
   if (reply->error() != QNetworkReply::NoError && !answered) {
     const QString error = reply->errorString();
-    qCWarning(lcSync).noquote() << QStringLiteral("Connection failed: %1").arg(error);
+    // The delegate says it where a person sees it; the log keeps the detail only for debugging.
+    qCDebug(lcSync).noquote() << QStringLiteral("Connection failed: %1").arg(error);
     responseData_.clear();
     if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);
     return;

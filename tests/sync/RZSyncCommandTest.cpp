@@ -44,20 +44,20 @@ TEST(RZSyncCommand, FailsWithAMessage) {
     QByteArray answer;  // empty: never answers
     QStringList arguments;
     QString server, user;
-    const char* result;  // the start of what run() gives
+    std::string result;  // the start of what run() gives
   } rows[] = {
       // clang-format off
       {errorReply("Wrong e-mail address or password.", 2), {}, server.address(), "ann",
        "1 |  | The server refused: Wrong e-mail address or password. - (Code: 2)"},
       {LoopbackHttpServer::raw("Bad gateway", 502, "text/plain"), {}, server.address(), "ann",
-       "1 |  | Sync failed: "},
+       "1 |  | Sync with " + server.url().toString().toStdString() + " failed: "},
       {QByteArray(), {"--timeout", "1"}, server.address(), "ann",
        "1 |  | Not in step with the server after 1 seconds."},
       {QByteArray(), {}, "", "ann", "1 |  | "},  // the message names the missing setting
       {QByteArray(), {}, server.address(), "  ", "1 |  | "},
-      {QByteArray(), {"--timeout"}, server.address(), "ann", "2 |  | "},
-      {QByteArray(), {"--timeout", "0"}, server.address(), "ann", "2 |  | "},
-      {QByteArray(), {"now"}, server.address(), "ann", "2 |  | "},
+      {QByteArray(), {"--timeout"}, server.address(), "ann", "2 |  | tessal: --timeout takes a whole number"},
+      {QByteArray(), {"--timeout", "0"}, server.address(), "ann", "2 |  | tessal: --timeout takes a whole number"},
+      {QByteArray(), {"now"}, server.address(), "ann", "2 |  | tessal: unexpected “now”\nusage: "},
       // clang-format on
   };
   for (const auto& row : rows) {
@@ -65,7 +65,7 @@ TEST(RZSyncCommand, FailsWithAMessage) {
     SyncClient client(row.server, row.user);
     const qsizetype before = server.requests.size();
     const std::string result = run(client, row.arguments);
-    EXPECT_EQ(result.substr(0, strlen(row.result)), row.result) << result;
+    EXPECT_EQ(result.substr(0, row.result.size()), row.result) << result;
     EXPECT_TRUE(row.server.isEmpty() == (result.find("\"WTSyncServer\"") != std::string::npos)) << result;
     EXPECT_TRUE((row.user == "  ") == (result.find("\"WTSyncUser\"") != std::string::npos)) << result;
     EXPECT_EQ(server.requests.size() > before, &row < rows + 3) << result;  // only the first rows get as far
