@@ -194,9 +194,14 @@ class Scanner {
   qsizetype at_ = 0;
 };
 
-// "2024-03-10", "10.03.2024" or "10-03-2024" (day first), "03/10/2024" (month first, as the hosted
-// trackers' American default writes it; a first number past 12 can only be a day).
-std::optional<QDate> parseDate(const QString& text) {
+// How a file writes dates with slashes: month first, as the hosted trackers' American default does, or
+// day first, as the rest of the world does.
+enum class SlashedDates { MonthFirst, DayFirst };
+
+// "2024-03-10", "10.03.2024" or "10-03-2024" (day first), "03/10/2024" (as `slashed` says; unless
+// `strictly`, a date that reads only the other way round is read that way: 25/04/2024 is day first).
+std::optional<QDate> parseDate(const QString& text, SlashedDates slashed = SlashedDates::MonthFirst,
+                               bool strictly = false) {
   Scanner scan(text);
   QDate date;
   if (const auto year = scan.number(4, 4)) {
@@ -206,14 +211,14 @@ std::optional<QDate> parseDate(const QString& text) {
   } else if (const auto first = scan.number(1, 2)) {
     const QChar mark = scan.mark(u".-/");
     const auto second = mark.isNull() ? std::nullopt : scan.number(1, 2);
-    const bool slashed = mark == u'/';
-    const bool marked = second && !scan.mark(slashed ? u"/" : u".-").isNull();
+    const bool isSlashed = mark == u'/';
+    const bool marked = second && !scan.mark(isSlashed ? u"/" : u".-").isNull();
     const auto year = marked ? scan.number(4, 4) : std::nullopt;
     if (year && scan.atEnd()) {
-      if (!slashed)
-        date = QDate(*year, *second, *first);
-      else
-        date = *first > 12 ? QDate(*year, *second, *first) : QDate(*year, *first, *second);
+      const QDate dayFirst(*year, *second, *first), monthFirst(*year, *first, *second);
+      const bool preferDay = !isSlashed || slashed == SlashedDates::DayFirst;
+      date = preferDay ? dayFirst : monthFirst;
+      if (isSlashed && !date.isValid() && !strictly) date = preferDay ? monthFirst : dayFirst;
     }
   }
   if (!date.isValid()) return std::nullopt;
@@ -330,7 +335,7 @@ class ZoneDays {
 // One CSV record as an entry, or the reason it is none; `leftOut` when that reason is its kind alone.
 std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& header,
                                       const QStringList& fields, const Options& options, ZoneDays& days,
-                                      QString& problem, bool& leftOut) {
+                                      SlashedDates slashed, QString& problem, bool& leftOut) {
   const auto value = [&](const char* name) {
     const qsizetype column = header.column(name);
     return column >= 0 && column < fields.size() ? fields[column].trimmed() : QString();
@@ -363,7 +368,7 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   row.billable = *billable;
 
   const QString startDay = value(format.startDate);
-  const std::optional<QDate> day = parseDate(startDay);
+  const std::optional<QDate> day = parseDate(startDay, slashed);
   if (!day) {
     problem = QStringLiteral("the date “%1” cannot be read").arg(startDay);
     return std::nullopt;
@@ -380,7 +385,7 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   if (!endText.isEmpty()) {
     const std::optional<QTime> endTime = parseTime(endText);
     const QString endDayText = value(format.endDate);
-    const std::optional<QDate> endDay = endDayText.isEmpty() ? day : parseDate(endDayText);
+    const std::optional<QDate> endDay = endDayText.isEmpty() ? day : parseDate(endDayText, slashed);
     if (!endTime || !endDay) {
       problem = QStringLiteral("the end “%1 %2” cannot be read").arg(endDayText, endText).trimmed();
       return std::nullopt;
@@ -455,21 +460,36 @@ Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
   }
   WTImportFile file;
   file.format = QString::fromUtf8(format->name);
-  ZoneDays days(options.zone);
+  // Read whole first: one date that can only be day first (25/04/2024) says how the file writes the
+  // others (03/04/2024), unless another can only be month first.
+  std::vector<std::pair<qint64, QStringList>> records;
+  bool dayFirst = false, monthFirst = false;
   for (;;) {
     const WTCSVReader::Status next = reader.next(fields);
     if (next == WTCSVReader::Status::Failed) return Error{1, reader.error()};
     if (next == WTCSVReader::Status::End) break;
+    for (const char* name : {format->startDate, format->endDate}) {
+      const QString date = fields.value(header.column(name)).trimmed();
+      const bool asDay = bool(parseDate(date, SlashedDates::DayFirst, true));
+      const bool asMonth = bool(parseDate(date, SlashedDates::MonthFirst, true));
+      dayFirst = dayFirst || (asDay && !asMonth);
+      monthFirst = monthFirst || (asMonth && !asDay);
+    }
+    records.emplace_back(reader.line(), std::move(fields));
+  }
+  const SlashedDates slashed = dayFirst && !monthFirst ? SlashedDates::DayFirst : SlashedDates::MonthFirst;
+  ZoneDays days(options.zone);
+  for (const auto& [line, record] : records) {
     QString problem;
     bool leftOut = false;
     if (std::optional<WTImportRow> row =
-            readRecord(*format, header, fields, options, days, problem, leftOut)) {
-      row->line = reader.line();
+            readRecord(*format, header, record, options, days, slashed, problem, leftOut)) {
+      row->line = line;
       file.rows.push_back(std::move(*row));
     } else if (leftOut) {
-      file.leftOut.push_back({reader.line(), problem});
+      file.leftOut.push_back({line, problem});
     } else {
-      file.addProblem(reader.line(), problem);
+      file.addProblem(line, problem);
     }
   }
   return file;

@@ -75,6 +75,10 @@ INSTANTIATE_TEST_SUITE_P(
                 "3 Globex/Mobile App/Code|Review|2024-03-12T03:45:00Z|30|1080.00 USD|not billable|x;y|",
                 "4 Globex/Mobile App/Code|Lunch|2024-03-13T16:00:00Z|60|- USD|billable||"},
                {"5: the date “31/02/2024” cannot be read"}},
+        Sample{"clockify-day-first.csv", "", "UTC", {}, "clockify",  // one date can only be day first
+               {"2 Globex/App/|Ambiguous|2024-04-03T09:00:00Z|60|- USD|billable||",
+                "3 Globex/App/|Only day first|2024-04-25T09:00:00Z|30|- USD|billable||"},
+               {}},
         Sample{"timewarrior.json", "", "UTC", {}, "timewarrior",
                {"2 /Website/|design, logo, print|2023-10-01T10:30:00Z|90|- |billable||first \"draft\"",
                 "3 //||2023-10-29T00:30:00Z|60|- |billable||",
