@@ -46,6 +46,8 @@ inline constexpr QLatin1StringView kExpandedItemsPrefix{"NSOutlineView Items "};
 inline constexpr QLatin1StringView kSyncUser{"WTSyncUser"};
 inline constexpr QLatin1StringView kSyncServer{"WTSyncServer"};
 inline constexpr QLatin1StringView kSyncDevice{"WTSyncDevice"};
+// The machine the identity was made on (a hash of its machine id), to tell settings copied to another.
+inline constexpr QLatin1StringView kSyncDeviceMachine{"WTSyncDeviceMachine"};
 // The password, only where no secret service took it.
 inline constexpr QLatin1StringView kSyncPassword{"WTSyncPassword"};
 // Set when the keychain refused the password, cancelled its prompt or did not answer in time: the

@@ -15,6 +15,8 @@
 #include "WTTask.h"
 
 #include <QColor>
+#include <QCryptographicHash>
+#include <QSysInfo>
 #include <QUuid>
 #include <QtDebug>
 
@@ -81,16 +83,22 @@ RZSyncManager::RZSyncManager(WTObjectContext* context, QObject* parent)
   connect(&timer_, &QTimer::timeout, this, &RZSyncManager::sync);
   network_->setUrl(configuredEndpoint());
 
-  // One identity per installation, kept with the user's settings. A store that never synced has sent
-  // nothing under any identity, so it takes a new one: settings copied from another installation name
-  // that one's, and the server would hold back that installation's records as this one's own.
+  // One identity per installation, kept with the user's settings beside the machine it was made on:
+  // settings copied to another machine, alone or with the store, name the first one's, and the server
+  // would hold back that machine's records as this one's own. Settings that name no machine keep theirs.
   QString device;
   if (UserDefaults* defaults = userDefaults()) {
     device = defaults->stringForKey(SettingsKeys::kSyncDevice);
-    if (device.isEmpty() || track_->iteration() == 0) {
+    const QString machine = QString::fromLatin1(
+        QCryptographicHash::hash(QSysInfo::machineUniqueId() + "tessal", QCryptographicHash::Sha256)
+            .toHex()
+            .left(32));
+    const QString madeOn = defaults->stringForKey(SettingsKeys::kSyncDeviceMachine);
+    if (device.isEmpty() || (!madeOn.isEmpty() && madeOn != machine)) {
       device = QUuid::createUuid().toString(QUuid::WithoutBraces);
       defaults->setValue(SettingsKeys::kSyncDevice, device);
     }
+    if (madeOn != machine) defaults->setValue(SettingsKeys::kSyncDeviceMachine, machine);
   } else {
     device = QUuid::createUuid().toString(QUuid::WithoutBraces);
   }

@@ -519,7 +519,11 @@ TEST_P(RZSyncTwoDevices, ARestoredCopyNeitherResurrectsNorDrops) {
   // A device set up afresh gets the same from the server, also with settings copied from another device.
   SyncClient fresh(server->address(), Simulation::kUser, Simulation::kPassword);
   fresh.defaults->setValue("WTSyncDevice", there.defaults->stringForKey("WTSyncDevice"));
+  fresh.defaults->setValue("WTSyncDeviceMachine", "another machine");
   fresh.reopen();
+  const QString own = fresh.defaults->stringForKey("WTSyncDevice");
+  fresh.reopen();  // and keeps it at the next start, synced or not
+  EXPECT_EQ(fresh.defaults->stringForKey("WTSyncDevice"), own);
   ASSERT_TRUE(fresh.syncOnce());
   EXPECT_EQ(snapshot(*fresh.context), snapshot(*here.context));
 }
