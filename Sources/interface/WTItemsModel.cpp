@@ -33,18 +33,22 @@ QVariant pointerVariant(const WTObject* object) {
   return object ? QVariant::fromValue(reinterpret_cast<quintptr>(object)) : QVariant();
 }
 
-// "9:05", "09:05" or "9" on the day of `day`; none when the text is not a time of day.
-std::optional<Date> timeOnDay(Date day, const QString& text) {
+// "9:05", "09:05" or "9"; none when the text is not a time of day.
+std::optional<QTime> typedTimeOfDay(const QString& text) {
   static const QRegularExpression pattern(QStringLiteral("^\\s*(\\d{1,2})(?:[:.](\\d{2}))?\\s*$"));
   const QRegularExpressionMatch match = pattern.match(text);
   if (!match.hasMatch()) return std::nullopt;
-  const int hour = match.captured(1).toInt();
-  const int minute = match.captured(2).isEmpty() ? 0 : match.captured(2).toInt();
-  if (hour > 23 || minute > 59) return std::nullopt;
+  const QTime time(match.captured(1).toInt(), match.captured(2).isEmpty() ? 0 : match.captured(2).toInt());
+  if (!time.isValid()) return std::nullopt;
+  return time;
+}
+
+// `time` on the clocks of the day of `day`; on the day they go forward, a time they skip comes out later.
+Date timeOnDay(Date day, QTime time) {
   RZDate::DateComponents components;
   RZDate::assignFlags(day, RZDate::DayUnits, components);
-  components.hour = hour;
-  components.minute = minute;
+  components.hour = time.hour();
+  components.minute = time.minute();
   components.second = 0;
   return RZDate::dateFromComponents(components);
 }
@@ -411,12 +415,15 @@ QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QStri
   const bool start = role == StartTimeEditRole;
   const std::optional<Date> day = start ? time->startDate() : time->endDate();
   if (!day || (!start && time->running())) return {};
-  const std::optional<Date> moved = timeOnDay(*day, text);
-  if (!moved) return tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed());
+  const std::optional<QTime> typed = typedTimeOfDay(text);
+  if (!typed) return tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed());
   const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
-  if (start && !time->running() && time->endDate() && *moved > *time->endDate())
+  const Date moved = timeOnDay(*day, *typed);
+  if (const QString asTyped = typed->toString(u"HH:mm"); clock(moved) != asTyped)
+    return tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped);
+  if (start && !time->running() && time->endDate() && moved > *time->endDate())
     return tr("The start would come after the end (%1).").arg(clock(*time->endDate()));
-  if (!start && time->startDate() && *moved < *time->startDate())
+  if (!start && time->startDate() && moved < *time->startDate())
     return tr("The end would come before the start (%1).").arg(clock(*time->startDate()));
   return {};
 }
@@ -464,8 +471,8 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
       const bool start = role == StartTimeEditRole;
       const std::optional<Date> day = start ? time->startDate() : time->endDate();
       if (!day || (!start && time->running())) return false;
-      const std::optional<Date> moved = timeOnDay(*day, value.toString());
-      if (*moved == (start ? *day : RZDate::beginOfMinute(*day))) return false;
+      const Date moved = timeOnDay(*day, *typedTimeOfDay(value.toString()));
+      if (moved == (start ? *day : RZDate::beginOfMinute(*day))) return false;
       start ? time->setStartDate(moved) : time->setEndDate(moved);
       return true;
     }

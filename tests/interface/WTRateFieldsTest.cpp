@@ -158,6 +158,11 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
                 Outcome(money ? dec("1250.5") : Decimal(75), refused));
     }
   }
+  // Berlin's clocks skip from 2:00 to 3:00 that night: an end at 2:30 would be stored as 3:30.
+  auto* spring = makeItem<WTTime>(design, "Spring", at(2024, 3, 31, 1, 10));
+  endTurn();
+  outline()->expandAll();
+  EXPECT_TRUE(typeIntoRow(spring, Field::End, "2:30"));
 }
 
 TEST_F(WTRateFieldsTest, ARateChangeShowsNewCostsInEveryRowAtOnce) {
