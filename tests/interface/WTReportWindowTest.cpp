@@ -242,6 +242,13 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   };
   EXPECT_GE(QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf})).captured(1).toInt(), 3);
   EXPECT_TRUE(poppler("pdftotext", {pdf, "-"}).contains("12,270.00")) << "the whole report, to its total";
+  // Each head stands over its column: "Duration" ends where every task's and entry's 01:00 ends.
+  QList<double> rights;
+  for (const auto& word : QRegularExpression(R"re(xMax="([\d.]+)"[^>]*>(Duration|01:00)<)re")
+                              .globalMatch(poppler("pdftotext", {"-bbox", "-l", "1", pdf, "-"})))
+    rights << word.captured(1).toDouble();
+  ASSERT_GE(rights.size(), 3);
+  for (const double right : rights) EXPECT_NEAR(right, rights.first(), 1.0);
 }
 
 // Custom days stand when the range dialog is dismissed; the export writes the chosen project's range.
