@@ -50,13 +50,18 @@ WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& 
   layout->addWidget(buttons);
 
   load();
-  connect(begin_, &QDateEdit::dateChanged, this, [this](QDate day) { store(beginKey_, day); });
+  // A range never ends before it begins: a later first day takes the last along.
+  connect(begin_, &QDateEdit::dateChanged, this, [this](QDate day) {
+    store(beginKey_, day);
+    end_->setMinimumDate(day);
+  });
   connect(end_, &QDateEdit::dateChanged, this, [this](QDate day) { store(endKey_, day); });
 }
 
 void WTCustomRangeDialog::load() {
   const Date now = Date::now();
   begin_->setDate(dayOf(defaults_->dateForKey(beginKey_).value_or(RZDate::addMonth(now, -1))));
+  end_->setMinimumDate(begin_->date());
   end_->setDate(dayOf(defaults_->dateForKey(endKey_).value_or(now)));
   // What the dialog shows is the range, even when it is closed untouched.
   store(beginKey_, begin_->date());
