@@ -26,10 +26,13 @@ class ErrorPrinter : public GXTemplateEngineDelegate {
   void templateEngineEncounteredError(GXTemplateEngine*, const GXTemplateError& error, bool) override {
     err_ << "error " << int(error.code) << ": " << error.localizedDescription << '\n';
     err_.flush();
+    reported_ = true;
   }
+  bool reported() const { return reported_; }
 
  private:
   QTextStream& err_;
+  bool reported_ = false;
 };
 
 // Builds variants straight from the parser's events, so a number with a fraction keeps the digits it was
@@ -176,8 +179,7 @@ int runTemplateCommand(const QStringList& arguments, QTextStream& out, QTextStre
   ErrorPrinter printer(err);
   engine.setDelegate(&printer);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
-  engine.loadFilter(std::make_shared<WTReportFilters>());
-  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
+  loadReportFilters(engine);
   QString result;
   try {
     result = engine.processTemplateInFileAtPath(templatePath, variables);
@@ -193,5 +195,5 @@ int runTemplateCommand(const QStringList& arguments, QTextStream& out, QTextStre
   }
   out << result;
   out.flush();
-  return 0;
+  return printer.reported() ? 1 : 0;
 }

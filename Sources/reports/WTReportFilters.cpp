@@ -5,8 +5,11 @@
 #include "GXTemplateEngine.h"
 #include "GXTemplateValue.h"
 #include "MoneyFormat.h"
+#include "WTHTMLFilter.h"
+#include "WTItemKindFilter.h"
 
 #include <algorithm>
+#include <memory>
 #include <optional>
 
 QStringList WTReportFilters::filters() const {
@@ -38,7 +41,8 @@ std::optional<Decimal> number(const QVariant& value) {
 }
 
 bool isCurrencyCode(const QString& text) {
-  return text.size() == 3 && std::all_of(text.begin(), text.end(), [](QChar c) { return c >= u'A' && c <= u'Z'; });
+  return text.size() == 3 &&
+         std::all_of(text.begin(), text.end(), [](QChar c) { return c >= u'A' && c <= u'Z'; });
 }
 
 }  // namespace
@@ -60,4 +64,11 @@ QVariant WTMoneyFilter::filterInvoked(const QString& filter, const QStringList& 
   if (!isCurrencyCode(currency)) currency.clear();
   if (rate) return MoneyFormat::formatRate(*amount, currency);
   return currency.isEmpty() ? MoneyFormat::format(*amount) : MoneyFormat::format(*amount, currency);
+}
+
+void loadReportFilters(GXTemplateEngine& engine) {
+  engine.loadFilter(std::make_shared<WTReportFilters>());
+  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
+  engine.loadFilter(std::make_shared<WTHTMLFilter>());
+  engine.loadFilter(std::make_shared<WTItemKindFilter>());
 }

@@ -30,3 +30,7 @@ class WTMoneyFilter : public GXTemplateFilter {
  private:
   GXTemplateEngine* engine_;
 };
+
+// Loads every filter a report uses (these two, "html" and "item_kind") on `engine`: the report and the
+// template command render the same template alike.
+void loadReportFilters(GXTemplateEngine& engine);

@@ -7,10 +7,8 @@
 #include "TessalLogging.h"
 #include "UserDefaults.h"
 #include "WTClient.h"
-#include "WTHTMLFilter.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
-#include "WTItemKindFilter.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTReportFilters.h"
@@ -198,10 +196,7 @@ WTReport WTReportGenerator::run(const QString* path, const QString* text) {
   ErrorCollector collector(report.errors, logsErrors_);
   engine.setDelegate(&collector);
   engine.setMatcher(ICUTemplateMatcher::matcherWithTemplateEngine(&engine));
-  engine.loadFilter(std::make_shared<WTReportFilters>());
-  engine.loadFilter(std::make_shared<WTMoneyFilter>(&engine));
-  engine.loadFilter(std::make_shared<WTHTMLFilter>());
-  engine.loadFilter(std::make_shared<WTItemKindFilter>());
+  loadReportFilters(engine);
   engine.loadMarker(std::make_shared<WTReportLevelMarker>(&engine, mode_));
   QString html;
   // Every task's totals are read again for its project's subtotal and the grand total.

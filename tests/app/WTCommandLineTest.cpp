@@ -14,21 +14,22 @@ namespace {
 
 using namespace commandtest;
 
-// `tessal template`: JSON variables in, text out, errors in order on stderr; a refusal is one line.
+// `tessal template`: JSON variables in, text out as a report renders it, errors in order on stderr and
+// exit 1; a refusal is one line.
 TEST(WTCommandLine, TemplateRendersJsonVariablesAndRefusesInOneLine) {
   Installation here;
-  const QString templ =
-      here.file("report.txt",
-                "{{ client.name | uppercase }}: {% for item in items %}{{ item.minutes | digiclock }} "
-                "{{ item.cost | decimal }} {{ item.cost }}{% if item.billed %} billed{% /if %}\n{% /for %}"
-                "{{ count }} {{ ratio }} {{ huge }} {{ items.1.note }}{% bogus %}{% for 1 to 2 %}");
+  const QString templ = here.file(
+      "report.txt",
+      "{{ client.name | uppercase }}: {% for item in items %}{{ item.minutes | digiclock }} "
+      "{{ item.cost | decimal }} {{ item.cost }}{% if item.billed %} billed{% /if %}\n{% /for %}"
+      "{{ count }} {{ ratio }} {{ huge }} {{ items.1.note }}{{ sign | html }}{% bogus %}{% for 1 to 2 %}");
   const QString vars = here.file("vars.json", R"({"client": {"name": "Acme"},
       "items": [{"minutes": 90, "cost": 1234.50, "billed": true, "note": null},
                 {"minutes": 5, "cost": 2, "billed": false}],
-      "count": 2, "ratio": 0.1, "huge": 123456789012345678901234567890})");
-  const Outcome run = here.expect({"template", templ, "--vars", vars}, 0, "", {{"LANG", "en_US.UTF-8"}});
+      "count": 2, "ratio": 0.1, "huge": 123456789012345678901234567890, "sign": "a<b"})");
+  const Outcome run = here.expect({"template", templ, "--vars", vars}, 1, "", {{"LANG", "en_US.UTF-8"}});
   EXPECT_EQ(run.out,
-            "ACME: 01:30 1,234.50 1234.50 billed\n00:05 2.00 2\n2 0.1 123456789012345678901234567890 ");
+            "ACME: 01:30 1,234.50 1234.50 billed\n00:05 2.00 2\n2 0.1 123456789012345678901234567890 a&lt;b");
   // null is absent: the note is no variable.
   EXPECT_EQ(run.err,
             "error 3: \"items.1.note\" is not a valid variable\nerror 2: \"bogus\" is not a valid marker\n"
