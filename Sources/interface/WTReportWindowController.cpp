@@ -353,6 +353,9 @@ bool WTReportWindowController::isBuildingDocument() const {
 }
 
 void WTReportWindowController::showTemplateErrors(const WTReport& report) {
+  // A report its template failed is not one to send: as `tessal report`, the window writes none.
+  for (const char* name : {"saveHTML", "savePDF", "print"})
+    findChild<QPushButton*>(QLatin1String(name))->setEnabled(report.templateRead && report.errors.empty());
   if (!report.templateRead) {
     errorBar_->setText(
         tr("The report template could not be read: %1").arg(WTReportGenerator::templatePath()));
@@ -369,6 +372,7 @@ void WTReportWindowController::showTemplateErrors(const WTReport& report) {
                                 : tr("Template error: %1").arg(first.message);
   if (report.errors.size() > 1)
     text += QLatin1Char(' ') + tr("(and %n more)", "", int(report.errors.size() - 1));
+  text += QStringLiteral(" — ") + tr("saving and printing wait until it is mended");
   errorBar_->setText(text);
   errorBar_->setToolTip(WTReportGenerator::templatePath());
   errorBar_->show();
