@@ -142,7 +142,7 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
   minutesField_ = new QLineEdit(this);
   minutesField_->setObjectName(QStringLiteral("roundingMinutesField"));
   minutesField_->setAlignment(Qt::AlignRight);
-  minutesField_->setPlaceholderText(tr("Inherited: %1").arg(above.minutes));
+  WTRateField::setPlaceholder(minutesField_, tr("Inherited: %1").arg(above.minutes));
   if (record->roundingMinutes().value_or(0) > 0)
     minutesField_->setText(QLocale().toString(*record->roundingMinutes()));
   clearsRefusal(minutesField_);

@@ -41,7 +41,7 @@ void WTItemsViewController::refreshHeader() {
   setElidedText(clientLabel_, client);
   durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
   totalsLabel_->setText(MoneyFormat::format(project_->cost(), project_->billingCurrency()));
-  rateField_->setPlaceholderText(WTRateField::placeholder(project_));
+  WTRateField::setPlaceholder(rateField_, WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
     rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());

@@ -11,6 +11,8 @@
 #include <QDialogButtonBox>
 #include <QLabel>
 #include <QLineEdit>
+#include <QStyle>
+#include <QStyleOptionFrame>
 #include <QVBoxLayout>
 
 namespace WTRateField {
@@ -39,6 +41,19 @@ QString text(const Decimal& rate) {
   const QString formatted = MoneyFormat::format(rate);
   const TypedNumber::Reading back = MoneyFormat::parse(formatted);
   return back.value == rate ? formatted : TypedNumber::editableText(rate);
+}
+
+void setPlaceholder(QLineEdit* field, const QString& text) {
+  field->setPlaceholderText(text);
+  QStyleOptionFrame option;
+  option.initFrom(field);
+  option.lineWidth = field->style()->pixelMetric(QStyle::PM_DefaultFrameWidth, &option, field);
+  const QMargins margins = field->textMargins();
+  // The line edit's own margin of 2 on each side, and a pixel for the caret.
+  const QSize content(field->fontMetrics().horizontalAdvance(text) + 4 + 1 + margins.left() + margins.right(),
+                      field->fontMetrics().height());
+  field->setMinimumWidth(
+      field->style()->sizeFromContents(QStyle::CT_LineEdit, &option, content, field).width());
 }
 
 void setRefused(QLineEdit* field, const QString& reason) {
@@ -75,7 +90,7 @@ WTRateDialog::WTRateDialog(WTObject* object, QWidget* parent) : QDialog(parent),
   field_ = new QLineEdit(this);
   field_->setObjectName(QStringLiteral("rateField"));
   field_->setAlignment(Qt::AlignRight);
-  field_->setPlaceholderText(WTRateField::placeholder(object));
+  WTRateField::setPlaceholder(field_, WTRateField::placeholder(object));
   if (object->storedRate()) field_->setText(WTRateField::text(*object->storedRate()));
   label->setBuddy(field_);
   message_ = new QLabel(this);

@@ -30,6 +30,10 @@ Parsed parse(const QString& text);
 // number, so that leaving the field untouched never changes a rate by rounding it.
 QString text(const Decimal& rate);
 
+// Shows `text` in the empty field, which a line edit's width (seventeen x's) may cut: the field is kept at
+// least as wide as the text.
+void setPlaceholder(QLineEdit* field, const QString& text);
+
 // Marks the field as holding a value that was not taken, with `reason` as its tool tip; an empty reason
 // clears the mark.
 void setRefused(QLineEdit* field, const QString& reason);

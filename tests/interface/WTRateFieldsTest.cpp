@@ -280,6 +280,11 @@ TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRef
   }
   EXPECT_EQ(WTBillingDialog(project).roundingMinutesField()->text(), "6");
   EXPECT_EQ(WTBillingDialog(design).roundingMinutesField()->placeholderText(), "Inherited: 6");
+  project->setRoundingMinutes(1440);  // however long, what is inherited shows whole
+  WTBillingDialog longest(design);
+  longest.show();
+  const QLineEdit* inherits = longest.roundingMinutesField();
+  EXPECT_GE(inherits->width(), inherits->fontMetrics().horizontalAdvance(inherits->placeholderText()) + 6);
   defaults->setValue("WTCurrency", "CHF");
   EXPECT_EQ(WTBillingDialog(acme).currencyField()->lineEdit()->placeholderText(), "Inherited: CHF");
 }
