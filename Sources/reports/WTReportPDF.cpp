@@ -17,6 +17,9 @@ QPageSize localPageSize() {
 
 Result<void> write(QTextDocument& document, const QString& title, const QString& path) {
   const QString partial = path + QStringLiteral(".part");
+  // The writer only says that it could not paint: a file that cannot be made says why, first.
+  if (QFile probe(partial); !probe.open(QIODevice::WriteOnly))
+    return Error{1, QStringLiteral("%1: %2").arg(path, probe.errorString())};
   {
     QPdfWriter writer(partial);
     writer.setCreator(QStringLiteral("Tessal"));

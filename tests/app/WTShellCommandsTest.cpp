@@ -406,6 +406,8 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
             "final\",\"02:15\",\"180.00\"\n\"Beacon\",\"Build\",\"01:00\",\"80.00\"\n");
   EXPECT_TRUE(fileBytes(pdfFile).startsWith("%PDF-"));
   EXPECT_FALSE(QFile::exists(pdfFile + ".part"));
+  EXPECT_EQ(here.expect({"report", "--client", "Acme", "--out", here.path("no/r.pdf")}, 1, "").err,
+            "tessal: " + here.path("no/r.pdf") + ": No such file or directory\n");
   here.expect({"report", "--project", "atlas ", "--mode", "2", "--out", csvFile}, 1,
               "");  // a trailing space counts
   // A billing period of the export's words: 4 March's entry (the one across midnight started on the 3rd).
