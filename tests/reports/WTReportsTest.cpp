@@ -368,6 +368,9 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
   EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 138 % of the budget of 100.00 · 38.47 over</td>")))
       << html.toStdString();
   EXPECT_EQ(html.count("class=\"budget\""), 2);  // tasks 2 and 3 have none
+  WTReportGenerator empty({billed}, 0);
+  empty.setPeriod(WTRangePredicate::boundsForRangeWord(QStringLiteral("2025-01-01..2025-01-31")).value());
+  EXPECT_TRUE(empty.render().html.contains("Projects: none in the period<br>"));
 }
 
 // A "level" part is skipped unread elsewhere: an empty loop's end cannot switch output on inside it.
