@@ -17,6 +17,7 @@
 #include "WTStoreSetup.h"
 #include "WTTask.h"
 #include "WTTimerCommands.h"
+#include "WTUndoManager.h"
 
 #include <QDir>
 #include <QFileInfo>
@@ -156,7 +157,13 @@ bool WTAppDelegate::saveChanges(Error* error) {
 }
 
 QJsonObject WTAppDelegate::carryOutRequest(const QJsonObject& request) {
+  // What the user was typing when a change came from the shell is a step of Edit › Undo of its own, and
+  // so is the change: undoing a typo never starts or stops a timer again.
+  WTUndoManager& undo = managedObjectContext()->undoManager();
+  if (commitEditing_) commitEditing_();
+  undo.closeGroup();
   WTCommandOutcome outcome = WTTimerCommands::answer(*managedObjectContext(), request);
+  undo.closeGroup();
   Error error;
   if (!saveChanges(&error)) {
     outcome.status = 1;

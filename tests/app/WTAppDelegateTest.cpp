@@ -11,6 +11,7 @@
 #include "WTStoreBackup.h"
 #include "WTTrackingAlert.h"
 
+#include <QJsonArray>
 #include <QStatusBar>
 #include <QToolButton>
 
@@ -183,6 +184,12 @@ TEST_F(WTAppDelegateTest, ChangesAreSavedSoonAndCommitTheEditInProgressOnlyWhenT
   EXPECT_FALSE(context->hasChanges());
   EXPECT_EQ(storedNames<WTProject>(delegate->storePath()),
             QStringList({"Default Project", "another change", "autosaved", "typed, not yet committed"}));
+  // A start from the shell is a step of its own: undoing it leaves what was being typed.
+  delegate->setCommitEditingHandler([&] { return project->setName("typed as the shell started"), true; });
+  delegate->carryOutRequest({{"command", "start"}, {"arguments", QJsonArray{"Default Task"}}});
+  context->undoManager().undo();
+  EXPECT_EQ(project->name() + ' ' + QString::number(context->fetch<WTTime>(&WTTime::running).size()),
+            "typed as the shell started 0");
 }
 
 // The context's sync manager keeps the installation's journal, takes the account, and stops on quitting.
