@@ -18,6 +18,7 @@
 namespace {
 
 constexpr int kImageSize = 24;
+constexpr int kTitleWidth = 300;  // pixels of a task's or project's name, beyond which it is cut
 
 // The minutes of a task's running timers, as the stopwatch counted them at its last tick; empty for a
 // task that does not run.
@@ -127,7 +128,13 @@ void WTStatusBarPopup::rebuildRows() {
     auto* title = new QLabel(row);
     title->setObjectName(QStringLiteral("taskTitle"));
     title->setTextFormat(Qt::PlainText);
-    title->setText(project.isEmpty() ? task->name() : QStringLiteral("%1\n%2").arg(task->name(), project));
+    // A long name is cut where it shows that it is, and is whole in the tip.
+    QStringList lines = {task->name()};
+    if (!project.isEmpty()) lines << project;
+    const QStringList whole = lines;
+    for (QString& line : lines) line = title->fontMetrics().elidedText(line, Qt::ElideRight, kTitleWidth);
+    title->setText(lines.join(u'\n'));
+    if (lines != whole) title->setToolTip(whole.join(u'\n'));
     title->setMinimumWidth(160);
     layout->addWidget(title, 1);
     auto* elapsed = new QLabel(elapsedText(task), row);

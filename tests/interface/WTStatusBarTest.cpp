@@ -68,6 +68,10 @@ TEST_F(StatusBarTest, ThePopupStartsAndStopsTimersAndTheXEmbedIconCarriesTheRunn
   EXPECT_EQ(rowsOf(popup),
             QStringList({"T8:Stop 00:01", "T4:Stop 00:31", "T1:Stop 01:01", "T9:Start", "T7:Start"}));
   EXPECT_EQ(shownRows(popup), before);
+  tasks[9]->setName(QString(120, u'L'));  // cut where it shows that it is, whole in the tip
+  settle();
+  const QLabel* title = shownRows(popup)[3]->findChild<QLabel*>("taskTitle");
+  EXPECT_TRUE(title->text().contains(u'…') && title->toolTip().contains(QString(120, u'L')));
   statusBar.statusBarClicked(QRect(0, 0, 24, 24));
   for (WTTask* task : tasks) context->deleteObject(task);
   settle();
