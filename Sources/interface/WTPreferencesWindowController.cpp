@@ -122,6 +122,11 @@ void WTPreferencesWindowController::updateKeychainNote() {
   }
   keychainNoteLabel_->setText(note);
   keychainNoteLabel_->setVisible(!note.isEmpty());
+  // Said while the window is open, the note's lines make it taller: none of them is cut.
+  if (isVisible() && layout()->hasHeightForWidth()) {
+    layout()->activate();
+    resize(width(), std::max(height(), layout()->totalHeightForWidth(width())));
+  }
 }
 
 WTPreferencesWindowController::~WTPreferencesWindowController() {
