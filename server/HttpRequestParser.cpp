@@ -1,6 +1,7 @@
 #include "HttpRequestParser.h"
 
 #include <algorithm>
+#include <cctype>
 #include <cstdint>
 #include <utility>
 
@@ -27,6 +28,15 @@ std::string trimmed(const std::string& text) {
   while (begin < end && (text[begin] == ' ' || text[begin] == '\t')) ++begin;
   while (end > begin && (text[end - 1] == ' ' || text[end - 1] == '\t')) --end;
   return text.substr(begin, end - begin);
+}
+
+// Whether `bytes` up to their first space could be a method: a token's characters only.
+bool beginsLikeAMethod(std::string_view bytes) {
+  const std::string_view method = bytes.substr(0, bytes.find(' '));
+  return std::all_of(method.begin(), method.end(), [](char c) {
+    return std::isalnum(static_cast<unsigned char>(c)) ||
+           std::string_view("!#$%&'*+-.^_`|~").find(c) != std::string_view::npos;
+  });
 }
 
 }  // namespace
@@ -230,6 +240,10 @@ HttpRequestParser::Outcome HttpRequestParser::feed(std::string_view bytes) {
       case Phase::Headers:
         switch (nextLine(limits_.maxHeaderLine, limits_.maxHeaderBytes, line)) {
           case Line::Partial:
+            // A request begins with its method: bytes that cannot (a TLS handshake sent to this plain
+            // HTTP server) are refused at once, not after a wait for a line that never comes.
+            if (version_.empty() && !beginsLikeAMethod(buffer_))
+              return refuse(outcome, 400, "Not an HTTP request: this server speaks plain HTTP.");
             return outcome;
           case Line::TooLong:
             return refuse(outcome, 431, "A header line is too long.");
