@@ -222,6 +222,7 @@ bool HttpListener::start(const std::string& host, int port, std::string& error) 
     error = "cannot resolve " + host;
     return false;
   }
+  int failure = 0;
   for (addrinfo* address = found; address && listenFd_ < 0; address = address->ai_next) {
     const int fd = socket(address->ai_family, address->ai_socktype | SOCK_CLOEXEC, address->ai_protocol);
     if (fd < 0) continue;
@@ -230,12 +231,14 @@ bool HttpListener::start(const std::string& host, int port, std::string& error) 
     if (bind(fd, address->ai_addr, address->ai_addrlen) == 0 && listen(fd, listenBacklog()) == 0) {
       listenFd_ = fd;
     } else {
+      failure = errno;
       ::close(fd);
     }
   }
   freeaddrinfo(found);
   if (listenFd_ < 0) {
-    error = "cannot listen on " + host + ":" + std::to_string(port);
+    error = "cannot listen on " + host + ":" + std::to_string(port) +
+            (failure ? ": " + std::string(std::strerror(failure)) : "");
     return false;
   }
   sockaddr_storage bound{};

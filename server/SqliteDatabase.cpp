@@ -19,7 +19,7 @@ class SqliteConnection final : public SqlConnection {
       std::string message = db_ ? sqlite3_errmsg(db_) : sqlite3_errstr(rc);
       sqlite3_close(db_);
       db_ = nullptr;
-      throw StorageError("cannot open " + path + ": " + message);
+      throw StorageError(message);  // the caller names the file
     }
     sqlite3_busy_timeout(db_, 10000);
     executeScript("PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;");

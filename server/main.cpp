@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <iostream>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -30,9 +31,16 @@ constexpr const char* kUsage =
     "connections one address (an IPv6 /64) holds, the rest answered 503 at once (default 256, 0: no\n"
     "cap; behind a proxy on this host, raise it to the proxy's connections or use 0).\n";
 
-int usage() {
-  std::cerr << kUsage;
+// What was wrong with the arguments, then how they go.
+int usage(const std::string& problem) {
+  std::cerr << "tessal-sync-server: " << problem << "\n" << kUsage;
   return 2;
+}
+
+std::string unexpected(const std::string& argument) {
+  static const std::set<std::string> valued = {"--listen",   "--db",          "--threads",
+                                               "--max-body", "--body-memory", "--connections-per-address"};
+  return valued.count(argument) ? argument + " needs a value" : "unexpected “" + argument + "”";
 }
 
 std::optional<long long> number(const std::string& text) {
@@ -70,27 +78,30 @@ int serve(const std::vector<std::string>& args) {
       location = args[++i];
     } else if (arg == "--threads" && hasValue) {
       const auto value = number(args[++i]);
-      if (!value || *value < 2 || *value > 1024) return usage();
+      if (!value || *value < 2 || *value > 1024) return usage("--threads takes a number from 2 to 1024");
       options.threads = static_cast<int>(*value);
     } else if (arg == "--max-body" && hasValue) {
       const auto value = number(args[++i]);
-      if (!value || *value < 1024) return usage();
+      if (!value || *value < 1024) return usage("--max-body takes a number of bytes, 1024 or more");
       options.maxBodyBytes = static_cast<size_t>(*value);
     } else if (arg == "--body-memory" && hasValue) {
       const auto value = number(args[++i]);
-      if (!value || *value < 1024) return usage();
+      if (!value || *value < 1024) return usage("--body-memory takes a number of bytes, 1024 or more");
       options.limits.maxBodyMemory = static_cast<size_t>(*value);
     } else if (arg == "--connections-per-address" && hasValue) {
       const auto value = number(args[++i]);
-      if (!value) return usage();
+      if (!value) return usage("--connections-per-address takes a number");
       options.limits.maxConnectionsPerAddress = static_cast<size_t>(*value);
     } else if (arg == "--no-signup") {
       options.signUp = false;
     } else {
-      return usage();
+      return usage(unexpected(arg));
     }
   }
-  if (listen.empty() || location.empty() || !splitListen(listen, options.host, options.port)) return usage();
+  if (listen.empty()) return usage("--listen HOST:PORT is needed");
+  if (location.empty()) return usage("--db LOCATION is needed");
+  if (!splitListen(listen, options.host, options.port))
+    return usage("“" + listen + "” is not HOST:PORT with a port up to 65535");
 
   // Signals are taken by this thread alone, so block them before any worker exists.
   sigset_t signals;
@@ -138,10 +149,11 @@ int addUser(const std::vector<std::string>& args) {
     } else if (email.empty() && args[i].rfind("--", 0) != 0) {
       email = args[i];
     } else {
-      return usage();
+      return usage(unexpected(args[i]));
     }
   }
-  if (email.empty() || location.empty()) return usage();
+  if (email.empty()) return usage("the account's e-mail address is needed");
+  if (location.empty()) return usage("--db LOCATION is needed");
   std::string password;
   std::getline(std::cin, password);
 
@@ -179,7 +191,7 @@ int addUser(const std::vector<std::string>& args) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc < 2) return usage();
+  if (argc < 2) return usage("name a command: serve or add-user");
   const std::string command = argv[1];
   if (command == "--help" || command == "-h") {
     std::cout << kUsage;
@@ -188,5 +200,5 @@ int main(int argc, char** argv) {
   const std::vector<std::string> args(argv + 2, argv + argc);
   if (command == "serve") return serve(args);
   if (command == "add-user") return addUser(args);
-  return usage();
+  return usage("there is no command “" + command + "”");
 }
