@@ -81,6 +81,14 @@ void WTStopwatchUpdater::update() {
 
   processIdleTime();
 
+  sumRunningTimes();
+  timer_.start();
+  scheduledAt_ = Date::now();
+  tickDue_ = scheduledAt_->addingSeconds(kTickMilliseconds / 1000.0);
+  emit stopwatchDidUpdate(this);
+}
+
+void WTStopwatchUpdater::sumRunningTimes() {
   QVariantList entries;
   entries.reserve(times_.size());
   for (WTTime* time : std::as_const(times_)) entries.append(KeyPath::variantFromObject(time));
@@ -89,11 +97,6 @@ void WTStopwatchUpdater::update() {
   for (WTTime* time : QList<WTTime*>(times_)) time->peek();
 
   updateBadge();
-
-  timer_.start();
-  scheduledAt_ = Date::now();
-  tickDue_ = scheduledAt_->addingSeconds(kTickMilliseconds / 1000.0);
-  emit stopwatchDidUpdate(this);
 }
 
 void WTStopwatchUpdater::processIdleTime() {
@@ -219,12 +222,18 @@ void WTStopwatchUpdater::scheduleReconcile() {
       this,
       [this] {
         reconcileScheduled_ = false;
-        if (reconcile() && started_) update();
+        bool moved = false;
+        if (reconcile(&moved) && started_) {
+          update();
+        } else if (moved && started_) {
+          sumRunningTimes();
+          emit stopwatchDidUpdate(this);
+        }
       },
       Qt::QueuedConnection);
 }
 
-bool WTStopwatchUpdater::reconcile() {
+bool WTStopwatchUpdater::reconcile(bool* moved) {
   if (candidates_.isEmpty()) return false;
   const QSet<WTTime*> candidates = std::exchange(candidates_, {});
   bool changed = false;
@@ -238,6 +247,8 @@ bool WTStopwatchUpdater::reconcile() {
     } else if (!running && index >= 0) {
       times_.removeAt(index);
       changed = true;
+    } else if (running && moved) {
+      *moved = true;  // its start may have moved: what it adds up to shows now, not at the next tick
     }
   }
   return changed;

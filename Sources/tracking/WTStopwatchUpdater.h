@@ -89,8 +89,11 @@ class WTStopwatchUpdater : public QObject {
                         const QList<WTObject*>& deleted);
   void noteCandidate(WTObject* object);
   void scheduleReconcile();
-  // Brings times() in line with the entries that changed; returns whether the set changed.
-  bool reconcile();
+  // Brings times() in line with the entries that changed; returns whether the set changed, and sets
+  // `moved` when an entry that runs on changed (its start, and so its minutes).
+  bool reconcile(bool* moved = nullptr);
+  // The running entries' total and the badge, as a tick sets them.
+  void sumRunningTimes();
 
   WTObjectContext* context_;
   UserDefaults* defaults_;

@@ -20,6 +20,10 @@ TEST_F(TrackingTest, TickTotalsRunningEntriesAndMovesOncePerMinute) {
   advance(35);  // 12:01:05
   updater->update();
   EXPECT_EQ(updater->totalActiveDuration(), 77);  // 45:35 + 31:05
+  other->runningTimes().first()->setStartDate(
+      clockNow.addingSeconds(-3600));  // shown at once, not a tick later
+  settle();
+  EXPECT_EQ(updater->totalActiveDuration(), 106);  // 45:35 + 60:00
 }
 
 // The running set follows starts, stops, restarts, deletion and undo; its changes tick at once.
