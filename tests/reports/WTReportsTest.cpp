@@ -258,8 +258,8 @@ TEST_F(ReportTest, BuiltInTemplateRendersEveryModeCleanly) {
                 months = WTReportGenerator(projects(), 3).render().html;
   for (const char* text : {"Expense: Fonts", "Flat fee: Setup", "Time: Review", ">a&lt;b</td>", ">Time</td>"})
     EXPECT_TRUE(items.contains(QString::fromUtf8(text))) << text;
-  EXPECT_TRUE(!items.contains("Open question") && months.contains("3 entries") &&
-              months.contains("1 entry<"));
+  EXPECT_TRUE(!items.contains("Open question") && months.contains("3 items") &&  // an expense and a flat fee are items
+              months.contains("1 item<"));
   // The named flat fee, the time without a name, the bare flat fee.
   EXPECT_EQ(WTReportGenerator({backend}, 1).render().html.count(QStringLiteral("class=\"item\"")), 3);
   EXPECT_EQ(WTReportGenerator().renderText(QStringLiteral("[{{ missing | html }}]")).html,
