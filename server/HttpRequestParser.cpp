@@ -30,13 +30,10 @@ std::string trimmed(const std::string& text) {
   return text.substr(begin, end - begin);
 }
 
-// Whether `bytes` up to their first space could be a method: a token's characters only.
-bool beginsLikeAMethod(std::string_view bytes) {
-  const std::string_view method = bytes.substr(0, bytes.find(' '));
-  return std::all_of(method.begin(), method.end(), [](char c) {
-    return std::isalnum(static_cast<unsigned char>(c)) ||
-           std::string_view("!#$%&'*+-.^_`|~").find(c) != std::string_view::npos;
-  });
+// Whether `c` may be part of a method (a token).
+bool isTokenCharacter(char c) {
+  return std::isalnum(static_cast<unsigned char>(c)) ||
+         std::string_view("!#$%&'*+-.^_`|~").find(c) != std::string_view::npos;
 }
 
 }  // namespace
@@ -86,6 +83,10 @@ HttpRequestParser::Line HttpRequestParser::nextLine(size_t maxLength, size_t max
   for (; scanned_ < buffer_.size(); ++scanned_) {
     if (scanned_ + 1 > maxTotal) return Line::HeadersTooLarge;
     const char c = buffer_[scanned_];
+    // A request begins with its method: a byte no method has (a TLS handshake sent to this plain HTTP
+    // server) is refused as it arrives, not after a wait for a line end that never comes.
+    if (inMethod_ && (c == ' ' || c == '\r' || c == '\n')) inMethod_ = false;
+    if (inMethod_ && !isTokenCharacter(c)) return Line::NotAMethod;
     if (c == '\n' && scanned_ > lineStart_ && buffer_[scanned_ - 1] == '\r') {
       line.assign(buffer_, lineStart_, scanned_ - 1 - lineStart_);
       lineStart_ = ++scanned_;
@@ -144,6 +145,7 @@ HttpRequestParser::Outcome&& HttpRequestParser::complete(Outcome& outcome) {
   version_.clear();
   headerCount_ = 0;
   keepAlive_ = true;
+  inMethod_ = true;
   contentLength_ = 0;
   chunkLeft_ = 0;
   return std::move(outcome);
@@ -240,11 +242,9 @@ HttpRequestParser::Outcome HttpRequestParser::feed(std::string_view bytes) {
       case Phase::Headers:
         switch (nextLine(limits_.maxHeaderLine, limits_.maxHeaderBytes, line)) {
           case Line::Partial:
-            // A request begins with its method: bytes that cannot (a TLS handshake sent to this plain
-            // HTTP server) are refused at once, not after a wait for a line that never comes.
-            if (version_.empty() && !beginsLikeAMethod(buffer_))
-              return refuse(outcome, 400, "Not an HTTP request: this server speaks plain HTTP.");
             return outcome;
+          case Line::NotAMethod:
+            return refuse(outcome, 400, "Not an HTTP request: this server speaks plain HTTP.");
           case Line::TooLong:
             return refuse(outcome, 431, "A header line is too long.");
           case Line::HeadersTooLarge:

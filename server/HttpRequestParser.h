@@ -104,7 +104,8 @@ class HttpRequestParser {
 
  private:
   enum class Phase { Headers, Body, ChunkSize, ChunkData, ChunkEnd, Trailers, Refused };
-  enum class Line { Complete, Partial, TooLong, HeadersTooLarge };
+  // NotAMethod: the request line began with a byte no method has (as a TLS handshake does).
+  enum class Line { Complete, Partial, TooLong, HeadersTooLarge, NotAMethod };
 
   Line nextLine(size_t maxLength, size_t maxTotal, std::string& line);
   bool readHeaderLine(const std::string& line, Outcome& outcome);
@@ -127,6 +128,7 @@ class HttpRequestParser {
   std::string version_;
   size_t headerCount_ = 0;
   bool keepAlive_ = true;
+  bool inMethod_ = true;  // the bytes scanned are those of a request's method so far
   size_t contentLength_ = 0;
   size_t chunkLeft_ = 0;
   int refusedStatus_ = 0;
