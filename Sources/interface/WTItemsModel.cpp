@@ -53,6 +53,30 @@ Date timeOnDay(Date day, QTime time) {
   return RZDate::dateFromComponents(components);
 }
 
+// Where a start (or end) typed for `time` puts it on its day, or why it may not: `moved` is none when
+// the text is refused, and also when there is no such end to move (a running entry's end).
+struct MovedEnd {
+  std::optional<Date> moved;
+  QString refusal;
+};
+MovedEnd movedEnd(const WTTime& time, bool start, const QString& text) {
+  const std::optional<Date> day = start ? time.startDate() : time.endDate();
+  if (!day || (!start && time.running())) return {};
+  const std::optional<QTime> typed = typedTimeOfDay(text);
+  if (!typed)
+    return {{},
+            WTItemsModel::tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed())};
+  const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
+  const Date moved = timeOnDay(*day, *typed);
+  if (const QString asTyped = typed->toString(u"HH:mm"); clock(moved) != asTyped)
+    return {{}, WTItemsModel::tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped)};
+  if (start && !time.running() && time.endDate() && moved > *time.endDate())
+    return {{}, WTItemsModel::tr("The start would come after the end (%1).").arg(clock(*time.endDate()))};
+  if (!start && time.startDate() && moved < *time.startDate())
+    return {{}, WTItemsModel::tr("The end would come before the start (%1).").arg(clock(*time.startDate()))};
+  return {moved, {}};
+}
+
 // A day group's heading: weekday, day, month and year in the order and words of the user's locale
 // ("Tue 24 Nov 2026"), which a numeric short date ("11/24/26") leaves for the reader to work out.
 QString dayTitle(Date day) {
@@ -411,21 +435,7 @@ QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QStri
   if (role != StartTimeEditRole && role != EndTimeEditRole) return refusalFor(role, text);
   const Node* node = checkIndex(index, CheckIndexOption::IndexIsValid) ? nodeOf(index) : nullptr;
   if (!node || !node->object || node->object->entity() != WTEntity::Time) return {};
-  const auto* time = static_cast<const WTTime*>(node->object);
-  const bool start = role == StartTimeEditRole;
-  const std::optional<Date> day = start ? time->startDate() : time->endDate();
-  if (!day || (!start && time->running())) return {};
-  const std::optional<QTime> typed = typedTimeOfDay(text);
-  if (!typed) return tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed());
-  const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
-  const Date moved = timeOnDay(*day, *typed);
-  if (const QString asTyped = typed->toString(u"HH:mm"); clock(moved) != asTyped)
-    return tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped);
-  if (start && !time->running() && time->endDate() && moved > *time->endDate())
-    return tr("The start would come after the end (%1).").arg(clock(*time->endDate()));
-  if (!start && time->startDate() && moved < *time->startDate())
-    return tr("The end would come before the start (%1).").arg(clock(*time->startDate()));
-  return {};
+  return movedEnd(*static_cast<const WTTime*>(node->object), role == StartTimeEditRole, text).refusal;
 }
 
 bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int role) {
@@ -464,15 +474,13 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     }
     case StartTimeEditRole:
     case EndTimeEditRole: {
-      // Only the one end moves and the other stays: what refusalFor refuses changes nothing.
-      if (object->entity() != WTEntity::Time || !refusalFor(index, role, value.toString()).isEmpty())
-        return false;
+      if (object->entity() != WTEntity::Time) return false;
       auto* time = static_cast<WTTime*>(object);
       const bool start = role == StartTimeEditRole;
-      const std::optional<Date> day = start ? time->startDate() : time->endDate();
-      if (!day || (!start && time->running())) return false;
-      const Date moved = timeOnDay(*day, *typedTimeOfDay(value.toString()));
-      if (moved == (start ? *day : RZDate::beginOfMinute(*day))) return false;
+      // Only the one end moves and the other stays: what refusalFor refuses changes nothing.
+      const std::optional<Date> moved = movedEnd(*time, start, value.toString()).moved;
+      if (!moved || *moved == (start ? *time->startDate() : RZDate::beginOfMinute(*time->endDate())))
+        return false;
       start ? time->setStartDate(moved) : time->setEndDate(moved);
       return true;
     }
