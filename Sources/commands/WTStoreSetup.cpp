@@ -1,6 +1,5 @@
 #include "WTStoreSetup.h"
 
-#include "MoneyFormat.h"
 #include "RZSyncReplacedStore.h"
 #include "RZSyncTrack.h"
 #include "SettingsKeys.h"
@@ -46,10 +45,11 @@ Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
   return aside;
 }
 
+// No currency: where none is chosen, whoever bills takes the locale's when asked, and asking ICU for it
+// at every command's start would cost a timer's start a few percent.
 void registerDefaults(UserDefaults& defaults) {
   defaults.registerDefaults({{SettingsKeys::kInvoiceUnit, QStringLiteral("h")},
                              {SettingsKeys::kIdleTime, 5},
-                             {SettingsKeys::kCurrency, MoneyFormat::localeCurrency()},
                              {SettingsKeys::kRoundingMinutes, 1},
                              {SettingsKeys::kRoundingMode, QStringLiteral("nearest")}});
 }

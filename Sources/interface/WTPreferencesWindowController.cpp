@@ -361,6 +361,12 @@ void WTPreferencesWindowController::commitBillingDetails() {
   }
 }
 
+// Unchosen, it is the locale's, and stays so while the user leaves it alone.
+QString WTPreferencesWindowController::billingCurrency() const {
+  const QString currency = defaults_->stringForKey(SettingsKeys::kCurrency).trimmed().toUpper();
+  return currency.isEmpty() ? MoneyFormat::localeCurrency() : currency;
+}
+
 void WTPreferencesWindowController::commitCurrency() {
   const QString code = currencyComboBox_->currentText().trimmed().toUpper();
   const int index = currencyComboBox_->findData(code);
@@ -368,8 +374,7 @@ void WTPreferencesWindowController::commitCurrency() {
               tr("Not a currency: type its ISO 4217 code, such as EUR, USD or JPY"));
   if (index < 0) return;
   if (currencyComboBox_->currentText() != code) currencyComboBox_->setCurrentIndex(index);
-  if (code != defaults_->stringForKey(SettingsKeys::kCurrency))
-    defaults_->setValue(SettingsKeys::kCurrency, code);
+  if (code != billingCurrency()) defaults_->setValue(SettingsKeys::kCurrency, code);
 }
 
 void WTPreferencesWindowController::loadValues() {
@@ -400,9 +405,7 @@ void WTPreferencesWindowController::loadValues() {
 
   const QSignalBlocker currencyBlocker(currencyComboBox_);
   const QSignalBlocker roundingBlocker(roundingMinutesSpinBox_);
-  const QString currency = defaults_->stringForKey(SettingsKeys::kCurrency).trimmed().toUpper();
-  currencyComboBox_->setCurrentIndex(
-      currencyComboBox_->findData(currency.isEmpty() ? MoneyFormat::localeCurrency() : currency));
+  currencyComboBox_->setCurrentIndex(currencyComboBox_->findData(billingCurrency()));
   const qint64 rounding = defaults_->integerForKey(SettingsKeys::kRoundingMinutes);
   roundingMinutesSpinBox_->setValue(int(std::clamp<qint64>(rounding, 1, roundingMinutesSpinBox_->maximum())));
   const WTRoundingRule::Mode mode =

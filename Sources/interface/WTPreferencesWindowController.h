@@ -88,6 +88,7 @@ class WTPreferencesWindowController : public QDialog {
   void commitBillingDetails();
   // Stores the currency typed or chosen when ICU knows it; marks it refused otherwise.
   void commitCurrency();
+  QString billingCurrency() const;
   void updateSignUpButton();
   void passwordDidLoad();
   void updateKeychainNote();

@@ -197,6 +197,9 @@ TEST_F(WTPreferencesWindowTest, TheBillingPageStoresYourDetailsAndTheBillingDefa
   EXPECT_EQ(std::tuple(currency->currentText(), window->roundingMinutesSpinBox()->text(),
                        window->roundingModeComboBox()->isEnabled()),
             std::tuple(MoneyFormat::localeCurrency(), QString("None"), false));
+  // Confirmed as it shows, the locale's stays unchosen, to follow the locale.
+  type(currency->lineEdit(), MoneyFormat::localeCurrency(), true);
+  EXPECT_EQ(defaults->stringForKey("WTCurrency"), QString());
   for (const auto& [typed, stored, refused] : {std::tuple{"jpy", "JPY", false}, {"EURO", "JPY", true}}) {
     type(currency->lineEdit(), typed, true);
     EXPECT_EQ(
