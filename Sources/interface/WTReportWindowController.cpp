@@ -308,11 +308,15 @@ void WTReportWindowController::setMode(int mode) {
   }
 }
 
-QString WTReportWindowController::windowTitleForProjects() const {
-  if (client_) return tr("Report — %1").arg(client_->name());
+QString WTReportWindowController::reportSubject() const {
+  if (client_) return client_->name();
   const QList<WTProject*> projects = liveProjects();
-  if (projects.size() == 1) return tr("Report — %1").arg(projects.constFirst()->name());
-  return tr("Report");
+  return projects.size() == 1 ? projects.constFirst()->name() : QString();
+}
+
+QString WTReportWindowController::windowTitleForProjects() const {
+  const QString subject = reportSubject();
+  return subject.isEmpty() ? tr("Report") : tr("Report — %1").arg(subject);
 }
 
 void WTReportWindowController::refreshWebContent() {
@@ -427,7 +431,8 @@ Result<void> WTReportWindowController::savePDFToFile(const QString& path) const 
 void WTReportWindowController::saveWith(const QString& title, const QString& filter, const QString& suffix,
                                         Result<void> (WTReportWindowController::*write)(const QString&)
                                             const) {
-  const QString path = chooseSaveLocation_(this, title, filter, suffix);
+  const QString path = chooseSaveLocation_(
+      this, {title, filter, suffix, suggestedFileName(reportSubject().isEmpty() ? tr("Report") : reportSubject(), period(), suffix)});
   if (path.isEmpty()) return;
   const Result<void> written = (this->*write)(path);
   if (!written) QMessageBox::warning(this, title, written.error().message);

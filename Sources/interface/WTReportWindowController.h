@@ -118,6 +118,8 @@ class WTReportWindowController : public QWidget {
   void saveWith(const QString& title, const QString& filter, const QString& suffix,
                 Result<void> (WTReportWindowController::*write)(const QString&) const);
   QString windowTitleForProjects() const;
+  // The client or the one project reported on; empty for several projects.
+  QString reportSubject() const;
 
   QPointer<WTObjectContext> context_;
   QList<WTProject*> projects_;

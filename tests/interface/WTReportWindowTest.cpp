@@ -198,8 +198,9 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   openReport({web, backend});
   const QString csv = dir.filePath("report.csv"), html = dir.filePath("report.html");
   QStringList asked;
-  window->setSaveLocationChooser([&](QWidget*, const QString&, const QString& filter, const QString&) {
-    asked << filter;
+  window->setSaveLocationChooser([&](QWidget*, const WTSaveRequest& request) {
+    asked << request.filter;
+    EXPECT_EQ(request.suggestedName, "Report.csv");  // two projects, every day
     return asked.size() == 1 ? csv : QString();
   });
   window->setMode(1);
@@ -277,10 +278,15 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
     for (QString& line : records) line = line.section(u',', 0, 1);
     return records.join(u' ');
   };
-  exporter.setSaveLocationChooser(
-      [&](QWidget*, const QString&, const QString&, const QString&) { return path; });
+  QString suggested;
+  exporter.setSaveLocationChooser([&](QWidget*, const WTSaveRequest& request) {
+    suggested = request.suggestedName;
+    return path;
+  });
   exporter.projectChoice()->button(WTExportController::SelectedProject)->click();
   exporter.accept();
+  EXPECT_EQ(suggested, "Time entries 2024-03-03.csv");
+  EXPECT_EQ(suggestedFileName("Web/App", std::nullopt, "pdf"), "Web-App.pdf");
   EXPECT_EQ(exporter.result(), QDialog::Accepted);
   EXPECT_EQ(recordsIn(), "\"Website\",\"Design\"");  // 3 March's entry, not 4 March's
   selected = backend;
