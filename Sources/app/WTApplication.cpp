@@ -9,6 +9,7 @@
 #include "WTDialogTrackingAlertPresenter.h"
 #include "WTIdleSourceChain.h"
 #include "WTImages.h"
+#include "WTKeyboardContextMenu.h"
 #include "WTLauncherEntry.h"
 #include "WTMainWindowController.h"
 #include "WTObject.h"
@@ -31,6 +32,7 @@ WTApplication::WTApplication(int& argc, char** argv)
   setDesktopFileName(QStringLiteral("tessal"));
   setWindowIcon(WTImages::icon(QStringLiteral("tessal")));
   registerDefaults(*defaults_);
+  installEventFilter(new WTKeyboardContextMenu(this));
   delegate_ = std::make_unique<WTAppDelegate>(defaults_.get(), presenter_.get());
   delegate_->setSyncErrorPresenter(presenter_.get());
   connect(this, &QCoreApplication::aboutToQuit, delegate_.get(), &WTAppDelegate::applicationWillTerminate);

@@ -117,10 +117,10 @@ Result<int> WTExportController::exportToPath(const QString& path) const {
 void WTExportController::accept() {
   const WTProject* project = projectLimit();
   const QString suffix = QStringLiteral("csv");
-  const QString path = chooseSaveLocation_(
-      this, {tr("Export"), tr("CSV files (*.csv)"), suffix,
-             suggestedFileName(project ? project->name() : tr("Time entries"), rangeButton_->selectedPeriod(),
-                               suffix)});
+  const QString path =
+      chooseSaveLocation_(this, {tr("Export"), tr("CSV files (*.csv)"), suffix,
+                                 suggestedFileName(project ? project->name() : tr("Time entries"),
+                                                   rangeButton_->selectedPeriod(), suffix)});
   if (path.isEmpty()) return;  // the choices stay on screen for another try
   const Result<int> written = exportToPath(path);
   if (!written) {

@@ -57,8 +57,12 @@ void WTListView::mousePressEvent(QMouseEvent* event) {
 }
 
 void WTListView::contextMenuEvent(QContextMenuEvent* event) {
-  const QModelIndex index = indexAt(event->pos());
-  emit contextMenuRequestedForRow(index.isValid() ? index.row() : -1, event->globalPos());
+  // From the keyboard, the menu is the current row's, under it.
+  const bool keyboard = event->reason() == QContextMenuEvent::Keyboard;
+  const QModelIndex index = keyboard ? currentIndex() : indexAt(event->pos());
+  const QPoint global = keyboard && index.isValid() ? viewport()->mapToGlobal(visualRect(index).bottomLeft())
+                                                    : event->globalPos();
+  emit contextMenuRequestedForRow(index.isValid() ? index.row() : -1, global);
 }
 
 void WTListView::paintEvent(QPaintEvent* event) {

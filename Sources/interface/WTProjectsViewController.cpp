@@ -59,6 +59,11 @@ QMenu* WTProjectsViewController::clientMenu(WTProject* project) {
   auto* menu = new QMenu(tableView());
   menu->setObjectName(QStringLiteral("clientMenu"));
   menu->setAttribute(Qt::WA_DeleteOnClose);
+  fillClientMenu(menu, project);
+  return menu;
+}
+
+void WTProjectsViewController::fillClientMenu(QMenu* menu, WTProject* project) {
   auto* group = new QActionGroup(menu);
   auto add = [&](const QString& title, WTClient* client) {
     QAction* action = menu->addAction(title);
@@ -87,7 +92,6 @@ QMenu* WTProjectsViewController::clientMenu(WTProject* project) {
   }
   menu->addSeparator();
   menu->addAction(tr("Edit Clients…"), this, &WTProjectsViewController::openClients);
-  return menu;
 }
 
 void WTProjectsViewController::partActivated(const QModelIndex& index, WTTableCellView::Part part,
@@ -107,6 +111,12 @@ void WTProjectsViewController::addRowMenuItems(QMenu* menu) {
   });
   menu->addAction(WTBillingDialog::menuTitle(WTEntity::Project), this, [this] {
     if (WTObject* project = clickedObject()) WTBillingDialog::editBilling(project, tableView());
+  });
+  // The chooser under the project's name, for the keyboard too.
+  QMenu* client = menu->addMenu(tr("Client"));
+  connect(client, &QMenu::aboutToShow, this, [this, client] {
+    client->clear();
+    if (WTObject* project = clickedObject()) fillClientMenu(client, static_cast<WTProject*>(project));
   });
   menu->addSeparator();
 }

@@ -36,6 +36,8 @@ class WTProjectsViewController : public WTObjectListViewController {
   void addRowMenuItems(QMenu* menu) override;
 
  private:
+  void fillClientMenu(QMenu* menu, WTProject* project);
+
   WTObjectListModel* clientsModel_;
   WTItemsViewController* itemsViewController_ = nullptr;
 };

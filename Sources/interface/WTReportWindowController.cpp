@@ -432,7 +432,9 @@ void WTReportWindowController::saveWith(const QString& title, const QString& fil
                                         Result<void> (WTReportWindowController::*write)(const QString&)
                                             const) {
   const QString path = chooseSaveLocation_(
-      this, {title, filter, suffix, suggestedFileName(reportSubject().isEmpty() ? tr("Report") : reportSubject(), period(), suffix)});
+      this,
+      {title, filter, suffix,
+       suggestedFileName(reportSubject().isEmpty() ? tr("Report") : reportSubject(), period(), suffix)});
   if (path.isEmpty()) return;
   const Result<void> written = (this->*write)(path);
   if (!written) QMessageBox::warning(this, title, written.error().message);

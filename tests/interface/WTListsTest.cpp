@@ -1,5 +1,9 @@
 #include "UiFixture.h"
 #include "WTDeletion.h"
+#include "WTKeyboardContextMenu.h"
+
+#include <QApplication>
+#include <QTimer>
 
 namespace {
 
@@ -214,7 +218,8 @@ TEST_F(WTListControllerTest, TheRowMenuAndTheToolbarActOnTheClickedOrLastSelecte
   EXPECT_EQ(context->undoManager().undoActionName(), "Delete “A”");
 }
 
-// The client chooser offers clients not archived; a project opens in an outline, reused next time.
+// The client chooser offers clients not archived, and Shift+F10 reaches it in the current row's menu; a
+// project opens in an outline, reused next time.
 TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   auto* first = makeProject("First");
   makeTask(first, "Only task");
@@ -222,12 +227,27 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   auto* acme = makeClient("ACME");
   makeClient("Gone")->setArchived(true);
   endTurn();
-  std::unique_ptr<QMenu> menu(projects->clientMenu(second));
+  WTKeyboardContextMenu keyboardMenus;
+  qApp->installEventFilter(&keyboardMenus);
+  QListView* list = projects->tableView();
+  list->setCurrentIndex(projects->arrayController()->indexOfObject(second));
   QStringList titles;
-  for (const QAction* action : menu->actions()) titles << action->text();
+  QTimer::singleShot(0, [&] {
+    auto* rowMenu = qobject_cast<QMenu*>(QApplication::activePopupWidget());
+    QMenu* chooser =
+        rowMenu && actionTitled(rowMenu, "Client") ? actionTitled(rowMenu, "Client")->menu() : nullptr;
+    if (chooser) {
+      emit chooser->aboutToShow();
+      for (const QAction* action : chooser->actions()) titles << action->text();
+      actionTitled(chooser, "ACME")->trigger();
+    }
+    if (rowMenu) rowMenu->close();
+  });
+  QTest::keyClick(list, Qt::Key_F10, Qt::ShiftModifier);
+  qApp->removeEventFilter(&keyboardMenus);
   EXPECT_EQ(titles, (QStringList{"No Client", "", "ACME", "", "Edit Clients…"}));
-  actionTitled(menu.get(), "ACME")->trigger();
   EXPECT_EQ(second->client(), acme);
+  shown->window.activateWindow();  // the closed menu leaves none active here
 
   WTNavigationController& stack = shown->stack;
   projects->openProject(first);
