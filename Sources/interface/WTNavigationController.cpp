@@ -2,6 +2,7 @@
 
 #include "WTViewController.h"
 
+#include <QApplication>
 #include <QEasingCurve>
 #include <QParallelAnimationGroup>
 #include <QPropertyAnimation>
@@ -94,11 +95,15 @@ void WTNavigationController::popViewController() {
 
 void WTNavigationController::replaceView(QWidget* old, QWidget* next, bool push) {
   QWidget* stack = view();
+  // The keyboard goes on in the view shown, not wherever Qt sends it when the old one hides.
+  const QWidget* focused = QApplication::focusWidget();
+  const bool keepsFocus = focused && (focused == old || old->isAncestorOf(focused));
   const int width = stack->width();
   const QRect bounds = stack->rect();
   next->setGeometry(bounds.translated(push ? width : -width, 0));
   next->show();
   next->raise();
+  if (keepsFocus) next->setFocus(Qt::OtherFocusReason);
   if (!stack->isVisible() || width <= 0) {
     // Nothing to watch: end in the final state at once.
     next->setGeometry(bounds);

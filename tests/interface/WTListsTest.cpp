@@ -4,6 +4,7 @@
 
 #include <QApplication>
 #include <QTimer>
+#include <QTreeView>
 
 namespace {
 
@@ -250,6 +251,7 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   shown->window.activateWindow();  // the closed menu leaves none active here
 
   WTNavigationController& stack = shown->stack;
+  list->setFocus();
   projects->openProject(first);
   ASSERT_TRUE(QTest::qWaitFor([&] { return stack.viewControllers().size() == 2; }));
   WTItemsViewController* items = projects->itemsViewController();
@@ -257,8 +259,11 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   EXPECT_EQ(items->treeController()->index(0, 0).data(WTItemsModel::NameRole).toString(), "Only task");
   ASSERT_TRUE(QTest::qWaitFor([&] { return !stack.isAnimating(); }, 2000));
   EXPECT_TRUE(items->view()->isVisible() && !projects->view()->isVisible());
+  // The keyboard goes on in the outline, not in the project's rate field, and back in the list.
+  EXPECT_TRUE(qobject_cast<QTreeView*>(QApplication::focusWidget()));
   stack.popViewController();
   stack.finishAnimation();
+  EXPECT_EQ(QApplication::focusWidget(), list);
   stack.popViewController();  // the root stays
   EXPECT_TRUE(projects->view()->isVisible() && !items->view()->isVisible());
   projects->openProject(second);
