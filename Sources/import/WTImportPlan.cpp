@@ -153,6 +153,29 @@ void placeRates(ClientNode& client, WTImportPlan& plan) {
   }
 }
 
+// An entry of the same task over the same minutes is the same entry, whichever file brings it again:
+// Tessal's own spreadsheet read back in (its entries carry no import id), or another tracker's export of
+// work also tracked here.
+QString sameEntryKey(const QString& client, const QString& project, const QString& task, const Date& start,
+                     const Date& end) {
+  return QStringList{client.toCaseFolded(), project.toCaseFolded(), task.toCaseFolded(),
+                     QString::number(qint64(start.secondsSince1970() / 60)),
+                     QString::number(qint64(end.secondsSince1970() / 60))}
+      .join(u'\x1f');
+}
+
+QSet<QString> sameEntryKeys(const QList<WTTime*>& times) {
+  QSet<QString> keys;
+  for (const WTTime* time : times) {
+    const WTTask* task = time->task();
+    const WTProject* project = task ? task->project() : nullptr;
+    if (!project || !time->startDate() || !time->endDate() || time->running()) continue;
+    keys.insert(sameEntryKey(project->client() ? project->client()->name() : QString(), project->name(),
+                             task->name(), *time->startDate(), *time->endDate()));
+  }
+  return keys;
+}
+
 QString notesFor(const WTImportRow& row) {
   QStringList lines;
   if (!row.notes.isEmpty()) lines.append(row.notes);
@@ -169,6 +192,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
   present.reserve(times.size() + qsizetype(file.rows.size()));
   for (const WTTime* time : times)
     if (!time->importId().isNull()) present.insert(time->importId());
+  QSet<QString> tracked = sameEntryKeys(times);
 
   const QList<WTClient*> clients = context.fetch<WTClient>();
   const QList<WTProject*> loneProjects =
@@ -190,11 +214,15 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
       stopped.back().end = std::max(*row->lastKnown, row->start);
       row = &stopped.back();
     }
-    if (present.contains(row->importId)) {
+    const QString projectName = row->project.isEmpty() ? kNoProject : row->project;
+    const QString taskName = row->task.isEmpty() ? kDefaultTask : row->task;
+    const QString sameEntry = sameEntryKey(row->client, projectName, taskName, row->start, *row->end);
+    if (present.contains(row->importId) || tracked.contains(sameEntry)) {
       ++plan.alreadyThere;
       continue;
     }
     present.insert(row->importId);
+    tracked.insert(sameEntry);
 
     auto [clientIt, newClient] = nodes.try_emplace(row->client.toCaseFolded());
     ClientNode& client = clientIt->second;
@@ -204,7 +232,6 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
       if (!row->client.isEmpty()) client.existing = named(clients, row->client);
       order.push_back(&client);
     }
-    const QString projectName = row->project.isEmpty() ? kNoProject : row->project;
     auto [projectIt, newProject] = client.projects.try_emplace(projectName.toCaseFolded());
     ProjectNode& project = projectIt->second;
     if (newProject) {
@@ -214,7 +241,6 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
       else if (row->client.isEmpty())
         project.existing = named(loneProjects, projectName);
     }
-    const QString taskName = row->task.isEmpty() ? kDefaultTask : row->task;
     auto [taskIt, newTask] = project.tasks.try_emplace(taskName.toCaseFolded());
     TaskNode& task = taskIt->second;
     if (newTask) {

@@ -85,7 +85,8 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
 }
 
 // Tessal's spreadsheet of a store, imported into an empty store, gives the same entries: names and notes
-// with commas, quotes and line breaks, a project without client, an entry past midnight.
+// with commas, quotes and line breaks, a project without client, an entry past midnight. Read back into
+// the store it came from, it adds none.
 TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries) {
   auto* client = makeClient(QStringLiteral("ACME, \"West\""));
   auto* site = makeProject(QStringLiteral("Site; new"), client);
@@ -133,6 +134,8 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
   buffer.open(QIODevice::ReadOnly);
   const WTImportFile file = read(buffer);
   EXPECT_EQ(file.format, QStringLiteral("tessal"));
+  const WTImportPlan back = WTImport::plan(*context, file, {});
+  EXPECT_EQ(std::pair(back.entries, back.alreadyThere), std::pair(0, 3));
 
   WTObjectContext empty(defaults.get());
   auto store = WTStore::open(dir.filePath(QStringLiteral("empty.sqlite")));
