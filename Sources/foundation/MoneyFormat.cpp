@@ -1,6 +1,8 @@
 #include "MoneyFormat.h"
 
+#include <QCoreApplication>
 #include <QHash>
+#include <QRegularExpression>
 #include <QVarLengthArray>
 
 #include <unicode/dcfmtsym.h>
@@ -8,6 +10,7 @@
 #include <unicode/locid.h>
 #include <unicode/ucurr.h>
 
+#include <algorithm>
 #include <array>
 #include <memory>
 
@@ -179,6 +182,60 @@ TypedNumber::Reading parse(const QString& typed, const icu::Locale& locale) {
 
 TypedNumber::Reading parse(const QString& typed) {
   return parse(typed, icu::Locale::getDefault());
+}
+
+namespace {
+
+// The code and the signs `locale` writes `currency` with ("CHF"; "EUR", "€"; "USD", "US$", "$").
+QStringList signsOf(const QString& currency, const icu::Locale& locale) {
+  QStringList signs{currency};
+  const std::u16string code = currency.toStdU16String();
+  for (const UCurrNameStyle style : {UCURR_SYMBOL_NAME, UCURR_NARROW_SYMBOL_NAME}) {
+    UErrorCode status = U_ZERO_ERROR;
+    int32_t length = 0;
+    const UChar* name = ucurr_getName(code.c_str(), locale.getName(), style, nullptr, &length, &status);
+    const QString sign =
+        U_SUCCESS(status) ? QString(reinterpret_cast<const QChar*>(name), length) : QString();
+    if (!sign.isEmpty() && !signs.contains(sign)) signs.append(sign);
+  }
+  // The longest first: "US$" is not "$" with "US" left over.
+  std::stable_sort(signs.begin(), signs.end(),
+            [](const QString& a, const QString& b) { return a.size() > b.size(); });
+  return signs;
+}
+
+bool namesACurrency(const QString& text) {
+  static const QRegularExpression code(QStringLiteral("\\b[A-Z]{3}\\b"));
+  return std::any_of(text.begin(), text.end(),
+                     [](QChar c) { return c.category() == QChar::Symbol_Currency; }) ||
+         code.match(text).hasMatch();
+}
+
+}  // namespace
+
+TypedNumber::Reading parse(const QString& typed, const QString& currency, const icu::Locale& locale) {
+  const QStringList signs = signsOf(currency, locale);
+  TypedNumber::Reading reading = TypedNumber::read(typed, locale, signs);
+  if (!reading.taken() && namesACurrency(typed)) {
+    reading.refusal =
+        QCoreApplication::translate("MoneyFormat", "Billed in %1: type the amount alone or with “%2”")
+            .arg(currency, signs.size() > 1 ? signs.constLast() : currency);
+  }
+  return reading;
+}
+
+TypedNumber::Reading parseAmount(const QString& typed, const QString& currency) {
+  TypedNumber::Reading reading = parse(typed, currency);
+  const int places = minorUnitDigits(currency);
+  if (reading.value && reading.value->rounded(places) != *reading.value) {
+    reading.value.reset();
+    reading.refusal =
+        places == 0 ? QCoreApplication::translate("MoneyFormat", "%1 is billed in whole units").arg(currency)
+                    : QCoreApplication::translate("MoneyFormat", "%1 is billed to %2 decimal places")
+                          .arg(currency)
+                          .arg(places);
+  }
+  return reading;
 }
 
 }  // namespace MoneyFormat

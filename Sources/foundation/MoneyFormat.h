@@ -35,4 +35,12 @@ QString format(const Decimal& amount, const icu::Locale& locale);
 TypedNumber::Reading parse(const QString& typed, const icu::Locale& locale);
 // In the user's locale.
 TypedNumber::Reading parse(const QString& typed);
+// Money typed for what bills in `currency` (ISO 4217): its code or its signs in `locale` may stand around
+// the amount; another currency's sign is refused, saying which currency it bills in, never taken as this
+// one's.
+TypedNumber::Reading parse(const QString& typed, const QString& currency,
+                           const icu::Locale& locale = icu::Locale::getDefault());
+// The same for an amount billed as typed (an expense): refused too when finer than `currency` bills, as
+// half a yen is.
+TypedNumber::Reading parseAmount(const QString& typed, const QString& currency);
 }  // namespace MoneyFormat

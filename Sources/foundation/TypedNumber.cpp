@@ -110,10 +110,14 @@ qsizetype signAt(const QString& text, qsizetype at, const QString& sign) {
 }  // namespace
 
 Reading read(const QString& typed, const icu::Locale& locale, bool currency) {
+  return read(typed, locale, currency ? signsOf(locale).currencies : QStringList());
+}
+
+Reading read(const QString& typed, const icu::Locale& locale, const QStringList& currencySigns) {
   QString text = typed.trimmed();
   if (text.isEmpty()) return {};
   const Signs& signs = signsOf(locale);
-  for (const QString& sign : currency ? signs.currencies : QStringList()) {
+  for (const QString& sign : currencySigns) {
     // A currency sign alone is no amount, and is refused below as text that is not a number.
     if (text.size() > sign.size() && text.startsWith(sign)) {
       text = text.mid(sign.size()).trimmed();

@@ -3,6 +3,7 @@
 #include "Decimal.h"
 
 #include <QString>
+#include <QStringList>
 
 #include <unicode/locid.h>
 
@@ -26,6 +27,8 @@ struct Reading {
 // other sign, exponents, and more digits than a Decimal holds exactly. With `currency`, the locale's
 // currency sign (or code) may stand before or after the number.
 Reading read(const QString& typed, const icu::Locale& locale, bool currency = false);
+// The same with `currencySigns` (one currency's code and symbols) allowed before or after the number.
+Reading read(const QString& typed, const icu::Locale& locale, const QStringList& currencySigns);
 // In the user's locale (ICU's default, as everything shown is formatted).
 Reading read(const QString& typed);
 

@@ -45,9 +45,9 @@ struct Parsed {
   QString refusal;
 };
 
-// Money in the user's locale, as a rate is read, and not below zero; empty: no budget.
-Parsed<std::optional<Decimal>> parseBudget(const QString& typed) {
-  const TypedNumber::Reading reading = MoneyFormat::parse(typed);
+// Money in the user's locale and `currency`, as a rate is read, and not below zero; empty: no budget.
+Parsed<std::optional<Decimal>> parseBudget(const QString& typed, const QString& currency) {
+  const TypedNumber::Reading reading = MoneyFormat::parse(typed, currency);
   if (!reading.taken()) return {false, std::nullopt, reading.refusal};
   if (reading.value && reading.value->isNegative())
     return {false, std::nullopt, QObject::tr("Not a budget: a budget is never below zero")};
@@ -200,7 +200,11 @@ void WTBillingDialog::accept() {
   }
   Parsed<std::optional<Decimal>> budget{true, std::nullopt, {}};
   if (budgetField_) {
-    budget = parseBudget(budgetField_->text());
+    // In the currency the dialog sets, when it sets one.
+    QString billedIn = billingRecord(object_)->billingCurrency();
+    if (currencyField_)
+      billedIn = currency.value.isEmpty() ? object_->context()->billingDefaults().currency : currency.value;
+    budget = parseBudget(budgetField_->text(), billedIn);
     if (!budget.valid) return refuse(budgetField_, budget.refusal);
   }
   const Parsed<std::optional<int>> minutes = parseMinutes(minutesField_->text());

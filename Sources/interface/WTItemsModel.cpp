@@ -424,16 +424,19 @@ QString WTItemsModel::billedText(std::optional<std::pair<int, int>> durations, c
 
 QString WTItemsModel::refusalFor(int role, const QString& text) {
   QString refusal;
-  if (role == DurationEditRole)
-    DurationText::minutesFromTypedText(text, &refusal);
-  else if (role == AmountEditRole)
-    refusal = MoneyFormat::parse(text).refusal;
+  if (role == DurationEditRole) DurationText::minutesFromTypedText(text, &refusal);
   return refusal;
 }
 
 QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QString& text) const {
-  if (role != StartTimeEditRole && role != EndTimeEditRole) return refusalFor(role, text);
+  if (role != StartTimeEditRole && role != EndTimeEditRole && role != AmountEditRole)
+    return refusalFor(role, text);
   const Node* node = checkIndex(index, CheckIndexOption::IndexIsValid) ? nodeOf(index) : nullptr;
+  if (role == AmountEditRole) {
+    if (!node || !node->object || node->object->entity() != WTEntity::Expense) return {};
+    return MoneyFormat::parseAmount(text, static_cast<const WTExpense*>(node->object)->billingCurrency())
+        .refusal;
+  }
   if (!node || !node->object || node->object->entity() != WTEntity::Time) return {};
   return movedEnd(*static_cast<const WTTime*>(node->object), role == StartTimeEditRole, text).refusal;
 }
@@ -493,9 +496,11 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     }
     case AmountEditRole: {
       if (object->entity() != WTEntity::Expense) return false;
-      const TypedNumber::Reading amount = MoneyFormat::parse(value.toString());
+      auto* expense = static_cast<WTExpense*>(object);
+      const TypedNumber::Reading amount =
+          MoneyFormat::parseAmount(value.toString(), expense->billingCurrency());
       if (!amount.taken()) return false;
-      static_cast<WTExpense*>(object)->setExpense(amount.value);
+      expense->setExpense(amount.value);
       return true;
     }
     case CompletedRole:

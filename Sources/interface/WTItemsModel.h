@@ -106,11 +106,11 @@ class WTItemsModel : public QAbstractItemModel {
   // where its text or the duration differs (raw durations first, billed second); empty where all agree.
   static QString billedText(std::optional<std::pair<int, int>> durations, const Decimal& cost,
                             const Decimal& billed, const QString& currency);
-  // Why `text` set under `role` (a duration or an amount) would be refused, for the person who typed
-  // it; empty when it would be taken.
+  // Why `text` set under `role` (a duration) would be refused, for the person who typed it; empty when it
+  // would be taken.
   static QString refusalFor(int role, const QString& text);
-  // The same for the row at `index`, which also answers a start or end time of day: one that is not a
-  // time, or that would put the start after the end.
+  // The same for the row at `index`, which also answers an expense's amount (in its currency) and a start
+  // or end time of day: one that is not a time, or that would put the start after the end.
   QString refusalFor(const QModelIndex& index, int role, const QString& text) const;
   Qt::ItemFlags flags(const QModelIndex& index) const override;
 

@@ -493,7 +493,7 @@ void WTPreferencesWindowController::commitServer() {
 }
 
 void WTPreferencesWindowController::commitDefaultRate() {
-  const WTRateField::Parsed parsed = WTRateField::parse(defaultRateField_->text());
+  const WTRateField::Parsed parsed = WTRateField::parse(defaultRateField_->text(), billingCurrency());
   WTRateField::setRefused(defaultRateField_, parsed.refusal);
   if (!parsed.valid) return;
   const std::optional<Decimal> stored = defaults_->decimalForKey(SettingsKeys::kDefaultRate);

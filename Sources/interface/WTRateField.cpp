@@ -23,14 +23,18 @@ const char* const kRefusedProperty = "rateRefused";
 
 }  // namespace
 
-QString placeholder(const WTObject* object) {
-  // In the places of the currency the record bills in (every client, project and task answers it).
-  const QString currency = object->valueForKey(QStringLiteral("billingCurrency")).toString();
-  return QObject::tr("Inherited: %1").arg(MoneyFormat::formatRate(object->rateFromAbove(), currency));
+// The currency the record bills in (every client, project and task answers it).
+QString currencyOf(const WTObject* object) {
+  return object->valueForKey(QStringLiteral("billingCurrency")).toString();
 }
 
-Parsed parse(const QString& typed) {
-  const TypedNumber::Reading reading = MoneyFormat::parse(typed);
+QString placeholder(const WTObject* object) {
+  return QObject::tr("Inherited: %1")
+      .arg(MoneyFormat::formatRate(object->rateFromAbove(), currencyOf(object)));
+}
+
+Parsed parse(const QString& typed, const QString& currency) {
+  const TypedNumber::Reading reading = MoneyFormat::parse(typed, currency);
   if (!reading.taken()) return {false, std::nullopt, reading.refusal};
   if (reading.value && reading.value->isNegative())
     return {false, std::nullopt, QObject::tr("Not a rate: a rate is never below zero")};
@@ -69,7 +73,7 @@ bool isRefused(const QLineEdit* field) {
 }
 
 bool apply(QLineEdit* field, WTObject* object) {
-  const Parsed parsed = parse(field->text());
+  const Parsed parsed = parse(field->text(), currencyOf(object));
   setRefused(field, parsed.refusal);
   if (!parsed.valid) return false;
   if (object->storedRate() != parsed.rate) {

@@ -23,8 +23,8 @@ struct Parsed {
   std::optional<Decimal> rate;  // empty: inherit
   QString refusal;              // why the text is not a rate, when it is not
 };
-// Money in the user's locale, as MoneyFormat::parse reads it, and not negative.
-Parsed parse(const QString& text);
+// Money in the user's locale and in `currency`, as MoneyFormat::parse reads it, and not negative.
+Parsed parse(const QString& text, const QString& currency);
 
 // What a field shows for `rate`: the money format when it reads back as the same rate, else the exact
 // number, so that leaving the field untouched never changes a rate by rounding it.

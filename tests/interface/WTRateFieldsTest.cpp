@@ -158,6 +158,16 @@ TEST_F(WTRateFieldsTest, EachFieldStoresWhatItTakesAndKeepsWhatItRefusesInView) 
                 Outcome(money ? dec("1250.5") : Decimal(75), refused));
     }
   }
+  // Billed in francs, an amount in euros is refused, never taken as francs; the preference bills in the
+  // locale's euros.
+  acme->setCurrency("CHF");
+  const UserLocale german("de_DE");
+  endTurn();
+  for (const std::string field : {"project", "client", "budget", "expense", "preferences"}) {
+    const bool refused = field != "preferences";
+    EXPECT_EQ(fields.at(field)("EUR 2.000"), Outcome(refused ? dec("1250.5") : Decimal(2000), refused))
+        << field;
+  }
   // Berlin's clocks skip from 2:00 to 3:00 that night: an end at 2:30 would be stored as 3:30.
   auto* spring = makeItem<WTTime>(design, "Spring", at(2024, 3, 31, 1, 10));
   endTurn();
