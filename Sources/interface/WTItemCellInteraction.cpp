@@ -286,7 +286,10 @@ bool WTItemCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,
     const auto* items = static_cast<const WTItemsModel*>(model);
     if (part == Part::Duration) {
       setEditField(Field::Duration);
-    } else if (part == Part::Cost && items->kindAt(index) == QLatin1String("WTExpense")) {
+    } else if (part == Part::Cost) {
+      // Only an expense's amount is typed; any other comes from a duration. The name editor that a
+      // double click opens elsewhere would take the digits typed for an amount as the name.
+      if (items->kindAt(index) != QLatin1String("WTExpense")) return true;
       setEditField(Field::Amount);
     } else if (part == Part::Label && items->kindAt(index) == QLatin1String("WTTime")) {
       setEditField(Field::Start);

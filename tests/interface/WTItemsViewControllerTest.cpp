@@ -250,6 +250,9 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
     EXPECT_EQ(span(time), row.after) << row.typed;
   }
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));  // on the same day
+  // An amount that comes from the duration opens nothing, not the name's editor.
+  QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, shown->centreOf(time, Part::Cost));
+  EXPECT_EQ(shown->openEditor(), nullptr);
 
   controller->cellDelegate()->setEditField(Field::Start);
   outline()->edit(rowOf(time));
