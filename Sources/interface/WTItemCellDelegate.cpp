@@ -161,10 +161,10 @@ void WTItemCellDelegate::paintTask(QPainter& painter, const QStyleOptionViewItem
 
   painter.setFont(option.font);
   painter.setPen(textColour(option));
-  painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::DurationTextRole).toString());
-  painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::CostTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Duration, row,
+                  index.data(WTItemsModel::DurationTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Cost, row,
+                  index.data(WTItemsModel::CostTextRole).toString());
   if (const QVariant budget = index.data(WTItemsModel::BudgetRole); budget.isValid()) {
     WTBudgetBar::paint(painter, cell.partRect(WTTableCellView::Part::BudgetBar, row),
                        budget.value<WTBudgetState>(), option.palette, selected);
@@ -198,10 +198,10 @@ void WTItemCellDelegate::paintContainer(QPainter& painter, const QStyleOptionVie
   painter.setFont(bold);
   painter.setPen(Qt::white);
   painter.drawText(title, Qt::AlignLeft | Qt::AlignVCenter, index.data(WTItemsModel::NameRole).toString());
-  painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::DurationTextRole).toString());
-  painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::CostTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Duration, row,
+                  index.data(WTItemsModel::DurationTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Cost, row,
+                  index.data(WTItemsModel::CostTextRole).toString());
 }
 
 void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem& option,
@@ -262,12 +262,12 @@ void WTItemCellDelegate::paintItem(QPainter& painter, const QStyleOptionViewItem
   totals.setBold(running);
   painter.setFont(totals);
   painter.setPen(running && !isSelected(option) ? QColor(0x2f, 0x9e, 0x44) : textColour(option));
-  painter.drawText(cell.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::DurationTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Duration, row,
+                  index.data(WTItemsModel::DurationTextRole).toString());
   painter.setFont(option.font);
   painter.setPen(textColour(option));
-  painter.drawText(cell.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
-                   index.data(WTItemsModel::CostTextRole).toString());
+  cell.drawFigure(painter, WTTableCellView::Part::Cost, row,
+                  index.data(WTItemsModel::CostTextRole).toString());
   if (running) {
     const QRectF stop = cell.partRect(WTTableCellView::Part::TimerButton, row);
     drawImage(painter, stop.adjusted(3, 3, -3, -3), QStringLiteral("stop_32"));

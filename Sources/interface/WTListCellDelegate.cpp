@@ -76,10 +76,10 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
 
   painter->setFont(option.font);
   painter->setPen(text);
-  painter->drawText(cell_.partRect(WTTableCellView::Part::Duration, row), Qt::AlignRight | Qt::AlignVCenter,
-                    index.data(WTObjectListModel::DurationTextRole).toString());
-  painter->drawText(cell_.partRect(WTTableCellView::Part::Cost, row), Qt::AlignRight | Qt::AlignVCenter,
-                    index.data(WTObjectListModel::CostTextRole).toString());
+  cell_.drawFigure(*painter, WTTableCellView::Part::Duration, row,
+                   index.data(WTObjectListModel::DurationTextRole).toString());
+  cell_.drawFigure(*painter, WTTableCellView::Part::Cost, row,
+                   index.data(WTObjectListModel::CostTextRole).toString());
   if (const QVariant budget = index.data(WTObjectListModel::BudgetRole); budget.isValid()) {
     WTBudgetBar::paint(*painter, cell_.partRect(WTTableCellView::Part::BudgetBar, row),
                        budget.value<WTBudgetState>(), option.palette, selected);

@@ -5,6 +5,8 @@
 
 #include <QApplication>
 #include <QFontDatabase>
+#include <QFontMetricsF>
+#include <QPainter>
 
 #include <algorithm>
 
@@ -209,4 +211,14 @@ std::optional<WTTableCellView::Part> WTTableCellView::partAt(const QPointF& poin
     if (partRect(part, row).contains(point)) return part;
   }
   return std::nullopt;
+}
+
+void WTTableCellView::drawFigure(QPainter& painter, Part part, const QRectF& row, const QString& text) const {
+  const QRectF rect = partRect(part, row);
+  painter.drawText(rect, Qt::AlignRight | Qt::AlignVCenter,
+                   fittedFigure(QFontMetricsF(painter.font()), text, rect.width()));
+}
+
+QString WTTableCellView::fittedFigure(const QFontMetricsF& metrics, const QString& text, qreal width) {
+  return metrics.elidedText(text, Qt::ElideRight, width);
 }
