@@ -87,13 +87,17 @@ void WTApplication::applicationDidFinishLaunching() {
   budgetWatcher_ = std::make_unique<WTBudgetWatcher>(updater);
   notifier_ = std::make_unique<WTDesktopNotifier>(QDBusConnection::sessionBus());
   linkBudgetNotices(*budgetWatcher_, *notifier_, *window);
+  presenter_->setNoticeSink([notifier = notifier_.get()](const QString& summary, const QString& body) {
+    notifier->notify(summary, body);
+  });
   // Only now, with the window and the store up, and only for an account: the keyring may prompt, and is
   // asked in the background. A password an earlier version kept in the settings file moves into it.
   delegate_->passwordStore()->load();
 }
 
 void WTApplication::linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window) {
-  connect(&statusBar, &WTStatusBarController::showMainWindowRequested, &window, &WTMainWindowController::bringToFront);
+  connect(&statusBar, &WTStatusBarController::showMainWindowRequested, &window,
+          &WTMainWindowController::bringToFront);
   connect(&statusBar, &WTStatusBarController::quitRequested, &window, &WTMainWindowController::quit);
   connect(&window, &WTMainWindowController::runningTimeButtonClicked, &statusBar,
           &WTStatusBarController::statusBarClicked);

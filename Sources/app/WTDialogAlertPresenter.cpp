@@ -73,5 +73,11 @@ void WTDialogAlertPresenter::presentSyncError(const QString& message) {
 }
 
 void WTDialogAlertPresenter::presentNetworkError(const QString& message) {
-  presentError(message);
+  const QString summary = QCoreApplication::translate("RZSyncManager", "Sync cannot reach the server");
+  const QString body =
+      QCoreApplication::translate("RZSyncManager",
+                                  "%1. Your changes are kept here and sent when the server answers again.")
+          .arg(message);
+  if (noticeSink_) return noticeSink_(summary, body);
+  presentError(summary + u'\n' + body);
 }

@@ -229,8 +229,8 @@ void RZSyncManager::syncNetworkReceivedJSONObject(RZSyncNetwork* network, const 
   if (reply.error) {
     if (reply.code != 4) {
       const QString message = QStringLiteral("%1 - (Code: %2)").arg(*reply.error).arg(reply.code);
+      disableSync();  // first: nothing polls again while the refusal is on screen
       presenter_->presentSyncError(message);
-      disableSync();
       exchange.outcome = RZSyncExchange::Outcome::Refused;
       exchange.message = message;
       return finish(exchange);
@@ -312,8 +312,9 @@ void RZSyncManager::finish(RZSyncExchange exchange) {
 
 void RZSyncManager::syncNetworkDidFailWithError(RZSyncNetwork*, const QString& error) {
   const Request answered = std::exchange(inFlight_, {});
-  if (!networkError_) presenter_->presentNetworkError(error);
-  networkError_ = true;
+  // The run is marked before it is shown: a box waits for the user while polls and saves go on failing,
+  // and each would have stacked a box of its own.
+  if (!std::exchange(networkError_, true)) presenter_->presentNetworkError(error);
   if (syncEnabled_) rescheduleTimer(intervals_.retryMs);
   finish({answered.action, RZSyncExchange::Outcome::Failed, false, error});
 }

@@ -108,7 +108,11 @@ void RZSyncNetwork::replyFinished() {
   // JSON body is the server's word. Only a failure to get an answer at all is a transport failure.
   const bool answered = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).isValid();
   if (reply->error() != QNetworkReply::NoError && !answered) {
-    const QString error = reply->errorString();
+    QString error = reply->errorString();
+    // An address without a scheme is taken as https; a server on plain HTTP answers the handshake with
+    // what no TLS library can read.
+    if (reply->error() == QNetworkReply::SslHandshakeFailedError)
+      error += QStringLiteral(" (if the server speaks plain HTTP, its address starts with “http://”)");
     // The delegate says it where a person sees it; the log keeps the detail only for debugging.
     qCDebug(lcSync).noquote() << QStringLiteral("Connection failed: %1").arg(error);
     responseData_.clear();
@@ -138,7 +142,10 @@ void RZSyncNetwork::replyFinished() {
   if (object) error = QStringLiteral("The reply is not a JSON object or array.");
   if (status != 200) {
     // A plain-text answer (a proxy's or the server's "try again later") says more than the parser.
-    const QString text = QString::fromUtf8(body).simplified().left(200);
+    QString text = QString::fromUtf8(body).simplified().left(200);
+    // A bare "404" says no more than the status.
+    if (text == QString::number(status)) text.clear();
+    if (text.isEmpty() && status == 404) text = QStringLiteral("there is no sync service at this address");
     error = QStringLiteral("The server answered HTTP %1: %2").arg(status).arg(text.isEmpty() ? error : text);
   }
   if (delegate_) delegate_->syncNetworkDidFailWithError(this, error);

@@ -298,4 +298,17 @@ TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenInto) {
   EXPECT_TRUE(presenter.confirmDeletion("Delete “General” and its 14 items?", QString()));
 }
 
+// A sync that cannot reach its server says so in a notice, with what becomes of the changes: a box would
+// take the focus from what is being typed (it would wait here for an answer).
+TEST(WTDialogAlertPresenterTest, AnUnreachableServerIsANoticeNotABox) {
+  WTDialogAlertPresenter presenter;
+  QStringList notices;
+  presenter.setNoticeSink(
+      [&](const QString& summary, const QString& body) { notices << summary + " / " + body; });
+  presenter.presentNetworkError("Connection refused");
+  EXPECT_EQ(notices,
+            QStringList{"Sync cannot reach the server / Connection refused. Your changes are kept here "
+                        "and sent when the server answers again."});
+}
+
 }  // namespace

@@ -122,17 +122,30 @@ TEST_F(RZSyncNetworkTest, OnlyObjectsAndArraysAreDelivered) {
       {arrays(65), "more than 64 values"},
       {LoopbackHttpServer::raw(R"({"result": {"i": {"a": {"b": [)" + QByteArray("1,").repeated(59) + "1]}}}}"),
        "more than 64 values"},
-      {QByteArray(), ""}, {"closed", ""},
+      {LoopbackHttpServer::raw("404", 404, "text/plain"), "HTTP 404: there is no sync service at this address"},
+      {QByteArray(), ""}, {"closed", ""}, {"tls", "plain HTTP, its address starts with \u201Chttp://\u201D"},
       // clang-format on
   };
   QTcpServer closed;
   ASSERT_TRUE(closed.listen(QHostAddress::LocalHost, 0));
   closed.close();
+  QTcpServer plain;  // answers a TLS handshake as a plain HTTP server does
+  ASSERT_TRUE(plain.listen(QHostAddress::LocalHost, 0));
+  QObject::connect(&plain, &QTcpServer::newConnection, [&] {
+    QTcpSocket* connection = plain.nextPendingConnection();
+    QObject::connect(connection, &QTcpSocket::readyRead, connection, [connection] {
+      connection->readAll();
+      connection->write("HTTP/1.1 400 Bad Request\r\nContent-Length: 0\r\nConnection: close\r\n\r\n");
+      connection->disconnectFromHost();
+    });
+  });
   for (const auto& row : rows) {
     SCOPED_TRACE(row.answer.left(120).toStdString());
     server.handler = [&](const HttpRequest&) { return row.answer; };
     if (row.answer == "closed")
       network.setUrl(QUrl(QStringLiteral("http://127.0.0.1:%1/s").arg(closed.serverPort())));
+    if (row.answer == "tls")
+      network.setUrl(QUrl(QStringLiteral("https://127.0.0.1:%1/s").arg(plain.serverPort())));
     const qsizetype objects = delegate.objects.size(), errors = delegate.errors.size();
     exchange();
     EXPECT_EQ(delegate.objects.size(), objects + (row.error ? 0 : 1));

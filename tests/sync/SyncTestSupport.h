@@ -14,6 +14,7 @@
 
 #include <QCoreApplication>
 #include <QDeadlineTimer>
+#include <QEventLoop>
 #include <QPointer>
 #include <QTcpServer>
 #include <QTcpSocket>
@@ -152,9 +153,22 @@ inline QByteArray errorReply(const QString& message, qint64 code, const QVariant
 
 class RecordingPresenter final : public RZSyncErrorPresenter {
  public:
-  void presentSyncError(const QString& message) override { syncErrors.append(message); }
-  void presentNetworkError(const QString& message) override { networkErrors.append(message); }
+  void presentSyncError(const QString& message) override { syncErrors.append(message), answer(); }
+  void presentNetworkError(const QString& message) override { networkErrors.append(message), answer(); }
   QStringList syncErrors, networkErrors;
+  int answersAfterMs = 0;  // as a modal box: events, timers among them, go on until the user answers
+
+ private:
+  // A box shown over a box is recorded without waiting again: the test ends, failing, rather than nest.
+  void answer() {
+    if (answersAfterMs <= 0 || answering_) return;
+    answering_ = true;
+    QEventLoop loop;
+    QTimer::singleShot(answersAfterMs, &loop, &QEventLoop::quit);
+    loop.exec();
+    answering_ = false;
+  }
+  bool answering_ = false;
 };
 
 // One installation in its own folder, syncing off; credentials come from its user defaults.
