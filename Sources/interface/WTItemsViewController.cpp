@@ -157,6 +157,7 @@ QWidget* WTItemsViewController::loadView() {
   totalsLabel_ = new QLabel(header_);
   totalsLabel_->setObjectName(QStringLiteral("projectCost"));
   for (QLabel* label : {durationLabel_, totalsLabel_}) {
+    label->installEventFilter(this);  // a figure too wide keeps its leading digits, as in the rows
     label->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
     QFont totalsFont = label->font();
     totalsFont.setBold(true);

@@ -25,8 +25,8 @@ void WTItemsViewController::refreshHeader() {
   if (!project_) {
     setElidedText(titleLabel_, QString());
     setElidedText(clientLabel_, QString());
-    totalsLabel_->clear();
-    durationLabel_->clear();
+    setElidedText(totalsLabel_, QString());
+    setElidedText(durationLabel_, QString());
     rateField_->clear();
     WTRateField::setRefused(rateField_, {});
     return;
@@ -39,8 +39,8 @@ void WTItemsViewController::refreshHeader() {
                                project_->billedCost(), project_->billingCurrency());
   if (!billed.isEmpty()) client += QStringLiteral(" · ") + billed;
   setElidedText(clientLabel_, client);
-  durationLabel_->setText(DurationText::stringWithMinutes(project_->duration()));
-  totalsLabel_->setText(MoneyFormat::format(project_->cost(), project_->billingCurrency()));
+  setElidedText(durationLabel_, DurationText::stringWithMinutes(project_->duration()));
+  setElidedText(totalsLabel_, MoneyFormat::format(project_->cost(), project_->billingCurrency()));
   WTRateField::setPlaceholder(rateField_, WTRateField::placeholder(project_));
   // A refused text stays as typed until the user changes it, so the mistake is in view.
   if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
@@ -73,7 +73,8 @@ bool WTItemsViewController::eventFilter(QObject* watched, QEvent* event) {
     alignTotals();
   }
   if ((type == QEvent::Resize || type == QEvent::FontChange) &&
-      (watched == titleLabel_ || watched == clientLabel_)) {
+      (watched == titleLabel_ || watched == clientLabel_ || watched == durationLabel_ ||
+       watched == totalsLabel_)) {
     elide(static_cast<QLabel*>(watched));
   }
   return WTViewController::eventFilter(watched, event);

@@ -216,9 +216,5 @@ std::optional<WTTableCellView::Part> WTTableCellView::partAt(const QPointF& poin
 void WTTableCellView::drawFigure(QPainter& painter, Part part, const QRectF& row, const QString& text) const {
   const QRectF rect = partRect(part, row);
   painter.drawText(rect, Qt::AlignRight | Qt::AlignVCenter,
-                   fittedFigure(QFontMetricsF(painter.font()), text, rect.width()));
-}
-
-QString WTTableCellView::fittedFigure(const QFontMetricsF& metrics, const QString& text, qreal width) {
-  return metrics.elidedText(text, Qt::ElideRight, width);
+                   QFontMetricsF(painter.font()).elidedText(text, Qt::ElideRight, rect.width()));
 }

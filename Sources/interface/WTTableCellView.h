@@ -6,7 +6,6 @@
 
 #include <optional>
 
-class QFontMetricsF;
 class QPainter;
 class WTObject;
 
@@ -72,11 +71,10 @@ class WTTableCellView {
   // visible (its buttons answer only then).
   std::optional<Part> partAt(const QPointF& point, const QRectF& row, bool hoverShown) const;
 
-  // Draws a duration or an amount right-aligned in its part of `row`.
+  // Draws a duration or an amount right-aligned in its part of `row`. One too wide keeps its leading
+  // digits and ends in "…", rather than losing them at the left edge, where 100,000,000,080.82 read as
+  // 80.82.
   void drawFigure(QPainter& painter, Part part, const QRectF& row, const QString& text) const;
-  // `text` as a figure `width` wide shows it: one too wide keeps its leading digits and ends in "…",
-  // rather than losing them at the left edge, where 100,000,000,080.82 read as 80.82.
-  static QString fittedFigure(const QFontMetricsF& metrics, const QString& text, qreal width);
 
   static QFont notesFont();
   static constexpr qreal kMinimumNotesHeight = 20.0;

@@ -274,8 +274,9 @@ TEST_F(WindowTest, HelpMenuNamesTheLicenceAndListsTheMenusShortcuts) {
   EXPECT_TRUE(listed().contains("Record/Start/Stop Timer/Ctrl+Shift+Y"));
 }
 
-// The desktop's question before a deletion: Return keeps everything, only "Delete" deletes.
-TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenInto) {
+// The desktop's question before a deletion: Return keeps everything, only "Delete" deletes; what needs no
+// answer asks none.
+TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenIntoAndANoticeAsksNothing) {
   WTDialogAlertPresenter presenter;
   auto whenShown = [](const std::function<void(QMessageBox*)>& act) {
     QTimer::singleShot(0, [act] {
@@ -296,12 +297,9 @@ TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenInto) {
     }
   });
   EXPECT_TRUE(presenter.confirmDeletion("Delete “General” and its 14 items?", QString()));
-}
 
-// A sync that cannot reach its server says so in a notice, with what becomes of the changes: a box would
-// take the focus from what is being typed (it would wait here for an answer).
-TEST(WTDialogAlertPresenterTest, AnUnreachableServerIsANoticeNotABox) {
-  WTDialogAlertPresenter presenter;
+  // A sync that cannot reach its server says so in a notice, with what becomes of the changes: a box would
+  // take the focus from what is being typed (it would wait here for an answer).
   QStringList notices;
   presenter.setNoticeSink(
       [&](const QString& summary, const QString& body) { notices << summary + " / " + body; });

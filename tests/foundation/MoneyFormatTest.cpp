@@ -139,17 +139,15 @@ TEST(MoneyFormat, TypedAmountsAreReadStrictlyInTheUsersLocale) {
   // Typed for what bills in a currency other than the locale's: its code and signs are taken, another's
   // sign is refused naming the currency; an expense finer than its currency bills is refused.
   const UserLocale german("de_DE");
+  // clang-format off
   const std::tuple<const char*, const char*, bool, const char*> billedIn[] = {
-      {"CHF 130,00", "CHF", false, "130"},
+      {"CHF 130,00", "CHF", false, "130"}, {"€7,00", "EUR", false, "7"}, {"1.000 ¥", "JPY", true, "1000"},
       {"120,00 €", "CHF", false, "Billed in CHF: type the amount alone or with “CHF”"},
       {"EUR 7,00", "CHF", false, "Billed in CHF: type the amount alone or with “CHF”"},
-      {"€7,00", "EUR", false, "7"},
       {"$ 5,00", "EUR", false, "Billed in EUR: type the amount alone or with “€”"},
-      {"1.000 ¥", "JPY", true, "1000"},
       {"1.000,50", "JPY", false, "1000.5"},  // a rate may be finer
-      {"1.000,50", "JPY", true, "JPY is billed in whole units"},
-      {"-12,345", "EUR", true, "EUR is billed to 2 decimal places"},
-  };
+      {"1.000,50", "JPY", true, "JPY is billed in whole units"}, {"-12,345", "EUR", true, "EUR is billed to 2 decimal places"}};
+  // clang-format on
   for (const auto& [typed, currency, amount, expected] : billedIn) {
     const TypedNumber::Reading reading =
         amount ? MoneyFormat::parseAmount(QString::fromUtf8(typed), currency)

@@ -24,6 +24,7 @@
 
 #include <functional>
 #include <memory>
+#include <utility>
 
 namespace synctest {
 
@@ -161,8 +162,7 @@ class RecordingPresenter final : public RZSyncErrorPresenter {
  private:
   // A box shown over a box is recorded without waiting again: the test ends, failing, rather than nest.
   void answer() {
-    if (answersAfterMs <= 0 || answering_) return;
-    answering_ = true;
+    if (answersAfterMs <= 0 || std::exchange(answering_, true)) return;
     QEventLoop loop;
     QTimer::singleShot(answersAfterMs, &loop, &QEventLoop::quit);
     loop.exec();
