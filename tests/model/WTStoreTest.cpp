@@ -613,7 +613,10 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
   const unsigned seed = std::random_device()();
   SCOPED_TRACE(testing::Message() << "seed " << seed);
   std::mt19937 random(seed);
-  std::uniform_int_distribution<int> delayMs(2, 50);
+  // The kill comes after 0 to 3 reported saves, then 0 to 20 ms into what follows (the open, a save, the
+  // next): counted in saves rather than in time alone, so a slow machine (sanitizers, a loaded builder)
+  // gets as far as a fast one.
+  std::uniform_int_distribution<int> savesFirst(0, 3), delayMs(0, 20);
   constexpr int kRounds = 50;
   int committed = 0;  // the last save found in the file
   for (int round = 0; round < kRounds; ++round) {
@@ -643,12 +646,14 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
       }
     }
     close(fds[1]);
+    int reported = committed, save = 0;
+    for (int wanted = savesFirst(random); wanted > 0; --wanted)
+      if (read(fds[0], &save, sizeof save) == sizeof save) reported = save;
     std::this_thread::sleep_for(std::chrono::milliseconds(delayMs(random)));
     kill(child, SIGKILL);
     int status = 0;
     ASSERT_EQ(waitpid(child, &status, 0), child);
     ASSERT_TRUE(WIFSIGNALED(status)) << "the saver stopped by itself with status " << WEXITSTATUS(status);
-    int reported = committed, save = 0;
     while (read(fds[0], &save, sizeof save) == sizeof save) reported = save;
     close(fds[0]);
 
@@ -683,7 +688,7 @@ TEST_F(WTStoreTest, AKilledSaverLosesNoSaveItReported) {
     }
     committed = last;
   }
-  EXPECT_GT(committed, kRounds);  // the saver got through many saves, not just its open
+  EXPECT_GT(committed, kRounds / 2);  // the saver got through many saves, not just its open
 }
 
 }  // namespace
