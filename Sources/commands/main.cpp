@@ -26,7 +26,7 @@ std::filesystem::path desktopExecutable() {
 
 int main(int argc, char** argv) {
   // A command reads and writes a few pages. SQLite's first bulk of page slots would be touched whole on
-  // the first read, each slot a fresh page of memory to fault in: a tenth of what starting a timer costs.
+  // the first read, each slot a fresh page of memory to fault in: about one fault in twenty of a start.
   sqlite3_config(SQLITE_CONFIG_PAGECACHE, nullptr, 0, 0);
   if (const std::optional<int> status = WTCommandLine::run(argc, argv)) return *status;
   // The desktop and the commands that render or sync: the same process goes on as the executable that
