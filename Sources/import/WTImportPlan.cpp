@@ -1,6 +1,7 @@
 #include "WTImportPlan.h"
 
 #include "DurationText.h"
+#include "MoneyFormat.h"
 #include "WTClient.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -341,8 +342,9 @@ QString preview(const WTImportFile& file, const WTImportPlan& plan, const QTimeZ
                .arg(total.client.isEmpty() ? QStringLiteral("(no client)") : total.client,
                     DurationText::stringWithMinutes(int(total.minutes)));
     if (total.priced) {
+      // As the store's own figures are shown: in the user's locale, to the currency's minor unit.
       out += QStringLiteral("  %1%2").arg(
-          total.money.rounded(2).toString(),
+          MoneyFormat::format(total.money, total.currency),
           total.currency.isEmpty() ? QString() : QLatin1Char(' ') + total.currency);
     }
     // The file's money leaves that time out; what Tessal bills for it is not the file's to say.

@@ -162,10 +162,14 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
       "Three,E,y,time,e7,2024-01-01,10:00,11:00,,,60,,,\n"
       "Three,E,y,time,e8,2024-01-01,11:00,12:00,,,,,,\n"
       "Four,G,x,time,e9,2024-01-01,09:00,10:00,,,100,,,\n"
-      "Five,F,x,time,e10,2024-01-01,09:00,10:00,,,60,,,\n";
+      "Five,F,x,time,e10,2024-01-01,09:00,10:00,,,60,,,\n"
+      "Six,H,x,time,e11,2024-01-01,09:00,10:00,,,1234.5,,JPY,\n";
   QBuffer buffer(&content);
   buffer.open(QIODevice::ReadOnly);
-  WTImport::apply(*context, read(buffer), {});
+  const WTImportFile file = read(buffer);
+  // The preview bills as the store would: whole yen, grouped.
+  EXPECT_TRUE(WTImport::preview(file, WTImport::apply(*context, file, {}), QTimeZone::utc())
+                  .contains("  Six  01:00  1,235 JPY\n"));
   QStringList rates;
   const auto rate = [](const WTObject* object) {
     return object->storedRate() ? object->storedRate()->toString() : QStringLiteral("-");
@@ -182,9 +186,10 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
     rates.append(line);
   }
   EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four 100 | G - x -", "One 80 | A - x - | B - y -",
-                                "Three - | E - x 70 y 60", "Two - | C 80 x - | D 90 x - y -"}));
+                                "Six 1234.5 | H - x -", "Three - | E - x 70 y 60",
+                                "Two - | C 80 x - | D 90 x - y -"}));
   EXPECT_EQ(clients[0]->storedRate(), Decimal(50));
-  const QStringList currencies = {clients[2]->currency(), clients[4]->currency()};
+  const QStringList currencies = {clients[2]->currency(), clients[5]->currency()};
   EXPECT_EQ(currencies, QStringList({"EUR", QString()}));
 }
 
