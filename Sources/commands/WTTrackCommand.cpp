@@ -276,7 +276,9 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
     minutes += time->duration();
     billed[currency] += amount;
   }
-  if (billed.isEmpty()) billed[context.billingDefaults().currency] = Decimal();
+  // Nothing to bill still says in what: the project's currency, which its client may choose.
+  if (billed.isEmpty())
+    billed[project ? project->billingCurrency() : context.billingDefaults().currency] = Decimal();
   QStringList totals;
   for (const auto& [currency, amount] : billed.asKeyValueRange()) totals << money(amount, currency);
   out << "Total: " << times.size() << (times.size() == 1 ? " entry  " : " entries  ")
