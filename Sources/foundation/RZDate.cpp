@@ -52,6 +52,9 @@ struct CachedFormat {
 
 struct State {
   std::unique_ptr<icu::GregorianCalendar> calendar;
+  // The default zone alone, for the offset look-ups that need no calendar: making a calendar also reads
+  // the locale's calendar data, which a command that only measures a running entry never uses.
+  std::unique_ptr<icu::TimeZone> zone;
   // [dayStart, nextDayStart): instants known to share the local day whose midnight is dayStart.
   UDate dayStart = std::numeric_limits<double>::quiet_NaN();
   UDate nextDayStart = std::numeric_limits<double>::quiet_NaN();
@@ -66,6 +69,7 @@ struct State {
 
   void reset() {
     calendar.reset();
+    zone.reset();
     offsetSpans.clear();
     dayStart = nextDayStart = std::numeric_limits<double>::quiet_NaN();
     shortDate.format.reset();
@@ -115,7 +119,9 @@ State::OffsetSpan spanAt(UDate ms) {
   if (after != spans.begin() && ms < std::prev(after)->to) return *std::prev(after);
 
   constexpr double kForever = std::numeric_limits<double>::infinity();
-  const icu::TimeZone& zone = calendar().getTimeZone();
+  State& s = state();
+  if (!s.zone) s.zone.reset(icu::TimeZone::createDefault());
+  const icu::TimeZone& zone = *s.zone;
   int32_t raw = 0, dst = 0;
   UErrorCode status = U_ZERO_ERROR;
   zone.getOffset(ms, false, raw, dst, status);
@@ -343,8 +349,12 @@ Date beginOfMinute(Date date) {
   // Dropping the seconds of the local wall clock is subtracting them from the instant, so no calendar
   // fields are needed: one offset look-up. Rebuilding from fields would also move an instant in the
   // first pass of a repeated hour into the second pass, and a time entry across it would gain an hour.
-  // Durations call this twice per entry, so it must stay cheap.
+  // Durations call this twice per entry, so it must stay cheap. Since Monrovia left its offset of
+  // -0:44:30 on 7 January 1972, every zone of the database has kept whole minutes from UTC: a local
+  // minute begins with a UTC one, and a command that measures a running entry reads no zone at all.
+  constexpr UDate kWholeMinuteOffsetsSince = 63593070000.0;
   const UDate ms = toUDate(date);
+  if (ms >= kWholeMinuteOffsetsSince) return fromUDate(std::floor(ms / 60000.0) * 60000.0);
   const double local = ms + offsetAt(ms);
   return fromUDate(ms - (local - std::floor(local / 60000.0) * 60000.0));
 }
