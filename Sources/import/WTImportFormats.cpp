@@ -6,6 +6,9 @@
 #include <QHash>
 #include <QIODevice>
 
+#include <cmath>
+#include <limits>
+
 namespace WTImportFormats {
 
 QString detail::when(const Date& date, const QTimeZone& zone) {
@@ -391,8 +394,20 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
       return std::nullopt;
     }
     row.end = days.at(*endDay, *endTime);
-    // Tessal's own file writes one date: an end earlier in the day is on the next.
-    if (&format == &kTessal && *row.end < row.start) row.end = days.at(endDay->addDays(1), *endTime);
+    if (&format == &kTessal) {
+      // Tessal's own file writes one date: the end is on the day that brings it nearest to what the duration
+      // says (a timer left running over a weekend ends days later; an end time edited by hand moves less
+      // than a day), and never before the start.
+      const double wanted = row.start.secondsSince1970() + double(duration.value_or(0));
+      const auto away = [&](Date end) {
+        return end < row.start ? std::numeric_limits<double>::infinity()
+                               : std::abs(end.secondsSince1970() - wanted);
+      };
+      const QDate endOn = endDay->addDays(qint64((wanted - row.end->secondsSince1970()) / 86400));
+      for (const QDate& candidate : {endOn.addDays(-1), endOn, endOn.addDays(1)}) {
+        if (const Date end = days.at(candidate, *endTime); away(end) < away(*row.end)) row.end = end;
+      }
+    }
   } else if (duration && header.column(format.endTime) < 0) {
     row.end = row.start.addingSeconds(double(*duration));
   } else {

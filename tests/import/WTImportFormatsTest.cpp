@@ -96,7 +96,8 @@ INSTANTIATE_TEST_SUITE_P(
                 "5: the start time “nine” cannot be read"}},
         Sample{"tessal.csv", "", "Europe/Berlin", {}, "tessal",
                {"2 Acme/Website/Design|Late, late|2024-03-30T22:30:00Z|90|50.00 EUR|billable||two\nlines",
-                "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||"},
+                "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||",
+                "6 /Solo/|End typed over|2024-04-02T08:00:00Z|360|- |billable||"},
                {"4: left out, a flat fee"}}));
 // clang-format on
 

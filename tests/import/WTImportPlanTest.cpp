@@ -85,7 +85,7 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
 }
 
 // Tessal's spreadsheet of a store, imported into an empty store, gives the same entries: names and notes
-// with commas, quotes and line breaks, a project without client, an entry past midnight. Read back into
+// with commas, quotes and line breaks, a project without client, entries past midnight. Read back into
 // the store it came from, it adds none.
 TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries) {
   auto* client = makeClient(QStringLiteral("ACME, \"West\""));
@@ -105,6 +105,8 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
        QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 45},
       {makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234",
        QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
+      {lone->tasks().first(), "left running over the weekend", "",
+       QDateTime(QDate(2024, 3, 8), QTime(20, 31), zone), 54 * 60},
   };
   for (const auto& entry : entries) {
     auto* time = WTTime::insertNewObject(context.get());
@@ -135,7 +137,7 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
   const WTImportFile file = read(buffer);
   EXPECT_EQ(file.format, QStringLiteral("tessal"));
   const WTImportPlan back = WTImport::plan(*context, file, {});
-  EXPECT_EQ(std::pair(back.entries, back.alreadyThere), std::pair(0, 3));
+  EXPECT_EQ(std::pair(back.entries, back.alreadyThere), std::pair(0, 4));
 
   WTObjectContext empty(defaults.get());
   auto store = WTStore::open(dir.filePath(QStringLiteral("empty.sqlite")));
