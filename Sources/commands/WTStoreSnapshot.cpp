@@ -119,14 +119,22 @@ QString quoted(const QString& name) {
 }
 
 // The one record of `all` named `name`; `kinds` names what `all` holds ("projects", "tasks of “Atlas”").
+// Of several so named, the only one `preferred` passes, else the only one spelt exactly as typed.
 template <class T>
 Result<T*> named(const QList<T*>& all, const QString& name, const char* kind, const QString& kinds,
-                 const std::function<QString(const T*)>& describe) {
+                 const std::function<QString(const T*)>& describe,
+                 const std::function<bool(const T*)>& preferred = {}) {
   QList<T*> matches;
   for (T* record : all) {
     if (record->name().compare(name, Qt::CaseInsensitive) == 0) matches.append(record);
   }
+  const auto onlyOne = [&](const std::function<bool(const T*)>& passes) -> T* {
+    const auto count = passes ? std::count_if(matches.begin(), matches.end(), passes) : 0;
+    return count == 1 ? *std::find_if(matches.begin(), matches.end(), passes) : nullptr;
+  };
   if (matches.size() == 1) return matches.first();
+  if (T* only = onlyOne(preferred)) return only;
+  if (T* exact = onlyOne([&](const T* record) { return record->name() == name; })) return exact;
   const QList<T*>& listed = matches.isEmpty() ? all : matches;
   QStringList names;
   for (T* record : listed) names.append(describe(record));
@@ -174,7 +182,7 @@ Result<WTClient*> client(const WTObjectContext& context, const QString& name) {
 }
 
 Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName,
-                     const QString& clientName) {
+                     const QString& clientName, const std::function<bool(const WTTask*)>& preferred) {
   const QList<WTTask*> candidates = context.fetch<WTTask>([&](const WTTask* task) {
     const WTProject* project = task->project();
     if (!projectName.isNull() && !(project && sameName(project->name(), projectName))) return false;
@@ -189,17 +197,20 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
   const bool anyNamed = std::any_of(candidates.begin(), candidates.end(),
                                     [&](const WTTask* task) { return sameName(task->name(), name); });
   if (!anyNamed && separator > 0 && projectName.isNull())
-    return task(context, name.mid(separator + 3), name.left(separator), clientName);
+    return task(context, name.mid(separator + 3), name.left(separator), clientName, preferred);
   QString kinds = QStringLiteral("tasks");
   if (!projectName.isNull()) kinds += QStringLiteral(" of projects named %1").arg(quoted(projectName));
   if (!clientName.isNull())
     kinds +=
         QStringLiteral("%1 of clients named %2").arg(projectName.isNull() ? "" : ",", quoted(clientName));
-  return named<WTTask>(candidates, name, "task", kinds, [](const WTTask* task) {
-    return task->project()
-               ? QStringLiteral("%1 in %2").arg(quoted(task->name()), describeProject(task->project()))
-               : quoted(task->name());
-  });
+  return named<WTTask>(
+      candidates, name, "task", kinds,
+      [](const WTTask* task) {
+        return task->project()
+                   ? QStringLiteral("%1 in %2").arg(quoted(task->name()), describeProject(task->project()))
+                   : quoted(task->name());
+      },
+      preferred);
 }
 
 Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name, const QString& projectName,

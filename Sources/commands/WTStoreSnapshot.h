@@ -7,6 +7,7 @@
 #include <QString>
 #include <QTextStream>
 
+#include <functional>
 #include <memory>
 #include <optional>
 
@@ -62,16 +63,19 @@ struct WTProjectScope {
   const WTProject* project = nullptr;
 };
 
-// Finding the one record a command names: names compare without regard to case. No match, or more than
-// one, is an error naming what there is (at most a screenful).
+// Finding the one record a command names: names compare without regard to case, and of several so named
+// the one spelt exactly as typed is meant. No match, or more than one, is an error naming what there is (at
+// most a screenful).
 namespace WTNamedRecords {
 
 Result<WTProject*> project(const WTObjectContext& context, const QString& name);
 Result<WTClient*> client(const WTObjectContext& context, const QString& name);
 // The task named `name` among those of projects named `projectName` and of clients named `clientName`;
-// a null filter lets every task through. "PROJECT › TASK" (label()) names a task too.
+// a null filter lets every task through. "PROJECT › TASK" (label()) names a task too. Of several tasks so
+// named, the only one `preferred` passes is meant (stop means the one that runs).
 Result<WTTask*> task(const WTObjectContext& context, const QString& name, const QString& projectName = {},
-                     const QString& clientName = {});
+                     const QString& clientName = {},
+                     const std::function<bool(const WTTask*)>& preferred = {});
 
 // As task(), but a name that no task of the filters carries makes a task of that name, in the project
 // `projectName` names (made, for the client `clientName` names, when missing; the client too), or without

@@ -202,7 +202,7 @@ WTCommandOutcome stop(WTObjectContext& context, const Arguments& arguments) {
   const WTTask* only = nullptr;
   if (!arguments.task.isNull()) {
     const Result<WTTask*> found =
-        WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client);
+        WTNamedRecords::task(context, arguments.task, arguments.project, arguments.client, &WTTask::running);
     if (!found) return failure(found.error().message);
     only = found.value();
   }

@@ -220,6 +220,11 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "Design", "0:10", "--date", "2026-03-04", "--project", "hermes", "--create"}, 0, "Added Hermes › Design  2026-03-04 "},
       {{"add", "Atlas › Plan", "0:10", "--date", "2026-03-04", "--create"}, 0, "Created task Atlas › Plan\nAdded Atlas › Plan  "},
       {{"start", "Design", "--create"}, 1, "2 tasks are named “Design”"},
+      // Of several so named, stop means the one running, and a name spelt exactly as typed the one so spelt.
+      {{"start", "Design", "--project", "Hermes"}, 0, "Started Hermes › Design\n"},
+      {{"stop", "Design"}, 0, "Stopped Hermes › Design  00:00\n"},
+      {{"add", "Design", "0:10", "--date", "2026-03-04", "--project", "ATLAS", "--client", "Hestia", "--create"}, 0, "Created client Hestia\nCreated project ATLAS\n"},
+      {{"log", "--range", "2026-03-04..2026-03-04", "--project", "Atlas"}, 0, "Atlas › Plan"},
       {{"log", "--project", "nowhere"}, 1, "no project is named “nowhere”"},
       {{"list", "tasks", "--project", "nowhere"}, 1, "no project is named “nowhere”"},
       {{"list", "projects", "--client", "nobody"}, 1, "no client is named “nobody”"},
@@ -228,9 +233,9 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   for (const auto& c : cases) here.expect(c.arguments, c.code, c.says);
   EXPECT_EQ(here.out({"list", "projects", "--client", "olymp"}), "Zeus\n");
   EXPECT_EQ(running(), QStringList({"Zeus/Write"}));
-  // Exactly the accepted: 45 minutes ending now, the call, yesterday's, two on 4 March, the running one.
+  // Exactly the accepted: 45 minutes ending now, the call, yesterday's, three on 4 March, two started.
   const std::unique_ptr<WTObjectContext> context = here.readStore();
-  EXPECT_EQ(context->fetch<WTTime>().size(), 7);
+  EXPECT_EQ(context->fetch<WTTime>().size(), 9);
   EXPECT_EQ(context
                 ->fetch<WTTime>([](const WTTime* time) {
                   return time->task()->project()->name() == "Atlas" && time->duration() == 45 &&
