@@ -56,6 +56,15 @@ std::optional<Span> parseSpan(const QString& text, QString& problem) {
     span.end = QTime::fromString(match.captured(2), u"H:mm");
     if (span.start.isValid() && span.end.isValid()) return span;
   } else if (duration.match(text).hasMatch()) {
+    // Other trackers write hours:minutes:seconds: "1:30:00" would be a day and 30 hours here.
+    if (const QStringList pieces = text.split(u':');
+        pieces.size() == 3 && (pieces[1].toInt() >= 24 || pieces[2].toInt() >= 60)) {
+      problem = QStringLiteral(
+                    "'%1' reads as days:hours:minutes, with hours under 24 and minutes under 60; "
+                    "an hour and a half is 1:30")
+                    .arg(text);
+      return std::nullopt;
+    }
     span.minutes = DurationText::minutesFromString(text);
     if (span.minutes > 0) return span;
     problem = QStringLiteral("a duration of no time adds nothing");
@@ -250,9 +259,12 @@ WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const
               : Date::fromQDateTime(QDateTime(day, QTime(here.time().hour(), here.time().minute()), zone));
     start = end.addingSeconds(-60.0 * arguments.span.minutes);
   }
-  const QString when = QStringLiteral("%1 %2–%3")
-                           .arg(start.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd"),
-                                timeOfDay(start, zone), timeOfDay(end, zone));
+  // An entry that ends on another day names that day too.
+  const auto dayOf = [&](Date date) { return date.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd"); };
+  const QString when =
+      QStringLiteral("%1 %2–%3%4")
+          .arg(dayOf(start), timeOfDay(start, zone),
+               dayOf(end) == dayOf(start) ? QString() : dayOf(end) + u' ', timeOfDay(end, zone));
   if (end > now) return failure(QStringLiteral("the entry %1 is not over yet; add it once it is").arg(when));
 
   QString out;

@@ -168,7 +168,7 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
       {"start"}, {"start", "Design", "Review"}, {"start", "Review", "--bogus"}, {"stop", "--project", "Atlas"},
       {"status", "Design"}, {"log", "--range", "soon"}, {"start", "Review", "--project", "a", "--project", "b"},
       {"stop", "--create"}, {"add", "Review"}, {"add", "Review", "soon"}, {"add", "Review", "0"},
-      {"add", "Review", "24:00-25:00"}, {"add", "Review", "0:45", "--date", "someday"},
+      {"add", "Review", "24:00-25:00"}, {"add", "Review", "0:45", "--date", "someday"}, {"add", "Review", "1:30:00"},
       {"add", "Review", "9:00-10:00", "--note", "a", "--note", "b"}, {"list", "notes"},
       {"report"}, {"report", "--project", "Hermes", "--client", "Acme"}, {"report", "--project", "Hermes", "--mode", "4"},
       {"report", "--project", "Hermes", "--mode", "one"}, {"report", "--project", "Hermes", "--out", here.path("r.doc")},
@@ -207,7 +207,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       {{"add", "Review", "02:30-03:15", "--date", "2026-03-29"}, 1, "there is no 02:30 on 2026-03-29 here: the clocks go forward then"},
       {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
-      {{"add", "Review", "1:00:00", "--date", tomorrow}, 1, "is not over yet"},  // a day, read as a duration
+      {{"add", "Review", "1:00:00", "--date", tomorrow}, 1, "–" + tomorrow + " "},  // a day, read as a duration
       {{"add", "Review", "12:00-12:30", "--date", "yesterday"}, 0, "Added Hermes › Review  " + yesterday + " 12:00–12:30  00:30\n"},
       {{"add", "Design", "0:30"}, 1, "2 tasks are named “Design”: “Design” in “Atlas” (Acme), “Design” in “Hermes”"},
       {{"add", "Design", "45", "--project", "Atlas"}, 0, "Added Atlas › Design  "},
