@@ -26,7 +26,8 @@ struct WTImportRow {
   // Where a running entry had got to when the file was written: its start plus its duration so far, or
   // the file's own time.
   std::optional<Date> lastKnown;
-  std::optional<Decimal> rate;  // per hour
+  std::optional<Decimal> rate;    // per hour
+  std::optional<Decimal> amount;  // what the file says the entry bills, where it says so
   QString currency;
   bool billable = true;
   QStringList tags;

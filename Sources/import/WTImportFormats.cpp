@@ -103,7 +103,7 @@ const CSVFormat kTessal{
     "task",     "name",   "",
     "",         "notes",  "date",
     "start",    "",       "end",
-    "duration", "rate",   "",
+    "duration", "rate",   "amount",
     "currency", "kind",   {"client", "project", "task", "kind", "name", "date", "start", "end"}};
 
 const CSVFormat* const kCSVFormats[] = {&kToggl, &kClockify, &kKimai, &kTessal};
@@ -420,14 +420,16 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     return std::nullopt;
   }
 
+  if (format.amount[0] && row.billable) row.amount = parseNumber(value(format.amount));
   if (format.rate[0] && !value(format.rate).isEmpty()) {
     row.rate = parseNumber(value(format.rate));
     if (!row.rate) {
       problem = QStringLiteral("the rate “%1” cannot be read").arg(value(format.rate));
       return std::nullopt;
     }
-  } else if (format.amount[0] && !value(format.amount).isEmpty() && row.end && row.billable) {
-    // The amount over the hours: the rate the tracker billed, to the cent.
+  } else if (!format.rate[0] && format.amount[0] && !value(format.amount).isEmpty() && row.end &&
+             row.billable) {
+    // A file without rates: the amount over the hours is the rate the tracker billed, to the cent.
     const std::optional<Decimal> amount = parseNumber(value(format.amount));
     const double seconds = row.end->secondsSince1970() - row.start.secondsSince1970();
     if (!amount) {

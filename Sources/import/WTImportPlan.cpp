@@ -253,9 +253,12 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
 
     const qint64 minutes = minutesOf(row->start, *row->end);
     client.total.minutes += minutes;
-    client.total.priced = client.total.priced || (row->billable && row->rate);
+    client.total.priced = client.total.priced || (row->billable && (row->rate || row->amount));
     if (!row->billable) client.total.notBillable += minutes;
-    if (row->billable && row->rate)
+    // The file's own amount where it gives one (a rounding rule may have billed more than the minutes).
+    if (row->billable && row->amount)
+      client.total.money += *row->amount;
+    else if (row->billable && row->rate)
       client.total.money +=
           Decimal::divide(*row->rate * Decimal(std::int64_t(minutes)), Decimal(60)).value_or(Decimal());
     if (client.total.currency.isEmpty()) client.total.currency = row->currency;

@@ -165,13 +165,13 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
       "Three,E,y,time,e8,2024-01-01,11:00,12:00,,,,,,\n"
       "Four,G,x,time,e9,2024-01-01,09:00,10:00,,,100,,,\n"
       "Five,F,x,time,e10,2024-01-01,09:00,10:00,,,60,,,\n"
-      "Six,H,x,time,e11,2024-01-01,09:00,10:00,,,1234.5,,JPY,\n";
+      "Six,H,x,time,e11,2024-01-01,09:00,10:00,,,1234.5,1500,JPY,\n";
   QBuffer buffer(&content);
   buffer.open(QIODevice::ReadOnly);
   const WTImportFile file = read(buffer);
-  // The preview bills as the store would: whole yen, grouped.
+  // The preview gives the file's amount (rounded up, as Six bills) as the store shows money.
   EXPECT_TRUE(WTImport::preview(file, WTImport::apply(*context, file, {}), QTimeZone::utc())
-                  .contains("  Six  01:00  1,235 JPY\n"));
+                  .contains("  Six  01:00  1,500 JPY\n"));
   QStringList rates;
   const auto rate = [](const WTObject* object) {
     return object->storedRate() ? object->storedRate()->toString() : QStringLiteral("-");
