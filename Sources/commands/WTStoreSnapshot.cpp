@@ -113,6 +113,7 @@ namespace WTNamedRecords {
 namespace {
 
 constexpr qsizetype kNamesShown = 20;
+const QString kSeparator = QStringLiteral(" › ");
 
 QString quoted(const QString& name) {
   return QStringLiteral("“%1”").arg(name);
@@ -192,12 +193,17 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
     return true;
   });
   // "PROJECT › TASK", the way status and `list tasks --qualified` name a task, names it too, unless a task
-  // is called that.
-  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
+  // is called that. Either name may hold the separator itself: the first split that finds a task is meant.
   const bool anyNamed = std::any_of(candidates.begin(), candidates.end(),
                                     [&](const WTTask* task) { return sameName(task->name(), name); });
-  if (!anyNamed && separator > 0 && projectName.isNull())
-    return task(context, name.mid(separator + 3), name.left(separator), clientName, preferred);
+  const qsizetype first = name.indexOf(kSeparator);
+  if (!anyNamed && first > 0 && projectName.isNull()) {
+    for (qsizetype at = first; at > 0; at = name.indexOf(kSeparator, at + 1)) {
+      if (Result<WTTask*> found = task(context, name.mid(at + 3), name.left(at), clientName, preferred))
+        return found;
+    }
+    return task(context, name.mid(first + 3), name.left(first), clientName, preferred);
+  }
   QString kinds = QStringLiteral("tasks");
   if (!projectName.isNull()) kinds += QStringLiteral(" of projects named %1").arg(quoted(projectName));
   if (!clientName.isNull())
@@ -290,9 +296,9 @@ Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name,
 }
 
 QStringList taskNames(const QString& name) {
-  const qsizetype separator = name.indexOf(QStringLiteral(" › "));
   QStringList names(name);
-  if (separator > 0) names.append(name.mid(separator + 3));
+  for (qsizetype at = name.indexOf(kSeparator); at > 0; at = name.indexOf(kSeparator, at + 1))
+    names.append(name.mid(at + 3));
   return names;
 }
 

@@ -306,10 +306,13 @@ TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
       // A picker offers every task once under a name of its own, and start takes that name back.
       {{"list", "tasks", "--qualified"}, "Atlas › Build \"it\" now\nAtlas › Design\nHermes › Design\nHermes › Review\n"},
       {{"start", "hermes › design"}, "Started Hermes › Design\n"},
+      // A project's name may hold the separator too.
+      {{"add", "Audit", "09:00-09:10", "--date", "2026-03-06", "--project", "Bank › Audit", "--create"}, "Created project Bank › Audit\nCreated task Bank › Audit › Audit\nAdded Bank › Audit › Audit  2026-03-06 09:00–09:10  00:10\n"},
+      {{"start", "bank › audit › audit"}, "Started Bank › Audit › Audit\n"},
       // clang-format on
   };
   for (const auto& [arguments, out] : cases) EXPECT_EQ(here.out(arguments), out) << out;
-  EXPECT_EQ(running(), QStringList({"Hermes/Design"}));
+  EXPECT_EQ(running(), QStringList({"Bank › Audit/Audit", "Hermes/Design"}));
 }
 
 TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
