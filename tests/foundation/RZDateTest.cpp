@@ -6,13 +6,10 @@
 #include <QDateTime>
 #include <QTimeZone>
 
-#include <unicode/basictz.h>
 #include <unicode/gregocal.h>
 #include <unicode/locid.h>
 #include <unicode/smpdtfmt.h>
-#include <unicode/strenum.h>
 #include <unicode/timezone.h>
-#include <unicode/tztrans.h>
 
 #include <algorithm>
 #include <cmath>
@@ -164,23 +161,11 @@ INSTANTIATE_TEST_SUITE_P(Zones, RZDateInZone,
                          });
 
 // A local minute begins with the offset's seconds: Monrovia's clocks ran 44:30 behind UTC until 1972. Since
-// then every zone has kept whole minutes from UTC, so that minutes begin with UTC's, unlooked-up.
+// then every zone of the database has kept whole minutes from UTC.
 TEST_F(RZDateTest, MinutesBeginWithTheZonesOffset) {
   setZone("Africa/Monrovia");
   EXPECT_EQ(RZDate::beginOfMinute(utc(1971, 6, 1, 12, 0, 40)), utc(1971, 6, 1, 12, 0, 30));
-  UErrorCode status = U_ZERO_ERROR;
-  std::unique_ptr<icu::StringEnumeration> ids(icu::TimeZone::createEnumeration(status));
-  while (const icu::UnicodeString* id = ids->snext(status)) {
-    std::unique_ptr<icu::TimeZone> zone(icu::TimeZone::createTimeZone(*id));
-    icu::TimeZoneTransition next;
-    UDate at = 63593070000.0;  // 1972-01-07 00:44:30 UTC
-    do {
-      int32_t raw = 0, dst = 0;
-      zone->getOffset(at, false, raw, dst, status);
-      ASSERT_EQ((raw + dst) % 60000, 0) << fromIcu(*id).toStdString() << " " << at;
-    } while (dynamic_cast<icu::BasicTimeZone&>(*zone).getNextTransition(at, false, next) &&
-             (at = next.getTime()) < 4e12);
-  }
+  EXPECT_EQ(RZDate::beginOfMinute(utc(1972, 6, 1, 12, 0, 40)), utc(1972, 6, 1, 12));
 }
 
 // Fields worked out without the calendar must be ICU's, over five centuries and odd zones.
