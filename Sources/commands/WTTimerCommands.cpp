@@ -271,21 +271,13 @@ WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const
   const Result<WTTask*> found = namedTask(context, arguments, out);
   if (!found) return failure(found.error().message);
   WTTask* task = found.value();
-  QList<WTTime*> others = task->times();
-  std::sort(others.begin(), others.end(), [](const WTTime* a, const WTTime* b) {
-    return a->startDate().value_or(Date()) < b->startDate().value_or(Date());
-  });
-  for (const WTTime* other : others) {
-    if (!other->startDate()) continue;
+  if (const WTTime* other = task->timeOverlapping(start, end)) {
     const Date otherStart = *other->startDate();
-    const Date otherEnd = other->running() ? now : other->endDate().value_or(otherStart);
-    if (otherStart < end && start < otherEnd) {
-      return failure(QStringLiteral("the entry %1 overlaps the entry %2 %3–%4 of %5")
-                         .arg(when, otherStart.toQDateTime().toTimeZone(zone).toString(u"yyyy-MM-dd"),
-                              timeOfDay(otherStart, zone),
-                              other->running() ? QStringLiteral("now") : timeOfDay(otherEnd, zone),
-                              WTNamedRecords::label(*task)));
-    }
+    return failure(QStringLiteral("the entry %1 overlaps the entry %2 %3–%4 of %5")
+                       .arg(when, dayOf(otherStart), timeOfDay(otherStart, zone),
+                            other->running() ? QStringLiteral("now")
+                                             : timeOfDay(other->endDate().value_or(otherStart), zone),
+                            WTNamedRecords::label(*task)));
   }
   auto* time = WTTime::insertNewObject(&context);
   time->setTask(task);

@@ -53,6 +53,25 @@ Date timeOnDay(Date day, QTime time) {
   return RZDate::dateFromComponents(components);
 }
 
+QString clock(Date date) {
+  return RZDate::stringWithPattern(date, QStringLiteral("HH:mm"));
+}
+
+// Why `time` may not span from `start` to `end` (none: it runs), as the command line refuses an entry:
+// a typed end after now bills time not yet spent, and time shared with another entry of the task bills
+// the same minutes twice.
+QString spanRefusal(const WTTime& time, Date start, std::optional<Date> end, bool endTyped) {
+  if (endTyped && end && *end > Date::now())
+    return WTItemsModel::tr("The entry would end after now (%1): it is for time already spent.")
+        .arg(clock(*end));
+  const WTTask* task = time.task();
+  if (const WTTime* other = task ? task->timeOverlapping(start, end.value_or(Date::now()), &time) : nullptr)
+    return WTItemsModel::tr("The entry would share time with the task's entry %1–%2.")
+        .arg(clock(*other->startDate()),
+             other->running() ? WTItemsModel::tr("now") : clock(other->endDate().value_or(Date())));
+  return {};
+}
+
 // Where a start (or end) typed for `time` puts it on its day, or why it may not: `moved` is none when
 // the text is refused, and also when there is no such end to move (a running entry's end).
 struct MovedEnd {
@@ -66,7 +85,6 @@ MovedEnd movedEnd(const WTTime& time, bool start, const QString& text) {
   if (!typed)
     return {{},
             WTItemsModel::tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed())};
-  const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
   const Date moved = timeOnDay(*day, *typed);
   if (const QString asTyped = typed->toString(u"HH:mm"); clock(moved) != asTyped)
     return {{}, WTItemsModel::tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped)};
@@ -74,7 +92,16 @@ MovedEnd movedEnd(const WTTime& time, bool start, const QString& text) {
     return {{}, WTItemsModel::tr("The start would come after the end (%1).").arg(clock(*time.endDate()))};
   if (!start && time.startDate() && moved < *time.startDate())
     return {{}, WTItemsModel::tr("The end would come before the start (%1).").arg(clock(*time.startDate()))};
+  const std::optional<Date> end = start ? (time.running() ? std::nullopt : time.endDate()) : moved;
+  if (QString refusal = spanRefusal(time, start ? moved : *time.startDate(), end, !start); !refusal.isEmpty())
+    return {{}, refusal};
   return {moved, {}};
+}
+
+// Why a duration typed for a stopped entry, which moves its end, may not be.
+QString durationRefusal(const WTTime& time, int minutes) {
+  if (time.running() || !time.startDate()) return {};
+  return spanRefusal(time, *time.startDate(), time.startDate()->addingSeconds(minutes * 60.0), true);
 }
 
 // A day group's heading: weekday, day, month and year in the order and words of the user's locale
@@ -429,9 +456,17 @@ QString WTItemsModel::refusalFor(int role, const QString& text) {
 }
 
 QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QString& text) const {
-  if (role != StartTimeEditRole && role != EndTimeEditRole && role != AmountEditRole)
+  if (role != StartTimeEditRole && role != EndTimeEditRole && role != AmountEditRole &&
+      role != DurationEditRole)
     return refusalFor(role, text);
   const Node* node = checkIndex(index, CheckIndexOption::IndexIsValid) ? nodeOf(index) : nullptr;
+  if (role == DurationEditRole) {
+    QString refusal;
+    const std::optional<int> minutes = DurationText::minutesFromTypedText(text, &refusal);
+    if (minutes && node && node->object && node->object->entity() == WTEntity::Time)
+      refusal = durationRefusal(*static_cast<const WTTime*>(node->object), *minutes);
+    return refusal;
+  }
   if (role == AmountEditRole) {
     if (!node || !node->object || node->object->entity() != WTEntity::Expense) return {};
     return MoneyFormat::parseAmount(text, static_cast<const WTExpense*>(node->object)->billingCurrency())
@@ -465,7 +500,8 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
       const int minutes = *typed;
       if (object->entity() == WTEntity::Time) {
         auto* time = static_cast<WTTime*>(object);
-        if (time->running()) return false;  // a running entry's length is the clock's
+        // A running entry's length is the clock's.
+        if (time->running() || !durationRefusal(*time, minutes).isEmpty()) return false;
         time->setDuration(minutes);
         return true;
       }

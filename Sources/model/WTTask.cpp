@@ -245,6 +245,19 @@ QList<WTTime*> WTTask::times() const {
   return result;
 }
 
+const WTTime* WTTask::timeOverlapping(Date start, Date end, const WTTime* except) const {
+  const Date now = Date::now();
+  const WTTime* earliest = nullptr;
+  for (const WTTime* time : times()) {
+    if (time == except || !time->startDate()) continue;
+    const Date otherStart = *time->startDate();
+    const Date otherEnd = time->running() ? now : time->endDate().value_or(otherStart);
+    if (otherStart < end && start < otherEnd && (!earliest || otherStart < *earliest->startDate()))
+      earliest = time;
+  }
+  return earliest;
+}
+
 QList<WTItem*> WTTask::pendingToDos() const {
   QList<WTItem*> result;
   for (WTItem* item : items_) {

@@ -79,6 +79,9 @@ class WTTask final : public WTBillingRecord {
 
   // Subsets of the items.
   QList<WTTime*> times() const;
+  // The earliest of the task's time entries but `except` that shares time with [start, end) (a running
+  // one up to now), or null: one minute is never billed twice in a task. Entries that only touch share none.
+  const WTTime* timeOverlapping(Date start, Date end, const WTTime* except = nullptr) const;
   QList<WTItem*> pendingToDos() const;  // open to-dos, newest first
   QList<WTItem*> itemsWithoutPendingToDos() const;
   QList<WTItem*> valuableItems() const;  // time entries, flat fees and expenses, newest first

@@ -197,7 +197,9 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
 // Tips belong to buttons and editable fields, never a whole row (once "Start" everywhere), and to a budget's
 // cost; refused times leave the entry as it was; Tab and Shift+Tab walk the fields, committing each.
 TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingTheOthers) {
+  setNow(at(2024, 3, 13, 18, 0));
   WTTime* time = makeItem<WTTime>(design, "Sketches", at(2024, 3, 13, 12, 0));  // until 12:30
+  makeItem<WTTime>(design, "Call", at(2024, 3, 13, 17, 30));                    // until 18:00
   auto* expense = makeItem<WTExpense>(design, "Ticket", at(2024, 3, 13));
   controller->expandContainerOfItem(time);  // its day is not shown yet: only its task opens
   EXPECT_TRUE(outline()->isExpanded(rowOf(design)));
@@ -210,7 +212,7 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
       // all of a task's tip, else a part of it; empty: no tip
       {design, Part::TimerButton, design->buttonTitle()},
       {design, Part::Name, {}},
-      {design, Part::Cost, "25 % of the budget of 100.00 · 75.00 left"},
+      {design, Part::Cost, "50 % of the budget of 100.00 · 50.00 left"},
       {time, Part::Label, "the end stays"},
       {time, Part::End, "the start stays"},
       {time, Part::Duration, "the end moves"},
@@ -230,11 +232,20 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
     Part part;
     const char *typed, *shownBefore, *after;
   } rows[] = {
-      {Part::Label, "11:45", "12:00", "11:45-12:30"}, {Part::Label, "12:40", "11:45", "11:45-12:30"},
-      {Part::Label, "25:00", "11:45", "11:45-12:30"}, {Part::Label, "noon", "11:45", "11:45-12:30"},
-      {Part::Label, "9:7", "11:45", "11:45-12:30"},   {Part::Label, "9", "11:45", "09:00-12:30"},
-      {Part::End, "17:20", "12:30", "09:00-17:20"},   {Part::End, "8:59", "17:20", "09:00-17:20"},
-      {Part::End, "24:00", "17:20", "09:00-17:20"},   {Part::End, "later", "17:20", "09:00-17:20"},
+      {Part::Label, "11:45", "12:00", "11:45-12:30"},
+      {Part::Label, "12:40", "11:45", "11:45-12:30"},
+      {Part::Label, "25:00", "11:45", "11:45-12:30"},
+      {Part::Label, "noon", "11:45", "11:45-12:30"},
+      {Part::Label, "9:7", "11:45", "11:45-12:30"},
+      {Part::Label, "9", "11:45", "09:00-12:30"},
+      {Part::End, "17:20", "12:30", "09:00-17:20"},
+      {Part::End, "8:59", "17:20", "09:00-17:20"},
+      {Part::End, "24:00", "17:20", "09:00-17:20"},
+      {Part::End, "later", "17:20", "09:00-17:20"},
+      // Time not spent yet, and the Call's time: never billed twice.
+      {Part::End, "18:05", "17:20", "09:00-17:20"},
+      {Part::End, "17:31", "17:20", "09:00-17:20"},
+      {Part::End, "17:30", "17:20", "09:00-17:30"},
   };
   for (const auto& row : rows) {
     const QPoint field = shown->centreOf(time, row.part);
