@@ -212,7 +212,15 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
   auto* menu = new QMenu;
   menu->setObjectName(QStringLiteral("taskMenu"));
   QPointer<WTOutlineView> outline = outlineView_;
+  // What the row's hover buttons add, reachable from the keyboard too (the Menu key, Shift+F10).
+  menu->addAction(tr("New Time Entry"), this, [this, task] { addTimeItem(task); });
   menu->addAction(tr("New Time Entry (Already Spent)"), this, [this, task] { addStoppedTimeItem(task); });
+  for (const auto& [kind, title] : {std::pair{WTEntity::Flat, tr("New Flat Fee")},
+                                    {WTEntity::Note, tr("New Note")},
+                                    {WTEntity::Expense, tr("New Expense")},
+                                    {WTEntity::ToDo, tr("New To-Do")}})
+    menu->addAction(title, this, [this, task, kind] { addItem(kind, task); });
+  menu->addSeparator();
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
   menu->addAction(WTBillingDialog::menuTitle(WTEntity::Task), this,
                   [task, outline] { WTBillingDialog::editBilling(task, outline); });

@@ -38,10 +38,18 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
               outline()->currentIndex() == rowOf(time));
   EXPECT_EQ(dayOf(time) + ", " + dayOf(yesterday), "03-14 open, 03-13 closed");
   EXPECT_TRUE(outline()->isExpanded(rowOf(build)));
-  for (WTEntity kind : {WTEntity::Flat, WTEntity::Note, WTEntity::Expense, WTEntity::ToDo}) {
-    WTItem* item = controller->addItem(kind, design);
-    ASSERT_NE(item, nullptr);
-    EXPECT_TRUE(item->entity() == kind && item->task() == design && outline()->currentIndex() == rowOf(item));
+  // The task's menu adds what its hover buttons add, from the keyboard too.
+  std::unique_ptr<QMenu> menu(controller->taskMenu(design));
+  for (const auto& [kind, title] : {std::pair{WTEntity::Flat, "New Flat Fee"},
+                                    {WTEntity::Note, "New Note"},
+                                    {WTEntity::Expense, "New Expense"},
+                                    {WTEntity::ToDo, "New To-Do"}}) {
+    const QList<WTItem*> before = design->items();
+    actionTitled(menu.get(), title)->trigger();
+    ASSERT_EQ(design->items().size(), before.size() + 1) << title;
+    WTItem* item = *std::find_if(design->items().begin(), design->items().end(),
+                                 [&](WTItem* added) { return !before.contains(added); });
+    EXPECT_TRUE(item->entity() == kind && outline()->currentIndex() == rowOf(item));
   }
   EXPECT_EQ(controller->addItem(WTEntity::Flat, nullptr), nullptr);
 
@@ -179,8 +187,8 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
 // Time already spent is entered stopped by typing its duration: it ends now, not that long from now.
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));
-  ASSERT_NE(actionTitled(menu.get(), "New Time Entry"), nullptr);
-  actionTitled(menu.get(), "New Time Entry")->trigger();
+  ASSERT_NE(actionTitled(menu.get(), "New Time Entry (Already Spent)"), nullptr);
+  actionTitled(menu.get(), "New Time Entry (Already Spent)")->trigger();
   ASSERT_EQ(build->items().size(), 1);
   auto* time = dynamic_cast<WTTime*>(build->items().first());
   ASSERT_TRUE(time && !time->running() && outline()->isEditing());
