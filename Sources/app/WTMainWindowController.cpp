@@ -395,7 +395,7 @@ void WTMainWindowController::showStack(WTNavigationController* stack, const QStr
   view->show();
   setSelectedToolbarItemIdentifier(identifier);
   if (WTViewController* top = stack->topViewController()) {
-    if (top->isViewLoaded()) top->view()->setFocus();
+    if (top->isViewLoaded()) WTNavigationController::focusView(top->view());
   }
   scheduleValidation();
 }

@@ -172,7 +172,6 @@ QWidget* WTItemsViewController::loadView() {
   layout->addWidget(line);
 
   outlineView_ = new WTOutlineView(container);
-  container->setFocusProxy(outlineView_);  // not the rate field above it: typing there changes money
   outlineView_->setObjectName(QStringLiteral("itemsOutline"));
   outlineView_->setEmptyHint(WTEmptyHint::forAdding(tr("No tasks yet")));
   delegate_ = new WTItemCellDelegate(this, outlineView_);

@@ -2,6 +2,7 @@
 
 #include "WTViewController.h"
 
+#include <QAbstractItemView>
 #include <QApplication>
 #include <QEasingCurve>
 #include <QParallelAnimationGroup>
@@ -93,6 +94,11 @@ void WTNavigationController::popViewController() {
   emit topViewControllerChanged();
 }
 
+void WTNavigationController::focusView(QWidget* view) {
+  auto* list = view->findChild<QAbstractItemView*>();
+  (list ? static_cast<QWidget*>(list) : view)->setFocus(Qt::OtherFocusReason);
+}
+
 void WTNavigationController::replaceView(QWidget* old, QWidget* next, bool push) {
   QWidget* stack = view();
   // The keyboard goes on in the view shown, not wherever Qt sends it when the old one hides.
@@ -103,7 +109,7 @@ void WTNavigationController::replaceView(QWidget* old, QWidget* next, bool push)
   next->setGeometry(bounds.translated(push ? width : -width, 0));
   next->show();
   next->raise();
-  if (keepsFocus) next->setFocus(Qt::OtherFocusReason);
+  if (keepsFocus) focusView(next);
   if (!stack->isVisible() || width <= 0) {
     // Nothing to watch: end in the final state at once.
     next->setGeometry(bounds);

@@ -33,6 +33,10 @@ class WTNavigationController : public QObject {
   // Slides `next` in over `old` (from the right when pushing, from the left when popping); `old`
   // leaves the stack's view when the slide ends.
   void replaceView(QWidget* old, QWidget* next, bool push);
+  // Gives the keyboard to a view shown: to its list or outline, not to the fields above it (typing in
+  // a rate field changes money). No focus proxy does it: Tab would then jump from the view's
+  // neighbours straight into the list, past the fields.
+  static void focusView(QWidget* view);
   bool isAnimating() const;
   // Ends a running slide at once, in its final state.
   void finishAnimation();

@@ -36,7 +36,6 @@ QWidget* WTObjectListViewController::loadView() {
   auto* layout = new QVBoxLayout(container);
   layout->setContentsMargins(0, 0, 0, 0);
   tableView_ = new WTListView(container);
-  container->setFocusProxy(tableView_);  // shown by the keyboard, the list takes it on
   tableView_->setObjectName(identifier_ + QStringLiteral("sTable"));
   tableView_->setEmptyHint(WTEmptyHint::forAdding(
       identifier_ == QLatin1String("Client") ? tr("No clients yet") : tr("No projects yet")));

@@ -175,6 +175,11 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
   outline->setCurrentIndex(rowOf(task));
   window->activateWindow();
   ASSERT_TRUE(QTest::qWaitForWindowActive(window.get()));
+  // Tab walks on from the outline to the fields above it, the rate among them.
+  QStringList walked;
+  for (outline->setFocus(); walked.size() < 4; walked << QApplication::focusWidget()->objectName())
+    QTest::keyClick(QApplication::focusWidget(), Qt::Key_Tab);
+  EXPECT_TRUE(walked.contains("rateField")) << walked.join(' ').toStdString();
   outline->setFocus();
 
   QTest::keyClick(outline, Qt::Key_N, Qt::ControlModifier);

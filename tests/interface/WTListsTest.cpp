@@ -252,6 +252,7 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
 
   WTNavigationController& stack = shown->stack;
   list->setFocus();
+  ASSERT_TRUE(QTest::qWaitFor([&] { return QApplication::focusWidget() == list; }));
   projects->openProject(first);
   ASSERT_TRUE(QTest::qWaitFor([&] { return stack.viewControllers().size() == 2; }));
   WTItemsViewController* items = projects->itemsViewController();
