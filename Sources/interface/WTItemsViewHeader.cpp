@@ -103,6 +103,8 @@ void WTItemsViewController::alignTotals() {
 }
 
 void WTItemsViewController::projectRateAction() {
-  if (!project_) return;
-  if (WTRateField::apply(rateField_, project_)) refreshHeader();
+  if (!project_ || !WTRateField::apply(rateField_, project_)) return;
+  // What was taken, shown as every rate is ("120.00"): the user's own Return or Tab ended the typing.
+  rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());
+  refreshHeader();
 }

@@ -72,11 +72,14 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   project->setName("Website 2");
   endTurn();
   EXPECT_EQ(field->text(), "-5");
+  field->setFocus();  // where it stays after Return
+  ASSERT_TRUE(QTest::qWaitFor([&] { return field->hasFocus(); }));
   field->selectAll();
   QTest::keyClicks(field, "7");
   EXPECT_FALSE(WTRateField::isRefused(field) || !field->toolTip().isEmpty());
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), Decimal(7));
+  EXPECT_EQ(field->text(), "7.00");
   EXPECT_EQ(context->undoManager().undoActionName(), "Change Rate");
   field->clear();
   controller->projectRateAction();
