@@ -358,8 +358,9 @@ bool WTReportWindowController::isBuildingDocument() const {
 
 void WTReportWindowController::showTemplateErrors(const WTReport& report) {
   // A report its template failed is not one to send: as `tessal report`, the window writes none.
+  sendable_ = report.templateRead && report.errors.empty();
   for (const char* name : {"saveHTML", "savePDF", "print"})
-    findChild<QPushButton*>(QLatin1String(name))->setEnabled(report.templateRead && report.errors.empty());
+    findChild<QPushButton*>(QLatin1String(name))->setEnabled(sendable_);
   if (!report.templateRead) {
     errorBar_->setText(
         tr("The report template could not be read: %1").arg(WTReportGenerator::templatePath()));
@@ -436,6 +437,10 @@ void WTReportWindowController::saveWith(const QString& title, const QString& fil
       {title, filter, suffix,
        suggestedFileName(reportSubject().isEmpty() ? tr("Report") : reportSubject(), period(), suffix)});
   if (path.isEmpty()) return;
+  // A running timer has moved on since the report was shown, unsaved: what is written is rendered now
+  // (the view follows), unless its template broke meanwhile.
+  refreshWebContent();
+  if (!sendable_) return;
   const Result<void> written = (this->*write)(path);
   if (!written) QMessageBox::warning(this, title, written.error().message);
 }
@@ -461,7 +466,8 @@ void WTReportWindowController::print() {
   printer.setDocName(windowTitleForProjects());
   QPrintDialog dialog(&printer, this);
   if (dialog.exec() != QDialog::Accepted) return;
-  printToDevice(&printer);
+  refreshWebContent();  // as a save
+  if (sendable_) printToDevice(&printer);
 }
 
 void WTReportWindowController::editReportTemplate() {

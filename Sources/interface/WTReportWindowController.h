@@ -126,6 +126,7 @@ class WTReportWindowController : public QWidget {
   WTClient* client_ = nullptr;
   WTReportGenerator generator_;
   QString html_;
+  bool sendable_ = false;  // the last render's template was read and ran without errors
   QTextBrowser* webView_ = nullptr;
   WTReportDocumentBuilder* documentBuilder_ = nullptr;
   QButtonGroup* segments_ = nullptr;

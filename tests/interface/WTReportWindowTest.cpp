@@ -200,8 +200,8 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
   QStringList asked;
   window->setSaveLocationChooser([&](QWidget*, const WTSaveRequest& request) {
     asked << request.filter;
-    EXPECT_EQ(request.suggestedName, "Report.csv");  // two projects, every day
-    return asked.size() == 1 ? csv : QString();
+    EXPECT_EQ(request.suggestedName, "Report." + request.suffix);  // two projects, every day
+    return asked.size() == 1 ? csv : asked.size() == 3 ? html : QString();
   });
   window->setMode(1);
   window->exportCSV();
@@ -226,6 +226,12 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
     EXPECT_EQ(linesOf(csv).size(), tag == WTRangePredicate::AnyDate ? 3 : 1);
     EXPECT_EQ(window->html().contains("Website"), tag == WTRangePredicate::AnyDate);
   }
+  // What is saved is rendered then: three hours of a timer that ran on unsaved since the last render.
+  design->toggleTimer();
+  window->refreshWebContent();
+  clockNow = clockNow.addingSeconds(3 * 3600);
+  window->saveHTML();
+  EXPECT_TRUE(QString::fromUtf8(fileBytes(html)).contains("450.00")) << "7:30 at 60";
 
   if (QStandardPaths::findExecutable("pdfinfo").isEmpty()) GTEST_SKIP() << "poppler-utils missing";
   for (int i = 0; i < 200; ++i) {  // two hundred tasks of a day each make many pages
@@ -243,7 +249,7 @@ TEST_F(ReportWindowTest, ExportsWriteTheChosenFileWithTheModesLines) {
     return QString::fromUtf8(process.readAllStandardOutput());
   };
   EXPECT_GE(QRegularExpression("Pages:\\s+(\\d+)").match(poppler("pdfinfo", {pdf})).captured(1).toInt(), 3);
-  EXPECT_TRUE(poppler("pdftotext", {pdf, "-"}).contains("12,270.00")) << "the whole report, to its total";
+  EXPECT_TRUE(poppler("pdftotext", {pdf, "-"}).contains("12,450.00")) << "the whole report, to its total";
   // Each head stands over its column: "Duration" ends where every task's and entry's 01:00 ends.
   QList<double> rights;
   for (const auto& word : QRegularExpression(R"re(xMax="([\d.]+)"[^>]*>(Duration|01:00)<)re")
