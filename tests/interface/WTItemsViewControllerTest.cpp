@@ -44,12 +44,9 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
                                     {WTEntity::Note, "New Note"},
                                     {WTEntity::Expense, "New Expense"},
                                     {WTEntity::ToDo, "New To-Do"}}) {
-    const QList<WTItem*> before = design->items();
     actionTitled(menu.get(), title)->trigger();
-    ASSERT_EQ(design->items().size(), before.size() + 1) << title;
-    WTItem* item = *std::find_if(design->items().begin(), design->items().end(),
-                                 [&](WTItem* added) { return !before.contains(added); });
-    EXPECT_TRUE(item->entity() == kind && outline()->currentIndex() == rowOf(item));
+    const auto* item = dynamic_cast<const WTItem*>(model()->objectAt(outline()->currentIndex()));
+    EXPECT_TRUE(item && item->entity() == kind && item->task() == design) << title;
   }
   EXPECT_EQ(controller->addItem(WTEntity::Flat, nullptr), nullptr);
 
