@@ -260,7 +260,14 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   const auto money = [](const Decimal& amount, const QString& currency) {
     return MoneyFormat::format(amount, currency) + u' ' + currency;
   };
-  int minutes = 0;
+  // The minutes as they ran, and those a rounding rule bills beside them where they differ.
+  const auto duration = [](int minutes, int billedMinutes) {
+    return DurationText::stringWithMinutes(minutes) +
+           (billedMinutes == minutes
+                ? QString()
+                : QStringLiteral("  billed %1").arg(DurationText::stringWithMinutes(billedMinutes)));
+  };
+  int minutes = 0, billedMinutes = 0;
   QMap<QString, Decimal> billed;
   for (const WTTime* time : times) {
     const QDateTime start = time->startDate() ? time->startDate()->toQDateTime().toLocalTime() : QDateTime();
@@ -271,9 +278,10 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
     const Decimal amount = time->billedCost();
     const QString currency = time->billingCurrency();
     out << (start.isValid() ? start.toString(u"yyyy-MM-dd  HH:mm") : QStringLiteral("(no date)         "))
-        << "–" << end << "  " << task << "  " << DurationText::stringWithMinutes(time->duration()) << "  "
+        << "–" << end << "  " << task << "  " << duration(time->duration(), time->billedDuration()) << "  "
         << money(amount, currency) << '\n';
     minutes += time->duration();
+    billedMinutes += time->billedDuration();
     billed[currency] += amount;
   }
   // Nothing to bill still says in what: the project's currency, which its client may choose.
@@ -282,7 +290,7 @@ int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& e
   QStringList totals;
   for (const auto& [currency, amount] : billed.asKeyValueRange()) totals << money(amount, currency);
   out << "Total: " << times.size() << (times.size() == 1 ? " entry  " : " entries  ")
-      << DurationText::stringWithMinutes(minutes) << "  " << totals.join(QStringLiteral(", ")) << '\n';
+      << duration(minutes, billedMinutes) << "  " << totals.join(QStringLiteral(", ")) << '\n';
   out.flush();
   return 0;
 }

@@ -309,6 +309,13 @@ TEST_F(TrackCommand, LogsAndListsEachNameOnceForPickersAndCompletion) {
   };
   for (const auto& [arguments, out] : cases) EXPECT_EQ(here.out(arguments), out) << out;
   EXPECT_EQ(running(), QStringList({"Bank › Audit/Audit", "Hermes/Design"}));
+  // Under a rounding rule, the minutes billed stand beside those that ran.
+  here.setSetting("WTRoundingMinutes", "15");
+  here.setSetting("WTRoundingMode", "up");
+  EXPECT_EQ(
+      here.out({"log", "--range", "2026-03-04..2026-03-04"}),
+      "2026-03-04  00:00–00:01  Hermes › Review  00:01  billed 00:15  25.00 USD\n2026-03-04  00:01–00:02  "
+      "Hermes › Review  00:01  billed 00:15  25.00 USD\nTotal: 2 entries  00:02  billed 00:30  50.00 USD\n");
 }
 
 TEST(CommandWithoutStore, SaysThereIsNoDataAndCreatesNoneUnlessAskedToCreate) {
