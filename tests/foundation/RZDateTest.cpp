@@ -160,8 +160,7 @@ INSTANTIATE_TEST_SUITE_P(Zones, RZDateInZone,
                            return name;
                          });
 
-// A local minute begins with the offset's seconds: Monrovia's clocks ran 44:30 behind UTC until 1972. Since
-// then every zone of the database has kept whole minutes from UTC.
+// A local minute begins with the offset's seconds: Monrovia's clocks ran 44:30 behind UTC until 1972.
 TEST_F(RZDateTest, MinutesBeginWithTheZonesOffset) {
   setZone("Africa/Monrovia");
   EXPECT_EQ(RZDate::beginOfMinute(utc(1971, 6, 1, 12, 0, 40)), utc(1971, 6, 1, 12, 0, 30));
