@@ -237,20 +237,16 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
     Part part;
     const char *typed, *shownBefore, *after;
   } rows[] = {
-      {Part::Label, "11:45", "12:00", "11:45-12:30"},
-      {Part::Label, "12:40", "11:45", "11:45-12:30"},
-      {Part::Label, "25:00", "11:45", "11:45-12:30"},
-      {Part::Label, "noon", "11:45", "11:45-12:30"},
-      {Part::Label, "9:7", "11:45", "11:45-12:30"},
-      {Part::Label, "9", "11:45", "09:00-12:30"},
-      {Part::End, "17:20", "12:30", "09:00-17:20"},
-      {Part::End, "8:59", "17:20", "09:00-17:20"},
-      {Part::End, "24:00", "17:20", "09:00-17:20"},
-      {Part::End, "later", "17:20", "09:00-17:20"},
+      // clang-format off
+      {Part::Label, "11:45", "12:00", "11:45-12:30"}, {Part::Label, "12:40", "11:45", "11:45-12:30"},
+      {Part::Label, "25:00", "11:45", "11:45-12:30"}, {Part::Label, "noon", "11:45", "11:45-12:30"},
+      {Part::Label, "9:7", "11:45", "11:45-12:30"},   {Part::Label, "9", "11:45", "09:00-12:30"},
+      {Part::End, "17:20", "12:30", "09:00-17:20"},   {Part::End, "8:59", "17:20", "09:00-17:20"},
+      {Part::End, "24:00", "17:20", "09:00-17:20"},   {Part::End, "later", "17:20", "09:00-17:20"},
       // Time not spent yet, and the Call's time: never billed twice.
-      {Part::End, "18:05", "17:20", "09:00-17:20"},
-      {Part::End, "17:31", "17:20", "09:00-17:20"},
+      {Part::End, "18:05", "17:20", "09:00-17:20"},   {Part::End, "17:31", "17:20", "09:00-17:20"},
       {Part::End, "17:30", "17:20", "09:00-17:30"},
+      // clang-format on
   };
   for (const auto& row : rows) {
     const QPoint field = shown->centreOf(time, row.part);
