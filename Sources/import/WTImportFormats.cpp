@@ -430,14 +430,13 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   } else if (!format.rate[0] && format.amount[0] && !value(format.amount).isEmpty() && row.end &&
              row.billable) {
     // A file without rates: the amount over the hours is the rate the tracker billed, to the cent.
-    const std::optional<Decimal> amount = parseNumber(value(format.amount));
     const double seconds = row.end->secondsSince1970() - row.start.secondsSince1970();
-    if (!amount) {
+    if (!row.amount) {
       problem = QStringLiteral("the amount “%1” cannot be read").arg(value(format.amount));
       return std::nullopt;
     }
     if (seconds >= 60)
-      row.rate = Decimal::divide(*amount * Decimal(3600), *Decimal::fromDouble(seconds))
+      row.rate = Decimal::divide(*row.amount * Decimal(3600), *Decimal::fromDouble(seconds))
                      .value_or(Decimal())
                      .rounded(2);
   }
