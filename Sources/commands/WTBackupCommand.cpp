@@ -6,7 +6,10 @@
 #include "WTStore.h"
 #include "WTStoreBackup.h"
 #include "WTStoreSetup.h"
+#include "WTStoreSnapshot.h"
 #include "WTStoreWriterLock.h"
+#include "WTTask.h"
+#include "WTTime.h"
 
 #include <QDateTime>
 #include <QDir>
@@ -29,6 +32,24 @@ QString positional(const QStringList& arguments, bool required, QString* problem
   return arguments.value(0);
 }
 
+// The tasks whose timers run in the store at `path`, by their labels; none where it cannot be read (a
+// damaged store is what a restore is for).
+QStringList runningTasks(const QString& path) {
+  if (!QFileInfo::exists(path)) return {};
+  auto defaults = std::make_unique<UserDefaults>();
+  WTStoreSetup::registerDefaults(*defaults);
+  const Result<std::unique_ptr<WTStoreSnapshot>> snapshot =
+      WTStoreSnapshot::open(path, std::move(defaults), WTStore::Records::Timers);
+  if (!snapshot) return {};
+  QStringList labels;
+  for (const WTTime* time : snapshot.value()->context().fetch<WTTime>(
+           [](const WTTime* time) { return time->running() && time->task(); }))
+    labels << WTNamedRecords::label(*time->task());
+  labels.sort();
+  labels.removeDuplicates();
+  return labels;
+}
+
 }  // namespace
 
 int runBackupCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
@@ -36,9 +57,12 @@ int runBackupCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const QString file = positional(arguments, false, &problem);
   if (!problem.isEmpty()) return WTCommandArguments::usage(err, "usage: tessal backup [FILE]\n", problem);
   const QString store = WTStoreSetup::storePath();
+  // A folder takes the copy under the name the backups folder would give it.
+  const QString named = WTStoreBackup::manualPath(store, QDateTime::currentDateTime());
   const QString target =
-      file.isEmpty()
-          ? WTStoreBackup::unusedPath(WTStoreBackup::manualPath(store, QDateTime::currentDateTime()))
+      file.isEmpty() ? WTStoreBackup::unusedPath(named)
+      : QFileInfo(file).isDir()
+          ? WTStoreBackup::unusedPath(QDir(file).absoluteFilePath(QFileInfo(named).fileName()))
           : QFileInfo(file).absoluteFilePath();
   if (const Result<void> copied = WTStoreBackup::copy(store, target); !copied)
     return failure(err, copied.error().message);
@@ -65,9 +89,20 @@ int runRestoreCommand(const QStringList& arguments, QTextStream& out, QTextStrea
   if (!lock.lock(kWriterWaitMs))
     return failure(
         err, QStringLiteral("the data file is busy (%1 is held); nothing was changed").arg(lock.filePath()));
+  // A running timer's time would stay behind in the replaced file, and the timer would be gone.
+  auto noTimerRuns = [&]() -> Result<void> {
+    const QStringList running = runningTasks(store);
+    if (running.isEmpty()) return {};
+    return Error{WTStore::WriteFailed,
+                 QStringLiteral("%1 %2 running: stop the timer first (`tessal stop`), or the time it tracks "
+                                "stays in the replaced data file. Nothing was changed.")
+                     .arg(running.join(QStringLiteral(", ")),
+                          running.size() == 1 ? QStringLiteral("is") : QStringLiteral("are"))};
+  };
   UserDefaults defaults;
   WTStoreSetup::registerDefaults(defaults);
-  const Result<QString> restored = WTStoreSetup::restoreBackup(QFileInfo(file).absoluteFilePath(), defaults);
+  const Result<QString> restored =
+      WTStoreSetup::restoreBackup(QFileInfo(file).absoluteFilePath(), defaults, noTimerRuns);
   if (!restored) return failure(err, restored.error().message);
   out << "Restored " << QFileInfo(file).absoluteFilePath() << ".\n";
   if (!restored.value().isEmpty()) out << "The replaced data file is kept as " << restored.value() << ".\n";

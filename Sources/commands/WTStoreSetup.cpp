@@ -26,12 +26,13 @@ QString storePath() {
   return applicationSupportFolder() + QStringLiteral("/Tessal.sqlite");
 }
 
-Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults) {
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults,
+                              const std::function<Result<void>()>& mayReplace) {
   const QString store = storePath();
   if (QFileInfo::exists(store) &&
       QFileInfo(backup).canonicalFilePath() == QFileInfo(store).canonicalFilePath())
     return Error{WTStore::OpenFailed, QStringLiteral("“%1” is the data file itself").arg(backup)};
-  const Result<QString> aside = WTStoreBackup::restore(backup, store);
+  const Result<QString> aside = WTStoreBackup::restore(backup, store, mayReplace);
   if (!aside) return aside;
   Result<std::unique_ptr<WTStore>> opened = RZSyncTrack::openStore(store);
   WTObjectContext context(&defaults);

@@ -4,6 +4,8 @@
 
 #include <QString>
 
+#include <functional>
+
 class UserDefaults;
 class WTObjectContext;
 
@@ -17,8 +19,10 @@ QString storePath();
 
 // Puts the copy at `backup` in place of the store (see WTStoreBackup::restore) and returns the name
 // the replaced store, with the journal inside it, now has. The restored store is journaled anew
-// (journalReplacedStore). The caller holds the writer lock and knows no desktop copy runs.
-Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults);
+// (journalReplacedStore). The caller holds the writer lock and knows no desktop copy runs. `mayReplace`
+// as WTStoreBackup::restore asks it.
+Result<QString> restoreBackup(const QString& backup, UserDefaults& defaults,
+                              const std::function<Result<void>()>& mayReplace = {});
 
 // The settings' values until the user sets them.
 void registerDefaults(UserDefaults& defaults);

@@ -207,8 +207,12 @@ QString newestGoodCopy(const QString& storePath) {
   return {};
 }
 
-Result<QString> restore(const QString& backup, const QString& storePath) {
+Result<QString> restore(const QString& backup, const QString& storePath,
+                        const std::function<Result<void>()>& mayReplace) {
   if (const Result<void> checked = check(backup); !checked) return checked.error();
+  if (mayReplace) {
+    if (const Result<void> allowed = mayReplace(); !allowed) return allowed.error();
+  }
   // The copy is made beside the store first: the store is replaced only by a whole file.
   const QString incoming = storePath + QStringLiteral(".restoring");
   QFile::remove(incoming);

@@ -6,6 +6,7 @@
 #include <QDateTime>
 #include <QString>
 
+#include <functional>
 #include <future>
 
 struct sqlite3;
@@ -48,9 +49,11 @@ QString newestGoodCopy(const QString& storePath);
 
 // Puts the copy at `backup` in place of the store at `storePath`, after checking it: nothing changes
 // when the check fails. The store's files (the log too) are renamed, never deleted, to a name with
-// ".replaced-" and the time; that name is returned (empty when there was no store). The caller makes
-// sure nobody has the store open.
-Result<QString> restore(const QString& backup, const QString& storePath);
+// ".replaced-" and the time; that name is returned (empty when there was no store). `mayReplace`, asked
+// once the copy has passed, may still refuse with its reason. The caller makes sure nobody has the store
+// open.
+Result<QString> restore(const QString& backup, const QString& storePath,
+                        const std::function<Result<void>()>& mayReplace = {});
 
 // The day's copy, made once a day after the first save, on a thread of its own with its own connection:
 // the saving thread never waits for it. Failures are logged (tessal.store) and tried again on a later

@@ -347,7 +347,9 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
   addProject("Before");
   const QString copy = here.expect({"backup"}, 0, here.path("data/Tessal2/Backups/Tessal-")).out.trimmed();
   here.expect({"backup", copy}, 1, "exists already");
+  here.expect({"backup", here.path("")}, 0, here.path("Tessal-"));
   addProject("After");
+  here.expect({"start", "Design", "--project", "After", "--create"}, 0, "");
   const QString store = here.storePath();
   const QByteArray before = storeBytes(store);
   const QList<std::pair<QStringList, QString>> refused = {
@@ -356,7 +358,8 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
       {{"restore", here.file("half.sqlite", fileBytes(copy).left(fileBytes(copy).size() / 2 + 100))},
        "is damaged"},
       {{"restore", here.path("missing.sqlite")}, "There is no data file at"},
-      {{"restore", store}, "is the data file itself"}};
+      {{"restore", store}, "is the data file itself"},
+      {{"restore", copy}, "After › Design is running: stop the timer first"}};
   for (const auto& [arguments, says] : refused) here.expect(arguments, arguments.size() == 1 ? 2 : 1, says);
   {
     WTSingleInstance desktop(here.runtimeFolder() + "/tessal.socket");
@@ -364,11 +367,13 @@ TEST(BackupCommand, PutsBackOnlyACheckedCopyAndKeepsTheStoreItReplaces) {
     here.expect({"restore", copy}, 1, "Tessal is running");
   }
   EXPECT_EQ(storeBytes(store), before);
+  here.expect({"stop"}, 0, "");
+  const QByteArray stopped = storeBytes(store);
   const QString kept = here.expect({"restore", copy}, 0, "The replaced data file is kept as ")
                            .out.section("kept as ", 1)
                            .chopped(2);
   EXPECT_EQ(here.out({"list", "projects"}), "Before\n");
-  EXPECT_EQ(storeBytes(kept), before);
+  EXPECT_EQ(storeBytes(kept), stopped);
   here.file("data/Tessal2/Tessal.sqlite", "garbage");
   here.expect({"status"}, 1, "The newest good backup is " + copy);
 }
