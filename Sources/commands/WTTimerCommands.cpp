@@ -17,6 +17,7 @@
 #include <QTimeZone>
 
 #include <algorithm>
+#include <utility>
 
 namespace {
 
@@ -233,7 +234,7 @@ QString timeOfDay(Date date, const QTimeZone& zone) {
 }
 
 // Adds a finished entry to a task, as typing one into the outline does. It must be over (nothing of it
-// after now), end no earlier than it starts, and share no time with the task's other entries. A duration
+// after now) and share no time with the task's other entries. A duration
 // alone ends now, or on another day at the present time of day.
 WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const QTimeZone& zone) {
   const Date now = Date::now();
@@ -242,17 +243,17 @@ WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const
       arguments.day.date.isValid() ? arguments.day.date : here.date().addDays(-arguments.day.daysBack);
   Date start, end;
   if (arguments.span.start.isValid()) {
+    // As on a wall clock, an end before the start is the next morning's: work past midnight.
+    const QDate endDay = arguments.span.end < arguments.span.start ? day.addDays(1) : day;
     // A time the clocks skip on that day would otherwise be moved by the zone's shift, unseen.
-    for (const QTime& typed : {arguments.span.start, arguments.span.end}) {
-      if (const QDateTime at(day, typed, zone); !at.isValid() || at.time() != typed)
+    for (const auto& [typed, on] :
+         {std::pair{arguments.span.start, day}, std::pair{arguments.span.end, endDay}}) {
+      if (const QDateTime at(on, typed, zone); !at.isValid() || at.time() != typed)
         return failure(QStringLiteral("there is no %1 on %2 here: the clocks go forward then")
-                           .arg(typed.toString(u"HH:mm"), day.toString(Qt::ISODate)));
+                           .arg(typed.toString(u"HH:mm"), on.toString(Qt::ISODate)));
     }
     start = Date::fromQDateTime(QDateTime(day, arguments.span.start, zone));
-    end = Date::fromQDateTime(QDateTime(day, arguments.span.end, zone));
-    if (end < start)
-      return failure(QStringLiteral("the entry would end (%1) before it starts (%2)")
-                         .arg(timeOfDay(end, zone), timeOfDay(start, zone)));
+    end = Date::fromQDateTime(QDateTime(endDay, arguments.span.end, zone));
   } else {
     end = day == here.date()
               ? RZDate::beginOfMinute(now)

@@ -31,9 +31,9 @@ struct WTCommandOutcome {
 //     project and client when they are missing too (WTNamedRecords::taskMadeIfMissing).
 //   add TASK (DURATION | START-END) [--date DAY] [--note TEXT] [--project NAME] [--client NAME] [--create]
 //     Adds a finished time entry: START-END ("09:00-10:30") on DAY (today, yesterday or YYYY-MM-DD; today
-//     by default), or DURATION ("0:45", "45") ending now, or on another DAY at the present time of day.
-//     An entry that ends before it starts, is not over yet or shares time with another entry of the task
-//     exits 1 saying so, naming the other entry.
+//     by default; an END before START is the next morning's), or DURATION ("0:45", "45") ending now, or on
+//     another DAY at the present time of day. An entry that is not over yet or shares time with another
+//     entry of the task exits 1 saying so, naming the other entry.
 //   stop [TASK] [--project NAME] [--client NAME]
 //     Stops every running entry, or the named task's.
 //   status [--json]

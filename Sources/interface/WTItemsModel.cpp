@@ -85,7 +85,15 @@ MovedEnd movedEnd(const WTTime& time, bool start, const QString& text) {
   if (!typed)
     return {{},
             WTItemsModel::tr("“%1” is not a time of day; type one as 9:05 or 09:05.").arg(text.trimmed())};
-  const Date moved = timeOnDay(*day, *typed);
+  Date moved = timeOnDay(*day, *typed);
+  // An end is the first such time from the start on, as on a wall clock: work past midnight ends the next
+  // day, and an entry over midnight ends on the evening before it again. An entry of a day or more keeps
+  // its end's day.
+  if (const std::optional<Date> begin = time.startDate();
+      !start && begin && time.endDate()->secondsSince1970() - begin->secondsSince1970() < 24 * 3600) {
+    moved = timeOnDay(*begin, *typed);
+    if (moved < *begin) moved = timeOnDay(RZDate::tomorrow(*begin), *typed);
+  }
   if (const QString asTyped = typed->toString(u"HH:mm"); clock(moved) != asTyped)
     return {{}, WTItemsModel::tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped)};
   if (start && !time.running() && time.endDate() && moved > *time.endDate())

@@ -203,7 +203,7 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
       // clang-format off
       {{"add", "review", "10:15-11:00", "--date", "2026-03-03", "--note", "Call"}, 0, "Added Hermes › Review  2026-03-03 10:15–11:00  00:45\n"},
       {{"add", "Review", "8:30-9:01", "--date", "2026-03-03"}, 1, "the entry 2026-03-03 08:30–09:01 overlaps the entry 2026-03-03 09:00–10:15 of Hermes › Review"},
-      {{"add", "Review", "11:00-10:30", "--date", "2026-03-02"}, 1, "would end (10:30) before it starts (11:00)"},
+      {{"add", "Review", "23:30-0:45", "--date", "2026-03-02"}, 0, "Added Hermes › Review  2026-03-02 23:30–2026-03-03 00:45  01:15\n"},
       {{"add", "Review", "02:30-03:15", "--date", "2026-03-29"}, 1, "there is no 02:30 on 2026-03-29 here: the clocks go forward then"},
       {{"add", "Review", "00:00-00:01", "--date", tomorrow}, 1, "is not over yet"},
       {{"add", "Review", "1:00", "--date", tomorrow}, 1, "is not over yet"},
@@ -232,9 +232,10 @@ TEST_F(TrackCommand, SaysWhatItDidOrWhyNot) {
   };
   for (const auto& c : cases) here.expect(c.arguments, c.code, c.says);
   EXPECT_EQ(running(), QStringList({"Zeus/Write"}));
-  // Exactly the accepted: 45 minutes ending now, the call, yesterday's, three on 4 March, two started.
+  // Exactly the accepted: 45 minutes ending now, the call, the night's, yesterday's, three on 4 March, two
+  // started.
   const std::unique_ptr<WTObjectContext> context = here.readStore();
-  EXPECT_EQ(context->fetch<WTTime>().size(), 9);
+  EXPECT_EQ(context->fetch<WTTime>().size(), 10);
   const auto endsNow = [](const WTTime* time) {
     return time->duration() == 45 && std::abs(time->endDate()->timeIntervalSince(Date::now())) < 120;
   };

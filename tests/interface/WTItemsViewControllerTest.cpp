@@ -248,17 +248,22 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
       {Part::End, "17:30", "17:20", "09:00-17:30"},
       // clang-format on
   };
-  for (const auto& row : rows) {
-    const QPoint field = shown->centreOf(time, row.part);
+  // Types into an entry's field; gives what the editor showed first.
+  auto type = [&](WTTime* entry, Part part, const char* typed) {
+    const QPoint field = shown->centreOf(entry, part);
     QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, field);
     QTest::mouseDClick(outline()->viewport(), Qt::LeftButton, {}, field);
     QLineEdit* editor = shown->openEditor();
-    ASSERT_NE(editor, nullptr) << row.typed;
-    EXPECT_EQ(editor->objectName() + ' ' + editor->text(),
-              QString(row.part == Part::End ? "endEditor " : "startEditor ") + row.shownBefore);
-    editor->setText(row.typed);
+    if (!editor) return QString("no editor");
+    const QString before = editor->objectName() + ' ' + editor->text();
+    editor->setText(typed);
     outline()->endEditing();
     endTurn();
+    return before;
+  };
+  for (const auto& row : rows) {
+    EXPECT_EQ(type(time, row.part, row.typed),
+              QString(row.part == Part::End ? "endEditor " : "startEditor ") + row.shownBefore);
     EXPECT_EQ(span(time), row.after) << row.typed;
   }
   EXPECT_EQ(time->startDate(), at(2024, 3, 13, 9, 0));  // on the same day
@@ -287,6 +292,15 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   ASSERT_NE(shown->openEditor(), nullptr);
   EXPECT_EQ(shown->openEditor()->objectName(), "durationEditor");
   outline()->endEditing();
+  // An end before the start is the next morning's, and back to the evening again.
+  WTTime* night = makeItem<WTTime>(design, "Release", at(2024, 3, 12, 23, 0));
+  endTurn();
+  controller->expandContainerOfItem(night);
+  endTurn();
+  type(night, Part::End, "1:15");
+  EXPECT_EQ(night->endDate(), at(2024, 3, 13, 1, 15));
+  type(night, Part::End, "23:45");
+  EXPECT_EQ(night->endDate(), at(2024, 3, 12, 23, 45));
 }
 
 // A task's add buttons answer only while shown; an entry's row has none.
