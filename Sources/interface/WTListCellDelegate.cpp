@@ -63,7 +63,19 @@ void WTListCellDelegate::paint(QPainter* painter, const QStyleOptionViewItem& op
 
   QFont small = option.font;
   small.setPointSizeF(std::max<qreal>(small.pointSizeF() - 1.0, 8.0));
-  const QRectF subtitle = cell_.partRect(WTTableCellView::Part::Subtitle, row);
+  QRectF subtitle = cell_.partRect(WTTableCellView::Part::Subtitle, row);
+  // What the rounding rules bill, dimmed at the end of the line, right before the totals it stands beside
+  // (as in the outline); the subtitle gives up that room.
+  if (const QString billed = index.data(WTObjectListModel::BilledTextRole).toString(); !billed.isEmpty()) {
+    const qreal width =
+        std::min(QFontMetricsF(small).horizontalAdvance(billed) + 2.0, subtitle.width() / 2.0);
+    const QRectF room(subtitle.right() - width, subtitle.y(), width, subtitle.height());
+    painter->setFont(small);
+    painter->setPen(selected ? dimSelectedText : RZColor::calibratedWhite(0.4));
+    painter->drawText(room, Qt::AlignRight | Qt::AlignVCenter,
+                      painter->fontMetrics().elidedText(billed, Qt::ElideLeft, static_cast<int>(width)));
+    subtitle.setRight(room.left() - 8.0);
+  }
   const QString subtitleText = index.data(WTObjectListModel::SubtitleRole).toString();
   if (cell_.identifier() == QLatin1String("Project")) {
     // The client chooser: a pop-up drawn flat, dark on the light row, arrow first.

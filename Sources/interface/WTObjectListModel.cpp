@@ -4,6 +4,7 @@
 #include "MoneyFormat.h"
 #include "WTBudgetBar.h"
 #include "WTClient.h"
+#include "WTItemsModel.h"
 #include "WTObjectContext.h"
 #include "WTOrderedDiff.h"
 #include "WTProject.h"
@@ -33,11 +34,11 @@ bool isSortKey(const QString& key) {
 }
 
 bool isShownKey(const QString& key) {
-  static const QSet<QString> keys = {QStringLiteral("duration"),   QStringLiteral("cost"),
-                                     QStringLiteral("tableImage"), QStringLiteral("client"),
-                                     QStringLiteral("projects"),   QStringLiteral("notes"),
-                                     QStringLiteral("rate"),       QStringLiteral("budget"),
-                                     QStringLiteral("billedCost"), QStringLiteral("billingCurrency")};
+  static const QSet<QString> keys = {
+      QStringLiteral("duration"),       QStringLiteral("cost"),           QStringLiteral("tableImage"),
+      QStringLiteral("client"),         QStringLiteral("projects"),       QStringLiteral("notes"),
+      QStringLiteral("rate"),           QStringLiteral("budget"),         QStringLiteral("billedCost"),
+      QStringLiteral("billedDuration"), QStringLiteral("billingCurrency")};
   return keys.contains(key);
 }
 
@@ -201,6 +202,11 @@ QVariant WTObjectListModel::data(const QModelIndex& index, int role) const {
     case CostTextRole:
       return MoneyFormat::format(static_cast<const WTBillingRecord*>(object)->cost(),
                                  static_cast<const WTBillingRecord*>(object)->billingCurrency());
+    case BilledTextRole: {
+      const auto* record = static_cast<const WTBillingRecord*>(object);
+      return WTItemsModel::billedText(std::pair(record->duration(), record->billedDuration()), record->cost(),
+                                      record->billedCost(), record->billingCurrency());
+    }
     case ImageRole:
       return imageOf(object);
     case ArchivedRole:

@@ -28,6 +28,7 @@ class WTObjectListModel : public QAbstractListModel {
     SubtitleRole,
     DurationTextRole,
     CostTextRole,
+    BilledTextRole,  // what the record's rounding rules bill where it differs from the totals; else empty
     ImageRole,
     ArchivedRole,
     ClientRole,   // projects: the client (WTObject* as quintptr), settable

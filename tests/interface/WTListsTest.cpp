@@ -29,13 +29,14 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   const QModelIndex row = projects.index(0, 0), clientRow = clients.index(0, 0);
   auto shows = [](const QModelIndex& index) {
     QStringList parts;
-    for (int role : {int(WTObjectListModel::SubtitleRole), int(WTObjectListModel::DurationTextRole),
-                     int(WTObjectListModel::CostTextRole), int(WTObjectListModel::ImageRole),
-                     int(Qt::ToolTipRole), int(WTObjectListModel::ArchivedRole)})
+    for (int role :
+         {int(WTObjectListModel::SubtitleRole), int(WTObjectListModel::DurationTextRole),
+          int(WTObjectListModel::CostTextRole), int(WTObjectListModel::BilledTextRole),
+          int(WTObjectListModel::ImageRole), int(Qt::ToolTipRole), int(WTObjectListModel::ArchivedRole)})
       parts << index.data(role).toString();
     return parts.join(u'|');
   };
-  EXPECT_EQ(shows(row), "No Client|00:30|25.00|folder_32||false");
+  EXPECT_EQ(shows(row), "No Client|00:30|25.00||folder_32||false");
   auto clientOf = [](WTObjectListModel& list, const WTObject* object) {
     return list.setData(list.index(0, 0), WTObjectListModel::variantFromObject(object),
                         WTObjectListModel::ClientRole);
@@ -43,7 +44,7 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   EXPECT_FALSE(clientOf(projects, task) || clientOf(clients, client));
   ASSERT_TRUE(clientOf(projects, client));
   EXPECT_EQ(project->client(), client);
-  EXPECT_EQ(shows(clientRow), "1 project · 100.00 an hour|00:30|50.00|admin_2_32||false");
+  EXPECT_EQ(shows(clientRow), "1 project · 100.00 an hour|00:30|50.00||admin_2_32||false");
   QSignalSpy changed(&projects, &QAbstractItemModel::dataChanged),
       clientChanged(&clients, &QAbstractItemModel::dataChanged);
   project->setArchived(true);
@@ -51,12 +52,20 @@ TEST_F(WTObjectListModelTest, RowsShowTotalsClientAndArchivedLook) {
   client->setRate(Decimal(120));
   endTurn();
   EXPECT_TRUE(changed.count() >= 1 && clientChanged.count() >= 1);
-  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.00|folder_32_dis||true");  // no timer runs in it: no tip
-  EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00|admin_2_32||false");
+  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.00||folder_32_dis||true");  // no timer runs in it: no tip
+  EXPECT_EQ(shows(clientRow), "1 project · 120.00 an hour|00:30|60.00||admin_2_32||false");
   client->setCurrency("KWD");  // three places, and the code where it is the client's own
   endTurn();
-  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.000|folder_32_dis||true");
-  EXPECT_EQ(shows(clientRow), "1 project · 120.000 KWD an hour|00:30|60.000|admin_2_32||false");
+  EXPECT_EQ(shows(row), "ACME Ltd|00:30|60.000||folder_32_dis||true");
+  EXPECT_EQ(shows(clientRow), "1 project · 120.000 KWD an hour|00:30|60.000||admin_2_32||false");
+  // Beside the raw totals, what the client's rounding rule bills.
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
+  makeItem<WTTime>(task, at(2024, 3, 14, 11))->setEndDate(at(2024, 3, 14, 11, 10));
+  endTurn();
+  EXPECT_EQ(shows(row), "ACME Ltd|00:40|80.000|billed 00:45 · 90.000|folder_32_dis||true");
+  EXPECT_EQ(shows(clientRow),
+            "1 project · 120.000 KWD an hour|00:40|80.000|billed 00:45 · 90.000|admin_2_32||false");
 }
 
 // The filtered list follows changes row by row, and lists an archived project while its timer runs.
