@@ -35,6 +35,9 @@ inline constexpr QLatin1StringView kCustomRangeBegin{"WTCustomRangeBegin"};
 inline constexpr QLatin1StringView kCustomRangeEnd{"WTCustomRangeEnd"};
 inline constexpr QLatin1StringView kCustomRangeWindowBegin{"WTCustomRangeWindowBegin"};
 inline constexpr QLatin1StringView kCustomRangeWindowEnd{"WTCustomRangeWindowEnd"};
+// The export's last choices, offered again: the range's tag (WTRangePredicate::Tag) and the format.
+inline constexpr QLatin1StringView kExportRange{"WTExportRange"};
+inline constexpr QLatin1StringView kExportFormat{"WTExportFormat"};
 
 // The main window: the project chosen last and the window's place and size.
 inline constexpr QLatin1StringView kLastSelectedProject{"WTLastSelectedProject"};

@@ -1,5 +1,7 @@
 #include "WTExportController.h"
 
+#include "SettingsKeys.h"
+#include "UserDefaults.h"
 #include "WTCSVExport.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -58,6 +60,15 @@ WTExportController::WTExportController(WTObjectContext* context, std::function<W
   formatNote_->setForegroundRole(QPalette::PlaceholderText);
   layout->addWidget(formatNote_);
   connect(formatChoice_, &QComboBox::currentIndexChanged, this, &WTExportController::updateFormatNote);
+  // A month's export is made again next month: the last export's range and format are offered.
+  if (const UserDefaults* defaults = context ? context->userDefaults() : nullptr) {
+    if (const QVariant range = defaults->value(SettingsKeys::kExportRange); range.isValid())
+      rangeButton_->selectTag(range.toInt());
+    if (const QVariant format = defaults->value(SettingsKeys::kExportFormat); format.isValid()) {
+      const int index = formatChoice_->findData(format.toInt());
+      if (index >= 0) formatChoice_->setCurrentIndex(index);
+    }
+  }
   updateFormatNote();
 
   auto* buttons = new QDialogButtonBox(QDialogButtonBox::Cancel, this);
@@ -126,6 +137,10 @@ void WTExportController::accept() {
   if (!written) {
     QMessageBox::warning(this, tr("Export"), written.error().message);
     return;
+  }
+  if (UserDefaults* defaults = context_->userDefaults()) {
+    defaults->setValue(SettingsKeys::kExportRange, rangeButton_->selectedTag());
+    defaults->setValue(SettingsKeys::kExportFormat, int(format()));
   }
   QDialog::accept();
 }

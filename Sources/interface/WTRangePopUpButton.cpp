@@ -8,9 +8,18 @@
 WTRangePopUpButton::WTRangePopUpButton(UserDefaults* defaults, QWidget* parent)
     : QComboBox(parent), defaults_(defaults) {
   setObjectName(QStringLiteral("rangeButton"));
+  // The custom dates chosen last, else the month up to now.
   const Date now = Date::now();
   customRangeBegin_ = RZDate::addMonth(now, -1);
   customRangeEnd_ = now;
+  if (defaults_) {
+    const std::optional<Date> begin = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowBegin);
+    const std::optional<Date> end = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowEnd);
+    if (begin && end) {
+      customRangeBegin_ = begin;
+      customRangeEnd_ = end;
+    }
+  }
   setupMenu();
   connect(this, &QComboBox::activated, this, &WTRangePopUpButton::itemActivated);
 }

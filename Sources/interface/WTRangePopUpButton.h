@@ -18,7 +18,7 @@ class WTRangePopUpButton : public QComboBox {
   Q_OBJECT
  public:
   // `defaults` (not owned, may be null) carries the custom dates to and from the dialog under
-  // "WTCustomRangeWindowBegin" and "WTCustomRangeWindowEnd".
+  // "WTCustomRangeWindowBegin" and "WTCustomRangeWindowEnd"; the button starts with those chosen last.
   explicit WTRangePopUpButton(UserDefaults* defaults, QWidget* parent = nullptr);
   ~WTRangePopUpButton() override;
 

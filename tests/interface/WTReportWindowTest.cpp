@@ -306,6 +306,17 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
   EXPECT_TRUE(rows.size() == 2 && rows[0].startsWith("Acme,Backend,API,time,,2024-02-10,09:00,11:00,2:00") &&
               rows[1].startsWith("client,project,"))
       << rows.join(u'\n').toStdString();
+  // The next export offers what the last one written chose: the custom days and times, then last
+  // month's spreadsheet.
+  for (const bool again : {false, true}) {
+    WTExportController next(context.get(), [] { return nullptr; });
+    const std::pair chosen(next.rangeButton()->selectedTag(), next.format());
+    EXPECT_EQ(chosen, again ? std::pair(int(WTRangePredicate::LastMonth), WTCSVExport::Format::Spreadsheet)
+                            : std::pair(int(WTRangePredicate::Custom), WTCSVExport::Format::Times));
+    EXPECT_EQ(Range(next.rangeButton()->customRangeBegin(), next.rangeButton()->customRangeEnd()),
+              Range(berlin(2024, 3, 3), berlin(2024, 3, 3)));
+    exporter.accept();
+  }
 }
 
 }  // namespace
