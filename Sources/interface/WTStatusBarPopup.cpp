@@ -15,6 +15,8 @@
 #include <QToolButton>
 #include <QVBoxLayout>
 
+#include <algorithm>
+
 namespace {
 
 constexpr int kImageSize = 24;
@@ -41,9 +43,9 @@ WTStatusBarPopup::WTStatusBarPopup(WTRecentTasks* tasks, QWidget* parent)
   auto* layout = new QVBoxLayout(this);
   layout->setContentsMargins(8, 8, 8, 8);
   layout->setSpacing(6);
-  rows_ = new QVBoxLayout;
-  rows_->setSpacing(2);
-  layout->addLayout(rows_);
+  rowLayout_ = new QVBoxLayout;
+  rowLayout_->setSpacing(2);
+  layout->addLayout(rowLayout_);
   emptyHint_ = new QLabel(tr("No tasks yet"), this);
   emptyHint_->setEnabled(false);
   layout->addWidget(emptyHint_);
@@ -54,14 +56,25 @@ WTStatusBarPopup::WTStatusBarPopup(WTRecentTasks* tasks, QWidget* parent)
     emit showMainWindowRequested();
   });
   layout->addWidget(show, 0, Qt::AlignRight);
-  connect(tasks_, &WTRecentTasks::tasksDidChange, this, [this] {
-    // An empty list has nothing to offer: the popup goes, as a menu with no items would.
-    if (tasks_->tasks().isEmpty() && isVisible()) {
-      close();
-      return;
-    }
-    rebuildRows();
-  });
+  connect(tasks_, &WTRecentTasks::tasksDidChange, this, &WTStatusBarPopup::tasksDidChange);
+}
+
+void WTStatusBarPopup::tasksDidChange() {
+  // An empty list has nothing to offer: the popup goes, as a menu with no items would.
+  if (tasks_->tasks().isEmpty() && isVisible()) {
+    close();
+    return;
+  }
+  // The same tasks in another order (one was started) stay where the user sees them while it is open.
+  QList<WTTask*> shown, listed = tasks_->tasks();
+  for (const Row& row : std::as_const(rows_)) shown.append(row.task);
+  std::sort(shown.begin(), shown.end());
+  std::sort(listed.begin(), listed.end());
+  if (isVisible() && shown == listed) {
+    fillRows();
+    return;
+  }
+  rebuildRows();
 }
 
 void WTStatusBarPopup::popUp(const QRect& anchor) {
@@ -82,10 +95,7 @@ void WTStatusBarPopup::popUp(const QRect& anchor) {
   raise();
   activateWindow();
   // The keyboard works the list at once: Tab moves between the buttons, Space presses one.
-  if (QLayoutItem* first = rows_->itemAt(0)) {
-    if (auto* button = first->widget()->findChild<QToolButton*>(QStringLiteral("timerButton")))
-      button->setFocus(Qt::PopupFocusReason);
-  }
+  if (!rows_.isEmpty()) rows_.front().button->setFocus(Qt::PopupFocusReason);
 }
 
 void WTStatusBarPopup::showEvent(QShowEvent* event) {
@@ -99,20 +109,20 @@ void WTStatusBarPopup::hideEvent(QHideEvent* event) {
 }
 
 void WTStatusBarPopup::updateElapsedTimes() {
-  for (const auto& [task, label] : std::as_const(elapsed_)) label->setText(elapsedText(task));
+  for (const Row& row : std::as_const(rows_)) row.elapsed->setText(elapsedText(row.task));
 }
 
 void WTStatusBarPopup::rebuildRows() {
-  // Rows are a handful of widgets: made afresh after each change rather than kept in step one by one.
-  // The old ones go later, since the button that was clicked may still be on the stack.
-  while (QLayoutItem* item = rows_->takeAt(0)) {
+  // Rows are a handful of widgets: made afresh when other tasks are listed rather than kept in step one
+  // by one. The old ones go later, since the button that was clicked may still be on the stack.
+  while (QLayoutItem* item = rowLayout_->takeAt(0)) {
     if (QWidget* row = item->widget()) {
       row->hide();
       row->deleteLater();
     }
     delete item;
   }
-  elapsed_.clear();
+  rows_.clear();
   const QList<WTTask*>& tasks = tasks_->tasks();
   emptyHint_->setVisible(tasks.isEmpty());
   for (WTTask* task : tasks) {
@@ -121,38 +131,54 @@ void WTStatusBarPopup::rebuildRows() {
     auto* layout = new QHBoxLayout(row);
     layout->setContentsMargins(2, 2, 2, 2);
     auto* image = new QLabel(row);
-    image->setPixmap(
-        WTImages::pixmap(task->tableImage(), QSize(kImageSize, kImageSize), devicePixelRatioF()));
     layout->addWidget(image);
-    const QString project = task->project() ? task->project()->name() : QString();
     auto* title = new QLabel(row);
     title->setObjectName(QStringLiteral("taskTitle"));
     title->setTextFormat(Qt::PlainText);
-    // A long name is cut where it shows that it is, and is whole in the tip.
-    QStringList lines = {task->name()};
-    if (!project.isEmpty()) lines << project;
-    const QStringList whole = lines;
-    for (QString& line : lines) line = title->fontMetrics().elidedText(line, Qt::ElideRight, kTitleWidth);
-    title->setText(lines.join(u'\n'));
-    if (lines != whole) title->setToolTip(whole.join(u'\n'));
     title->setMinimumWidth(160);
     layout->addWidget(title, 1);
-    auto* elapsed = new QLabel(elapsedText(task), row);
+    auto* elapsed = new QLabel(row);
     elapsed->setObjectName(QStringLiteral("taskElapsed"));
     elapsed->setTextFormat(Qt::PlainText);
     layout->addWidget(elapsed);
-    elapsed_.append({task, elapsed});
     auto* button = new QToolButton(row);
     button->setObjectName(QStringLiteral("timerButton"));
     button->setToolButtonStyle(Qt::ToolButtonTextBesideIcon);
-    button->setIcon(WTImages::icon(task->timerButtonImage()));
-    button->setText(task->buttonTitle());
     button->setAutoRaise(true);
-    // Records live as long as their context (deleted ones too, for undo), and the rows are made afresh
-    // after every change, so the task behind a button is always there.
+    // Records live as long as their context (deleted ones too, for undo), so the task behind a button
+    // is always there.
     connect(button, &QToolButton::clicked, this, [task] { task->toggleTimer(); });
     layout->addWidget(button);
-    rows_->addWidget(row);
+    rowLayout_->addWidget(row);
+    rows_.append({task, image, title, elapsed, button});
   }
-  if (isVisible()) adjustSize();
+  fillRows();
+}
+
+void WTStatusBarPopup::fillRows() {
+  for (const Row& row : std::as_const(rows_)) {
+    WTTask* task = row.task;
+    row.image->setPixmap(
+        WTImages::pixmap(task->tableImage(), QSize(kImageSize, kImageSize), devicePixelRatioF()));
+    // A long name is cut where it shows that it is, and is whole in the tip.
+    QStringList lines = {task->name()};
+    const QString project = task->project() ? task->project()->name() : QString();
+    if (!project.isEmpty()) lines << project;
+    const QStringList whole = lines;
+    for (QString& line : lines) line = row.title->fontMetrics().elidedText(line, Qt::ElideRight, kTitleWidth);
+    row.title->setText(lines.join(u'\n'));
+    row.title->setToolTip(lines != whole ? whole.join(u'\n') : QString());
+    row.elapsed->setText(elapsedText(row.task));
+    row.button->setIcon(WTImages::icon(task->timerButtonImage()));
+    row.button->setText(task->buttonTitle());
+  }
+  if (!isVisible()) return;
+  // A row grown wider (a timer's minutes and "Stop") widens the popup now, from the rows' new sizes (their
+  // layouts ask for them later), and never past the screen's edge.
+  QCoreApplication::sendPostedEvents(nullptr, QEvent::LayoutRequest);
+  adjustSize();
+  if (const QScreen* screen = QGuiApplication::screenAt(geometry().center())) {
+    const QRect available = screen->availableGeometry();
+    move(std::clamp(x(), available.left(), std::max(available.left(), available.right() - width())), y());
+  }
 }

@@ -7,13 +7,16 @@
 #include <utility>
 
 class QLabel;
+class QToolButton;
 class QVBoxLayout;
 class WTRecentTasks;
 class WTTask;
 
 // The tray's list: the limited controller's tasks, each with its image, name, project, the elapsed time of
 // its running timers and its timer button ("Start"/"Stop"), and "Show Tessal" below. A frameless popup that
-// closes on a click elsewhere, when "Show Tessal" is chosen, or when the list becomes empty.
+// closes on a click elsewhere, when "Show Tessal" is chosen, or when the list becomes empty. While it is
+// open its rows keep their places (a started task comes first when it opens again): a row never moves
+// under the pointer or takes the focus with it.
 class WTStatusBarPopup : public QFrame {
   Q_OBJECT
  public:
@@ -35,11 +38,20 @@ class WTStatusBarPopup : public QFrame {
   void hideEvent(QHideEvent* event) override;
 
  private:
+  struct Row {
+    WTTask* task;
+    QLabel* image;
+    QLabel* title;
+    QLabel* elapsed;
+    QToolButton* button;
+  };
   void rebuildRows();
+  // Shows each row's task as it is now, in the rows' order.
+  void fillRows();
+  void tasksDidChange();
 
   WTRecentTasks* tasks_;
-  QVBoxLayout* rows_;
+  QVBoxLayout* rowLayout_;
   QWidget* emptyHint_;
-  // Each row's task and the label of its elapsed time.
-  QList<std::pair<WTTask*, QLabel*>> elapsed_;
+  QList<Row> rows_;
 };
