@@ -3,6 +3,7 @@
 #include "Date.h"
 #include "Decimal.h"
 #include "Result.h"
+#include "WTRoundingRule.h"
 
 #include <QString>
 #include <QStringList>
@@ -28,6 +29,7 @@ struct WTImportRow {
   std::optional<Date> lastKnown;
   std::optional<Decimal> rate;    // per hour
   std::optional<Decimal> amount;  // what the file says the entry bills, where it says so
+  std::optional<WTRoundingRule> rounding;  // the rule the file billed the entry by, where it says so
   QString currency;
   bool billable = true;
   QStringList tags;

@@ -421,6 +421,14 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   }
 
   if (format.amount[0] && row.billable) row.amount = parseNumber(value(format.amount));
+  // Tessal's own file says by which rule each entry was billed (a later column: older files lack it).
+  if (const QString rule = &format == &kTessal ? value("rounding") : QString(); !rule.isEmpty()) {
+    row.rounding = WTRoundingRule::fromText(rule);
+    if (!row.rounding) {
+      problem = QStringLiteral("the rounding “%1” cannot be read").arg(rule);
+      return std::nullopt;
+    }
+  }
   if (format.rate[0] && !value(format.rate).isEmpty()) {
     row.rate = parseNumber(value(format.rate));
     if (!row.rate) {

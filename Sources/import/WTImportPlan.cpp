@@ -154,6 +154,56 @@ void placeRates(ClientNode& client, WTImportPlan& plan) {
   }
 }
 
+// The rounding rule every row of `rows` that names one shares; none when they name none or differ, with
+// `varies`.
+std::optional<WTRoundingRule> sharedRounding(const std::vector<const WTImportRow*>& rows, bool& varies) {
+  std::optional<WTRoundingRule> shared;
+  varies = false;
+  for (const WTImportRow* row : rows) {
+    if (!row->rounding) continue;
+    if (shared && !shared->billsLike(*row->rounding)) varies = true;
+    if (!shared) shared = row->rounding;
+  }
+  if (varies) return std::nullopt;
+  return shared;
+}
+
+// Gives `record` the rule unless it bills by it already; a record the import did not make keeps its own.
+bool placeRounding(WTBillingRecord* record, bool made, const WTRoundingRule& rule) {
+  if (record->roundingRule().billsLike(rule)) return true;
+  if (!made) return false;
+  record->setRoundingMinutes(rule.minutes);
+  record->setRoundingMode(WTRoundingRule::nameOfMode(rule.mode));
+  return true;
+}
+
+// The rounding rules the file billed by, each set at the highest level across which it holds, so that
+// the store bills the entries as the file did.
+void placeRoundings(ClientNode& client, WTImportPlan& plan) {
+  bool varies = false;
+  const std::optional<WTRoundingRule> clientRule = sharedRounding(rowsOf(client), varies);
+  if (!clientRule && !varies) return;
+  if (clientRule && client.client() && placeRounding(client.client(), client.made, *clientRule)) return;
+  for (auto& [projectKey, project] : client.projects) {
+    const std::optional<WTRoundingRule> projectRule = sharedRounding(rowsOf(project), varies);
+    if (!projectRule && !varies) continue;
+    if (projectRule && placeRounding(project.project(), project.made, *projectRule)) continue;
+    for (auto& [taskKey, task] : project.tasks) {
+      const std::optional<WTRoundingRule> taskRule = sharedRounding(task.rows, varies);
+      if (!taskRule && !varies) continue;
+      const QString label = taskLabel(*task.rows.front());
+      if (varies) {
+        plan.notes.append(QStringLiteral("the entries of %1 were billed by several rounding rules; the task "
+                                         "bills by %2")
+                              .arg(label, task.task()->roundingRule().toText()));
+      } else if (!placeRounding(task.task(), task.made, *taskRule)) {
+        plan.notes.append(QStringLiteral("%1 keeps its rounding (%2); the file's entries were billed by %3")
+                              .arg(label, task.task()->roundingRule().toText(), taskRule->toText()));
+      }
+    }
+  }
+}
+
 // An entry of the same task over the same minutes is the same entry, whichever file brings it again:
 // Tessal's own spreadsheet read back in (its entries carry no import id), or another tracker's export of
 // work also tracked here.
@@ -295,6 +345,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
       }
     }
     placeRates(*client, plan);
+    placeRoundings(*client, plan);
   }
   context.reserveForInsertions(WTEntity::Time, entries.size());
   for (const auto& [row, node] : entries) {

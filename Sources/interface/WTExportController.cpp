@@ -102,7 +102,7 @@ void WTExportController::updateFormatNote() {
                "minutes, one entry a line.")
           : tr("Time entries, flat fees and expenses are written as a spreadsheet with a header row: client, "
                "project, task, kind, name, date, start, end, duration, billed duration, rate, amount, "
-               "currency and notes."));
+               "currency, notes and rounding rule."));
 }
 
 WTCSVExport::Format WTExportController::format() const {

@@ -47,6 +47,21 @@ QVariantMap WTRoundingRule::toVariantMap() const {
   return {{QStringLiteral("minutes"), minutes}, {QStringLiteral("mode"), nameOfMode(mode)}};
 }
 
+QString WTRoundingRule::toText() const {
+  return minutes <= 1 ? QStringLiteral("none") : QStringLiteral("%1 %2").arg(minutes).arg(nameOfMode(mode));
+}
+
+std::optional<WTRoundingRule> WTRoundingRule::fromText(QStringView text) {
+  text = text.trimmed();
+  if (text == u"none") return WTRoundingRule{};
+  const qsizetype space = text.indexOf(u' ');
+  bool number = false;
+  const int minutes = space > 0 ? text.left(space).toInt(&number) : 0;
+  const std::optional<Mode> mode = space > 0 ? modeFromName(text.mid(space + 1)) : std::nullopt;
+  if (!number || minutes < 1 || !mode) return std::nullopt;
+  return WTRoundingRule{minutes, *mode};
+}
+
 WTRoundingRule WTRoundingRule::refinedBy(const std::optional<qint64>& ownMinutes,
                                          const QString& ownMode) const {
   WTRoundingRule rule = *this;

@@ -31,6 +31,14 @@ struct WTRoundingRule {
   static std::optional<QString> storedMode(const QVariant& value);
   // {"minutes": 15, "mode": "up"}, for templates.
   QVariantMap toVariantMap() const;
+  // "15 up", or "none" for a rule that bills the minutes as they are; the spreadsheet export's text.
+  QString toText() const;
+  // A rule from toText()'s text; none for any other.
+  static std::optional<WTRoundingRule> fromText(QStringView text);
+  // Whether two rules bill every duration alike (all rules of a minute or less do).
+  bool billsLike(const WTRoundingRule& other) const {
+    return minutes <= 1 ? other.minutes <= 1 : *this == other;
+  }
 
   friend bool operator==(const WTRoundingRule&, const WTRoundingRule&) = default;
 };

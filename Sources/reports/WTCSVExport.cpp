@@ -144,7 +144,8 @@ const QStringList& spreadsheetColumns() {
                                       QStringLiteral("start"),    QStringLiteral("end"),
                                       QStringLiteral("duration"), QStringLiteral("billed duration"),
                                       QStringLiteral("rate"),     QStringLiteral("amount"),
-                                      QStringLiteral("currency"), QStringLiteral("notes")};
+                                      QStringLiteral("currency"), QStringLiteral("notes"),
+                                      QStringLiteral("rounding")};
   return columns;
 }
 
@@ -202,7 +203,8 @@ QString spreadsheetCSV(QList<WTItem*> items) {
               expense ? QString() : hoursAndMinutes(item->duration()),
               expense ? QString() : hoursAndMinutes(item->billedDuration()),
               expense || !rate ? QString() : plainNumber(*rate, places),
-              plainNumber(item->billedCost(), places), currency, inertText(item->notes())});
+              plainNumber(item->billedCost(), places), currency, inertText(item->notes()),
+              time && time->task() ? time->task()->roundingRule().toText() : QString()});
   }
   return out;
 }

@@ -91,6 +91,11 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
   auto* client = makeClient(QStringLiteral("ACME, \"West\""));
   auto* site = makeProject(QStringLiteral("Site; new"), client);
   auto* lone = makeProject(QStringLiteral("Internal"));
+  // Billed by their rounding rules, which the file carries: the same money in the other store.
+  client->setRoundingMinutes(15);
+  client->setRoundingMode("up");
+  lone->setRoundingMinutes(30);
+  lone->setRoundingMode("down");
   const QTimeZone zone("Europe/Berlin");
   const struct {
     WTTask* task;
@@ -102,7 +107,7 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
       {makeTask(site, QStringLiteral("design")), "Header, \"hero\"", "",
        QDateTime(QDate(2024, 3, 9), QTime(9, 0), zone), 90},
       {site->tasks().first(), "Call\nwith client", "line one\nline, two",
-       QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 45},
+       QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 44},
       {makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234",
        QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
       {lone->tasks().first(), "left running over the weekend", "",
@@ -123,7 +128,8 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
       found.append(QStringList{project->client() ? project->client()->name() : QString(), project->name(),
                                time->task()->name(), time->name(), time->notes(),
                                QString::number(qint64(time->startDate()->secondsSince1970())),
-                               QString::number(qint64(time->endDate()->secondsSince1970()))}
+                               QString::number(qint64(time->endDate()->secondsSince1970())),
+                               QString::number(time->billedDuration())}
                        .join(u'|'));
     }
     found.sort();

@@ -194,19 +194,19 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
   const QList<QStringList> expected = {
       WTCSVExport::spreadsheetColumns(),
       {"Acme", site, task, "time", "Sketch", "2024-02-10", "10:00", "11:00", "1:00", "1:00", "60.00", "60.00",
-       "EUR", ""},
+       "EUR", "", "15 up"},
       {"Acme", site, task, "time", "Kick \"off\"", "2024-03-03", "09:00", "10:30", "1:30", "1:30", "60.00",
-       "90.00", "EUR", ""},
+       "90.00", "EUR", "", "15 up"},
       {"Acme", site, task, "time", "Review", "2024-03-03", "14:00", "14:30", "0:30", "0:30", "60.00", "30.00",
-       "EUR", ""},
-      {"Acme", site, task, "expense", "Fonts", "2024-03-04", "", "", "", "", "", "1234.50", "EUR", ""},
+       "EUR", "", "15 up"},
+      {"Acme", site, task, "expense", "Fonts", "2024-03-04", "", "", "", "", "", "1234.50", "EUR", "", ""},
       {"Acme", site, task, "time", brief->name(), "2024-03-05", "09:00", "09:07", "0:07", "0:15", "60.00",
-       "15.00", "EUR", brief->notes()},
+       "15.00", "EUR", brief->notes(), "15 up"},
       // Text a spreadsheet would run as a formula stays text.
       {"Acme", site, task, "time", "'=HYPERLINK(\"x\")", "2024-03-05", "10:00", "11:00", "1:00", "1:00",
-       "60.00", "60.00", "EUR", "'-1"},
+       "60.00", "60.00", "EUR", "'-1", "15 up"},
       {"Tanaka 株式会社", "Backend", "API", "flat fee", "Setup", "2024-03-06", "", "", "2:00", "2:00",
-       "33.33", "67", "JPY", ""},
+       "33.33", "67", "JPY", "", ""},
   };
   const QList<QStringList> rows = rowsReadByPython(path);
   ASSERT_EQ(rows.size(), expected.size());
@@ -215,7 +215,7 @@ TEST_F(ReportTest, SpreadsheetCsvReadsBackAsColumns) {
   EXPECT_TRUE(
       readAll(path).contains("\r\nAcme,\"Web \"\"Site\"\"\",\"Design, "
                              "\"\"final\"\"\",time,Sketch,2024-02-10,10:00,11:00,1:00,1:00,60.00,"
-                             "60.00,EUR,\r\n"))
+                             "60.00,EUR,,15 up\r\n"))
       << readAll(path).toStdString();
 
   const WTItemPredicate days = WTRangePredicate::predicateForRangeWord("2024-03-03..2024-03-04").value();
