@@ -29,6 +29,7 @@
 #include <QLocale>
 #include <QMenu>
 #include <QScrollBar>
+#include <QShortcut>
 #include <QTimer>
 #include <QToolButton>
 #include <QVBoxLayout>
@@ -77,7 +78,10 @@ WTItemsViewController::~WTItemsViewController() {
 }
 
 void WTItemsViewController::setProject(WTProject* project) {
-  if (rateField_ && project != project_) WTRateField::setRefused(rateField_, {});
+  if (rateField_ && project != project_) {  // what was typed for the other project goes with it
+    WTRateField::setRefused(rateField_, {});
+    rateField_->setModified(false);
+  }
   project_ = project;
 }
 
@@ -148,6 +152,10 @@ QWidget* WTItemsViewController::loadView() {
   rateLabel->setBuddy(rateField_);
   connect(rateField_, &QLineEdit::editingFinished, this, &WTItemsViewController::projectRateAction);
   connect(rateField_, &QLineEdit::textEdited, this, [this] { WTRateField::setRefused(rateField_, {}); });
+  // Escape takes back what was typed, as in the outline's editors.
+  auto* revert =
+      new QShortcut(QKeySequence(Qt::Key_Escape), rateField_, nullptr, nullptr, Qt::WidgetShortcut);
+  connect(revert, &QShortcut::activated, this, &WTItemsViewController::showStoredRate);
   bar->addWidget(rateLabel);
   bar->addWidget(rateField_);
   // The totals sit right above the rows' duration and cost columns (alignTotals places them); the

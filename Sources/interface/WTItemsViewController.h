@@ -105,6 +105,8 @@ class WTItemsViewController : public WTViewController {
 
   // The project's rate as typed in the header; an empty field inherits.
   void projectRateAction();
+  // The project's own rate in the field, as every rate is shown, in place of anything typed.
+  void showStoredRate();
   QLineEdit* rateField() const { return rateField_; }
   // The menu of a task row (its rate among others); built anew for each task, owned by the caller.
   QMenu* taskMenu(WTTask* task);

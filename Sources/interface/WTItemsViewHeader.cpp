@@ -42,10 +42,9 @@ void WTItemsViewController::refreshHeader() {
   setElidedText(durationLabel_, DurationText::stringWithMinutes(project_->duration()));
   setElidedText(totalsLabel_, MoneyFormat::format(project_->cost(), project_->billingCurrency()));
   WTRateField::setPlaceholder(rateField_, WTRateField::placeholder(project_));
-  // A refused text stays as typed until the user changes it, so the mistake is in view.
-  if (!rateField_->hasFocus() && !WTRateField::isRefused(rateField_)) {
-    rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());
-  }
+  // The field shows the rate as it is now (a sync or an undo may change it), unless the user has typed
+  // into it: that text stays, a refused one too, so the mistake is in view.
+  if (!rateField_->isModified()) showStoredRate();
 }
 
 namespace {
@@ -103,8 +102,16 @@ void WTItemsViewController::alignTotals() {
 }
 
 void WTItemsViewController::projectRateAction() {
-  if (!project_ || !WTRateField::apply(rateField_, project_)) return;
+  // Only what the user typed is stored: a field left as it was shown never writes back a rate that has
+  // changed meanwhile.
+  if (!project_ || !rateField_->isModified() || !WTRateField::apply(rateField_, project_)) return;
   // What was taken, shown as every rate is ("120.00"): the user's own Return or Tab ended the typing.
-  rateField_->setText(project_->storedRate() ? WTRateField::text(*project_->storedRate()) : QString());
+  showStoredRate();
   refreshHeader();
+}
+
+void WTItemsViewController::showStoredRate() {
+  WTRateField::setRefused(rateField_, {});
+  rateField_->setText(project_ && project_->storedRate() ? WTRateField::text(*project_->storedRate())
+                                                         : QString());  // not modified: the user's no more
 }

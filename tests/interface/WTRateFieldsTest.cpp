@@ -66,7 +66,7 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   EXPECT_EQ(field->placeholderText(), "Inherited: 1,250");
   acme->setCurrency(QString());
   endTurn();
-  field->setText("-5");
+  QTest::keyClicks(field, "-5");
   controller->projectRateAction();
   EXPECT_TRUE(refusedIn(field, "-5"));
   project->setName("Website 2");
@@ -81,7 +81,24 @@ TEST_F(WTRateFieldsTest, TheProjectFieldNamesWhatItInheritsAndRefusesWhatIsNotAR
   EXPECT_EQ(project->storedRate(), Decimal(7));
   EXPECT_EQ(field->text(), "7.00");
   EXPECT_EQ(context->undoManager().undoActionName(), "Change Rate");
-  field->clear();
+  // A rate changed elsewhere (a sync, an undo) shows in the field that has the focus, and leaving the
+  // field untouched never writes the old one back.
+  project->setRate(Decimal(90));
+  endTurn();
+  EXPECT_EQ(field->text(), "90.00");
+  controller->projectRateAction();
+  project->setRate(Decimal(95));  // not shown yet when the field is left
+  controller->projectRateAction();
+  EXPECT_EQ(project->storedRate(), Decimal(95));
+  // Escape takes back what was typed.
+  endTurn();
+  QTest::keyClicks(field, "5");
+  QTest::keyClick(field, Qt::Key_Escape);
+  controller->projectRateAction();
+  EXPECT_EQ(std::pair(field->text(), project->storedRate()),
+            std::pair(QString("95.00"), std::optional(Decimal(95))));
+  field->selectAll();
+  QTest::keyClick(field, Qt::Key_Delete);
   controller->projectRateAction();
   EXPECT_EQ(project->storedRate(), std::nullopt);
 }
