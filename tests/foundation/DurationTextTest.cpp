@@ -33,7 +33,9 @@ TEST(DurationText, DurationsAreReadLenientlyOrStrictlyInTheUsersLocale) {
       {"", 0, 0, 0}, {"1:2:3:4", 3064, -1, -1}, {"0:0:0:0:0:7", 7, -1, -1}, {"abc", 0, -1, -1},
       {"::", 0, 0, 0}, {"1:abc", 60, -1, -1}, {"5m", 0, -1, -1}, {"2.5", 2, -1, -1}, {"2,5", 0, -1, -1},
       {"1:2.5", 62, -1, -1}, {"-5", -5, -1, -1}, {"1:-30", 30, -1, -1}, {"+7", 7, -1, -1},
-      {"1,000", 1000, 1000, 1}, {"1.000", 1, 1, 1000}, {"99999999999", 2147483647, -1, -1}};
+      {"1,000", 1000, 1000, -1}, {"1.000", 1, -1, 1000}, {"99999999999", 2147483647, -1, -1},
+      // Hours or money meant, never minutes: no decimal sign, even before a nought fraction.
+      {"2.00", 2, -1, -1}, {"2,00", 0, -1, -1}, {"1.250,00", 0, -1, -1}};
   // clang-format on
   for (const auto& [text, lenient, english, german] : cases) {
     QString refusals[2] = {"stale", "stale"};
