@@ -112,6 +112,12 @@ QString durationRefusal(const WTTime& time, int minutes) {
   return spanRefusal(time, *time.startDate(), time.startDate()->addingSeconds(minutes * 60.0), true);
 }
 
+// Why time already spent, typed for a new entry that ends where it ends (now), may not be so long.
+QString spentRefusal(const WTTime& time, int minutes) {
+  if (time.running() || !time.endDate()) return {};
+  return spanRefusal(time, time.endDate()->addingSeconds(-60.0 * minutes), time.endDate(), false);
+}
+
 // A day group's heading: weekday, day, month and year in the order and words of the user's locale
 // ("Tue 24 Nov 2026"), which a numeric short date ("11/24/26") leaves for the reader to work out.
 QString dayTitle(Date day) {
@@ -459,20 +465,23 @@ QString WTItemsModel::billedText(std::optional<std::pair<int, int>> durations, c
 
 QString WTItemsModel::refusalFor(int role, const QString& text) {
   QString refusal;
-  if (role == DurationEditRole) DurationText::minutesFromTypedText(text, &refusal);
+  if (role == DurationEditRole || role == SpentDurationEditRole)
+    DurationText::minutesFromTypedText(text, &refusal);
   return refusal;
 }
 
 QString WTItemsModel::refusalFor(const QModelIndex& index, int role, const QString& text) const {
   if (role != StartTimeEditRole && role != EndTimeEditRole && role != AmountEditRole &&
-      role != DurationEditRole)
+      role != DurationEditRole && role != SpentDurationEditRole)
     return refusalFor(role, text);
   const Node* node = checkIndex(index, CheckIndexOption::IndexIsValid) ? nodeOf(index) : nullptr;
-  if (role == DurationEditRole) {
+  if (role == DurationEditRole || role == SpentDurationEditRole) {
     QString refusal;
     const std::optional<int> minutes = DurationText::minutesFromTypedText(text, &refusal);
-    if (minutes && node && node->object && node->object->entity() == WTEntity::Time)
-      refusal = durationRefusal(*static_cast<const WTTime*>(node->object), *minutes);
+    if (minutes && node && node->object && node->object->entity() == WTEntity::Time) {
+      const auto& time = *static_cast<const WTTime*>(node->object);
+      refusal = role == DurationEditRole ? durationRefusal(time, *minutes) : spentRefusal(time, *minutes);
+    }
     return refusal;
   }
   if (role == AmountEditRole) {
@@ -534,8 +543,9 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
     case SpentDurationEditRole: {
       if (object->entity() != WTEntity::Time) return false;
       auto* time = static_cast<WTTime*>(object);
-      if (time->running()) return false;
-      time->setDurationKeepingEnd(DurationText::minutesFromString(value.toString()));
+      const std::optional<int> minutes = DurationText::minutesFromTypedText(value.toString());
+      if (time->running() || !minutes || !spentRefusal(*time, *minutes).isEmpty()) return false;
+      time->setDurationKeepingEnd(*minutes);
       return true;
     }
     case AmountEditRole: {

@@ -183,17 +183,27 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
 
 // Time already spent is entered stopped by typing its duration: it ends now, not that long from now.
 TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDuration) {
+  WTTime* earlier = makeItem<WTTime>(build, "Earlier", at(2024, 3, 14, 8, 0));  // until 08:30
   std::unique_ptr<QMenu> menu(controller->taskMenu(build));
   ASSERT_NE(actionTitled(menu.get(), "New Time Entry (Already Spent)"), nullptr);
   actionTitled(menu.get(), "New Time Entry (Already Spent)")->trigger();
-  ASSERT_EQ(build->items().size(), 1);
-  auto* time = dynamic_cast<WTTime*>(build->items().first());
+  ASSERT_EQ(build->items().size(), 2);
+  auto* time = dynamic_cast<WTTime*>(build->items().first() == earlier ? build->items().last()
+                                                                       : build->items().first());
   ASSERT_TRUE(time && !time->running() && outline()->isEditing());
-  auto* editor = outline()->viewport()->findChild<QLineEdit*>("durationEditor");
-  ASSERT_NE(editor, nullptr);
-  editor->setText("1:30");
-  outline()->endEditing();
-  endTurn();
+  // Time shared with the earlier entry, and what is not a whole duration, change nothing.
+  for (const char* typed : {"1:31", "1,30", "1:30"}) {
+    if (QLineEdit* open = shown->openEditor()) QTest::keyClick(open, Qt::Key_Escape);
+    controller->cellDelegate()->setEditField(WTItemCellDelegate::Field::SpentDuration);
+    outline()->edit(rowOf(time));
+    QLineEdit* editor = shown->openEditor();
+    ASSERT_NE(editor, nullptr);
+    ASSERT_EQ(editor->property("field").toInt(), int(WTItemCellDelegate::Field::SpentDuration));
+    editor->setText(typed);
+    outline()->endEditing();
+    endTurn();
+    EXPECT_EQ(time->duration(), typed == std::string("1:30") ? 90 : 0) << typed;
+  }
   EXPECT_FALSE(time->running());
   EXPECT_EQ(time->endDate(), clockNow);
   EXPECT_EQ(span(time) + ' ' + rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30-10:00 08:30");
