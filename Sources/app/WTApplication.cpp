@@ -90,6 +90,7 @@ void WTApplication::applicationDidFinishLaunching() {
   presenter_->setNoticeSink([notifier = notifier_.get()](const QString& summary, const QString& body) {
     notifier->notify(summary, body);
   });
+  presenter_->setWithdrawal([window](const QString& summary) { window->withdrawNotice(summary); });
   // Only now, with the window and the store up, and only for an account: the keyring may prompt, and is
   // asked in the background. A password an earlier version kept in the settings file moves into it.
   delegate_->passwordStore()->load();

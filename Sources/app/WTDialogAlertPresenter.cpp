@@ -72,8 +72,20 @@ void WTDialogAlertPresenter::presentSyncError(const QString& message) {
   box.exec();
 }
 
+namespace {
+
+QString unreachableSummary() {
+  return QCoreApplication::translate("RZSyncManager", "Sync cannot reach the server");
+}
+
+}  // namespace
+
+void WTDialogAlertPresenter::networkRecovered() {
+  if (withdraw_) withdraw_(unreachableSummary());
+}
+
 void WTDialogAlertPresenter::presentNetworkError(const QString& message) {
-  const QString summary = QCoreApplication::translate("RZSyncManager", "Sync cannot reach the server");
+  const QString summary = unreachableSummary();
   const QString body =
       QCoreApplication::translate("RZSyncManager",
                                   "%1. Your changes are kept here and sent when the server answers again.")

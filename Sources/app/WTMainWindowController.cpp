@@ -562,6 +562,11 @@ void WTMainWindowController::showNotice(const QString& text) {
   line->show();
 }
 
+void WTMainWindowController::withdrawNotice(const QString& summary) {
+  QStatusBar* line = statusBar();
+  if (line->currentMessage().startsWith(summary)) line->clearMessage();
+}
+
 void WTMainWindowController::closeEvent(QCloseEvent* event) {
   if (hidesOnClose_ && !quitting_) {
     // Tessal goes on in the tray; the window comes back from there.

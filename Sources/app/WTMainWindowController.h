@@ -102,6 +102,8 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   // A notice on the status line under the lists, shown while it stands (the line is hidden without
   // one); it takes no focus and ends no edit.
   void showNotice(const QString& text);
+  // Takes the notice off the status line if it is the one that begins with `summary`.
+  void withdrawNotice(const QString& summary);
   static constexpr int kNoticeMilliseconds = 10 * 60 * 1000;
 
   WTProjectsViewController* projectsViewController() const { return projectsViewController_; }

@@ -13,6 +13,8 @@ class RZSyncErrorPresenter {
   // The exchange with the server failed (no answer, or an answer that is not JSON). Shown once for a
   // run of consecutive failures.
   virtual void presentNetworkError(const QString& message) = 0;
+  // The server answers again after a run of failures: a notice of the run that still stands goes.
+  virtual void networkRecovered() {}
 };
 
 // Writes each message to the log as a warning.

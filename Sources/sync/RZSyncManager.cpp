@@ -302,6 +302,7 @@ void RZSyncManager::mergeHead(const QVariantMap& result, qint64 iteration) {
 
 void RZSyncManager::endFailureRun() {
   if (!std::exchange(networkError_, false)) return;
+  presenter_->networkRecovered();
   // Polling stopped with the failure; a good reply resumes it.
   if (syncEnabled_ && !timer_.isActive()) rescheduleTimer(intervals_.pollMs);
 }

@@ -253,6 +253,10 @@ TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStat
   ASSERT_TRUE(line && line->isVisible());
   EXPECT_EQ(line->currentMessage(),
             "“Website › Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
+  window.withdrawNotice("Sync cannot reach the server");  // another notice's withdrawal leaves it
+  EXPECT_TRUE(line->currentMessage().startsWith("“Website › Design”"));
+  window.withdrawNotice("“Website › Design” is over its budget");
+  EXPECT_EQ(line->currentMessage(), "");
 }
 
 // Without a tray the toolbar offers the list; with one, closing only hides; Ctrl+, opens one window.

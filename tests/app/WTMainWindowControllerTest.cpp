@@ -312,6 +312,11 @@ TEST(WTDialogAlertPresenterTest, ADeletionIsChosenNeverFallenIntoAndANoticeAsksN
   EXPECT_EQ(notices,
             QStringList{"Sync cannot reach the server / Connection refused. Your changes are kept here "
                         "and sent when the server answers again."});
+  // Once the server answers again, the notice is taken back.
+  QStringList withdrawn;
+  presenter.setWithdrawal([&](const QString& summary) { withdrawn << summary; });
+  presenter.networkRecovered();
+  EXPECT_EQ(withdrawn, QStringList{"Sync cannot reach the server"});
 }
 
 }  // namespace

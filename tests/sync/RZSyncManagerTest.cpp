@@ -328,6 +328,7 @@ TEST_F(RZSyncManagerTest, TheWaitBeforeTheNextPollFollowsWhatHappened) {
   const qsizetype before = server.requests.size();
   ASSERT_TRUE(waitUntil([&] { return server.requests.size() >= before + 4; }, 3000));
   EXPECT_FALSE(manager.hasNetworkError());
+  EXPECT_EQ(client.presenter.recoveries, 1);
   // A new run of failures is shown once, though polls go on failing while its box is on screen.
   client.presenter.answersAfterMs = 300;
   failing = true;

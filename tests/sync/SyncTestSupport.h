@@ -156,7 +156,9 @@ class RecordingPresenter final : public RZSyncErrorPresenter {
  public:
   void presentSyncError(const QString& message) override { syncErrors.append(message), answer(); }
   void presentNetworkError(const QString& message) override { networkErrors.append(message), answer(); }
+  void networkRecovered() override { ++recoveries; }
   QStringList syncErrors, networkErrors;
+  int recoveries = 0;
   int answersAfterMs = 0;  // as a modal box: events, timers among them, go on until the user answers
 
  private:
