@@ -6,6 +6,9 @@
 #include "WTRangePopUpButton.h"
 #include "WTReportGenerator.h"
 #include "WTReportWindowController.h"
+#include "WTSaveLocation.h"
+
+#include <QFileDialog>
 
 namespace {
 
@@ -317,6 +320,26 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
               Range(berlin(2024, 3, 3), berlin(2024, 3, 3)));
     exporter.accept();
   }
+}
+
+// The save dialog starts in the folder saved into last, never in the folder the program was started from.
+TEST(SaveLocationTest, StartsWhereTheLastSaveWent) {
+  QTemporaryDir folder;
+  QStringList shown;
+  for (const char* name : {"first.csv", "second.csv"}) {
+    QTimer::singleShot(0, [&, name] {
+      auto* dialog = qobject_cast<QFileDialog*>(QApplication::activeModalWidget());
+      ASSERT_NE(dialog, nullptr);
+      shown << dialog->directory().absolutePath();
+      dialog->selectFile(folder.filePath(name));
+      QMetaObject::invokeMethod(dialog, "accept");
+    });
+    EXPECT_EQ(askForSaveLocation(nullptr, {"Export", "CSV files (*.csv)", "csv", name}),
+              folder.filePath(name));
+  }
+  ASSERT_EQ(shown.size(), 2);
+  EXPECT_NE(shown[0], QDir::currentPath());
+  EXPECT_EQ(shown[1], folder.path());
 }
 
 }  // namespace
