@@ -129,29 +129,40 @@ QString taskLabel(const WTImportRow& row) {
                                        row.task.isEmpty() ? kDefaultTask : row.task);
 }
 
-// The rates the file gives, each set at the highest level across which it holds.
-void placeRates(ClientNode& client, WTImportPlan& plan) {
+// Walks `client`'s records top down with a value the file gives its rows (a rate, a rounding rule): the
+// value all of a level's rows share, by `shared(rows, varies)`, is set there by `place(record, made,
+// value)` unless it refuses, and the levels below are left alone; where neither client nor project takes
+// one, each task's rows go to `atTask(task, value, varies)`.
+template <class T, class Shared, class Place, class AtTask>
+void placeAtHighestLevel(ClientNode& client, Shared shared, Place place, AtTask atTask) {
   bool varies = false;
-  const std::optional<Decimal> clientRate = sharedRate(rowsOf(client), varies);
-  if (!clientRate && !varies) return;
-  if (clientRate && client.client() && placeRate(client.client(), client.made, *clientRate)) return;
+  const std::optional<T> clientValue = shared(rowsOf(client), varies);
+  if (!clientValue && !varies) return;
+  if (clientValue && client.client() && place(client.client(), client.made, *clientValue)) return;
   for (auto& [projectKey, project] : client.projects) {
-    const std::optional<Decimal> projectRate = sharedRate(rowsOf(project), varies);
-    if (!projectRate && !varies) continue;
-    if (projectRate && placeRate(project.project(), project.made, *projectRate)) continue;
+    const std::optional<T> projectValue = shared(rowsOf(project), varies);
+    if (!projectValue && !varies) continue;
+    if (projectValue && place(project.project(), project.made, *projectValue)) continue;
     for (auto& [taskKey, task] : project.tasks) {
-      const std::optional<Decimal> taskRate = sharedRate(task.rows, varies);
-      if (!taskRate && !varies) continue;
-      const Decimal rate = taskRate ? *taskRate : commonestRate(task.rows);
-      const QString label = taskLabel(*task.rows.front());
-      if (varies)
-        plan.notes.append(QStringLiteral("the entries of %1 have several rates; the task bills %2")
-                              .arg(label, rate.toString()));
-      if (!placeRate(task.task(), task.made, rate))
-        plan.notes.append(QStringLiteral("%1 keeps its rate %2; the file gives %3")
-                              .arg(label, task.task()->inheritedRate().toString(), rate.toString()));
+      const std::optional<T> taskValue = shared(task.rows, varies);
+      if (taskValue || varies) atTask(task, taskValue, varies);
     }
   }
+}
+
+// The rates the file gives, each set at the highest level across which it holds.
+void placeRates(ClientNode& client, WTImportPlan& plan) {
+  placeAtHighestLevel<Decimal>(
+      client, sharedRate, placeRate, [&](TaskNode& task, const std::optional<Decimal>& shared, bool varies) {
+        const Decimal rate = shared ? *shared : commonestRate(task.rows);
+        const QString label = taskLabel(*task.rows.front());
+        if (varies)
+          plan.notes.append(QStringLiteral("the entries of %1 have several rates; the task bills %2")
+                                .arg(label, rate.toString()));
+        if (!placeRate(task.task(), task.made, rate))
+          plan.notes.append(QStringLiteral("%1 keeps its rate %2; the file gives %3")
+                                .arg(label, task.task()->inheritedRate().toString(), rate.toString()));
+      });
 }
 
 // The rounding rule every row of `rows` that names one shares; none when they name none or differ, with
@@ -180,28 +191,19 @@ bool placeRounding(WTBillingRecord* record, bool made, const WTRoundingRule& rul
 // The rounding rules the file billed by, each set at the highest level across which it holds, so that
 // the store bills the entries as the file did.
 void placeRoundings(ClientNode& client, WTImportPlan& plan) {
-  bool varies = false;
-  const std::optional<WTRoundingRule> clientRule = sharedRounding(rowsOf(client), varies);
-  if (!clientRule && !varies) return;
-  if (clientRule && client.client() && placeRounding(client.client(), client.made, *clientRule)) return;
-  for (auto& [projectKey, project] : client.projects) {
-    const std::optional<WTRoundingRule> projectRule = sharedRounding(rowsOf(project), varies);
-    if (!projectRule && !varies) continue;
-    if (projectRule && placeRounding(project.project(), project.made, *projectRule)) continue;
-    for (auto& [taskKey, task] : project.tasks) {
-      const std::optional<WTRoundingRule> taskRule = sharedRounding(task.rows, varies);
-      if (!taskRule && !varies) continue;
-      const QString label = taskLabel(*task.rows.front());
-      if (varies) {
-        plan.notes.append(QStringLiteral("the entries of %1 were billed by several rounding rules; the task "
-                                         "bills by %2")
-                              .arg(label, task.task()->roundingRule().toText()));
-      } else if (!placeRounding(task.task(), task.made, *taskRule)) {
-        plan.notes.append(QStringLiteral("%1 keeps its rounding (%2); the file's entries were billed by %3")
-                              .arg(label, task.task()->roundingRule().toText(), taskRule->toText()));
-      }
-    }
-  }
+  placeAtHighestLevel<WTRoundingRule>(
+      client, sharedRounding, placeRounding,
+      [&](TaskNode& task, const std::optional<WTRoundingRule>& shared, bool varies) {
+        const QString label = taskLabel(*task.rows.front());
+        if (varies) {
+          plan.notes.append(QStringLiteral("the entries of %1 were billed by several rounding rules; the "
+                                           "task bills by %2")
+                                .arg(label, task.task()->roundingRule().toText()));
+        } else if (!placeRounding(task.task(), task.made, *shared)) {
+          plan.notes.append(QStringLiteral("%1 keeps its rounding (%2); the file's entries were billed by %3")
+                                .arg(label, task.task()->roundingRule().toText(), shared->toText()));
+        }
+      });
 }
 
 // An entry of the same task over the same minutes is the same entry, whichever file brings it again:
