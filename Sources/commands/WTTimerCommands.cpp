@@ -234,8 +234,8 @@ QString timeOfDay(Date date, const QTimeZone& zone) {
 }
 
 // Adds a finished entry to a task, as typing one into the outline does. It must be over (nothing of it
-// after now) and share no time with the task's other entries. A duration
-// alone ends now, or on another day at the present time of day.
+// after now) and share no time with the task's other entries. A duration alone ends now, or on another
+// day at the present time of day.
 WTCommandOutcome add(WTObjectContext& context, const Arguments& arguments, const QTimeZone& zone) {
   const Date now = Date::now();
   const QDateTime here = now.toQDateTime().toTimeZone(zone);

@@ -3,8 +3,6 @@
 #include "Decimal.h"
 #include "TypedNumber.h"
 
-#include <unicode/dcfmtsym.h>
-
 #include <QCoreApplication>
 #include <QLocale>
 #include <QStringList>
@@ -66,19 +64,6 @@ int minutesFromString(const QString& text) {
   return clampToInt(minutes);
 }
 
-namespace {
-
-// The user's decimal sign.
-QString decimalSign() {
-  UErrorCode status = U_ZERO_ERROR;
-  const icu::DecimalFormatSymbols symbols(icu::Locale::getDefault(), status);
-  if (U_FAILURE(status)) return QStringLiteral(".");
-  const icu::UnicodeString sign = symbols.getSymbol(icu::DecimalFormatSymbols::kDecimalSeparatorSymbol);
-  return QString(reinterpret_cast<const QChar*>(sign.getBuffer()), sign.length());
-}
-
-}  // namespace
-
 std::optional<int> minutesFromTypedText(const QString& text, QString* refusal) {
   auto refuse = [refusal]() -> std::optional<int> {
     if (refusal) {
@@ -94,7 +79,7 @@ std::optional<int> minutesFromTypedText(const QString& text, QString* refusal) {
   if (pieces.size() > 3) return refuse();
   // Whole numbers have no decimal sign, not even before a nought fraction: "2,00" meant as hours, or an
   // amount of money typed into a flat fee's duration, is not taken as minutes.
-  if (text.contains(decimalSign())) return refuse();
+  if (text.contains(TypedNumber::decimalSign())) return refuse();
   long long minutes = 0;
   for (qsizetype i = 0; i < pieces.size(); ++i) {
     const TypedNumber::Reading piece = TypedNumber::read(pieces[pieces.size() - 1 - i]);

@@ -215,4 +215,8 @@ QString editableText(const Decimal& value) {
   return editableText(value, icu::Locale::getDefault());
 }
 
+QString decimalSign() {
+  return signsOf(icu::Locale::getDefault()).decimal;
+}
+
 }  // namespace TypedNumber

@@ -36,5 +36,7 @@ Reading read(const QString& typed);
 // an editor shows so that taking its text unchanged gives back the same number.
 QString editableText(const Decimal& value, const icu::Locale& locale);
 QString editableText(const Decimal& value);
+// The user's decimal sign.
+QString decimalSign();
 
 }  // namespace TypedNumber

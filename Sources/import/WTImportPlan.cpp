@@ -15,6 +15,7 @@
 #include <QTimeZone>
 
 #include <algorithm>
+#include <functional>
 #include <map>
 
 namespace WTImport {
@@ -61,17 +62,28 @@ qint64 minutesOf(const Date& start, const Date& end) {
   return qint64(end.secondsSince1970() / 60) - qint64(start.secondsSince1970() / 60);
 }
 
-// The rate every row of `rows` that has one shares; none when they have none or differ, with `varies`.
-std::optional<Decimal> sharedRate(const std::vector<const WTImportRow*>& rows, bool& varies) {
-  std::optional<Decimal> shared;
+// The value `valueOf` gives every row of `rows` that has one, where they are all `alike`; none when no row
+// has one or they differ, with `varies`.
+template <class T, class ValueOf, class Alike>
+std::optional<T> sharedValue(const std::vector<const WTImportRow*>& rows, bool& varies, ValueOf valueOf,
+                             Alike alike) {
+  std::optional<T> shared;
   varies = false;
   for (const WTImportRow* row : rows) {
-    if (!row->rate || !row->billable) continue;
-    if (shared && *shared != *row->rate) varies = true;
-    if (!shared) shared = row->rate;
+    const std::optional<T> value = valueOf(*row);
+    if (!value) continue;
+    if (shared && !alike(*shared, *value)) varies = true;
+    if (!shared) shared = value;
   }
   if (varies) return std::nullopt;
   return shared;
+}
+
+// The rate every billable row of `rows` that has one shares.
+std::optional<Decimal> sharedRate(const std::vector<const WTImportRow*>& rows, bool& varies) {
+  return sharedValue<Decimal>(
+      rows, varies, [](const WTImportRow& row) { return row.billable ? row.rate : std::nullopt; },
+      std::equal_to<Decimal>());
 }
 
 // The rate a record's own or its owners' stored rates put in force; none where only the preferences or the
@@ -165,18 +177,11 @@ void placeRates(ClientNode& client, WTImportPlan& plan) {
       });
 }
 
-// The rounding rule every row of `rows` that names one shares; none when they name none or differ, with
-// `varies`.
+// The rounding rule every row of `rows` that names one bills by.
 std::optional<WTRoundingRule> sharedRounding(const std::vector<const WTImportRow*>& rows, bool& varies) {
-  std::optional<WTRoundingRule> shared;
-  varies = false;
-  for (const WTImportRow* row : rows) {
-    if (!row->rounding) continue;
-    if (shared && !shared->billsLike(*row->rounding)) varies = true;
-    if (!shared) shared = row->rounding;
-  }
-  if (varies) return std::nullopt;
-  return shared;
+  return sharedValue<WTRoundingRule>(
+      rows, varies, [](const WTImportRow& row) { return row.rounding; },
+      [](const WTRoundingRule& a, const WTRoundingRule& b) { return a.billsLike(b); });
 }
 
 // Gives `record` the rule unless it bills by it already; a record the import did not make keeps its own.
