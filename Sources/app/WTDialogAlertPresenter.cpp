@@ -93,3 +93,9 @@ void WTDialogAlertPresenter::presentNetworkError(const QString& message) {
   if (noticeSink_) return noticeSink_(summary, body);
   presentError(summary + u'\n' + body);
 }
+
+void WTDialogAlertPresenter::presentKeptWork(const QString& message) {
+  const QString summary = QCoreApplication::translate("RZSyncManager", "Work kept from a deletion elsewhere");
+  if (noticeSink_) return noticeSink_(summary, message);
+  presentError(summary + u'\n' + message);
+}

@@ -10,3 +10,7 @@ void RZSyncLogErrorPresenter::presentSyncError(const QString& message) {
 void RZSyncLogErrorPresenter::presentNetworkError(const QString& message) {
   qCWarning(lcSync).noquote() << QStringLiteral("Sync failed: %1").arg(message);
 }
+
+void RZSyncLogErrorPresenter::presentKeptWork(const QString& message) {
+  qCWarning(lcSync).noquote() << message;
+}

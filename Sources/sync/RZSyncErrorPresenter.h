@@ -15,6 +15,9 @@ class RZSyncErrorPresenter {
   virtual void presentNetworkError(const QString& message) = 0;
   // The server answers again after a run of failures: a notice of the run that still stands goes.
   virtual void networkRecovered() {}
+  // A deletion from another device met work added here that it never saw, and the merge kept that work
+  // under new copies of what was deleted (`message` says which). Needs no answer.
+  virtual void presentKeptWork(const QString& message) = 0;
 };
 
 // Writes each message to the log as a warning.
@@ -22,4 +25,5 @@ class RZSyncLogErrorPresenter final : public RZSyncErrorPresenter {
  public:
   void presentSyncError(const QString& message) override;
   void presentNetworkError(const QString& message) override;
+  void presentKeptWork(const QString& message) override;
 };

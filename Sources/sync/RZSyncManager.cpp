@@ -346,6 +346,15 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
       for (WTItem* item : task->items()) gone.append(item);
     }
   }
+  // The other device deleted what it knew: work added here since, which it never saw, is not its to
+  // delete. Taking it out of the deletion loses nothing, and deleting it again is one click.
+  if (const qsizetype kept = keepWorkAddedHere(gone)) {
+    const QString added = kept == 1
+                              ? tr("a record was added to it here; it is kept")
+                              : tr("%n records were added to it here; they are kept", nullptr, int(kept));
+    presenter_->presentKeptWork(tr("“%1” was deleted on another device after %2, in a new “%1”.")
+                                    .arg(object->valueForKey(QStringLiteral("name")).toString(), added));
+  }
   QStringList uuids;
   for (WTObject* record : gone) uuids.append(record->uuid());
   context_->deleteObject(object);
@@ -355,6 +364,67 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
   for (const QString& uuid : uuids) {
     if (!deletedThere.contains(uuid)) track_->deleteObjectWithId(uuid);
   }
+}
+
+namespace {
+
+// A new record with every stored value of `record` but its identity.
+template <class T>
+T* copyOf(const T& record, WTObjectContext& context) {
+  T* copy = context.insertNewObject<T>();
+  for (const QString& key : record.storedKeys())
+    if (key != QLatin1String("uuid")) copy->setValue(key, record.valueForKey(key));
+  return copy;
+}
+
+}  // namespace
+
+qsizetype RZSyncManager::keepWorkAddedHere(QList<WTObject*>& gone) {
+  const RZSyncTrack::Entries& insertedHere = track_->entries(RZSyncTrack::Section::Inserted);
+  QSet<WTObject*> kept;
+  QHash<WTObject*, WTObject*> copies;  // of the owners that go
+  // A copy of a project that goes, or of a task, in its project or in that project's copy.
+  const auto copyOfProject = [&](WTProject* project) {
+    WTObject*& copy = copies[project];
+    if (!copy) copy = copyOf(*project, *context_);
+    return static_cast<WTProject*>(copy);
+  };
+  const auto copyOfTask = [&](WTTask* task) {
+    WTObject*& copy = copies[task];
+    if (!copy) {
+      auto* made = copyOf(*task, *context_);
+      if (gone.contains(task->project())) made->setProject(copyOfProject(task->project()));
+      copy = made;
+    }
+    return static_cast<WTTask*>(copy);
+  };
+  for (WTObject* record : gone.mid(1)) {
+    auto* task = dynamic_cast<WTTask*>(record);
+    auto* item = dynamic_cast<WTItem*>(record);
+    WTObject* owner = task ? static_cast<WTObject*>(task->project()) : item ? item->task() : nullptr;
+    if (kept.contains(owner)) {
+      kept.insert(record);  // it moves with its owner
+      continue;
+    }
+    if (!insertedHere.contains(record->uuid()) || (!task && !item)) continue;
+    if (task) task->setProject(copyOfProject(task->project()));
+    if (item) item->setTask(copyOfTask(item->task()));
+    kept.insert(record);
+    track_->updateValues(record->setValues(), record->uuid(), RZSyncTrack::Section::Inserted);
+  }
+  if (kept.isEmpty()) return 0;
+  gone.removeIf([&](WTObject* record) { return kept.contains(record); });
+  const QList<WTObject*> made = copies.values();
+  for (WTObject* copy : made) {
+    track_->updateValues(copy->setValues(), copy->uuid(), RZSyncTrack::Section::Inserted);
+    // A task's copy in a project that stays changes that project's order.
+    auto* task = dynamic_cast<WTTask*>(copy);
+    if (WTProject* project = task ? task->project() : nullptr; project && !made.contains(project)) {
+      const QString tasks = QStringLiteral("tasks");
+      track_->updateValues({{tasks, project->setValues().value(tasks)}}, project->uuid());
+    }
+  }
+  return kept.size();
 }
 
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QString& key,

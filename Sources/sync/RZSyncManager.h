@@ -40,7 +40,8 @@ struct RZSyncExchange {
 // was on its way stay pending); moves the journal's iteration to a merged head at once; resumes polling
 // after a good reply that ends a run of failures; names this installation ("device") in every request;
 // never lets the merge re-create or change a record whose deletion is still waiting to be sent; journals
-// cleared values as null; and journals as deletions what its local cascade removes beyond the server's.
+// cleared values as null; journals as deletions what its local cascade removes beyond the server's; and
+// keeps from that cascade the work added here that the deleting device never saw.
 class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   Q_OBJECT
  public:
@@ -131,6 +132,10 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
                        const QSet<QString>& pending, bool* skip);
   // Deletes a record here with what it owns, journaling as deletions what the server did not delete.
   void deleteMerged(WTObject* object, const QSet<QString>& deletedThere);
+  // Takes out of `gone` (a deleted record, then what it owns, owners first) the records inserted here and
+  // not sent yet, with what they own, filing them under copies of their owners; journals the copies and
+  // the moves. Returns how many records were kept.
+  qsizetype keepWorkAddedHere(QList<WTObject*>& gone);
   void writeTrack(bool logFailure);
   // A reply came: the run of failures, if any, is over and polling goes on.
   void endFailureRun();

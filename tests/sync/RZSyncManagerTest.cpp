@@ -142,11 +142,14 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
        R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})"},
       {"ServerDeletionTakesOwnedRecordsHere",
        [](Bench& t, WTTask* task) {
+         auto* note = t.make<WTNote>("N@WTNote");
+         note->setTask(t.make<WTTask>("K@WTTask"));
+         t.synced();
          task->setName("Renamed here");
-         t.make<WTNote>("N@WTNote")->setTask(task);
+         note->setTask(task);  // moved here only: the server deletes it elsewhere
        },
        R"({"x":["T@WTTask","Gone@WTNote"]})", "T@WTTask (none)\nN@WTNote (none)\n",
-       R"({"u":{},"x":["N@WTNote"]})"},
+       R"({"u":{"K@WTTask":{},"N@WTNote":{"task":"T@WTTask"}},"x":["N@WTNote"]})"},
       {"PendingDeletionWinsOverTheMerge",
        [](Bench& t, WTTask* task) {
          auto* kept = t.make<WTTask>("K@WTTask");
@@ -192,6 +195,40 @@ P2@WTProject {"name":"Outlives its client"}
     EXPECT_FALSE(t.client.track().hasChanges());
     EXPECT_EQ(t.client.track().iteration(), 6);
   }
+}
+
+// Work added here that the deleting device never saw outlives the deletion, under copies of its owners.
+TEST_F(RZSyncManagerTest, WorkAddedHereOutlivesItsOwnersDeletionElsewhere) {
+  WTTask* task = syncedTask();
+  task->project()->setRate(dec("80.00"));
+  synced();
+  auto* entry = make<WTNote>("E@WTNote");
+  entry->setTask(task);
+  auto* added = make<WTTask>("K@WTTask", "Added");
+  added->setProject(task->project());
+  make<WTNote>("N@WTNote")->setTask(added);
+  answer(headReply(5, changeSet({}, {}, {"P@WTProject", "T@WTTask"})), saveReply(6));
+  ASSERT_TRUE(client.syncOnce());
+
+  ASSERT_TRUE(client.find<WTNote>("E@WTNote"));
+  WTTask* copy = client.find<WTNote>("E@WTNote")->task();
+  ASSERT_TRUE(copy && copy->project() && copy->project() == added->project());
+  EXPECT_EQ(copy->name(), "Design");
+  EXPECT_EQ(copy->project()->name(), "Site");
+  EXPECT_EQ(copy->project()->storedRate(), dec("80.00"));
+  EXPECT_EQ(client.find<WTNote>("N@WTNote")->task(), added);
+  EXPECT_FALSE(client.find<WTTask>("T@WTTask") || client.find<WTProject>("P@WTProject"));
+  ASSERT_EQ(sent("save").size(), 1);
+  const QVariantMap data = sent("save")[0].value("data").toMap();
+  const QVariantMap inserted = data["i"].toMap();
+  EXPECT_EQ(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()),
+            QSet<QString>({"E@WTNote", "K@WTTask", "N@WTNote", copy->uuid(), copy->project()->uuid()}));
+  EXPECT_EQ(inserted[copy->project()->uuid()].toMap()["tasks"], QVariantList({"K@WTTask", copy->uuid()}));
+  EXPECT_TRUE(data["x"].toList().isEmpty());
+  EXPECT_EQ(
+      client.presenter.keptWork,
+      QStringList{"“Site” was deleted on another device after 3 records were added to it here; they are "
+                  "kept, in a new “Site”."});
 }
 
 // The key is dropped only from the section the server sent it under.

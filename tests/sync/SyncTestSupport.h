@@ -157,7 +157,8 @@ class RecordingPresenter final : public RZSyncErrorPresenter {
   void presentSyncError(const QString& message) override { syncErrors.append(message), answer(); }
   void presentNetworkError(const QString& message) override { networkErrors.append(message), answer(); }
   void networkRecovered() override { ++recoveries; }
-  QStringList syncErrors, networkErrors;
+  void presentKeptWork(const QString& message) override { keptWork.append(message); }
+  QStringList syncErrors, networkErrors, keptWork;
   int recoveries = 0;
   int answersAfterMs = 0;  // as a modal box: events, timers among them, go on until the user answers
 
