@@ -4,6 +4,7 @@
 #include "KeyPath.h"
 #include "RZSyncErrorPresenter.h"
 #include "RZSyncJSON.h"
+#include "RZSyncKeptWork.h"
 #include "RZSyncReply.h"
 #include "SettingsKeys.h"
 #include "TessalLogging.h"
@@ -329,15 +330,17 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
   mergeWithDictionary(changes, kInserted, pending);
   mergeWithDictionary(changes, kUpdated, pending);
+  RZSyncKeptWork kept(*context_, *track_);
   for (const QVariant& uuid : changes.value(kDeleted).toList()) {
     if (uuid.typeId() != QMetaType::QString) continue;
     // What is still pending for a record the server deleted has nothing left to change there.
     track_->forget(uuid.toString());
-    if (WTObject* object = context_->objectWithUUID(uuid, false)) deleteMerged(object, deletedThere);
+    if (WTObject* object = context_->objectWithUUID(uuid, false)) deleteMerged(object, deletedThere, kept);
   }
+  if (const QString message = kept.message(); !message.isEmpty()) presenter_->presentKeptWork(message);
 }
 
-void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere) {
+void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept) {
   QList<WTObject*> gone{object};
   for (qsizetype i = 0; i < gone.size(); ++i) {
     if (auto* project = dynamic_cast<WTProject*>(gone[i])) {
@@ -346,15 +349,9 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
       for (WTItem* item : task->items()) gone.append(item);
     }
   }
-  // The other device deleted what it knew: work added here since, which it never saw, is not its to
-  // delete. Taking it out of the deletion loses nothing, and deleting it again is one click.
-  if (const qsizetype kept = keepWorkAddedHere(gone)) {
-    const QString added = kept == 1
-                              ? tr("a record was added to it here; it is kept")
-                              : tr("%n records were added to it here; they are kept", nullptr, int(kept));
-    presenter_->presentKeptWork(tr("“%1” was deleted on another device after %2, in a new “%1”.")
-                                    .arg(object->valueForKey(QStringLiteral("name")).toString(), added));
-  }
+  // Taking work the other device never saw out of its deletion loses nothing; deleting it again is one
+  // click.
+  kept.keepFrom(gone);
   QStringList uuids;
   for (WTObject* record : gone) uuids.append(record->uuid());
   context_->deleteObject(object);
@@ -364,67 +361,6 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
   for (const QString& uuid : uuids) {
     if (!deletedThere.contains(uuid)) track_->deleteObjectWithId(uuid);
   }
-}
-
-namespace {
-
-// A new record with every stored value of `record` but its identity.
-template <class T>
-T* copyOf(const T& record, WTObjectContext& context) {
-  T* copy = context.insertNewObject<T>();
-  for (const QString& key : record.storedKeys())
-    if (key != QLatin1String("uuid")) copy->setValue(key, record.valueForKey(key));
-  return copy;
-}
-
-}  // namespace
-
-qsizetype RZSyncManager::keepWorkAddedHere(QList<WTObject*>& gone) {
-  const RZSyncTrack::Entries& insertedHere = track_->entries(RZSyncTrack::Section::Inserted);
-  QSet<WTObject*> kept;
-  QHash<WTObject*, WTObject*> copies;  // of the owners that go
-  // A copy of a project that goes, or of a task, in its project or in that project's copy.
-  const auto copyOfProject = [&](WTProject* project) {
-    WTObject*& copy = copies[project];
-    if (!copy) copy = copyOf(*project, *context_);
-    return static_cast<WTProject*>(copy);
-  };
-  const auto copyOfTask = [&](WTTask* task) {
-    WTObject*& copy = copies[task];
-    if (!copy) {
-      auto* made = copyOf(*task, *context_);
-      if (gone.contains(task->project())) made->setProject(copyOfProject(task->project()));
-      copy = made;
-    }
-    return static_cast<WTTask*>(copy);
-  };
-  for (WTObject* record : gone.mid(1)) {
-    auto* task = dynamic_cast<WTTask*>(record);
-    auto* item = dynamic_cast<WTItem*>(record);
-    WTObject* owner = task ? static_cast<WTObject*>(task->project()) : item ? item->task() : nullptr;
-    if (kept.contains(owner)) {
-      kept.insert(record);  // it moves with its owner
-      continue;
-    }
-    if (!insertedHere.contains(record->uuid()) || (!task && !item)) continue;
-    if (task) task->setProject(copyOfProject(task->project()));
-    if (item) item->setTask(copyOfTask(item->task()));
-    kept.insert(record);
-    track_->updateValues(record->setValues(), record->uuid(), RZSyncTrack::Section::Inserted);
-  }
-  if (kept.isEmpty()) return 0;
-  gone.removeIf([&](WTObject* record) { return kept.contains(record); });
-  const QList<WTObject*> made = copies.values();
-  for (WTObject* copy : made) {
-    track_->updateValues(copy->setValues(), copy->uuid(), RZSyncTrack::Section::Inserted);
-    // A task's copy in a project that stays changes that project's order.
-    auto* task = dynamic_cast<WTTask*>(copy);
-    if (WTProject* project = task ? task->project() : nullptr; project && !made.contains(project)) {
-      const QString tasks = QStringLiteral("tasks");
-      track_->updateValues({{tasks, project->setValues().value(tasks)}}, project->uuid());
-    }
-  }
-  return kept.size();
 }
 
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QString& key,

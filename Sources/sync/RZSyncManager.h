@@ -15,6 +15,7 @@
 #include <memory>
 
 class RZSyncErrorPresenter;
+class RZSyncKeptWork;
 class UserDefaults;
 class WTObject;
 
@@ -130,12 +131,9 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending);
   QVariant mergedValue(WTObject* object, const QString& key, const QVariant& value,
                        const QSet<QString>& pending, bool* skip);
-  // Deletes a record here with what it owns, journaling as deletions what the server did not delete.
-  void deleteMerged(WTObject* object, const QSet<QString>& deletedThere);
-  // Takes out of `gone` (a deleted record, then what it owns, owners first) the records inserted here and
-  // not sent yet, with what they own, filing them under copies of their owners; journals the copies and
-  // the moves. Returns how many records were kept.
-  qsizetype keepWorkAddedHere(QList<WTObject*>& gone);
+  // Deletes a record here with what it owns but the work `kept` takes out, journaling as deletions what
+  // the server did not delete.
+  void deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept);
   void writeTrack(bool logFailure);
   // A reply came: the run of failures, if any, is over and polling goes on.
   void endFailureRun();

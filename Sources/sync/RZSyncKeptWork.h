@@ -1,0 +1,38 @@
+#pragma once
+
+#include <QCoreApplication>
+#include <QHash>
+#include <QList>
+#include <QSet>
+#include <QString>
+
+class RZSyncTrack;
+class WTObject;
+class WTObjectContext;
+class WTProject;
+class WTTask;
+
+// Deletes win over what the deleting device knew, not over work it never saw. During one merge, takes out
+// of each local cascade the tasks and items inserted here and not sent yet (with what they own), files
+// them under new copies of the owners that go, and journals the copies and the moves as insertions.
+class RZSyncKeptWork {
+  Q_DECLARE_TR_FUNCTIONS(RZSyncManager)
+
+ public:
+  RZSyncKeptWork(WTObjectContext& context, RZSyncTrack& track) : context_(context), track_(track) {}
+
+  // `gone` is a deleted record, then what it owns, owners before what they own; what is kept leaves it.
+  void keepFrom(QList<WTObject*>& gone);
+  // What the user is told of the work kept in this merge; empty when none was.
+  QString message() const;
+
+ private:
+  WTProject* copyOf(WTProject* project);
+  // In its project, or in that project's copy when the project goes too.
+  WTTask* copyOf(WTTask* task, const QList<WTObject*>& gone);
+
+  WTObjectContext& context_;
+  RZSyncTrack& track_;
+  QSet<WTObject*> kept_;               // the records taken out of a cascade, copies among them
+  QHash<WTObject*, WTObject*> copies_;  // of the owners that go
+};
