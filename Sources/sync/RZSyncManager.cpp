@@ -6,6 +6,7 @@
 #include "RZSyncJSON.h"
 #include "RZSyncKeptWork.h"
 #include "RZSyncReply.h"
+#include "RZSyncTwins.h"
 #include "SettingsKeys.h"
 #include "TessalLogging.h"
 #include "UserDefaults.h"
@@ -330,6 +331,8 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
   mergeWithDictionary(changes, kInserted, pending);
   mergeWithDictionary(changes, kUpdated, pending);
+  const QVariantMap inserted = changes.value(kInserted).toMap();
+  RZSyncTwins(*context_, *track_).fold(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()));
   RZSyncKeptWork kept(*context_, *track_);
   for (const QVariant& uuid : changes.value(kDeleted).toList()) {
     if (uuid.typeId() != QMetaType::QString) continue;

@@ -5,6 +5,7 @@
 #include "WTNote.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTTime.h"
 
 #include <QSignalSpy>
 #include <QUuid>
@@ -228,6 +229,43 @@ TEST_F(RZSyncManagerTest, WorkAddedHereOutlivesItsOwnersDeletionElsewhere) {
   EXPECT_EQ(
       client.presenter.keptWork.join('\n').toStdString(),
       "3 records added here to “Site” after it was deleted on another device are kept, in a new “Site”.");
+}
+
+// The same file imported, or the same names made, on two devices before either synced meet as one.
+TEST_F(RZSyncManagerTest, RecordsMadeOnTwoDevicesBeforeEitherSyncedMeetAsOne) {
+  auto* task = make<WTTask>("T2@WTTask", "Design");
+  task->setProject(make<WTProject>("P2@WTProject", "Dune"));
+  task->project()->setClient(make<WTClient>("C2@WTClient", "Delta"));
+  make<WTProject>("Solo@WTProject", "Solo")->setClient(task->project()->client());
+  for (const char* uuid : {"E1@WTTime", "E2@WTTime", "E3@WTTime"}) {
+    auto* entry = make<WTTime>(uuid);
+    entry->setTask(task);
+    if (uuid[1] != '3') entry->setImportId(QStringLiteral("csv:%1").arg(uuid[1]));
+  }
+  answer(headReply(5, changeSet(json(R"({"C1@WTClient":{"name":"delta"},
+    "P1@WTProject":{"name":"Dune","client":"C1@WTClient"},"T1@WTTask":{"name":"Design","project":"P1@WTProject"},
+    "R1@WTTime":{"task":"T1@WTTask","importId":"csv:1"},"R2@WTTime":{"task":"T1@WTTask","importId":"csv:2"}})"))),
+         saveReply(6));
+  ASSERT_TRUE(client.syncOnce());
+  expectRecords(R"(C1@WTClient {"name":"delta"}
+Solo@WTProject {"client":"C1@WTClient","name":"Solo"}
+P1@WTProject {"client":"C1@WTClient","name":"Dune","tasks":["T1@WTTask"]}
+C2@WTClient (none)
+P2@WTProject (none)
+T2@WTTask (none)
+E1@WTTime (none)
+)");
+  for (const char* uuid : {"E3@WTTime", "R2@WTTime"})
+    EXPECT_TRUE(client.find<WTTime>(uuid) && client.find<WTTime>(uuid)->task()->uuid() == "T1@WTTask")
+        << uuid;
+  ASSERT_EQ(sent("save").size(), 1);
+  const QVariantMap data = sent("save")[0].value("data").toMap();
+  const QVariantMap inserted = data["i"].toMap();
+  EXPECT_EQ(
+      compact(QVariantList{inserted.keys(), data["x"], inserted["E3@WTTime"].toMap()["task"],
+                           inserted["Solo@WTProject"].toMap()["client"]}),
+      R"([["E3@WTTime","Solo@WTProject"],["C2@WTClient","P2@WTProject","T2@WTTask","E1@WTTime","E2@WTTime"],)"
+      R"("T1@WTTask","C1@WTClient"])");
 }
 
 // The key is dropped only from the section the server sent it under.

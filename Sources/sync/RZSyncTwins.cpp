@@ -1,0 +1,84 @@
+#include "RZSyncTwins.h"
+
+#include "RZSyncTrack.h"
+#include "WTClient.h"
+#include "WTItem.h"
+#include "WTObjectContext.h"
+#include "WTProject.h"
+#include "WTTask.h"
+#include "WTTime.h"
+
+#include <QHash>
+
+namespace {
+
+// `key` of `record` into the journal, in the section that already holds the record.
+void journal(RZSyncTrack& track, const WTObject& record, const QString& key) {
+  track.updateValues({{key, record.setValues().value(key)}}, record.uuid());
+}
+
+}  // namespace
+
+void RZSyncTwins::fold(const QSet<QString>& arrived) {
+  const RZSyncTrack::Entries& unsent = track_.entries(RZSyncTrack::Section::Inserted);
+  if (arrived.isEmpty() || unsent.isEmpty()) return;
+  const auto madeHere = [&](const WTObject* record) {
+    return unsent.contains(record->uuid()) && !arrived.contains(record->uuid());
+  };
+  const auto remove = [&](WTObject* record) {
+    track_.forget(record->uuid());
+    track_.deleteObjectWithId(record->uuid());
+    context_.deleteObject(record);
+  };
+  QSet<WTProject*> reordered;
+  // Each of `records` made here goes into the one that arrived with its name under the same owner.
+  const auto foldNamed = [&]<class T>(const QList<T*>& records, auto ownerOf, auto moveChildren) {
+    const auto key = [&](const T* record) {
+      return std::pair<const WTObject*, QString>(ownerOf(record), record->name().toCaseFolded());
+    };
+    QHash<std::pair<const WTObject*, QString>, T*> arrivedNamed;
+    for (T* record : records)
+      if (arrived.contains(record->uuid())) arrivedNamed.insert(key(record), record);
+    for (T* record : records) {
+      T* twin = madeHere(record) ? arrivedNamed.value(key(record)) : nullptr;
+      if (!twin) continue;
+      moveChildren(record, twin);
+      remove(record);
+    }
+  };
+  foldNamed(
+      context_.fetch<WTClient>(), [](const WTClient*) -> const WTObject* { return nullptr; },
+      [&](WTClient* from, WTClient* into) {
+        for (WTProject* project : QList<WTProject*>(from->projects())) {
+          project->setClient(into);
+          journal(track_, *project, QStringLiteral("client"));
+        }
+      });
+  foldNamed(
+      context_.fetch<WTProject>(), [](const WTProject* project) -> const WTObject* { return project->client(); },
+      [&](WTProject* from, WTProject* into) {
+        for (WTTask* task : QList<WTTask*>(from->tasks())) {
+          task->setProject(into);
+          journal(track_, *task, QStringLiteral("project"));
+        }
+        reordered.insert(into);
+      });
+  foldNamed(
+      context_.fetch<WTTask>(), [](const WTTask* task) -> const WTObject* { return task->project(); },
+      [&](WTTask* from, WTTask* into) {
+        for (WTItem* item : QList<WTItem*>(from->items())) {
+          item->setTask(into);
+          journal(track_, *item, QStringLiteral("task"));
+        }
+      });
+  // Their tasks' order, once the tasks that went have left it.
+  for (WTProject* project : std::as_const(reordered)) journal(track_, *project, QStringLiteral("tasks"));
+
+  QSet<QString> importedThere;
+  const QList<WTTime*> entries = context_.fetch<WTTime>();
+  for (const WTTime* entry : entries)
+    if (arrived.contains(entry->uuid()) && !entry->importId().isNull()) importedThere.insert(entry->importId());
+  if (importedThere.isEmpty()) return;
+  for (WTTime* entry : entries)
+    if (madeHere(entry) && importedThere.contains(entry->importId())) remove(entry);
+}

@@ -1,0 +1,25 @@
+#pragma once
+
+#include <QSet>
+#include <QString>
+
+class RZSyncTrack;
+class WTObjectContext;
+
+// Records made on two devices before either synced meet as one when the second device merges the first
+// one's. A client, project or task inserted here and not sent yet, named as one that arrived under the
+// same owner, is folded into it: what is filed under it moves there, and it goes. An entry inserted here
+// and not sent yet goes when one arrived from the same row of an import (the same importId): one file
+// imported on two machines bills once. What goes is journaled as deleted (a save that was lost on its way
+// may have taken it to the server after all), the moves as changes.
+class RZSyncTwins {
+ public:
+  RZSyncTwins(WTObjectContext& context, RZSyncTrack& track) : context_(context), track_(track) {}
+
+  // `arrived`: the uuids of the records a head inserted, merged already.
+  void fold(const QSet<QString>& arrived);
+
+ private:
+  WTObjectContext& context_;
+  RZSyncTrack& track_;
+};
