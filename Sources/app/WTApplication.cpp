@@ -112,17 +112,24 @@ void WTApplication::linkStatusBar(WTStatusBarController& statusBar, WTMainWindow
 
 void WTApplication::linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifier& notifier,
                                       WTMainWindowController& window) {
+  const auto summary = [](const WTObject* object, WTBudget::Level level) {
+    QString name = object->name().isEmpty() ? tr("Untitled") : object->name();
+    // A task is named with its project: many projects have a "General".
+    const WTProject* project =
+        object->entity() == WTEntity::Task ? static_cast<const WTTask*>(object)->project() : nullptr;
+    if (project) name = tr("%1 › %2").arg(project->name(), name);
+    return level == WTBudget::Level::Over ? tr("“%1” is over its budget").arg(name)
+                                          : tr("“%1” has used 80 % of its budget").arg(name);
+  };
   connect(&watcher, &WTBudgetWatcher::budgetCrossed, &notifier,
-          [&notifier](WTObject* object, WTBudget::Level level) {
-            QString name = object->name().isEmpty() ? tr("Untitled") : object->name();
-            // A task is named with its project: many projects have a "General".
-            const WTProject* project =
-                object->entity() == WTEntity::Task ? static_cast<WTTask*>(object)->project() : nullptr;
-            if (project) name = tr("%1 › %2").arg(project->name(), name);
-            const QString summary = level == WTBudget::Level::Over
-                                        ? tr("“%1” is over its budget").arg(name)
-                                        : tr("“%1” has used 80 % of its budget").arg(name);
-            notifier.notify(summary, WTBudget::standing(object));
+          [&notifier, summary](WTObject* object, WTBudget::Level level) {
+            notifier.notify(summary(object, level), WTBudget::standing(object));
+          });
+  // A warning stands no longer than what it says.
+  connect(&watcher, &WTBudgetWatcher::budgetEased, &window,
+          [&window, summary](WTObject* object, WTBudget::Level level) {
+            for (const WTBudget::Level line : {WTBudget::Level::Warning, WTBudget::Level::Over})
+              if (level < line) window.withdrawNotice(summary(object, line));
           });
   connect(&notifier, &WTDesktopNotifier::notShown, &window,
           [&window](const QString& summary, const QString& body) {

@@ -44,7 +44,8 @@ class WTApplication : public QApplication {
   // the toolbar's running-time button opens the tray's list. Both ways lead to the window and to Quit.
   static void linkStatusBar(WTStatusBarController& statusBar, WTMainWindowController& window);
   // Says when a running timer takes a task or project past 80 % or past its budget: through the
-  // desktop's notifications, on the window's status line where they are not shown.
+  // desktop's notifications, on the window's status line where they are not shown, until it is back
+  // below that line.
   static void linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifier& notifier,
                                 WTMainWindowController& window);
 

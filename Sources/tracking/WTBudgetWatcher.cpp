@@ -19,18 +19,23 @@ void WTBudgetWatcher::check() {
       if (object && !watched.contains(object)) watched.append(object);
     }
   }
-  QHash<QString, Decimal> now;
-  QList<std::pair<WTObject*, WTBudget::Level>> crossings;
+  QHash<QString, Standing> now;
+  QList<std::pair<WTObject*, WTBudget::Level>> crossings, easings;
   for (WTObject* object : watched) {
     const Decimal billedNow = WTBudget::billed(object);
+    const std::optional<Decimal> budget = WTBudget::budget(object);
+    const WTBudget::Level levelNow = WTBudget::level(billedNow, budget).value_or(WTBudget::Level::Within);
     // A timer just started has nothing to compare with yet: it only sets where the next tick starts.
-    const auto before = billed_.constFind(object->uuid());
-    if (before != billed_.cend()) {
-      if (const auto level = WTBudget::crossed(*before, billedNow, WTBudget::budget(object)))
+    const auto before = standing_.constFind(object->uuid());
+    if (before != standing_.cend()) {
+      if (const auto level = WTBudget::crossed(before->billed, billedNow, budget))
         crossings.append({object, *level});
+      else if (levelNow < before->level)
+        easings.append({object, levelNow});
     }
-    now.insert(object->uuid(), billedNow);
+    now.insert(object->uuid(), {billedNow, levelNow});
   }
-  billed_ = std::move(now);
+  standing_ = std::move(now);
   for (const auto& [object, level] : crossings) emit budgetCrossed(object, level);
+  for (const auto& [object, level] : easings) emit budgetEased(object, level);
 }

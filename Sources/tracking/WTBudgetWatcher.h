@@ -14,7 +14,9 @@ class WTStopwatchUpdater;
 
 // Watches the tasks and projects in which a timer runs, tick by tick, and says when a tick takes one
 // past 80 % or past the whole of its budget: once per crossing, compared with what it billed at the
-// tick before. Records without a running timer are not watched; the rows' bars show where they stand.
+// tick before. It also says when one is back below a line it stood past at the tick before (an entry
+// shortened, the budget raised), so that a warning that no longer holds goes. Records without a running
+// timer are not watched; the rows' bars show where they stand.
 class WTBudgetWatcher : public QObject {
   Q_OBJECT
  public:
@@ -23,11 +25,18 @@ class WTBudgetWatcher : public QObject {
 
  signals:
   void budgetCrossed(WTObject* object, WTBudget::Level level);
+  // `level` is where it stands now, below where it stood.
+  void budgetEased(WTObject* object, WTBudget::Level level);
 
  private:
   void check();
 
   WTStopwatchUpdater* updater_;
-  // What each task and project with a running timer billed at the last tick, by uuid.
-  QHash<QString, Decimal> billed_;
+  // What each task and project with a running timer billed at the last tick, and where that stood, by
+  // uuid.
+  struct Standing {
+    Decimal billed;
+    WTBudget::Level level;
+  };
+  QHash<QString, Standing> standing_;
 };

@@ -258,6 +258,9 @@ TEST_F(TrackingTest, TicksSayOnceWhenATimerTakesATaskPastItsBudgetLines) {
   QObject::connect(&watcher, &WTBudgetWatcher::budgetCrossed, [&](WTObject* object, WTBudget::Level level) {
     said.append(QStringLiteral("%1 %2").arg(object->entityName()).arg(int(level)));
   });
+  QObject::connect(&watcher, &WTBudgetWatcher::budgetEased, [&](WTObject* object, WTBudget::Level level) {
+    said.append(QStringLiteral("%1 down to %2").arg(object->entityName()).arg(int(level)));
+  });
   startTimer(task, clockNow.addingSeconds(-79 * 60));
   updater->start();
   settle();
@@ -272,7 +275,9 @@ TEST_F(TrackingTest, TicksSayOnceWhenATimerTakesATaskPastItsBudgetLines) {
   updater->update();
   advance(7 * 60);  // 104 → 111
   updater->update();
-  EXPECT_EQ(said, QStringList{"WTTask 2"});
+  task->setBudget(dec("1000"));
+  updater->update();
+  EXPECT_EQ(said, (QStringList{"WTTask down to 1", "WTTask 2", "WTTask down to 0"}));
 }
 
 }  // namespace
