@@ -6,6 +6,7 @@
 #include <QDateEdit>
 #include <QDialogButtonBox>
 #include <QFormLayout>
+#include <QLocale>
 #include <QVBoxLayout>
 
 namespace {
@@ -40,7 +41,7 @@ WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& 
   end_->setObjectName(QStringLiteral("rangeEnd"));
   for (QDateEdit* edit : {begin_, end_}) {
     edit->setCalendarPopup(true);
-    edit->setDisplayFormat(QLocale().dateFormat(QLocale::ShortFormat));
+    edit->setDisplayFormat(dayFormat());
   }
   form->addRow(tr("From:"), begin_);
   form->addRow(tr("To:"), end_);
@@ -56,6 +57,16 @@ WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& 
     end_->setMinimumDate(day);
   });
   connect(end_, &QDateEdit::dateChanged, this, [this](QDate day) { store(endKey_, day); });
+}
+
+QString WTCustomRangeDialog::dayFormat() {
+  QString format = QLocale().dateFormat(QLocale::ShortFormat);
+  if (!format.contains(QLatin1String("yyyy"))) format.replace(QLatin1String("yy"), QLatin1String("yyyy"));
+  return format;
+}
+
+QString WTCustomRangeDialog::dayText(Date date) {
+  return QLocale().toString(dayOf(date), dayFormat());
 }
 
 void WTCustomRangeDialog::load() {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Date.h"
+
 #include <QDialog>
 
 class QDateEdit;
@@ -16,6 +18,11 @@ class WTCustomRangeDialog : public QDialog {
 
   QDateEdit* beginEdit() const { return begin_; }
   QDateEdit* endEdit() const { return end_; }
+
+  // A day as the range shows it: the locale's short form, with the whole year (a two-digit year typed
+  // as "2026" would read 2020).
+  static QString dayFormat();
+  static QString dayText(Date date);
 
  private:
   void load();

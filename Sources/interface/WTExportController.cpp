@@ -128,9 +128,10 @@ Result<int> WTExportController::exportToPath(const QString& path) const {
 void WTExportController::accept() {
   const WTProject* project = projectLimit();
   const QString suffix = QStringLiteral("csv");
+  // Named as the format's choice is: the spreadsheet holds flat fees and expenses too.
   const QString path =
       chooseSaveLocation_(this, {tr("Export"), tr("CSV files (*.csv)"), suffix,
-                                 suggestedFileName(project ? project->name() : tr("Time entries"),
+                                 suggestedFileName(project ? project->name() : formatChoice_->currentText(),
                                                    rangeButton_->selectedPeriod(), suffix)});
   if (path.isEmpty()) return;  // the choices stay on screen for another try
   const Result<int> written = exportToPath(path);

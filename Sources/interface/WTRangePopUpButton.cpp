@@ -21,7 +21,16 @@ WTRangePopUpButton::WTRangePopUpButton(UserDefaults* defaults, QWidget* parent)
     }
   }
   setupMenu();
+  if (defaults_ && defaults_->dateForKey(SettingsKeys::kCustomRangeWindowBegin)) showCustomDays();
   connect(this, &QComboBox::activated, this, &WTRangePopUpButton::itemActivated);
+}
+
+void WTRangePopUpButton::showCustomDays() {
+  // The item says which days it holds once there are some to say; choosing it still opens the dialog.
+  if (!customRangeBegin_ || !customRangeEnd_) return;
+  setItemText(findData(WTRangePredicate::Custom), tr("Custom: %1 – %2")
+                                                      .arg(WTCustomRangeDialog::dayText(*customRangeBegin_),
+                                                           WTCustomRangeDialog::dayText(*customRangeEnd_)));
 }
 
 WTRangePopUpButton::~WTRangePopUpButton() = default;
@@ -87,5 +96,6 @@ void WTRangePopUpButton::didEndRangeWindow() {
   // Whatever ended the dialog, the dates it showed are the range: they were stored as they were chosen.
   customRangeBegin_ = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowBegin);
   customRangeEnd_ = defaults_->dateForKey(SettingsKeys::kCustomRangeWindowEnd);
+  showCustomDays();
   emit rangeChosen();
 }

@@ -44,6 +44,7 @@ class WTRangePopUpButton : public QComboBox {
 
  private:
   void setupMenu();
+  void showCustomDays();
   void itemActivated(int index);
   void didEndRangeWindow();
 

@@ -272,13 +272,18 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
   int chosen = 0;
   QObject::connect(&button, &WTRangePopUpButton::rangeChosen, [&] { ++chosen; });
   button.selectTag(WTRangePredicate::Custom);
+  const QLocale locale;
+  QLocale::setDefault(QLocale(QLocale::German, QLocale::Germany));  // a short form with a two-digit year
   WTCustomRangeDialog* dialog = button.showRangeWindow();
+  QLocale::setDefault(locale);
   ASSERT_NE(dialog, nullptr);
   dialog->beginEdit()->setDate(QDate(2024, 3, 3));
   dialog->endEdit()->setDate(QDate(2024, 3, 1));  // before the first day: the range is that day
+  EXPECT_EQ(dialog->endEdit()->text(), "03.03.2024") << "the whole year, as it is typed";
   QTest::keyClick(dialog, Qt::Key_Escape);
   EXPECT_EQ(chosen, 1);
   EXPECT_EQ(range(), Range(berlin(2024, 3, 3), berlin(2024, 3, 3)));
+  EXPECT_EQ(button.currentText().count("2024"), 2);
 
   const QString path = dir.filePath("times.csv");
   auto recordsIn = [&] {  // each line's project and task
@@ -310,7 +315,8 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
               rows[1].startsWith("client,project,"))
       << rows.join(u'\n').toStdString();
   // The next export offers what the last one written chose: the custom days and times, then last
-  // month's spreadsheet.
+  // month's spreadsheet, named as such.
+  selected = nullptr;
   for (const bool again : {false, true}) {
     WTExportController next(context.get(), [] { return nullptr; });
     const std::pair chosen(next.rangeButton()->selectedTag(), next.format());
@@ -320,6 +326,7 @@ TEST_F(ReportWindowTest, TheRangeMenuKeepsTheCustomDaysShownAndTheExportWritesTh
               Range(berlin(2024, 3, 3), berlin(2024, 3, 3)));
     exporter.accept();
   }
+  EXPECT_TRUE(suggested.startsWith("Spreadsheet ")) << suggested.toStdString();
 }
 
 // The save dialog starts in the folder saved into last, never in the folder the program was started from.
