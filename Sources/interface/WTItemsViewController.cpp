@@ -209,6 +209,23 @@ QWidget* WTItemsViewController::loadView() {
   });
   connect(outlineView_, &QTreeView::expanded, this, &WTItemsViewController::saveExpandedItems);
   connect(outlineView_, &QTreeView::collapsed, this, &WTItemsViewController::saveExpandedItems);
+  // A day's group goes when its last item leaves; when it comes back (a to-do completed, then undone) it
+  // opens as it was left.
+  connect(treeController_, &QAbstractItemModel::rowsAboutToBeRemoved, this,
+          [this](const QModelIndex& parent, int first, int last) {
+            for (int row = first; row <= last; ++row) {
+              const QModelIndex index = treeController_->index(row, 0, parent);
+              if (outlineView_->isExpanded(index))
+                goneOpen_.insert(treeController_->persistentIdentity(index));
+            }
+          });
+  connect(treeController_, &QAbstractItemModel::rowsInserted, this,
+          [this](const QModelIndex& parent, int first, int last) {
+            for (int row = first; row <= last && !goneOpen_.isEmpty(); ++row) {
+              const QModelIndex index = treeController_->index(row, 0, parent);
+              if (goneOpen_.remove(treeController_->persistentIdentity(index))) outlineView_->expand(index);
+            }
+          });
   connect(outlineView_->selectionModel(), &QItemSelectionModel::selectionChanged, this,
           &WTViewController::validationChanged);
   refreshHeader();
@@ -237,6 +254,7 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
 void WTItemsViewController::willDisplayView() {
   view();
   autosaveExpandedItems_ = false;
+  goneOpen_.clear();
   delegate_->setEditField(WTItemCellDelegate::Field::Name);
   treeController_->setProject(project_);
   restoreExpandedItems();

@@ -140,6 +140,7 @@ class WTItemsViewController : public WTViewController {
   WTItem* currentItem_ = nullptr;
   QHash<QString, WTTableCellView*> cellViewPrototypes_;
   bool autosaveExpandedItems_ = false;
+  QSet<QString> goneOpen_;  // the identities of open rows that went, to open again if they come back
   RZBackgroundView* header_ = nullptr;
   QLabel* titleLabel_ = nullptr;
   QLabel* clientLabel_ = nullptr;

@@ -72,6 +72,10 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
     return context->undoManager().undoActionName() + ' ' + dayOf(todo);
   };
   EXPECT_EQ(tick(), "Complete To-Do 03-14 open");
+  context->undoManager().undo();
+  endTurn();
+  EXPECT_EQ(dayOf(todo), "Pending open") << "undone: the group comes back as it was left";
+  EXPECT_EQ(tick(), "Complete To-Do 03-14 open");
   EXPECT_EQ(tick(), "Reopen To-Do Pending open");
   controller->openDatePicker(time, QRect(100, 100, 20, 20));
   WTDatePopover* popover = controller->popover();
