@@ -91,6 +91,12 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   controller->openDatePicker(todo, QRect(0, 0, 20, 20));
   popover->hide();
   EXPECT_EQ(todo->startDate(), before);
+  // A day's row, never selected, shows when the keyboard is on it (as after Down from its task).
+  const QModelIndex day = model()->indexOfContainerOfItem(time);
+  outline()->setFocus();
+  const QImage plain = outline()->viewport()->grab(outline()->visualRect(day)).toImage();
+  outline()->setCurrentIndex(day);
+  EXPECT_NE(outline()->viewport()->grab(outline()->visualRect(day)).toImage(), plain);
 }
 
 // A note is stored once its editor is left; an emptied one closes with nothing stored.
