@@ -48,7 +48,7 @@ class WTCommandLinePresenter final : public WTAlertPresenter, public RZSyncError
   }
   void presentSyncError(const QString&) override {}
   void presentNetworkError(const QString&) override {}
-  void presentKeptWork(const QString& message) override { presentError(message); }
+  void presentMergeNotice(const QString&, const QString& message) override { presentError(message); }
 
  private:
   QTextStream& err_;

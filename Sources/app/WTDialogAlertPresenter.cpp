@@ -94,8 +94,7 @@ void WTDialogAlertPresenter::presentNetworkError(const QString& message) {
   presentError(summary + u'\n' + body);
 }
 
-void WTDialogAlertPresenter::presentKeptWork(const QString& message) {
-  const QString summary = QCoreApplication::translate("RZSyncManager", "Work kept from a deletion elsewhere");
+void WTDialogAlertPresenter::presentMergeNotice(const QString& summary, const QString& message) {
   if (noticeSink_) return noticeSink_(summary, message);
   presentError(summary + u'\n' + message);
 }

@@ -30,7 +30,7 @@ class WTDialogAlertPresenter final : public WTAlertPresenter, public RZSyncError
   void presentSyncError(const QString& message) override;
   void presentNetworkError(const QString& message) override;
   void networkRecovered() override;
-  void presentKeptWork(const QString& message) override;
+  void presentMergeNotice(const QString& summary, const QString& message) override;
 
  private:
   QWidget* parent_ = nullptr;

@@ -11,6 +11,6 @@ void RZSyncLogErrorPresenter::presentNetworkError(const QString& message) {
   qCWarning(lcSync).noquote() << QStringLiteral("Sync failed: %1").arg(message);
 }
 
-void RZSyncLogErrorPresenter::presentKeptWork(const QString& message) {
+void RZSyncLogErrorPresenter::presentMergeNotice(const QString&, const QString& message) {
   qCWarning(lcSync).noquote() << message;
 }

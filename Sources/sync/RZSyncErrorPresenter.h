@@ -15,9 +15,9 @@ class RZSyncErrorPresenter {
   virtual void presentNetworkError(const QString& message) = 0;
   // The server answers again after a run of failures: a notice of the run that still stands goes.
   virtual void networkRecovered() {}
-  // A deletion from another device met work added here that it never saw, and the merge kept that work
-  // under new copies of what was deleted (`message` says which). Needs no answer.
-  virtual void presentKeptWork(const QString& message) = 0;
+  // A merge changed what was done here: kept work from a deletion made elsewhere, or replaced a change
+  // made here with another device's. `message` says what, `summary` in a few words. Needs no answer.
+  virtual void presentMergeNotice(const QString& summary, const QString& message) = 0;
 };
 
 // Writes each message to the log as a warning.
@@ -25,5 +25,5 @@ class RZSyncLogErrorPresenter final : public RZSyncErrorPresenter {
  public:
   void presentSyncError(const QString& message) override;
   void presentNetworkError(const QString& message) override;
-  void presentKeptWork(const QString& message) override;
+  void presentMergeNotice(const QString& summary, const QString& message) override;
 };

@@ -322,6 +322,26 @@ void RZSyncManager::syncNetworkDidFailWithError(RZSyncNetwork*, const QString& e
   finish({answered.action, RZSyncExchange::Outcome::Failed, false, error});
 }
 
+QString RZSyncManager::replacedMessage(const QSet<QString>& uuids) const {
+  QStringList names;
+  for (const QString& uuid : uuids) {
+    const WTObject* record = context_->objectWithUUID(uuid, false);
+    const auto* item = dynamic_cast<const WTItem*>(record);
+    if (item)
+      names << tr("an item of “%1”").arg(item->task() ? item->task()->name() : QString());
+    else if (record)
+      names << QStringLiteral("“%1”").arg(record->valueForKey(QStringLiteral("name")).toString());
+  }
+  names.removeDuplicates();
+  names.sort();
+  if (names.isEmpty()) return {};
+  QString listed = names.mid(0, 3).join(QStringLiteral(", "));
+  if (names.size() > 3) listed = tr("%1 and %n more", nullptr, int(names.size() - 3)).arg(listed);
+  return names.size() == 1
+             ? tr("A change made here to %1 was replaced by one made on another device.").arg(listed)
+             : tr("Changes made here to %1 were replaced by ones made on another device.").arg(listed);
+}
+
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   // Deletions waiting to be sent win: the merge neither brings those records back nor changes them, and
   // files nothing under them (the server takes what is filed there with them once the deletion arrives).
@@ -329,8 +349,11 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   const QSet<QString> pending(pendingList.begin(), pendingList.end());
   QSet<QString> deletedThere;
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
-  mergeWithDictionary(changes, kInserted, pending);
-  mergeWithDictionary(changes, kUpdated, pending);
+  QSet<QString> replaced;
+  mergeWithDictionary(changes, kInserted, pending, &replaced);
+  mergeWithDictionary(changes, kUpdated, pending, &replaced);
+  if (const QString message = replacedMessage(replaced); !message.isEmpty())
+    presenter_->presentMergeNotice(tr("Changes replaced by another device’s"), message);
   const QVariantMap inserted = changes.value(kInserted).toMap();
   RZSyncTwins(*context_, *track_).fold(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()));
   RZSyncKeptWork kept(*context_, *track_);
@@ -340,7 +363,8 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
     track_->forget(uuid.toString());
     if (WTObject* object = context_->objectWithUUID(uuid, false)) deleteMerged(object, deletedThere, kept);
   }
-  if (const QString message = kept.message(); !message.isEmpty()) presenter_->presentKeptWork(message);
+  if (const QString message = kept.message(); !message.isEmpty())
+    presenter_->presentMergeNotice(tr("Work kept from a deletion elsewhere"), message);
 }
 
 void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept) {
@@ -367,7 +391,7 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
 }
 
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QString& key,
-                                        const QSet<QString>& pending) {
+                                        const QSet<QString>& pending, QSet<QString>* replaced) {
   const RZSyncTrack::Section section =
       key == kInserted ? RZSyncTrack::Section::Inserted : RZSyncTrack::Section::Updated;
   const QVariantMap entries = changes.value(key).toMap();
@@ -378,9 +402,10 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QStrin
     if (!object) continue;  // not the identity of a record
     QVariantMap local = track_->entry(section, uuid);
     const QVariantMap values = it.value().toMap();
+    const auto json = [](const QVariant& v) { return RZSyncJSON::write(v, RZSyncJSON::Style::Compact); };
     for (auto value = values.begin(); value != values.end(); ++value) {
-      // The server's value wins over a pending local one.
-      local.remove(value.key());
+      // The server's value wins over a pending local one; the user is told when it is another value.
+      const QVariant mine = local.take(value.key());
       if (value.key() == QLatin1String("uuid")) continue;
       bool skip = false;
       const QVariant merged = mergedValue(object, value.key(), value.value(), pending, &skip);
@@ -392,6 +417,12 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QStrin
                                                   value.value(), RZSyncJSON::Style::Compact)),
                                               value.key());
       }
+      // An order is not the user's edit: one that takes in tasks added elsewhere replaced nothing.
+      const WTKeyDescriptor* described = object->keyTable().find(value.key());
+      if (mine.isValid() && described && described->type != WTKeyType::Ordered &&
+          json(mine) !=
+              json(RZSyncTrack::transformedValue(object->valueForKey(value.key())).value_or(QVariant())))
+        replaced->insert(uuid);
     }
     if (!local.isEmpty() || track_->entries(section).contains(uuid)) track_->setEntry(section, uuid, local);
   }

@@ -128,7 +128,11 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   void postChanges(qint64 iteration);
   // Saves local edits, merges a "head" reply's result, saves it unjournaled and sends what is pending.
   void mergeHead(const QVariantMap& result, qint64 iteration);
-  void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending);
+  // Adds to `replaced` the records whose pending values here the server's replaced.
+  void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending,
+                           QSet<QString>* replaced);
+  // What the user is told of those records; empty for none.
+  QString replacedMessage(const QSet<QString>& uuids) const;
   QVariant mergedValue(WTObject* object, const QString& key, const QVariant& value,
                        const QSet<QString>& pending, bool* skip);
   // Deletes a record here with what it owns but the work `kept` takes out, journaling as deletions what

@@ -128,6 +128,7 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
     const char* what;
     std::function<void(Bench&, WTTask*)> local;  // on a synced T in P
     const char *result, *records, *sent;         // the head's change set, records afterwards, the save's data
+    const char* told = "";                       // what the user is told
   } rows[] = {
       {"ServerValueWinsOverAPendingKey",
        [](Bench& t, WTTask* task) {
@@ -140,7 +141,8 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
        R"({"u":{"T@WTTask":{"name":"Server name","budget":null,"rate":null}}})",
        R"(T@WTTask {"name":"Server name","notes":"Local notes","project":"P@WTProject"}
 )",
-       R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})"},
+       R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})",
+       "A change made here to “Server name” was replaced by one made on another device."},
       {"ServerDeletionTakesOwnedRecordsHere",
        [](Bench& t, WTTask* task) {
          auto* note = t.make<WTNote>("N@WTNote");
@@ -195,6 +197,7 @@ P2@WTProject {"name":"Outlives its client"}
     EXPECT_EQ(t.sent("save")[0].value("iteration").toLongLong(), 5);
     EXPECT_FALSE(t.client.track().hasChanges());
     EXPECT_EQ(t.client.track().iteration(), 6);
+    EXPECT_EQ(t.client.presenter.mergeNotices.join('\n').toStdString(), row.told);
   }
 }
 
@@ -227,7 +230,7 @@ TEST_F(RZSyncManagerTest, WorkAddedHereOutlivesItsOwnersDeletionElsewhere) {
   EXPECT_EQ(inserted[copy->project()->uuid()].toMap()["tasks"], QVariantList({"K@WTTask", copy->uuid()}));
   EXPECT_TRUE(data["x"].toList().isEmpty());
   EXPECT_EQ(
-      client.presenter.keptWork.join('\n').toStdString(),
+      client.presenter.mergeNotices.join('\n').toStdString(),
       "3 records added here to “Site” after it was deleted on another device are kept, in a new “Site”.");
 }
 

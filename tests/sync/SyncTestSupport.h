@@ -157,8 +157,8 @@ class RecordingPresenter final : public RZSyncErrorPresenter {
   void presentSyncError(const QString& message) override { syncErrors.append(message), answer(); }
   void presentNetworkError(const QString& message) override { networkErrors.append(message), answer(); }
   void networkRecovered() override { ++recoveries; }
-  void presentKeptWork(const QString& message) override { keptWork.append(message); }
-  QStringList syncErrors, networkErrors, keptWork;
+  void presentMergeNotice(const QString&, const QString& message) override { mergeNotices.append(message); }
+  QStringList syncErrors, networkErrors, mergeNotices;
   int recoveries = 0;
   int answersAfterMs = 0;  // as a modal box: events, timers among them, go on until the user answers
 
