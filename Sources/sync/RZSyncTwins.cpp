@@ -10,6 +10,8 @@
 
 #include <QHash>
 
+#include <algorithm>
+
 namespace {
 
 // `key` of `record` into the journal, in the section that already holds the record.
@@ -74,11 +76,19 @@ void RZSyncTwins::fold(const QSet<QString>& arrived) {
   // Their tasks' order, once the tasks that went have left it.
   for (WTProject* project : std::as_const(reordered)) journal(track_, *project, QStringLiteral("tasks"));
 
+  // Through the few records that arrived and the few not sent, never every entry of the store.
   QSet<QString> importedThere;
-  const QList<WTTime*> entries = context_.fetch<WTTime>();
-  for (const WTTime* entry : entries)
-    if (arrived.contains(entry->uuid()) && !entry->importId().isNull()) importedThere.insert(entry->importId());
+  for (const QString& uuid : arrived) {
+    const auto* entry = dynamic_cast<const WTTime*>(context_.objectWithUUID(uuid, false));
+    if (entry && !entry->importId().isNull()) importedThere.insert(entry->importId());
+  }
   if (importedThere.isEmpty()) return;
-  for (WTTime* entry : entries)
-    if (madeHere(entry) && importedThere.contains(entry->importId())) remove(entry);
+  QList<WTTime*> doubled;
+  for (auto it = unsent.keyBegin(); it != unsent.keyEnd(); ++it) {
+    auto* entry = dynamic_cast<WTTime*>(context_.objectWithUUID(*it, false));
+    if (entry && madeHere(entry) && importedThere.contains(entry->importId())) doubled.append(entry);
+  }
+  std::sort(doubled.begin(), doubled.end(),
+            [](const WTTime* a, const WTTime* b) { return a->uuid() < b->uuid(); });
+  for (WTTime* entry : doubled) remove(entry);
 }
