@@ -41,8 +41,10 @@ struct RZSyncExchange {
 // was on its way stay pending); moves the journal's iteration to a merged head at once; resumes polling
 // after a good reply that ends a run of failures; names this installation ("device") in every request;
 // never lets the merge re-create or change a record whose deletion is still waiting to be sent; journals
-// cleared values as null; journals as deletions what its local cascade removes beyond the server's; and
-// keeps from that cascade the work added here that the deleting device never saw.
+// cleared values as null; journals as deletions what its local cascade removes beyond the server's;
+// keeps from that cascade the work added here that the deleting device never saw (RZSyncKeptWork); folds
+// records made here into those made elsewhere first by the same names or import rows (RZSyncTwins); and
+// tells the user of what it kept and of changes made here that the server's replaced.
 class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   Q_OBJECT
  public:
