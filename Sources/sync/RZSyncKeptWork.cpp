@@ -24,13 +24,13 @@ void journalInsertion(RZSyncTrack& track, const WTObject& record) {
 }  // namespace
 
 WTProject* RZSyncKeptWork::copyOf(WTProject* project) {
-  WTObject*& copy = copies_[project];
+  WTObject*& copy = copies_[project->uuid()];
   if (!copy) copy = copyWithValues(*project, context_);
   return static_cast<WTProject*>(copy);
 }
 
 WTTask* RZSyncKeptWork::copyOf(WTTask* task, const QList<WTObject*>& gone) {
-  WTObject*& copy = copies_[task];
+  WTObject*& copy = copies_[task->uuid()];
   if (copy) return static_cast<WTTask*>(copy);
   auto* made = copyWithValues(*task, context_);
   copy = made;

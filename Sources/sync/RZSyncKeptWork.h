@@ -34,5 +34,7 @@ class RZSyncKeptWork {
   WTObjectContext& context_;
   RZSyncTrack& track_;
   QSet<WTObject*> kept_;               // the records taken out of a cascade, copies among them
-  QHash<WTObject*, WTObject*> copies_;  // of the owners that go
+  // Of the owners that go, by their uuids: an owner deleted in this merge may leave its address to a new
+  // record.
+  QHash<QString, WTObject*> copies_;
 };
