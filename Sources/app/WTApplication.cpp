@@ -125,11 +125,13 @@ void WTApplication::linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifie
           [&notifier, summary](WTObject* object, WTBudget::Level level) {
             notifier.notify(summary(object, level), WTBudget::standing(object));
           });
-  // A warning stands no longer than what it says.
+  // A warning stands no longer than what it says; back from over the budget, the 80 % line is said.
   connect(&watcher, &WTBudgetWatcher::budgetEased, &window,
-          [&window, summary](WTObject* object, WTBudget::Level level) {
+          [&window, &notifier, summary](WTObject* object, WTBudget::Level level) {
             for (const WTBudget::Level line : {WTBudget::Level::Warning, WTBudget::Level::Over})
               if (level < line) window.withdrawNotice(summary(object, line));
+            if (level == WTBudget::Level::Warning)
+              notifier.notify(summary(object, level), WTBudget::standing(object));
           });
   connect(&notifier, &WTDesktopNotifier::notShown, &window,
           [&window](const QString& summary, const QString& body) {

@@ -33,6 +33,7 @@
 #include <QPushButton>
 #include <QScreen>
 #include <QStatusBar>
+#include <QStatusTipEvent>
 #include <QStyle>
 #include <QThread>
 #include <QTimeZone>
@@ -565,6 +566,15 @@ void WTMainWindowController::showNotice(const QString& text) {
 void WTMainWindowController::withdrawNotice(const QString& summary) {
   QStatusBar* line = statusBar();
   if (line->currentMessage().startsWith(summary)) line->clearMessage();
+}
+
+bool WTMainWindowController::event(QEvent* event) {
+  // A menu passed over shows each action's status tip in the status line's place, an empty one too: a
+  // notice standing there (a budget line crossed, a server out of reach) would be wiped for good.
+  if (event->type() == QEvent::StatusTip && static_cast<QStatusTipEvent*>(event)->tip().isEmpty() &&
+      !statusBar()->currentMessage().isEmpty())
+    return true;
+  return QMainWindow::event(event);
 }
 
 void WTMainWindowController::closeEvent(QCloseEvent* event) {

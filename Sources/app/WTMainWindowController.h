@@ -117,6 +117,7 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
 
  protected:
   void closeEvent(QCloseEvent* event) override;
+  bool event(QEvent* event) override;
 
  private:
   void previewImport(QMessageBox* dialog, const QString& path, Result<WTImportFile> read,

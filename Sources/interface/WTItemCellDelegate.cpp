@@ -182,11 +182,8 @@ void WTItemCellDelegate::paintContainer(QPainter& painter, const QStyleOptionVie
   header.setDrawsSeparator(false);
   header.draw(painter, row, false);
   // A group is never selected, but the keyboard passes through it (Down from its task, Left and Right to
-  // close and open it): there it is framed, or nothing would show where the keyboard is.
-  if (option.state & QStyle::State_HasFocus) {
-    painter.setPen(QPen(option.palette.color(QPalette::Highlight), 2));
-    painter.drawRect(row.adjusted(1, 1, -1, -1));
-  }
+  // close and open it): there it takes the selection's colour, or nothing would show where the keyboard is.
+  if (option.state & QStyle::State_HasFocus) painter.fillRect(row, option.palette.color(QPalette::Highlight));
   if (view_->dropTargetIndex() == index) {
     header.drawDraggingDestinationFeedbackInRect(painter, row.adjusted(2, 1, -2, -1),
                                                  option.palette.color(QPalette::Highlight));

@@ -13,6 +13,7 @@
 
 #include <QJsonArray>
 #include <QStatusBar>
+#include <QStatusTipEvent>
 #include <QToolButton>
 
 #include <sqlite3.h>
@@ -255,7 +256,13 @@ TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStat
             "“Website › Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
   window.withdrawNotice("Sync cannot reach the server");  // another notice's withdrawal leaves it
   EXPECT_TRUE(line->currentMessage().startsWith("“Website › Design”"));
+  QStatusTipEvent passedOver{QString()};  // a menu's action without a tip
+  QApplication::sendEvent(&window, &passedOver);
+  EXPECT_TRUE(line->currentMessage().startsWith("“Website › Design” is over"));
   emit watcher.budgetEased(task, WTBudget::Level::Warning);
+  EXPECT_TRUE(
+      QTest::qWaitFor([&] { return line->currentMessage().startsWith("“Website › Design” has used 80 %"); }));
+  emit watcher.budgetEased(task, WTBudget::Level::Within);
   EXPECT_EQ(line->currentMessage(), "");
 }
 
