@@ -6,10 +6,30 @@
 #include <QDateEdit>
 #include <QDialogButtonBox>
 #include <QFormLayout>
+#include <QKeyEvent>
+#include <QLineEdit>
 #include <QLocale>
 #include <QVBoxLayout>
 
 namespace {
+
+// A day typed in full ("26.11.2026") is the day typed. Two digits take the field on to the next part by
+// themselves; the separator typed after them would otherwise skip that part too, and the month typed
+// would land in the year.
+class DayEdit final : public QDateEdit {
+ public:
+  using QDateEdit::QDateEdit;
+
+ protected:
+  void keyPressEvent(QKeyEvent* event) override {
+    const QString typed = event->text();
+    const QLineEdit* line = lineEdit();
+    const int at = line->hasSelectedText() ? line->selectionStart() : line->cursorPosition();
+    if (typed.size() == 1 && !typed[0].isLetterOrNumber() && at > 0 && line->text().at(at - 1) == typed[0])
+      return;
+    QDateEdit::keyPressEvent(event);
+  }
+};
 
 // Days are the user's calendar days (the calendar's zone), not the system clock's.
 QDate dayOf(Date date) {
@@ -35,9 +55,9 @@ WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& 
   setWindowTitle(tr("Custom Range"));
   auto* layout = new QVBoxLayout(this);
   auto* form = new QFormLayout;
-  begin_ = new QDateEdit(this);
+  begin_ = new DayEdit(this);
   begin_->setObjectName(QStringLiteral("rangeBegin"));
-  end_ = new QDateEdit(this);
+  end_ = new DayEdit(this);
   end_->setObjectName(QStringLiteral("rangeEnd"));
   for (QDateEdit* edit : {begin_, end_}) {
     edit->setCalendarPopup(true);
