@@ -314,7 +314,11 @@ bool WTItemCellDelegate::refuses(QLineEdit* line) const {
   const QString refusal = model->refusalFor(row, editRole(line), line->text());
   if (refusal.isEmpty()) return false;
   WTRateField::setRefused(line, refusal);
-  if (line->isVisible()) QToolTip::showText(line->mapToGlobal(QPoint(0, line->height())), refusal, line);
+  // Shown once the event that asked has been delivered: asked by the field's losing the focus to the tip
+  // itself, a tip replaced at once would be deleted while it is being activated.
+  QTimer::singleShot(0, line, [line, refusal] {
+    if (line->isVisible()) QToolTip::showText(line->mapToGlobal(QPoint(0, line->height())), refusal, line);
+  });
   return true;
 }
 
