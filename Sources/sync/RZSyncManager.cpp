@@ -322,7 +322,7 @@ void RZSyncManager::syncNetworkDidFailWithError(RZSyncNetwork*, const QString& e
   finish({answered.action, RZSyncExchange::Outcome::Failed, false, error});
 }
 
-QString RZSyncManager::replacedMessage(const QSet<QString>& uuids) const {
+QString RZSyncManager::recordsNamed(const QSet<QString>& uuids, qsizetype* count) const {
   QStringList names;
   for (const QString& uuid : uuids) {
     const WTObject* record = context_->objectWithUUID(uuid, false);
@@ -334,12 +334,10 @@ QString RZSyncManager::replacedMessage(const QSet<QString>& uuids) const {
   }
   names.removeDuplicates();
   names.sort();
-  if (names.isEmpty()) return {};
+  *count = names.size();
   QString listed = names.mid(0, 3).join(QStringLiteral(", "));
   if (names.size() > 3) listed = tr("%1 and %n more", nullptr, int(names.size() - 3)).arg(listed);
-  return names.size() == 1
-             ? tr("A change made here to %1 was replaced by one made on another device.").arg(listed)
-             : tr("Changes made here to %1 were replaced by ones made on another device.").arg(listed);
+  return listed;
 }
 
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
@@ -352,10 +350,23 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   QSet<QString> replaced;
   mergeWithDictionary(changes, kInserted, pending, &replaced);
   mergeWithDictionary(changes, kUpdated, pending, &replaced);
-  if (const QString message = replacedMessage(replaced); !message.isEmpty())
-    presenter_->presentMergeNotice(tr("Changes replaced by another device’s"), message);
+  qsizetype count = 0;
+  if (const QString names = recordsNamed(replaced, &count); count > 0) {
+    presenter_->presentMergeNotice(
+        tr("Changes replaced by another device’s"),
+        count == 1 ? tr("A change made here to %1 was replaced by one made on another device.").arg(names)
+                   : tr("Changes made here to %1 were replaced by ones made on another device.").arg(names));
+  }
   const QVariantMap inserted = changes.value(kInserted).toMap();
-  RZSyncTwins(*context_, *track_).fold(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()));
+  const QSet<QString> carried =
+      RZSyncTwins(*context_, *track_).fold(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()));
+  if (const QString names = recordsNamed(carried, &count); count > 0) {
+    presenter_->presentMergeNotice(
+        tr("Records made on both devices"),
+        tr("%1: made on this device and on another before they synced, each is one record now, with the "
+           "values set here.")
+            .arg(names));
+  }
   RZSyncKeptWork kept(*context_, *track_);
   for (const QVariant& uuid : changes.value(kDeleted).toList()) {
     if (uuid.typeId() != QMetaType::QString) continue;

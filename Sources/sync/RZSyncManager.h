@@ -133,8 +133,8 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   // Adds to `replaced` the records whose pending values here the server's replaced.
   void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending,
                            QSet<QString>* replaced);
-  // What the user is told of those records; empty for none.
-  QString replacedMessage(const QSet<QString>& uuids) const;
+  // The records of `uuids` as a notice names them (at most three, then how many more), and their number.
+  QString recordsNamed(const QSet<QString>& uuids, qsizetype* count) const;
   QVariant mergedValue(WTObject* object, const QString& key, const QVariant& value,
                        const QSet<QString>& pending, bool* skip);
   // Deletes a record here with what it owns but the work `kept` takes out, journaling as deletions what

@@ -21,11 +21,25 @@ void journal(RZSyncTrack& track, const WTObject& record, const QString& key) {
 
 }  // namespace
 
-void RZSyncTwins::fold(const QSet<QString>& arrived) {
+QSet<QString> RZSyncTwins::fold(const QSet<QString>& arrived) {
+  QSet<QString> carried;
   const RZSyncTrack::Entries& unsent = track_.entries(RZSyncTrack::Section::Inserted);
-  if (arrived.isEmpty() || unsent.isEmpty()) return;
+  if (arrived.isEmpty() || unsent.isEmpty()) return carried;
   const auto madeHere = [&](const WTObject* record) {
     return unsent.contains(record->uuid()) && !arrived.contains(record->uuid());
+  };
+  // What `from` has set and `into` has not, or otherwise, goes over; its owner and `matched` (the name,
+  // alike but for case) are the other's already.
+  const auto carry = [&](const WTObject& from, WTObject& into, const QString& matched) {
+    const WTKeyDescriptor* owner = from.keyTable().ownerKey();
+    for (const QString& key : from.storedKeys()) {
+      const QVariant value = from.valueForKey(key);
+      if (key == QLatin1String("uuid") || key == matched || (owner && key == owner->name) || value.isNull() ||
+          value == into.valueForKey(key) || !into.setValue(key, value))
+        continue;
+      journal(track_, into, key);
+      carried.insert(into.uuid());
+    }
   };
   const auto remove = [&](WTObject* record) {
     track_.forget(record->uuid());
@@ -45,6 +59,7 @@ void RZSyncTwins::fold(const QSet<QString>& arrived) {
       T* twin = madeHere(record) ? arrivedNamed.value(key(record)) : nullptr;
       if (!twin) continue;
       moveChildren(record, twin);
+      carry(*record, *twin, QStringLiteral("name"));
       remove(record);
     }
   };
@@ -77,12 +92,11 @@ void RZSyncTwins::fold(const QSet<QString>& arrived) {
   for (WTProject* project : std::as_const(reordered)) journal(track_, *project, QStringLiteral("tasks"));
 
   // Through the few records that arrived and the few not sent, never every entry of the store.
-  QSet<QString> importedThere;
-  for (const QString& uuid : arrived) {
-    const auto* entry = dynamic_cast<const WTTime*>(context_.objectWithUUID(uuid, false));
-    if (entry && !entry->importId().isNull()) importedThere.insert(entry->importId());
-  }
-  if (importedThere.isEmpty()) return;
+  QHash<QString, WTTime*> importedThere;  // by importId
+  for (const QString& uuid : arrived)
+    if (auto* entry = dynamic_cast<WTTime*>(context_.objectWithUUID(uuid, false)))
+      if (!entry->importId().isNull()) importedThere.insert(entry->importId(), entry);
+  if (importedThere.isEmpty()) return carried;
   QList<WTTime*> doubled;
   for (auto it = unsent.keyBegin(); it != unsent.keyEnd(); ++it) {
     auto* entry = dynamic_cast<WTTime*>(context_.objectWithUUID(*it, false));
@@ -90,5 +104,9 @@ void RZSyncTwins::fold(const QSet<QString>& arrived) {
   }
   std::sort(doubled.begin(), doubled.end(),
             [](const WTTime* a, const WTTime* b) { return a->uuid() < b->uuid(); });
-  for (WTTime* entry : doubled) remove(entry);
+  for (WTTime* entry : doubled) {
+    carry(*entry, *importedThere.value(entry->importId()), QString());
+    remove(entry);
+  }
+  return carried;
 }

@@ -10,14 +10,17 @@ class WTObjectContext;
 // one's. A client, project or task inserted here and not sent yet, named as one that arrived under the
 // same owner, is folded into it: what is filed under it moves there, and it goes. An entry inserted here
 // and not sent yet goes when one arrived from the same row of an import (the same importId): one file
-// imported on two machines bills once. What goes is journaled as deleted (a save that was lost on its way
-// may have taken it to the server after all), the moves as changes.
+// imported on two machines bills once. What was set here and differs (a rate typed, a name edited) is
+// carried over to the record it meets, as if typed there after the sync: nothing typed is lost, and
+// nothing is billed twice. What goes is journaled as deleted (a save that was lost on its way may have
+// taken it to the server after all), the moves and the carried values as changes.
 class RZSyncTwins {
  public:
   RZSyncTwins(WTObjectContext& context, RZSyncTrack& track) : context_(context), track_(track) {}
 
-  // `arrived`: the uuids of the records a head inserted, merged already.
-  void fold(const QSet<QString>& arrived);
+  // `arrived`: the uuids of the records a head inserted, merged already. Returns the uuids of the records
+  // that took values from here.
+  QSet<QString> fold(const QSet<QString>& arrived);
 
  private:
   WTObjectContext& context_;

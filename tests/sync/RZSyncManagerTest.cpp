@@ -240,27 +240,33 @@ TEST_F(RZSyncManagerTest, RecordsMadeOnTwoDevicesBeforeEitherSyncedMeetAsOne) {
   task->setProject(make<WTProject>("P2@WTProject", "Dune"));
   task->project()->setClient(make<WTClient>("C2@WTClient", "Delta"));
   make<WTProject>("Solo@WTProject", "Solo")->setClient(task->project()->client());
+  task->project()->setRate(dec("95.00"));  // typed here before the sync: it carries over
   for (const char* uuid : {"E1@WTTime", "E2@WTTime", "E3@WTTime"}) {
     auto* entry = make<WTTime>(uuid);
     entry->setTask(task);
-    if (uuid[1] != '3') entry->setImportId(QStringLiteral("csv:%1").arg(uuid[1]));
+    if (uuid[1] == '3') continue;
+    entry->setImportId(QStringLiteral("csv:%1").arg(uuid[1]));
+    entry->setStartDate(Date::fromSeconds(1700000000));
+    entry->setEndDate(Date::fromSeconds(1700003600));
   }
+  client.find<WTTime>("E2@WTTime")->setName("PO 4711");
   answer(headReply(5, changeSet(json(R"({"C1@WTClient":{"name":"delta"},
     "P1@WTProject":{"name":"Dune","client":"C1@WTClient"},"T1@WTTask":{"name":"Design","project":"P1@WTProject"},
-    "R1@WTTime":{"task":"T1@WTTask","importId":"csv:1"},"R2@WTTime":{"task":"T1@WTTask","importId":"csv:2"}})"))),
+    "R1@WTTime":{"task":"T1@WTTask","importId":"csv:1","startDate":1700000000,"endDate":1700003600},
+    "R2@WTTime":{"task":"T1@WTTask","importId":"csv:2","startDate":1700000000,"endDate":1700003600}})"))),
          saveReply(6));
   ASSERT_TRUE(client.syncOnce());
   expectRecords(R"(C1@WTClient {"name":"delta"}
 Solo@WTProject {"client":"C1@WTClient","name":"Solo"}
-P1@WTProject {"client":"C1@WTClient","name":"Dune","tasks":["T1@WTTask"]}
+P1@WTProject {"client":"C1@WTClient","name":"Dune","rate":95.00,"tasks":["T1@WTTask"]}
+R2@WTTime {"endDate":1700003600,"importId":"csv:2","name":"PO 4711","startDate":1700000000,"task":"T1@WTTask"}
 C2@WTClient (none)
 P2@WTProject (none)
 T2@WTTask (none)
 E1@WTTime (none)
 )");
-  for (const char* uuid : {"E3@WTTime", "R2@WTTime"})
-    EXPECT_TRUE(client.find<WTTime>(uuid) && client.find<WTTime>(uuid)->task()->uuid() == "T1@WTTask")
-        << uuid;
+  EXPECT_TRUE(client.find<WTTime>("E3@WTTime") &&
+              client.find<WTTime>("E3@WTTime")->task()->uuid() == "T1@WTTask");
   ASSERT_EQ(sent("save").size(), 1);
   const QVariantMap data = sent("save")[0].value("data").toMap();
   const QVariantMap inserted = data["i"].toMap();
@@ -269,6 +275,12 @@ E1@WTTime (none)
                            inserted["Solo@WTProject"].toMap()["client"]}),
       R"([["E3@WTTime","Solo@WTProject"],["C2@WTClient","P2@WTProject","T2@WTTask","E1@WTTime","E2@WTTime"],)"
       R"("T1@WTTask","C1@WTClient"])");
+  EXPECT_EQ(compact(QVariantList{data["u"].toMap()["R2@WTTime"],
+                                 data["u"].toMap()["P1@WTProject"].toMap()["rate"]}),
+            R"([{"name":"PO 4711"},95.00])");
+  EXPECT_EQ(client.presenter.mergeNotices.join('\n').toStdString(),
+            "an item of “Design”, “Dune”: made on this device and on another before they synced, each is one "
+            "record now, with the values set here.");
 }
 
 // The key is dropped only from the section the server sent it under.
