@@ -358,9 +358,15 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
                    : tr("Changes made here to %1 were replaced by ones made on another device.").arg(names));
   }
   const QVariantMap inserted = changes.value(kInserted).toMap();
-  const QSet<QString> carried =
+  const RZSyncTwins::Outcome twins =
       RZSyncTwins(*context_, *track_).fold(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()));
-  if (const QString names = recordsNamed(carried, &count); count > 0) {
+  if (const QString names = recordsNamed(twins.apart, &count); count > 0) {
+    presenter_->presentMergeNotice(
+        tr("Records made on both devices"),
+        tr("%1: made on this device and on another before they synced, billing differently; both are kept.")
+            .arg(names));
+  }
+  if (const QString names = recordsNamed(twins.carried, &count); count > 0) {
     presenter_->presentMergeNotice(
         tr("Records made on both devices"),
         tr("%1: made on this device and on another before they synced, each is one record now, with the "

@@ -19,12 +19,22 @@ void journal(RZSyncTrack& track, const WTObject& record, const QString& key) {
   track.updateValues({{key, record.setValues().value(key)}}, record.uuid());
 }
 
+// Whether both bill by terms of their own that differ.
+bool billsApart(const WTObject& a, const WTObject& b) {
+  for (const char* key : {"rate", "roundingMinutes", "roundingMode", "currency"}) {
+    const QVariant mine = a.valueForKey(QLatin1String(key)), theirs = b.valueForKey(QLatin1String(key));
+    if (!mine.isNull() && !theirs.isNull() && mine != theirs) return true;
+  }
+  return false;
+}
+
 }  // namespace
 
-QSet<QString> RZSyncTwins::fold(const QSet<QString>& arrived) {
-  QSet<QString> carried;
+RZSyncTwins::Outcome RZSyncTwins::fold(const QSet<QString>& arrived) {
+  Outcome outcome;
+  QSet<QString>& carried = outcome.carried;
   const RZSyncTrack::Entries& unsent = track_.entries(RZSyncTrack::Section::Inserted);
-  if (arrived.isEmpty() || unsent.isEmpty()) return carried;
+  if (arrived.isEmpty() || unsent.isEmpty()) return outcome;
   const auto madeHere = [&](const WTObject* record) {
     return unsent.contains(record->uuid()) && !arrived.contains(record->uuid());
   };
@@ -58,6 +68,10 @@ QSet<QString> RZSyncTwins::fold(const QSet<QString>& arrived) {
     for (T* record : records) {
       T* twin = madeHere(record) ? arrivedNamed.value(key(record)) : nullptr;
       if (!twin) continue;
+      if (billsApart(*record, *twin)) {
+        outcome.apart.insert(record->uuid());
+        continue;
+      }
       moveChildren(record, twin);
       carry(*record, *twin, QStringLiteral("name"));
       remove(record);
@@ -96,7 +110,7 @@ QSet<QString> RZSyncTwins::fold(const QSet<QString>& arrived) {
   for (const QString& uuid : arrived)
     if (auto* entry = dynamic_cast<WTTime*>(context_.objectWithUUID(uuid, false)))
       if (!entry->importId().isNull()) importedThere.insert(entry->importId(), entry);
-  if (importedThere.isEmpty()) return carried;
+  if (importedThere.isEmpty()) return outcome;
   QList<WTTime*> doubled;
   for (auto it = unsent.keyBegin(); it != unsent.keyEnd(); ++it) {
     auto* entry = dynamic_cast<WTTime*>(context_.objectWithUUID(*it, false));
@@ -108,5 +122,5 @@ QSet<QString> RZSyncTwins::fold(const QSet<QString>& arrived) {
     carry(*entry, *importedThere.value(entry->importId()), QString());
     remove(entry);
   }
-  return carried;
+  return outcome;
 }

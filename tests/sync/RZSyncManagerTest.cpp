@@ -250,16 +250,20 @@ TEST_F(RZSyncManagerTest, RecordsMadeOnTwoDevicesBeforeEitherSyncedMeetAsOne) {
     entry->setEndDate(Date::fromSeconds(1700003600));
   }
   client.find<WTTime>("E2@WTTime")->setName("PO 4711");
-  answer(headReply(5, changeSet(json(R"({"C1@WTClient":{"name":"delta"},
+  make<WTClient>("Apart@WTClient", "Tyrell")->setRate(dec("150.00"));  // billing otherwise: kept apart
+  answer(
+      headReply(
+          5, changeSet(json(R"({"C1@WTClient":{"name":"delta"},"T9@WTClient":{"name":"Tyrell","rate":80.00},
     "P1@WTProject":{"name":"Dune","client":"C1@WTClient"},"T1@WTTask":{"name":"Design","project":"P1@WTProject"},
     "R1@WTTime":{"task":"T1@WTTask","importId":"csv:1","startDate":1700000000,"endDate":1700003600},
     "R2@WTTime":{"task":"T1@WTTask","importId":"csv:2","startDate":1700000000,"endDate":1700003600}})"))),
-         saveReply(6));
+      saveReply(6));
   ASSERT_TRUE(client.syncOnce());
   expectRecords(R"(C1@WTClient {"name":"delta"}
 Solo@WTProject {"client":"C1@WTClient","name":"Solo"}
 P1@WTProject {"client":"C1@WTClient","name":"Dune","rate":95.00,"tasks":["T1@WTTask"]}
 R2@WTTime {"endDate":1700003600,"importId":"csv:2","name":"PO 4711","startDate":1700000000,"task":"T1@WTTask"}
+Apart@WTClient {"name":"Tyrell","rate":150.00}
 C2@WTClient (none)
 P2@WTProject (none)
 T2@WTTask (none)
@@ -273,13 +277,15 @@ E1@WTTime (none)
   EXPECT_EQ(
       compact(QVariantList{inserted.keys(), data["x"], inserted["E3@WTTime"].toMap()["task"],
                            inserted["Solo@WTProject"].toMap()["client"]}),
-      R"([["E3@WTTime","Solo@WTProject"],["C2@WTClient","P2@WTProject","T2@WTTask","E1@WTTime","E2@WTTime"],)"
+      R"([["Apart@WTClient","E3@WTTime","Solo@WTProject"],["C2@WTClient","P2@WTProject","T2@WTTask","E1@WTTime","E2@WTTime"],)"
       R"("T1@WTTask","C1@WTClient"])");
   EXPECT_EQ(compact(QVariantList{data["u"].toMap()["R2@WTTime"],
                                  data["u"].toMap()["P1@WTProject"].toMap()["rate"]}),
             R"([{"name":"PO 4711"},95.00])");
   EXPECT_EQ(client.presenter.mergeNotices.join('\n').toStdString(),
-            "an item of “Design”, “Dune”: made on this device and on another before they synced, each is one "
+            "“Tyrell”: made on this device and on another before they synced, billing differently; both are "
+            "kept.\nan item of “Design”, “Dune”: made on this device and on another before they synced, each "
+            "is one "
             "record now, with the values set here.");
 }
 
