@@ -22,6 +22,8 @@
 #include <QUuid>
 #include <QtDebug>
 
+#include <algorithm>
+
 namespace {
 
 const QString kInserted = QStringLiteral("i");
@@ -322,16 +324,29 @@ void RZSyncManager::syncNetworkDidFailWithError(RZSyncNetwork*, const QString& e
   finish({answered.action, RZSyncExchange::Outcome::Failed, false, error});
 }
 
+QString RZSyncManager::named(const WTObject& record) {
+  if (const auto* item = dynamic_cast<const WTItem*>(&record))
+    return tr("an item of “%1”").arg(item->task() ? item->task()->name() : QString());
+  return QStringLiteral("“%1”").arg(record.valueForKey(QStringLiteral("name")).toString());
+}
+
+bool RZSyncManager::changedHere(const WTObject& record) const {
+  // A task order follows the tasks added and moved; it is not an edit of its own.
+  const QVariantMap changes = track_->entry(RZSyncTrack::Section::Updated, record.uuid());
+  return std::any_of(changes.keyBegin(), changes.keyEnd(), [&](const QString& key) {
+    const WTKeyDescriptor* described = record.keyTable().find(key);
+    return described && described->type != WTKeyType::Ordered;
+  });
+}
+
 QString RZSyncManager::recordsNamed(const QSet<QString>& uuids, qsizetype* count) const {
   QStringList names;
-  for (const QString& uuid : uuids) {
-    const WTObject* record = context_->objectWithUUID(uuid, false);
-    const auto* item = dynamic_cast<const WTItem*>(record);
-    if (item)
-      names << tr("an item of “%1”").arg(item->task() ? item->task()->name() : QString());
-    else if (record)
-      names << QStringLiteral("“%1”").arg(record->valueForKey(QStringLiteral("name")).toString());
-  }
+  for (const QString& uuid : uuids)
+    if (const WTObject* record = context_->objectWithUUID(uuid, false)) names << named(*record);
+  return listed(names, count);
+}
+
+QString RZSyncManager::listed(QStringList names, qsizetype* count) {
   names.removeDuplicates();
   names.sort();
   *count = names.size();
@@ -374,17 +389,27 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
             .arg(names));
   }
   RZSyncKeptWork kept(*context_, *track_);
+  QStringList lost;  // records whose changes here go with them
   for (const QVariant& uuid : changes.value(kDeleted).toList()) {
     if (uuid.typeId() != QMetaType::QString) continue;
+    WTObject* object = context_->objectWithUUID(uuid, false);
+    if (object && changedHere(*object)) lost << named(*object);
     // What is still pending for a record the server deleted has nothing left to change there.
     track_->forget(uuid.toString());
-    if (WTObject* object = context_->objectWithUUID(uuid, false)) deleteMerged(object, deletedThere, kept);
+    if (object) deleteMerged(object, deletedThere, kept, &lost);
   }
   if (const QString message = kept.message(); !message.isEmpty())
     presenter_->presentMergeNotice(tr("Work kept from a deletion elsewhere"), message);
+  if (const QString names = listed(lost, &count); count > 0) {
+    presenter_->presentMergeNotice(
+        tr("Changes gone with a deletion elsewhere"),
+        count == 1 ? tr("A change made here to %1 went with a record deleted on another device.").arg(names)
+                   : tr("Changes made here to %1 went with records deleted on another device.").arg(names));
+  }
 }
 
-void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept) {
+void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept,
+                                 QStringList* lost) {
   QList<WTObject*> gone{object};
   for (qsizetype i = 0; i < gone.size(); ++i) {
     if (auto* project = dynamic_cast<WTProject*>(gone[i])) {
@@ -397,7 +422,10 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
   // click.
   kept.keepFrom(gone);
   QStringList uuids;
-  for (WTObject* record : gone) uuids.append(record->uuid());
+  for (WTObject* record : gone) {
+    uuids.append(record->uuid());
+    if (record != object && changedHere(*record)) *lost << named(*record);
+  }
   context_->deleteObject(object);
   // The deletion here takes the record's tasks and items with it. One of them may be filed under it here
   // only (moved there, not sent yet): the server still has it elsewhere, so its deletion is journaled

@@ -133,13 +133,19 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   // Adds to `replaced` the records whose pending values here the server's replaced.
   void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending,
                            QSet<QString>* replaced);
-  // The records of `uuids` as a notice names them (at most three, then how many more), and their number.
+  // A record as a notice names it; the records of `uuids` and `names` as a notice lists them (at most
+  // three, then how many more), with their number.
+  static QString named(const WTObject& record);
+  // Whether a change of `record` made here waits to be sent.
+  bool changedHere(const WTObject& record) const;
   QString recordsNamed(const QSet<QString>& uuids, qsizetype* count) const;
+  static QString listed(QStringList names, qsizetype* count);
   QVariant mergedValue(WTObject* object, const QString& key, const QVariant& value,
                        const QSet<QString>& pending, bool* skip);
   // Deletes a record here with what it owns but the work `kept` takes out, journaling as deletions what
-  // the server did not delete.
-  void deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept);
+  // the server did not delete; adds to `lost` the names of those of its records with changes not sent.
+  void deleteMerged(WTObject* object, const QSet<QString>& deletedThere, RZSyncKeptWork& kept,
+                    QStringList* lost);
   void writeTrack(bool logFailure);
   // A reply came: the run of failures, if any, is over and polling goes on.
   void endFailureRun();

@@ -152,7 +152,9 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
          note->setTask(task);  // moved here only: the server deletes it elsewhere
        },
        R"({"x":["T@WTTask","Gone@WTNote"]})", "T@WTTask (none)\nN@WTNote (none)\n",
-       R"({"u":{"K@WTTask":{},"N@WTNote":{"task":"T@WTTask"}},"x":["N@WTNote"]})"},
+       R"({"u":{"K@WTTask":{},"N@WTNote":{"task":"T@WTTask"}},"x":["N@WTNote"]})",
+       "Changes made here to an item of “Renamed here”, “Renamed here” went with records deleted on another "
+       "device."},
       {"PendingDeletionWinsOverTheMerge",
        [](Bench& t, WTTask* task) {
          auto* kept = t.make<WTTask>("K@WTTask");
