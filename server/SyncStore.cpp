@@ -159,10 +159,13 @@ class SaveWork {
 
   // Deletes a record for good: its tombstone stays, every field goes.
   void tombstone(const std::string& uuid, int64_t iteration, const std::string& device) {
-    const std::vector<SqlRow> owner = c_.query(
-        "SELECT ref FROM fields WHERE account_id = ? AND uuid = ? AND ref IS NOT NULL", {account_, uuid});
-    if (!owner.empty() && SyncSchema::entityOf(uuid) == SyncSchema::kOrderedMemberEntity)
-      touch(owner[0].text(0));
+    // By the record's own fields (its key), the reference filtered here: "ref IS NOT NULL" in the query
+    // lets SQLite walk the index of every reference in the account instead, once for each deletion.
+    if (SyncSchema::entityOf(uuid) == SyncSchema::kOrderedMemberEntity) {
+      for (const SqlRow& row :
+           c_.query("SELECT ref FROM fields WHERE account_id = ? AND uuid = ?", {account_, uuid}))
+        if (!row.isNull(0)) touch(row.text(0));
+    }
     c_.query(
         "INSERT INTO records (account_id, uuid, created_iter, created_device, deleted_iter, deleted_device) "
         "VALUES (?, ?, NULL, '', ?, ?) "
