@@ -68,20 +68,45 @@ WTReportWindowController::WTReportWindowController(WTObjectContext* context, QWi
 
 WTReportWindowController::~WTReportWindowController() = default;
 
+namespace {
+
+// The report windows open, so that asking again for one of them brings it forward.
+QList<QPointer<WTReportWindowController>>& openReports() {
+  static QList<QPointer<WTReportWindowController>> windows;
+  windows.removeAll(nullptr);
+  return windows;
+}
+
+}  // namespace
+
 WTReportWindowController* WTReportWindowController::showReport(WTObjectContext* context,
                                                                const QList<WTProject*>& projects) {
-  auto* window = new WTReportWindowController(context);
-  window->setAttribute(Qt::WA_DeleteOnClose);
-  window->show();
-  window->setProjects(projects);
-  return window;
+  return shown(
+      context,
+      [&](WTReportWindowController& window) { return !window.client_ && window.projects_ == projects; },
+      [&](WTReportWindowController& window) { window.setProjects(projects); });
 }
 
 WTReportWindowController* WTReportWindowController::showReport(WTObjectContext* context, WTClient* client) {
+  return shown(
+      context, [&](WTReportWindowController& window) { return window.client_ == client; },
+      [&](WTReportWindowController& window) { window.setClient(client); });
+}
+
+WTReportWindowController* WTReportWindowController::shown(
+    WTObjectContext* context, const std::function<bool(WTReportWindowController&)>& reports,
+    const std::function<void(WTReportWindowController&)>& subject) {
+  for (WTReportWindowController* window : openReports()) {
+    if (window->context_ != context || !reports(*window)) continue;
+    window->raise();
+    window->activateWindow();
+    return window;
+  }
   auto* window = new WTReportWindowController(context);
   window->setAttribute(Qt::WA_DeleteOnClose);
   window->show();
-  window->setClient(client);
+  subject(*window);
+  openReports().append(window);
   return window;
 }
 

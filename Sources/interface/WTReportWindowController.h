@@ -8,6 +8,8 @@
 #include <QPointer>
 #include <QWidget>
 
+#include <functional>
+
 class QAbstractButton;
 class QButtonGroup;
 class QFileSystemWatcher;
@@ -41,7 +43,7 @@ class WTReportWindowController : public QWidget {
   ~WTReportWindowController() override;
 
   // Opens a window of its own on the report of `projects` (or of every project of `client`), deleted
-  // when closed.
+  // when closed; brings forward the one open on that report already.
   static WTReportWindowController* showReport(WTObjectContext* context, const QList<WTProject*>& projects);
   static WTReportWindowController* showReport(WTObjectContext* context, WTClient* client);
 
@@ -102,6 +104,11 @@ class WTReportWindowController : public QWidget {
   void changeEvent(QEvent* event) override;
 
  private:
+  // The open window that `reports` says shows the report asked for, brought forward; else a new one,
+  // given its `subject`.
+  static WTReportWindowController* shown(WTObjectContext* context,
+                                         const std::function<bool(WTReportWindowController&)>& reports,
+                                         const std::function<void(WTReportWindowController&)>& subject);
   void objectsDidChange(const QList<WTObject*>& inserted, const QList<WTObject*>& updated,
                         const QList<WTObject*>& deleted);
   // Whether a change to `object` may change what the report shows.

@@ -114,6 +114,10 @@ TEST_F(ReportWindowTest, TheSegmentsChooseTheLevelAndATemplateErrorShowsUntilMen
   writeFile(WTReportGenerator::userTemplatePath(), "<p>my own report</p>");
   EXPECT_TRUE(QTest::qWaitFor([&] { return window->html() == "<p>my own report</p>"; }, 5000));
   QDesktopServices::unsetUrlHandler("file");
+  // Asking again for a report that is open brings its window forward, not a second one.
+  WTReportWindowController* shown = WTReportWindowController::showReport(context.get(), client);
+  EXPECT_EQ(WTReportWindowController::showReport(context.get(), client), shown);
+  EXPECT_NE(WTReportWindowController::showReport(context.get(), QList<WTProject*>{web}), shown);
   QPointer<WTReportWindowController> open = window.release();
   open->setAttribute(Qt::WA_DeleteOnClose);
   context.reset();
