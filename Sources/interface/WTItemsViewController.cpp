@@ -34,6 +34,8 @@
 #include <QToolButton>
 #include <QVBoxLayout>
 
+#include <algorithm>
+
 namespace {
 
 const QString kExpandedItemsKey = SettingsKeys::kExpandedItemsPrefix;
@@ -334,11 +336,34 @@ void WTItemsViewController::addObject() {
 void WTItemsViewController::removeSelectedObjects() {
   if (!outlineView_) return;
   outlineView_->endEditing();
+  QModelIndexList rows = outlineView_->selectionModel()->selectedRows();
   QList<WTObject*> objects;
-  for (const QModelIndex& index : outlineView_->selectionModel()->selectedRows()) {
+  for (const QModelIndex& index : rows) {
     if (WTObject* object = treeController_->objectAt(index)) objects.append(object);
   }
-  if (deleteObjects(context_, objects)) treeController_->processChanges();
+  if (rows.isEmpty()) return;
+  // The keyboard goes on from a neighbour of what goes: the row below, else the rows above (a day's
+  // group goes with its last item), else the task.
+  std::sort(rows.begin(), rows.end(), [this](const QModelIndex& a, const QModelIndex& b) {
+    return outlineView_->visualRect(a).top() < outlineView_->visualRect(b).top();
+  });
+  const auto goes = [&](QModelIndex index) {
+    for (; index.isValid(); index = index.parent())
+      if (rows.contains(index)) return true;
+    return false;
+  };
+  QModelIndex below = outlineView_->indexBelow(rows.last()), above = outlineView_->indexAbove(rows.first());
+  while (below.isValid() && goes(below)) below = outlineView_->indexBelow(below);
+  while (above.isValid() && goes(above)) above = outlineView_->indexAbove(above);
+  const QList<QPersistentModelIndex> neighbours{below, above, outlineView_->indexAbove(above),
+                                                rows.first().parent()};
+  if (!deleteObjects(context_, objects)) return;
+  treeController_->processChanges();
+  for (const QPersistentModelIndex& neighbour : neighbours) {
+    if (!neighbour.isValid()) continue;
+    outlineView_->setCurrentIndex(neighbour);
+    break;
+  }
 }
 
 void WTItemsViewController::toggleArchive() {

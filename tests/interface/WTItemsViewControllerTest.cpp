@@ -170,6 +170,9 @@ TEST_F(WTItemsViewControllerTest, WhatUndoBringsBackIsOpenedAndSelected) {
     controller->removeSelectedObjects();
     endTurn();
     EXPECT_FALSE(rowOf(removed).isValid());
+    EXPECT_EQ(outline()->currentIndex(),
+              removed == note ? model()->indexOfContainerOfItem(kept) : rowOf(design))
+        << "the keyboard goes on from a neighbour";
     outline()->collapseAll();
     select(design);
     context->undoManager().undo();
