@@ -469,6 +469,9 @@ void WTItemsViewController::refreshChildren(WTItem* item) {
   context_->processPendingChanges();
   treeController_->processChanges();
   expandContainerOfItem(item);
+  // The keyboard stays on the item, in its new place.
+  const QModelIndex index = treeController_->indexOfObject(item);
+  if (index.isValid()) outlineView_->setCurrentIndex(index);
 }
 
 WTDatePopover* WTItemsViewController::popover() {

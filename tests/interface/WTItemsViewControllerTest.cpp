@@ -72,6 +72,7 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
     return context->undoManager().undoActionName() + ' ' + dayOf(todo);
   };
   EXPECT_EQ(tick(), "Complete To-Do 03-14 open");
+  EXPECT_EQ(outline()->currentIndex(), rowOf(todo)) << "the keyboard stays on it";
   context->undoManager().undo();
   endTurn();
   EXPECT_EQ(dayOf(todo), "Pending open") << "undone: the group comes back as it was left";
