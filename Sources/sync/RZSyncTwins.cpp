@@ -77,30 +77,35 @@ RZSyncTwins::Outcome RZSyncTwins::fold(const QSet<QString>& arrived) {
       remove(record);
     }
   };
+  // Files each of `children` under `into` by `file`, journaling the owner `key` of each.
+  const auto refile = [&]<class Child, class Owner>(const QList<Child*>& children, Owner* into,
+                                                    void (*file)(Child*, Owner*), const char* key) {
+    for (Child* child : QList<Child*>(children)) {
+      file(child, into);
+      journal(track_, *child, QLatin1String(key));
+    }
+  };
   foldNamed(
       context_.fetch<WTClient>(), [](const WTClient*) -> const WTObject* { return nullptr; },
       [&](WTClient* from, WTClient* into) {
-        for (WTProject* project : QList<WTProject*>(from->projects())) {
-          project->setClient(into);
-          journal(track_, *project, QStringLiteral("client"));
-        }
+        refile(
+            from->projects(), into, +[](WTProject* project, WTClient* client) { project->setClient(client); },
+            "client");
       });
   foldNamed(
-      context_.fetch<WTProject>(), [](const WTProject* project) -> const WTObject* { return project->client(); },
+      context_.fetch<WTProject>(),
+      [](const WTProject* project) -> const WTObject* { return project->client(); },
       [&](WTProject* from, WTProject* into) {
-        for (WTTask* task : QList<WTTask*>(from->tasks())) {
-          task->setProject(into);
-          journal(track_, *task, QStringLiteral("project"));
-        }
+        refile(
+            from->tasks(), into, +[](WTTask* task, WTProject* project) { task->setProject(project); },
+            "project");
         reordered.insert(into);
       });
   foldNamed(
       context_.fetch<WTTask>(), [](const WTTask* task) -> const WTObject* { return task->project(); },
       [&](WTTask* from, WTTask* into) {
-        for (WTItem* item : QList<WTItem*>(from->items())) {
-          item->setTask(into);
-          journal(track_, *item, QStringLiteral("task"));
-        }
+        refile(
+            from->items(), into, +[](WTItem* item, WTTask* task) { item->setTask(task); }, "task");
       });
   // Their tasks' order, once the tasks that went have left it.
   for (WTProject* project : std::as_const(reordered)) journal(track_, *project, QStringLiteral("tasks"));
