@@ -122,6 +122,8 @@ class WTItemsViewController : public WTViewController {
   void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
   void saveExpandedItems();
   void restoreExpandedItems();
+  // A row that goes while open (a day's group emptied) opens again when it comes back.
+  void reopenRowsThatComeBack();
   // The header (WTItemsViewHeader.cpp).
   void refreshHeader();
   // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.
