@@ -112,12 +112,9 @@ void WTItemsViewController::removeSelectedObjects() {
 
 void WTItemsViewController::selectItem(WTItem* item) {
   if (!item) return;
-  context_->processPendingChanges();
-  treeController_->processChanges();
-  expandContainerOfItem(item);
+  refreshChildren(item);  // in its place, opened and current
   const QModelIndex index = treeController_->indexOfObject(item);
   if (!index.isValid()) return;
-  outlineView()->setCurrentIndex(index);
   outlineView_->selectionModel()->select(index,
                                          QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
   delegate_->setEditField(WTItemCellDelegate::Field::Name);

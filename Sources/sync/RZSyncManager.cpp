@@ -330,13 +330,20 @@ QString RZSyncManager::named(const WTObject& record) {
   return QStringLiteral("“%1”").arg(record.valueForKey(QStringLiteral("name")).toString());
 }
 
+namespace {
+
+// A value the user sets: not a task order, which follows the tasks added and moved.
+bool isOwnEdit(const WTObject& record, const QString& key) {
+  const WTKeyDescriptor* described = record.keyTable().find(key);
+  return described && described->type != WTKeyType::Ordered;
+}
+
+}  // namespace
+
 bool RZSyncManager::changedHere(const WTObject& record) const {
-  // A task order follows the tasks added and moved; it is not an edit of its own.
   const QVariantMap changes = track_->entry(RZSyncTrack::Section::Updated, record.uuid());
-  return std::any_of(changes.keyBegin(), changes.keyEnd(), [&](const QString& key) {
-    const WTKeyDescriptor* described = record.keyTable().find(key);
-    return described && described->type != WTKeyType::Ordered;
-  });
+  return std::any_of(changes.keyBegin(), changes.keyEnd(),
+                     [&](const QString& key) { return isOwnEdit(record, key); });
 }
 
 QString RZSyncManager::recordsNamed(const QSet<QString>& uuids, qsizetype* count) const {
@@ -462,9 +469,7 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QStrin
                                                   value.value(), RZSyncJSON::Style::Compact)),
                                               value.key());
       }
-      // An order is not the user's edit: one that takes in tasks added elsewhere replaced nothing.
-      const WTKeyDescriptor* described = object->keyTable().find(value.key());
-      if (mine.isValid() && described && described->type != WTKeyType::Ordered &&
+      if (mine.isValid() && isOwnEdit(*object, value.key()) &&
           json(mine) !=
               json(RZSyncTrack::transformedValue(object->valueForKey(value.key())).value_or(QVariant())))
         replaced->insert(uuid);
