@@ -40,6 +40,10 @@ std::optional<OwnerLink> ownerLink(std::string_view entity) {
   return OwnerLink{"task", "WTTask", DeleteRule::Cascade};  // every kind of item
 }
 
+bool deletesWhatItOwns(std::string_view entity) {
+  return entity == "WTProject" || entity == "WTTask";
+}
+
 }  // namespace SyncSchema
 
 namespace {

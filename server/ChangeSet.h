@@ -33,6 +33,9 @@ std::optional<std::string_view> entityOf(std::string_view uuid);
 // The owning relationship of an entity; none for clients.
 std::optional<OwnerLink> ownerLink(std::string_view entity);
 
+// Whether deleting a record of the entity deletes what is filed under it (projects, tasks).
+bool deletesWhatItOwns(std::string_view entity);
+
 // The ordered to-many side the server keeps consistent: a project's "tasks".
 inline constexpr std::string_view kOrderedEntity = "WTProject";
 inline constexpr std::string_view kOrderedKey = "tasks";

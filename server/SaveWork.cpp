@@ -73,13 +73,21 @@ void SaveWork::settle() {
     const std::string owner = std::move(deleteQueue_.back());
     deleteQueue_.pop_back();
     for (const SqlRow& row :
-         c_.query("SELECT uuid, name FROM fields WHERE account_id = ? AND ref = ?", {account_, owner})) {
+         c_.query("SELECT uuid, name, iter, device FROM fields WHERE account_id = ? AND ref = ?",
+                  {account_, owner})) {
       const std::optional<std::string_view> entity = SyncSchema::entityOf(row.text(0));
       const std::optional<SyncSchema::OwnerLink> link =
           entity ? SyncSchema::ownerLink(*entity) : std::nullopt;
-      if (link && row.text(1) == link->key) followOwnerDeletion(row.text(0), *link);
+      if (!link || row.text(1) != link->key) continue;
+      // Deletes win over what the sender knew, not over work it never saw filed there.
+      const bool unseen =
+          row.integer(2) > base_ && row.integer(2) < senderIteration_ && row.text(3) != device_;
+      if (link->rule == SyncSchema::DeleteRule::Cascade && unseen && keepUnderCopy(row.text(0), *link, owner))
+        continue;
+      followOwnerDeletion(row.text(0), *link);
     }
   }
+  orderCopiedProjects();
   for (const std::string& project : touchedProjects_) normaliseTaskOrder(project);
 }
 
@@ -105,21 +113,102 @@ void SaveWork::writeField(const std::string& uuid, const std::string& name, cons
 
 // Deletes a record for good: its tombstone stays, every field goes.
 void SaveWork::tombstone(const std::string& uuid, int64_t iteration, const std::string& device) {
-  // By the record's own fields (its key), the reference filtered here: "ref IS NOT NULL" in the query
-  // lets SQLite walk the index of every reference in the account instead, once for each deletion.
-  if (SyncSchema::entityOf(uuid) == SyncSchema::kOrderedMemberEntity) {
-    for (const SqlRow& row :
-         c_.query("SELECT ref FROM fields WHERE account_id = ? AND uuid = ?", {account_, uuid}))
-      if (!row.isNull(0)) touch(row.text(0));
-  }
   c_.query(
       "INSERT INTO records (account_id, uuid, created_iter, created_device, deleted_iter, deleted_device) "
       "VALUES (?, ?, NULL, '', ?, ?) "
       "ON CONFLICT (account_id, uuid) DO UPDATE SET deleted_iter = excluded.deleted_iter, "
       "deleted_device = excluded.deleted_device",
       {account_, uuid, iteration, device});
-  c_.query("DELETE FROM fields WHERE account_id = ? AND uuid = ?", {account_, uuid});
+  const std::optional<std::string_view> entity = SyncSchema::entityOf(uuid);
+  if (entity && SyncSchema::deletesWhatItOwns(*entity)) {
+    // Its values last as long as the save: work filed under it that the sender never saw goes to a copy.
+    // The reference is filtered here, not in the query: "ref IS NOT NULL" there lets SQLite walk the
+    // index of every reference in the account, once for each deletion.
+    std::vector<StoredField>& values = goneValues_[uuid];
+    for (const SqlRow& row :
+         c_.query("DELETE FROM fields WHERE account_id = ? AND uuid = ? RETURNING name, value, ref",
+                  {account_, uuid})) {
+      values.push_back({row.text(0), row.text(1), row.isNull(2) ? std::string() : row.text(2)});
+      if (*entity == SyncSchema::kOrderedMemberEntity) touch(values.back().ref);
+    }
+  } else {
+    c_.query("DELETE FROM fields WHERE account_id = ? AND uuid = ?", {account_, uuid});
+  }
   deleteQueue_.push_back(uuid);
+}
+
+bool SaveWork::keepUnderCopy(const std::string& uuid, const SyncSchema::OwnerLink& link,
+                             const std::string& owner) {
+  const std::string copy = copyOf(owner);
+  if (copy.empty()) return false;
+  std::string value;
+  appendJsonString(value, copy);
+  writeField(uuid, std::string(link.key), value, copy, serverIteration_, kServerDevice);
+  if (link.ownerEntity == SyncSchema::kOrderedEntity) touch(copy);
+  wroteServer_ = true;
+  return true;
+}
+
+std::string SaveWork::copyOf(const std::string& original) {
+  if (const auto made = copies_.find(original); made != copies_.end()) return made->second;
+  const auto gone = goneValues_.find(original);
+  if (gone == goneValues_.end()) return {};  // deleted by an earlier save: nothing is left to copy
+  const std::string_view entity = *SyncSchema::entityOf(original);
+  const std::optional<SyncSchema::OwnerLink> link = SyncSchema::ownerLink(entity);
+  std::vector<StoredField> values = gone->second;
+  for (StoredField& field : values) {
+    // Filed where the original was, or under its owner's copy when that owner goes too.
+    if (!link || field.name != link->key || field.ref.empty() || stateOf(field.ref) != RecordState::Deleted)
+      continue;
+    field.ref = link->rule == SyncSchema::DeleteRule::Cascade ? copyOf(field.ref) : std::string();
+    if (link->rule == SyncSchema::DeleteRule::Cascade && field.ref.empty()) return {};
+    field.value.clear();
+    field.ref.empty() ? void(field.value = "null") : appendJsonString(field.value, field.ref);
+  }
+  const std::string copy = copyIdentity(original, entity);
+  c_.query("INSERT INTO records (account_id, uuid, created_iter, created_device) VALUES (?, ?, ?, ?)",
+           {account_, copy, serverIteration_, kServerDevice});
+  for (const StoredField& field : values) {
+    // The copy's order is written once its tasks are known (orderCopiedProjects).
+    if (entity == SyncSchema::kOrderedEntity && field.name == SyncSchema::kOrderedKey) continue;
+    writeField(copy, field.name, field.value, field.ref, serverIteration_, kServerDevice);
+    if (entity == SyncSchema::kOrderedMemberEntity) touch(field.ref);
+  }
+  copies_.emplace(original, copy);
+  wroteServer_ = true;
+  return copy;
+}
+
+std::string SaveWork::copyIdentity(const std::string& original, std::string_view entity) {
+  // Readable, and new: no client makes a "~", and a record is deleted once, at one iteration. The prefix is
+  // cut so that copies of copies stay well within an identity's 200 bytes.
+  std::string prefix = original.substr(0, std::min(original.rfind('@'), size_t(120)));
+  const std::string suffix = "~" + std::to_string(serverIteration_);
+  for (int n = 1;; ++n) {
+    std::string copy =
+        prefix + suffix + (n > 1 ? "." + std::to_string(n) : std::string()) + "@" + std::string(entity);
+    if (stateOf(copy) == RecordState::Unknown) return copy;
+  }
+}
+
+void SaveWork::orderCopiedProjects() {
+  for (const auto& [original, copy] : copies_) {
+    if (SyncSchema::entityOf(original) != SyncSchema::kOrderedEntity) continue;
+    std::string order = "[";
+    for (const StoredField& field : goneValues_[original]) {
+      if (field.name != SyncSchema::kOrderedKey) continue;
+      const std::optional<JsonValue> tasks = JsonValue::parse(field.value);
+      for (const JsonValue& task : tasks ? tasks->elements() : std::vector<JsonValue>()) {
+        const auto copied = copies_.find(task.text());
+        if (order.size() > 1) order += ',';
+        appendJsonString(order, copied != copies_.end() ? copied->second : task.text());
+      }
+    }
+    order += ']';
+    // The tasks deleted drop out and those filed under the copy and not listed are appended as usual.
+    writeField(copy, std::string(SyncSchema::kOrderedKey), order, {}, serverIteration_, kServerDevice);
+    touch(copy);
+  }
 }
 
 void SaveWork::followOwnerDeletion(const std::string& uuid, const SyncSchema::OwnerLink& link) {

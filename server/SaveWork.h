@@ -4,8 +4,10 @@
 #include "SqlDatabase.h"
 
 #include <cstdint>
+#include <map>
 #include <set>
 #include <string>
+#include <unordered_map>
 #include <vector>
 
 namespace tessal::server {
@@ -15,9 +17,11 @@ namespace tessal::server {
 // consequences of them at the one after that.
 class SaveWork {
  public:
-  SaveWork(SqlConnection& c, int64_t account, int64_t head, std::string device)
+  // `base` is the iteration the sender's changes build on.
+  SaveWork(SqlConnection& c, int64_t account, int64_t base, int64_t head, std::string device)
       : c_(c),
         account_(account),
+        base_(base),
         senderIteration_(head + 1),
         serverIteration_(head + 2),
         device_(std::move(device)) {}
@@ -34,6 +38,11 @@ class SaveWork {
 
  private:
   enum class RecordState { Unknown, Live, Deleted };
+  struct StoredField {
+    std::string name;
+    std::string value;  // JSON text
+    std::string ref;    // the owner an owner field names; else empty
+  };
   struct OwnerWrite {
     std::string uuid;
     std::string entity;
@@ -46,9 +55,18 @@ class SaveWork {
   void tombstone(const std::string& uuid, int64_t iteration, const std::string& device);
   void followOwnerDeletion(const std::string& uuid, const SyncSchema::OwnerLink& link);
   void normaliseTaskOrder(const std::string& project);
+  // Files `uuid` under a copy of `owner`, which this save deletes; false when no copy can be made.
+  bool keepUnderCopy(const std::string& uuid, const SyncSchema::OwnerLink& link, const std::string& owner);
+  // A new record with the values `original` had before this save deleted it, filed under a copy of its own
+  // owner when that goes too; empty when its values are gone.
+  std::string copyOf(const std::string& original);
+  std::string copyIdentity(const std::string& original, std::string_view entity);
+  // A copied project lists its tasks in the original's order, copied tasks by their copies.
+  void orderCopiedProjects();
 
   SqlConnection& c_;
   int64_t account_;
+  int64_t base_;
   int64_t senderIteration_;
   int64_t serverIteration_;
   std::string device_;
@@ -57,6 +75,9 @@ class SaveWork {
   std::vector<OwnerWrite> ownerWrites_;
   std::vector<std::string> deleteQueue_;
   std::set<std::string> touchedProjects_;
+  // The values of the projects and tasks this save deleted, and the copies made of them, by identity.
+  std::unordered_map<std::string, std::vector<StoredField>> goneValues_;
+  std::map<std::string, std::string> copies_;
 };
 
 }  // namespace tessal::server

@@ -280,7 +280,7 @@ SyncStore::Save SyncStore::save(int64_t accountId, int64_t base, const std::stri
       return reply;
     }
 
-    SaveWork work(*c, accountId, head, device);
+    SaveWork work(*c, accountId, base, head, device);
     for (const RecordChange& change : changes.inserted) work.applyRecord(change);
     for (const RecordChange& change : changes.updated) work.applyRecord(change);
     for (const std::string& uuid : changes.deleted) work.applyDelete(uuid);

@@ -26,34 +26,100 @@ using namespace synctest;
 
 namespace {
 
-// What the accepted saves add up to, deletions taking what is filed under them (a project its client).
+// A save the server applied: the request's "data", base and device, and the iteration its changes got.
+struct AppliedSave {
+  QVariantMap data;
+  qint64 base = 0;
+  QString device;
+  qint64 iteration = 0;
+};
+
+// What the accepted saves add up to, deletions taking what is filed under them (a project its client), but
+// for what another device filed there since the deleting device's base: that goes to copies of the owners
+// deleted, made with the values they had, under the identity "original~iteration@Entity".
 struct Expected {
   QSet<QString> deleted;
   QMap<QString, QVariantMap> values;
+  struct Filing {
+    qint64 iteration = 0;
+    QString device;
+  };
+  QHash<QString, Filing> filed;  // when and by which device each record was last filed under its owner
+  int keptFromDeletions = 0;
 
-  void apply(const QVariantMap& save) {
+  static QString ownerKey(const QString& uuid) {
+    static const QHash<QString, QString> kOwners{
+        {"WTTask", "project"}, {"WTProject", "client"}, {"WTClient", ""}};
+    return kOwners.value(uuid.section(u'@', -1), "task");
+  }
+
+  void apply(const AppliedSave& save) {
     for (const char* section : {"i", "u"}) {
-      const QVariantMap entries = save.value(section).toMap();
-      for (auto it = entries.begin(); it != entries.end(); ++it)
-        if (!deleted.contains(it.key())) values[it.key()].insert(it.value().toMap());  // deleted stays so
+      const QVariantMap entries = save.data.value(section).toMap();
+      for (auto it = entries.begin(); it != entries.end(); ++it) {
+        if (deleted.contains(it.key())) continue;  // deleted stays so
+        const QVariantMap fields = it.value().toMap();
+        const QString key = ownerKey(it.key());
+        QVariantMap& record = values[it.key()];
+        if (fields.contains(key) && (!record.contains(key) || compact(record[key]) != compact(fields[key])))
+          filed[it.key()] = {save.iteration, save.device};
+        record.insert(fields);
+      }
     }
-    for (const QVariant& uuid : save.value("x").toList())
+    QMap<QString, QVariantMap> gone;  // what this save deletes, with its values
+    for (const QVariant& uuid : save.data.value("x").toList()) {
+      if (!deleted.contains(uuid.toString())) gone.insert(uuid.toString(), values.value(uuid.toString()));
       deleted.insert(uuid.toString()), values.remove(uuid.toString());
+    }
+    const qint64 serverIteration = save.iteration + 1;
+    QHash<QString, QString> copies;
+    // None when the original's values are gone (it was deleted by an earlier save), or its owner's.
+    std::function<QString(const QString&)> copyOf = [&](const QString& original) {
+      if (copies.contains(original) || !gone.contains(original)) return copies.value(original);
+      QVariantMap copied = gone.value(original);
+      copied.remove("tasks"), copied.remove("uuid");
+      const QString key = ownerKey(original);
+      if (const QVariant owner = copied.value(key);
+          owner.typeId() == QMetaType::QString && deleted.contains(owner.toString())) {
+        copied[key] = key == "client" ? QVariant() : QVariant(copyOf(owner.toString()));
+        if (key != "client" && copied[key].toString().isEmpty()) return QString();
+      }
+      const QString copy = QStringLiteral("%1~%2@%3")
+                               .arg(original.section(u'@', 0, -2).left(120))
+                               .arg(serverIteration)
+                               .arg(original.section(u'@', -1));
+      copies[original] = copy;
+      values[copy] = copied;
+      filed[copy] = {serverIteration, QString()};
+      return copy;
+    };
     for (bool changed = true; changed;) {
       changed = false;
+      QStringList kept;
       for (auto it = values.begin(); it != values.end();) {
-        const QString entity = it.key().section(u'@', -1);
-        static const QHash<QString, QString> kOwners{{"WTTask", "project"}, {"WTProject", "client"}};
-        const QString ownerKey = entity == "WTClient" ? "" : kOwners.value(entity, "task");
-        const QVariant owner = ownerKey.isEmpty() ? QVariant() : it.value().value(ownerKey);
+        const QString key = ownerKey(it.key());
+        const QVariant owner = key.isEmpty() ? QVariant() : it.value().value(key);
+        const Filing filing = filed.value(it.key());
         if (owner.typeId() != QMetaType::QString || !deleted.contains(owner.toString())) {
           ++it;
-        } else if (entity == "WTProject") {
-          it++.value().insert(ownerKey, QVariant());
+        } else if (key == "client") {
+          it++.value().insert(key, QVariant());
+        } else if (filing.iteration > save.base && filing.iteration < save.iteration &&
+                   filing.device != save.device && gone.contains(owner.toString())) {
+          kept << it++.key();  // filed there by another device since the deleting device's base
         } else {
-          deleted.insert(it.key());
+          gone.insert(it.key(), it.value()), deleted.insert(it.key());
           it = values.erase(it), changed = true;
         }
+      }
+      for (const QString& uuid : kept) {
+        if (const QString copy = copyOf(values[uuid][ownerKey(uuid)].toString()); !copy.isEmpty()) {
+          values[uuid][ownerKey(uuid)] = copy, filed[uuid] = {serverIteration, QString()};
+          ++keptFromDeletions;
+        } else {
+          gone.insert(uuid, values.take(uuid)), deleted.insert(uuid);
+        }
+        changed = true;
       }
     }
   }
@@ -69,11 +135,26 @@ class Servers {
                                     bool& appliedUnanswered) = 0;
   virtual void stop() = 0;
   virtual bool start() = 0;
+  // The account's head, read from the storage.
+  int64_t head() {
+    return database_ ? database_->acquire()->query("SELECT head FROM accounts").at(0).integer(0) : -1;
+  }
+
+ protected:
+  explicit Servers(const std::string& location) {
+    std::string error;
+    database_ = tessal::server::SqlDatabase::open(location, error);
+    EXPECT_TRUE(database_) << error;
+  }
+
+ private:
+  std::unique_ptr<tessal::server::SqlDatabase> database_;
 };
 
 class OneServer final : public Servers {
  public:
-  explicit OneServer(servertest::LocalServer& server) : server_(server) {}
+  OneServer(servertest::LocalServer& server, const std::string& location)
+      : Servers(location), server_(server) {}
   servertest::Reply deliver(const std::string& path, const std::string& body, bool&) override {
     return servertest::post(server_.port(), path, body);
   }
@@ -89,12 +170,9 @@ class OneServer final : public Servers {
 class Replicas final : public Servers {
  public:
   Replicas(const std::string& location, const std::string& user, const std::string& password, unsigned seed)
-      : poll_(servertest::requestBody(user, password, "head", 0)), random_(seed) {
+      : Servers(location), poll_(servertest::requestBody(user, password, "head", 0)), random_(seed) {
     for (int i = 0; i < 3; ++i)
       replicas_.push_back(std::make_unique<servertest::ServerProcess>(kExe, location));
-    std::string error;
-    database_ = tessal::server::SqlDatabase::open(location, error);
-    EXPECT_TRUE(database_) << error;
     EXPECT_TRUE(Replicas::start());
   }
   static inline const std::string kExe = TESSAL_SYNC_SERVER_EXE;
@@ -137,13 +215,8 @@ class Replicas final : public Servers {
     return replica.start() && servertest::post(replica.port(), servertest::kSyncPath, poll_).status == 200;
   }
 
-  int64_t head() {
-    return database_ ? database_->acquire()->query("SELECT head FROM accounts").at(0).integer(0) : -1;
-  }
-
   std::string poll_;  // a head without a device, which changes nothing
   std::mt19937 random_;
-  std::unique_ptr<tessal::server::SqlDatabase> database_;
   std::vector<std::unique_ptr<servertest::ServerProcess>> replicas_;
 };
 
@@ -204,7 +277,7 @@ class Simulation {
       EXPECT_EQ(snapshot(*clients_[i]->context), first) << "client " << i;
     // Every accepted change is there, unless replaced by a later one or taken by a deletion.
     Expected expected;
-    for (const QVariantMap& save : appliedSaves_) expected.apply(save);
+    for (const AppliedSave& save : appliedSaves_) expected.apply(save);
     WTObjectContext& context = *clients_[0]->context;
     for (WTObject* object : context.fetchObjectsForEntityName("WTObject").value_or(QList<WTObject*>()))
       EXPECT_TRUE(expected.values.contains(object->uuid()))
@@ -223,8 +296,8 @@ class Simulation {
     for (WTProject* project : context.fetch<WTProject>())  // a project lists exactly the tasks under it
       for (WTTask* task : project->tasks()) EXPECT_EQ(task->project(), project);
     std::cout << "seed " << seed_ << ": " << clients_.size() << " clients, " << appliedSaves_.size()
-              << " saves applied, " << lost_ << " requests or replies lost, " << context.count()
-              << " records in every store\n";
+              << " saves applied, " << lost_ << " requests or replies lost, " << expected.keptFromDeletions
+              << " records kept from deletions, " << context.count() << " records in every store\n";
   }
 
  private:
@@ -355,12 +428,15 @@ class Simulation {
       proxy_.answerHeld(kGatewayError), ++lost_;
     } else {
       bool appliedUnanswered = false;
+      const qint64 head = server_.head();
       const servertest::Reply reply =
           server_.deliver(request.path.toStdString(), request.body.toStdString(), appliedUnanswered);
       const QByteArray body = QByteArray::fromStdString(reply.body);
       const QVariantMap answer = RZSyncJSON::parse(body).value_or(QVariant()).toMap();
       if ((answer.value("action") == "save" && !answer.contains("error")) || appliedUnanswered)
-        appliedSaves_.append(request.json().value("data").toMap());
+        appliedSaves_.append({request.json().value("data").toMap(),
+                              request.json().value("iteration").toLongLong(),
+                              request.json().value("device").toString(), head + 1});
       lost_ += fate == Fate::LoseReply;
       // A lost reply, or the server is down.
       proxy_.answerHeld(reply.status == 0 || fate == Fate::LoseReply
@@ -396,7 +472,7 @@ class Simulation {
   std::mt19937 random_;
   LoopbackHttpServer proxy_;
   qsizetype released_ = 0;
-  QList<QVariantMap> appliedSaves_;  // the "data" of each save the server applied, in order
+  QList<AppliedSave> appliedSaves_;  // each save the server applied, in order
   Servers& server_;
   std::vector<std::unique_ptr<SyncClient>> clients_;
 };
@@ -420,7 +496,7 @@ TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
     const servertest::StorageLocation storage(GetParam());
     servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
                                    Simulation::kPassword.toStdString());
-    OneServer one(server);
+    OneServer one(server, storage.location());
     Simulation simulation(seed, one);
     simulation.run(600);
     ASSERT_TRUE(simulation.settle()) << "no quiescence";
