@@ -6,6 +6,8 @@
 #include "WTProject.h"
 #include "WTTask.h"
 
+#include <QRegularExpression>
+
 namespace {
 
 // A new record with every stored value of `record` but its identity.
@@ -86,4 +88,31 @@ QString RZSyncKeptWork::message() const {
                          "new %1.",
                          nullptr, int(added))
                           .arg(where);
+}
+
+void RZSyncKeptWork::noteServerCopies(const QVariantMap& inserted) {
+  // Named "original~iteration@Entity" by the server; no client makes a "~".
+  static const QRegularExpression kCopy(QStringLiteral("~\\d+(\\.\\d+)?@WT(Project|Task)$"));
+  for (auto uuid = inserted.keyBegin(); uuid != inserted.keyEnd(); ++uuid)
+    if (kCopy.match(*uuid).hasMatch() && !context_.objectWithUUID(*uuid, false)) serverCopies_.append(*uuid);
+}
+
+QString RZSyncKeptWork::serverCopiesMessage() const {
+  QStringList names;
+  for (const QString& uuid : serverCopies_) {
+    const WTObject* copy = context_.objectWithUUID(uuid, false);
+    const auto* task = dynamic_cast<const WTTask*>(copy);
+    if (!copy || (task && task->project() && serverCopies_.contains(task->project()->uuid()))) continue;
+    names.append(QStringLiteral("“%1”").arg(copy->valueForKey(QStringLiteral("name")).toString()));
+  }
+  names.removeDuplicates();
+  names.sort();
+  if (names.isEmpty()) return {};
+  return names.size() == 1
+             ? tr("%1 was deleted on one device while another added work to it; the work is kept, in a new "
+                  "%1.")
+                   .arg(names[0])
+             : tr("%1 were deleted on one device while another added work to them; the work is kept, in new "
+                  "records of the same names.")
+                   .arg(names.join(QStringLiteral(", ")));
 }

@@ -5,6 +5,8 @@
 #include <QList>
 #include <QSet>
 #include <QString>
+#include <QStringList>
+#include <QVariantMap>
 
 class RZSyncTrack;
 class WTObject;
@@ -26,6 +28,12 @@ class RZSyncKeptWork {
   // What the user is told of the work kept in this merge; empty when none was.
   QString message() const;
 
+  // The server keeps work a deleting device never saw under copies of what it deleted. Before a merge
+  // applies `inserted`, notes which of its records are such copies, new here; afterwards, what the user
+  // is told of them (empty when none came).
+  void noteServerCopies(const QVariantMap& inserted);
+  QString serverCopiesMessage() const;
+
  private:
   WTProject* copyOf(WTProject* project);
   // In its project, or in that project's copy when the project goes too.
@@ -37,4 +45,5 @@ class RZSyncKeptWork {
   // Of the owners that go, by their uuids: an owner deleted in this merge may leave its address to a new
   // record.
   QHash<QString, WTObject*> copies_;
+  QStringList serverCopies_;
 };

@@ -369,6 +369,8 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   const QSet<QString> pending(pendingList.begin(), pendingList.end());
   QSet<QString> deletedThere;
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
+  RZSyncKeptWork kept(*context_, *track_);
+  kept.noteServerCopies(changes.value(kInserted).toMap());
   QSet<QString> replaced;
   mergeWithDictionary(changes, kInserted, pending, &replaced);
   mergeWithDictionary(changes, kUpdated, pending, &replaced);
@@ -395,7 +397,6 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
            "values set here.")
             .arg(names));
   }
-  RZSyncKeptWork kept(*context_, *track_);
   QStringList lost;  // records whose changes here go with them
   for (const QVariant& uuid : changes.value(kDeleted).toList()) {
     if (uuid.typeId() != QMetaType::QString) continue;
@@ -407,6 +408,8 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   }
   if (const QString message = kept.message(); !message.isEmpty())
     presenter_->presentMergeNotice(tr("Work kept from a deletion elsewhere"), message);
+  if (const QString message = kept.serverCopiesMessage(); !message.isEmpty())
+    presenter_->presentMergeNotice(tr("Work kept from a deletion"), message);
   if (const QString names = listed(lost, &count); count > 0) {
     presenter_->presentMergeNotice(
         tr("Changes gone with a deletion elsewhere"),

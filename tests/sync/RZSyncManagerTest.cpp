@@ -183,6 +183,24 @@ Deeper@WTNote {"startDate":1700000000,"task":"NewTask@WTTask"}
 P2@WTProject {"name":"Outlives its client"}
 )",
        R"({"i":{},"u":{},"x":["A@WTClient","T@WTTask"]})"},
+      {"TheServerKeepsWorkTheDeletingDeviceNeverSaw",
+       [](Bench& t, WTTask* task) {
+         auto* note = t.make<WTNote>("N@WTNote");
+         note->setTask(task);
+         note->setStartDate(Date::fromSeconds(1700000000));
+         t.synced();
+         t.make<WTClient>("K@WTClient");
+       },
+       R"({"i":{"P~7@WTProject":{"name":"Site","tasks":["T~7@WTTask"]},"T~7@WTTask":{"name":"Design",)"
+       R"("project":"P~7@WTProject"}},"u":{"N@WTNote":{"task":"T~7@WTTask"}},"x":["T@WTTask","P@WTProject"]})",
+       R"(T@WTTask (none)
+P@WTProject (none)
+N@WTNote {"startDate":1700000000,"task":"T~7@WTTask"}
+P~7@WTProject {"name":"Site","tasks":["T~7@WTTask"]}
+T~7@WTTask {"name":"Design","project":"P~7@WTProject"}
+)",
+       R"({"i":{"K@WTClient":{"archived":false,"uuid":"K@WTClient"}},"u":{},"x":[]})",
+       "“Site” was deleted on one device while another added work to it; the work is kept, in a new “Site”."},
   };
   for (const auto& row : rows) {
     SCOPED_TRACE(row.what);
