@@ -568,6 +568,11 @@ void WTMainWindowController::withdrawNotice(const QString& summary) {
   if (line->currentMessage().startsWith(summary)) line->clearMessage();
 }
 
+void WTMainWindowController::renewNotice(const QString& summary, const QString& text) {
+  const QString standing = statusBar()->currentMessage();
+  if (standing.startsWith(summary) && standing != text) showNotice(text);
+}
+
 bool WTMainWindowController::event(QEvent* event) {
   // A menu passed over shows each action's status tip in the status line's place, an empty one too: a
   // notice standing there (a budget line crossed, a server out of reach) would be wiped for good.

@@ -61,14 +61,17 @@ QString standing(const WTObject* object) {
   const Decimal spent = billed(object);
   const std::optional<double> share = fraction(spent, limit);
   if (!share) return {};
-  // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached.
-  const QString percent = QLocale().toString(qint64(std::floor(*share * 100.0)));
+  // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached; over the
+  // budget, raised: "100 %" never shows past it.
   const Decimal left = *limit - spent;
+  const double percent = *share * 100.0;
+  const QString percentText =
+      QLocale().toString(qint64(left.isNegative() ? std::ceil(percent) : std::floor(percent)));
   const QString currency = static_cast<const WTBillingRecord*>(object)->billingCurrency();
   const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left, currency))
                                          : QObject::tr("%1 left").arg(MoneyFormat::format(left, currency));
   return QObject::tr("%1 % of the budget of %2 · %3")
-      .arg(percent, MoneyFormat::format(*limit, currency), rest);
+      .arg(percentText, MoneyFormat::format(*limit, currency), rest);
 }
 
 QVariant reportedStanding(const WTObject* object) {

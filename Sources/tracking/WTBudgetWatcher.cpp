@@ -20,7 +20,7 @@ void WTBudgetWatcher::check() {
     }
   }
   QHash<QString, Standing> now;
-  QList<std::pair<WTObject*, WTBudget::Level>> crossings, easings;
+  QList<std::pair<WTObject*, WTBudget::Level>> crossings, easings, moves;
   for (WTObject* object : watched) {
     const Decimal billedNow = WTBudget::billed(object);
     const std::optional<Decimal> budget = WTBudget::budget(object);
@@ -32,10 +32,13 @@ void WTBudgetWatcher::check() {
         crossings.append({object, *level});
       else if (levelNow < before->level)
         easings.append({object, levelNow});
+      else if (billedNow != before->billed && WTBudget::level(billedNow, budget))
+        moves.append({object, levelNow});
     }
     now.insert(object->uuid(), {billedNow, levelNow});
   }
   standing_ = std::move(now);
   for (const auto& [object, level] : crossings) emit budgetCrossed(object, level);
   for (const auto& [object, level] : easings) emit budgetEased(object, level);
+  for (const auto& [object, level] : moves) emit budgetMoved(object, level);
 }

@@ -254,6 +254,11 @@ TEST_F(WTAppDelegateTest, BudgetNoticesWithoutANotificationServiceStandOnTheStat
   ASSERT_TRUE(line && line->isVisible());
   EXPECT_EQ(line->currentMessage(),
             "“Website › Design” is over its budget — 150 % of the budget of 100.00 · 50.00 over");
+  // Its figures follow; past the whole budget by a little is not "100 %".
+  task->setBudget(Decimal::fromString(u"149.50").value());
+  emit watcher.budgetMoved(task, WTBudget::Level::Over);
+  EXPECT_EQ(line->currentMessage(),
+            "“Website › Design” is over its budget — 101 % of the budget of 149.50 · 0.50 over");
   window.withdrawNotice("Sync cannot reach the server");  // another notice's withdrawal leaves it
   EXPECT_TRUE(line->currentMessage().startsWith("“Website › Design”"));
   QStatusTipEvent passedOver{QString()};  // a menu's action without a tip

@@ -365,7 +365,7 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
     EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
   // Task 1 is outside the period: its budget's line shows in the report over every date.
   html = WTReportGenerator({billed}, 0).render().html;
-  EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 138 % of the budget of 100.00 · 38.47 over</td>")))
+  EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 139 % of the budget of 100.00 · 38.47 over</td>")))
       << html.toStdString();
   EXPECT_EQ(html.count("class=\"budget\""), 2);  // tasks 2 and 3 have none
   WTReportGenerator empty({billed}, 0);

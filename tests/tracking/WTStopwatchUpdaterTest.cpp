@@ -261,6 +261,9 @@ TEST_F(TrackingTest, TicksSayOnceWhenATimerTakesATaskPastItsBudgetLines) {
   QObject::connect(&watcher, &WTBudgetWatcher::budgetEased, [&](WTObject* object, WTBudget::Level level) {
     said.append(QStringLiteral("%1 down to %2").arg(object->entityName()).arg(int(level)));
   });
+  QStringList moved;  // by the object's entity: the project has no budget
+  QObject::connect(&watcher, &WTBudgetWatcher::budgetMoved,
+                   [&](WTObject* object, WTBudget::Level) { moved.append(object->entityName()); });
   startTimer(task, clockNow.addingSeconds(-79 * 60));
   updater->start();
   settle();
@@ -270,6 +273,7 @@ TEST_F(TrackingTest, TicksSayOnceWhenATimerTakesATaskPastItsBudgetLines) {
     updater->update();
   }
   EXPECT_EQ(said, (QStringList{"WTTask 1", "WTTask 2"}));
+  EXPECT_EQ(moved, QStringList(23, "WTTask")) << "every other tick moves the figures";
   said.clear();
   task->setBudget(dec("110"));  // back under the whole: passing it again is said again
   updater->update();
