@@ -136,8 +136,9 @@ class WTItemsModel : public QAbstractItemModel {
   void projectChanged();
   // The shown project was deleted; the model now shows nothing.
   void projectDeleted();
-  // A drop moved these items (to another task, day or back to "Pending").
-  void itemsDropped(const QList<WTItem*>& items);
+  // A drop moved these tasks (in the project's order) or items (to another task, day or back to
+  // "Pending").
+  void recordsDropped(const QList<WTObject*>& records);
 
  private:
   struct Node;  // WTItemsModelNode.h

@@ -109,16 +109,20 @@ bool WTItemsModel::dropMimeData(const QMimeData* data, Qt::DropAction action, in
   if (!canDropMimeData(data, action, row, column, parent)) return false;
   const WTUndoManager::NamedStep step(context_->undoManager(), tr("Move"));
   const QStringList uuids = objectUUIDs(data);
+  QList<WTObject*> moved;
   if (containsTasks(data)) {
-    project_->moveTasks(objectsOfDrag<WTTask>(context_, uuids), row);
-    return true;
-  }
-  const QList<WTItem*> items = objectsOfDrag<WTItem>(context_, uuids);
-  const Node* target = nodeOf(parent);
-  const QList<WTItem*> moved = target->kind == Node::Task
-                                   ? static_cast<WTTask*>(target->object)->adoptItems(items)
+    const QList<WTTask*> tasks = objectsOfDrag<WTTask>(context_, uuids);
+    project_->moveTasks(tasks, row);
+    moved = {tasks.begin(), tasks.end()};
+  } else {
+    const QList<WTItem*> items = objectsOfDrag<WTItem>(context_, uuids);
+    const Node* target = nodeOf(parent);
+    const QList<WTItem*> adopted =
+        target->kind == Node::Task ? static_cast<WTTask*>(target->object)->adoptItems(items)
                                    : target->container->task()->adoptItems(items, target->container->date());
-  if (!moved.isEmpty()) emit itemsDropped(moved);
+    moved = {adopted.begin(), adopted.end()};
+  }
+  if (!moved.isEmpty()) emit recordsDropped(moved);
   return true;
 }
 

@@ -37,12 +37,10 @@ WTItemsViewController::WTItemsViewController(WTObjectContext* context, QObject* 
   setObjectName(QStringLiteral("Items"));
   connect(treeController_, &WTItemsModel::projectChanged, this, &WTItemsViewController::refreshHeader);
   connect(treeController_, &WTItemsModel::projectChanged, this, &WTViewController::validationChanged);
-  // Dropped items are shown where they landed.
-  connect(treeController_, &WTItemsModel::itemsDropped, this, [this](const QList<WTItem*>& items) {
-    QTimer::singleShot(0, this, [this, items] {
-      treeController_->processChanges();
-      for (WTItem* item : items) expandContainerOfItem(item);
-    });
+  // Dropped records are shown where they landed, selected, with the keyboard on them: once the drop
+  // event is done with the view.
+  connect(treeController_, &WTItemsModel::recordsDropped, this, [this](const QList<WTObject*>& records) {
+    QTimer::singleShot(0, this, [this, records] { revealObjects(records); });
   });
   // Records that undo or redo puts back are shown and selected, not left inside a closed row.
   connect(context_, &WTObjectContext::objectValueDidChange, this, [this](WTObject* object, const QString&) {

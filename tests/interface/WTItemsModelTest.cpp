@@ -194,7 +194,7 @@ TEST_F(WTItemsModelTest, ADropMovesTheDraggedRecordsToTheRowItLandsOn) {
   makeItem<WTToDo>(design, "open", at(2024, 3, 9));
   auto* note = makeItem<WTNote>(build, "note", at(2024, 3, 12, 9));
   model->setProject(project);
-  QSignalSpy dropped(model.get(), &WTItemsModel::itemsDropped);
+  QSignalSpy dropped(model.get(), &WTItemsModel::recordsDropped);
   auto drop = [&](std::initializer_list<const WTObject*> dragged, int row, const QModelIndex& parent) {
     return model->dropMimeData(dragOf(dragged).get(), Qt::MoveAction, row, 0, parent);
   };
@@ -205,7 +205,7 @@ TEST_F(WTItemsModelTest, ADropMovesTheDraggedRecordsToTheRowItLandsOn) {
   ASSERT_TRUE(drop({build, todo}, 0, {}));  // tasks between the top rows; the items dragged with them stay
   endTurn();
   EXPECT_EQ(shape(), "Build[03-10[note]] Design[Pending[todo,open]]");
-  EXPECT_EQ(dropped.count(), 3);
+  EXPECT_EQ(dropped.count(), 4);
 }
 
 // Each edit lands in its record's key, or is refused and changes nothing.

@@ -98,6 +98,14 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   const QImage plain = outline()->viewport()->grab(outline()->visualRect(day)).toImage();
   outline()->setCurrentIndex(day);
   EXPECT_NE(outline()->viewport()->grab(outline()->visualRect(day)).toImage(), plain);
+  // Dropped on another task, or among the tasks, records stay selected where they land.
+  for (WTObject* dropped : {static_cast<WTObject*>(time), static_cast<WTObject*>(build)}) {
+    const bool task = dropped == build;
+    ASSERT_TRUE(model()->dropMimeData(model()->mimeData({rowOf(dropped)}), Qt::MoveAction, task ? 0 : -1, 0,
+                                      task ? QModelIndex() : rowOf(build)));
+    EXPECT_TRUE(QTest::qWaitFor([&] { return outline()->currentIndex() == rowOf(dropped); })) << task;
+    EXPECT_EQ(outline()->selectionModel()->selectedRows(), QModelIndexList{rowOf(dropped)}) << task;
+  }
 }
 
 // A note is stored once its editor is left; an emptied one closes with nothing stored.
