@@ -142,7 +142,10 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
   minutesField_ = new QLineEdit(this);
   minutesField_->setObjectName(QStringLiteral("roundingMinutesField"));
   minutesField_->setAlignment(Qt::AlignRight);
-  WTRateField::setPlaceholder(minutesField_, tr("Inherited: %1").arg(above.minutes));
+  // A minute is no rounding at all, as Preferences says it.
+  const bool rounds = above.minutes > 1;
+  WTRateField::setPlaceholder(minutesField_,
+                              rounds ? tr("Inherited: %1").arg(above.minutes) : tr("Inherited: none"));
   if (record->roundingMinutes().value_or(0) > 0)
     minutesField_->setText(QLocale().toString(*record->roundingMinutes()));
   clearsRefusal(minutesField_);
@@ -158,7 +161,7 @@ WTBillingDialog::WTBillingDialog(WTObject* object, QWidget* parent) : QDialog(pa
         return tr("to the nearest");
     }
   };
-  modeField_->addItem(tr("Inherited: %1").arg(modeTitle(above.mode)), QString());
+  modeField_->addItem(rounds ? tr("Inherited: %1").arg(modeTitle(above.mode)) : tr("Inherited"), QString());
   for (const auto mode :
        {WTRoundingRule::Mode::Up, WTRoundingRule::Mode::Nearest, WTRoundingRule::Mode::Down})
     modeField_->addItem(modeTitle(mode), WTRoundingRule::nameOfMode(mode));

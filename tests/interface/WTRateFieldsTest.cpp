@@ -308,6 +308,10 @@ TEST_F(WTRateFieldsTest, TheBillingSheetSetsCurrencyAndRoundingAndKeepsWhatItRef
     EXPECT_EQ(refused, refusedIn(field, field->text()));
     EXPECT_EQ(stored(object), after);
   }
+  const WTBillingDialog unrounded(acme);  // nothing above rounds: said as Preferences says it
+  EXPECT_EQ(
+      unrounded.roundingMinutesField()->placeholderText() + ", " + unrounded.roundingModeField()->itemText(0),
+      "Inherited: none, Inherited");
   EXPECT_EQ(WTBillingDialog(project).roundingMinutesField()->text(), "6");
   EXPECT_EQ(WTBillingDialog(design).roundingMinutesField()->placeholderText(), "Inherited: 6");
   project->setRoundingMinutes(1440);  // however long, what is inherited shows whole
