@@ -1,6 +1,8 @@
 #include "RZSyncKeptWork.h"
 
 #include "RZSyncTrack.h"
+#include "RZSyncTwins.h"
+#include "WTClient.h"
 #include "WTItem.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
@@ -25,20 +27,46 @@ void journalInsertion(RZSyncTrack& track, const WTObject& record) {
 
 }  // namespace
 
-WTProject* RZSyncKeptWork::copyOf(WTProject* project) {
+bool RZSyncKeptWork::goes(const WTObject* record, const QList<WTObject*>& gone) const {
+  return record && (gone.contains(record) || deletedThere_.contains(record->uuid()));
+}
+
+template <class T>
+T* RZSyncKeptWork::namesake(const T& gone, const QList<T*>& candidates) const {
+  // Deleted there and made again by the same name (in the same merge, or before): the work goes to it,
+  // unless the two bill by terms of their own that differ.
+  const QString name = gone.name().toCaseFolded();
+  for (T* candidate : candidates)
+    if (candidate != &gone && !made_.contains(candidate) && candidate->name().toCaseFolded() == name &&
+        !RZSyncTwins::billApart(gone, *candidate))
+      return candidate;
+  return nullptr;
+}
+
+WTProject* RZSyncKeptWork::copyOf(WTProject* project, const QList<WTObject*>& gone) {
   WTObject*& copy = copies_[project->uuid()];
-  if (!copy) copy = copyWithValues(*project, context_);
+  if (copy) return static_cast<WTProject*>(copy);
+  QList<WTProject*> alike;
+  for (WTProject* other : project->client() ? project->client()->projects() : context_.fetch<WTProject>())
+    if (other->client() == project->client() && !goes(other, gone)) alike.append(other);
+  copy = namesake(*project, alike);
+  if (!copy) made_.insert(copy = copyWithValues(*project, context_));
   return static_cast<WTProject*>(copy);
 }
 
 WTTask* RZSyncKeptWork::copyOf(WTTask* task, const QList<WTObject*>& gone) {
   WTObject*& copy = copies_[task->uuid()];
   if (copy) return static_cast<WTTask*>(copy);
+  WTProject* project = goes(task->project(), gone) ? copyOf(task->project(), gone) : task->project();
+  QList<WTTask*> alike;
+  for (WTTask* other : project ? project->tasks() : QList<WTTask*>())
+    if (!goes(other, gone)) alike.append(other);
+  if ((copy = namesake(*task, alike))) return static_cast<WTTask*>(copy);
   auto* made = copyWithValues(*task, context_);
-  copy = made;
-  if (gone.contains(task->project())) {
-    made->setProject(copyOf(task->project()));
-  } else if (WTProject* project = task->project()) {
+  made_.insert(copy = made);
+  if (project != task->project()) {
+    made->setProject(project);
+  } else if (project) {
     // A project that stays has a new order.
     const QString tasks = QStringLiteral("tasks");
     track_.updateValues({{tasks, project->setValues().value(tasks)}}, project->uuid());
@@ -57,7 +85,7 @@ void RZSyncKeptWork::keepFrom(QList<WTObject*>& gone) {
       continue;
     }
     if (!track_.entries(RZSyncTrack::Section::Inserted).contains(record->uuid())) continue;
-    if (task) task->setProject(copyOf(task->project()));
+    if (task) task->setProject(copyOf(task->project(), gone));
     if (item) item->setTask(copyOf(item->task(), gone));
     keptHere.insert(record);
     journalInsertion(track_, *record);
@@ -65,29 +93,41 @@ void RZSyncKeptWork::keepFrom(QList<WTObject*>& gone) {
   if (keptHere.isEmpty()) return;
   gone.removeIf([&](WTObject* record) { return keptHere.contains(record); });
   kept_.unite(keptHere);
-  for (WTObject* copy : std::as_const(copies_)) journalInsertion(track_, *copy);
+  for (WTObject* copy : std::as_const(made_)) journalInsertion(track_, *copy);
 }
 
 QString RZSyncKeptWork::message() const {
-  // The user's own records, not the copies made for them; named by the outermost copies.
-  const QList<WTObject*> made = copies_.values();
+  // The user's own records, not the copies made for them; named by the outermost records they went to.
   qsizetype added = 0;
-  for (WTObject* record : kept_) added += !made.contains(record);
+  for (WTObject* record : kept_) added += !made_.contains(record);
   if (added == 0) return {};
+  const QList<WTObject*> went = copies_.values();
   QStringList names;
-  for (WTObject* copy : made) {
-    auto* task = dynamic_cast<WTTask*>(copy);
-    if (!task || !made.contains(task->project()))
-      names.append(QStringLiteral("“%1”").arg(copy->valueForKey(QStringLiteral("name")).toString()));
+  bool allNew = true;
+  for (WTObject* into : went) {
+    auto* task = dynamic_cast<WTTask*>(into);
+    if (task && went.contains(task->project())) continue;
+    names.append(QStringLiteral("“%1”").arg(into->valueForKey(QStringLiteral("name")).toString()));
+    allNew &= made_.contains(into);
   }
   names.sort();
   const QString where = names.join(QStringLiteral(", "));
-  return added == 1 ? tr("A record added here to %1 after it was deleted on another device is kept, in a new %1.")
-                          .arg(where)
-                    : tr("%n records added here to %1 after it was deleted on another device are kept, in a "
-                         "new %1.",
-                         nullptr, int(added))
-                          .arg(where);
+  if (!allNew) {
+    return added == 1 ? tr("A record added here to %1 after it was deleted on another device, and made again "
+                           "there, is kept in the new %1.")
+                            .arg(where)
+                      : tr("%n records added here to %1 after it was deleted on another device, and made "
+                           "again there, are kept in the new %1.",
+                           nullptr, int(added))
+                            .arg(where);
+  }
+  return added == 1
+             ? tr("A record added here to %1 after it was deleted on another device is kept, in a new %1.")
+                   .arg(where)
+             : tr("%n records added here to %1 after it was deleted on another device are kept, in a "
+                  "new %1.",
+                  nullptr, int(added))
+                   .arg(where);
 }
 
 void RZSyncKeptWork::noteServerCopies(const QVariantMap& inserted) {

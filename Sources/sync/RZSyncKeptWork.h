@@ -21,7 +21,9 @@ class RZSyncKeptWork {
   Q_DECLARE_TR_FUNCTIONS(RZSyncManager)
 
  public:
-  RZSyncKeptWork(WTObjectContext& context, RZSyncTrack& track) : context_(context), track_(track) {}
+  // `deletedThere`: the uuids the merge's head deleted.
+  RZSyncKeptWork(WTObjectContext& context, RZSyncTrack& track, const QSet<QString>& deletedThere)
+      : context_(context), track_(track), deletedThere_(deletedThere) {}
 
   // `gone` is a deleted record, then what it owns, owners before what they own; what is kept leaves it.
   void keepFrom(QList<WTObject*>& gone);
@@ -35,15 +37,23 @@ class RZSyncKeptWork {
   QString serverCopiesMessage() const;
 
  private:
-  WTProject* copyOf(WTProject* project);
-  // In its project, or in that project's copy when the project goes too.
+  // What the work filed under an owner that goes is filed under instead: a live record of the same name
+  // under the same owner (made again on the other device), else a new copy. A task's in its project, or
+  // in what that project's work goes to when the project goes too.
+  WTProject* copyOf(WTProject* project, const QList<WTObject*>& gone);
   WTTask* copyOf(WTTask* task, const QList<WTObject*>& gone);
+  // In the cascade at hand, or deleted by the same head.
+  bool goes(const WTObject* record, const QList<WTObject*>& gone) const;
+  template <class T>
+  T* namesake(const T& gone, const QList<T*>& candidates) const;
 
   WTObjectContext& context_;
   RZSyncTrack& track_;
-  QSet<WTObject*> kept_;               // the records taken out of a cascade, copies among them
+  const QSet<QString> deletedThere_;
+  QSet<WTObject*> kept_;  // the records taken out of a cascade, copies among them
   // Of the owners that go, by their uuids: an owner deleted in this merge may leave its address to a new
   // record.
   QHash<QString, WTObject*> copies_;
+  QSet<WTObject*> made_;  // the new copies among them
   QStringList serverCopies_;
 };

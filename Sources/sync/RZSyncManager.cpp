@@ -369,7 +369,7 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   const QSet<QString> pending(pendingList.begin(), pendingList.end());
   QSet<QString> deletedThere;
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
-  RZSyncKeptWork kept(*context_, *track_);
+  RZSyncKeptWork kept(*context_, *track_, deletedThere);
   kept.noteServerCopies(changes.value(kInserted).toMap());
   QSet<QString> replaced;
   mergeWithDictionary(changes, kInserted, pending, &replaced);

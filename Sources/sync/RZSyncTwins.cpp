@@ -19,16 +19,15 @@ void journal(RZSyncTrack& track, const WTObject& record, const QString& key) {
   track.updateValues({{key, record.setValues().value(key)}}, record.uuid());
 }
 
-// Whether both bill by terms of their own that differ.
-bool billsApart(const WTObject& a, const WTObject& b) {
+}  // namespace
+
+bool RZSyncTwins::billApart(const WTObject& a, const WTObject& b) {
   for (const char* key : {"rate", "roundingMinutes", "roundingMode", "currency"}) {
     const QVariant mine = a.valueForKey(QLatin1String(key)), theirs = b.valueForKey(QLatin1String(key));
     if (!mine.isNull() && !theirs.isNull() && mine != theirs) return true;
   }
   return false;
 }
-
-}  // namespace
 
 RZSyncTwins::Outcome RZSyncTwins::fold(const QSet<QString>& arrived) {
   Outcome outcome;
@@ -68,7 +67,7 @@ RZSyncTwins::Outcome RZSyncTwins::fold(const QSet<QString>& arrived) {
     for (T* record : records) {
       T* twin = madeHere(record) ? arrivedNamed.value(key(record)) : nullptr;
       if (!twin) continue;
-      if (billsApart(*record, *twin)) {
+      if (billApart(*record, *twin)) {
         outcome.apart.insert(record->uuid());
         continue;
       }

@@ -4,6 +4,7 @@
 #include <QString>
 
 class RZSyncTrack;
+class WTObject;
 class WTObjectContext;
 
 // Records made on two devices before either synced meet as one when the second device merges the first
@@ -26,6 +27,9 @@ class RZSyncTwins {
   };
   // `arrived`: the uuids of the records a head inserted, merged already.
   Outcome fold(const QSet<QString>& arrived);
+
+  // Whether both bill by terms of their own (rate, rounding, currency) that differ.
+  static bool billApart(const WTObject& a, const WTObject& b);
 
  private:
   WTObjectContext& context_;

@@ -231,7 +231,8 @@ TEST_F(RZSyncManagerTest, WorkAddedHereOutlivesItsOwnersDeletionElsewhere) {
   auto* added = make<WTTask>("K@WTTask", "Added");
   added->setProject(task->project());
   make<WTNote>("N@WTNote")->setTask(added);
-  answer(headReply(5, changeSet({}, {}, {"T@WTTask", "P@WTProject"})), saveReply(6));  // as the server orders them
+  answer(headReply(5, changeSet({}, {}, {"T@WTTask", "P@WTProject"})),
+         saveReply(6));  // as the server orders them
   ASSERT_TRUE(client.syncOnce());
 
   ASSERT_TRUE(client.find<WTNote>("E@WTNote"));
@@ -247,11 +248,43 @@ TEST_F(RZSyncManagerTest, WorkAddedHereOutlivesItsOwnersDeletionElsewhere) {
   const QVariantMap inserted = data["i"].toMap();
   EXPECT_EQ(QSet<QString>(inserted.keyBegin(), inserted.keyEnd()),
             QSet<QString>({"E@WTNote", "K@WTTask", "N@WTNote", copy->uuid(), copy->project()->uuid()}));
-  EXPECT_EQ(inserted[copy->project()->uuid()].toMap()["tasks"], QVariantList({"K@WTTask", copy->uuid()}));
+  EXPECT_EQ(inserted[copy->project()->uuid()].toMap()["tasks"], QVariantList({copy->uuid(), "K@WTTask"}));
   EXPECT_TRUE(data["x"].toList().isEmpty());
   EXPECT_EQ(
       client.presenter.mergeNotices.join('\n').toStdString(),
       "3 records added here to “Site” after it was deleted on another device are kept, in a new “Site”.");
+}
+
+// Work kept from a deletion goes to what the other device made again by the same name, unless the two
+// bill differently.
+TEST(RZSyncKeptWork, WorkKeptFromADeletionMeetsWhatWasMadeAgainByItsName) {
+  for (const char* rate : {"null", "99.00"}) {
+    SCOPED_TRACE(rate);
+    Bench t;
+    WTTask* task = t.syncedTask();
+    task->project()->setRate(dec("80.00"));
+    t.synced();
+    t.make<WTNote>("E@WTNote")->setTask(task);
+    t.answer(
+        headReply(5, changeSet(json(QStringLiteral(
+                                        R"({"P2@WTProject":{"name":"site","rate":%1,"tasks":["T2@WTTask"]},)"
+                                        R"("T2@WTTask":{"name":"Design","project":"P2@WTProject"}})")
+                                        .arg(rate)
+                                        .toUtf8()),
+                               {}, {"T@WTTask", "P@WTProject"})),
+        saveReply(6));
+    ASSERT_TRUE(t.client.syncOnce());
+    WTTask* into = t.client.find<WTNote>("E@WTNote")->task();
+    const bool apart = rate[0] == '9';
+    EXPECT_EQ(into->uuid() == "T2@WTTask", !apart);
+    EXPECT_EQ(t.client.context->fetch<WTProject>().size(), apart ? 2 : 1);
+    EXPECT_EQ(
+        t.client.presenter.mergeNotices.join('\n').toStdString(),
+        apart
+            ? "A record added here to “Site” after it was deleted on another device is kept, in a new “Site”."
+            : "A record added here to “site” after it was deleted on another device, and made again there, "
+              "is kept in the new “site”.");
+  }
 }
 
 // The same file imported, or the same names made, on two devices before either synced meet as one.
