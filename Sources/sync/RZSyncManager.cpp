@@ -371,11 +371,17 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   for (const QVariant& uuid : changes.value(kDeleted).toList()) deletedThere.insert(uuid.toString());
   RZSyncKeptWork kept(*context_, *track_, deletedThere);
   kept.noteServerCopies(changes.value(kInserted).toMap());
-  QSet<QString> replaced;
+  QHash<QString, QString> replaced;
   mergeWithDictionary(changes, kInserted, pending, &replaced);
   mergeWithDictionary(changes, kUpdated, pending, &replaced);
   qsizetype count = 0;
-  if (const QString names = recordsNamed(replaced, &count); count > 0) {
+  QStringList replacedNames;
+  for (const auto& [uuid, typed] : replaced.asKeyValueRange()) {
+    // By the name the user knows it by here, when that was what the other device changed.
+    if (const WTObject* record = context_->objectWithUUID(uuid, false))
+      replacedNames << (typed.isEmpty() ? named(*record) : tr("“%1” (now %2)").arg(typed, named(*record)));
+  }
+  if (const QString names = listed(replacedNames, &count); count > 0) {
     presenter_->presentMergeNotice(
         tr("Changes replaced by another device’s"),
         count == 1 ? tr("A change made here to %1 was replaced by one made on another device.").arg(names)
@@ -446,7 +452,7 @@ void RZSyncManager::deleteMerged(WTObject* object, const QSet<QString>& deletedT
 }
 
 void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QString& key,
-                                        const QSet<QString>& pending, QSet<QString>* replaced) {
+                                        const QSet<QString>& pending, QHash<QString, QString>* replaced) {
   const RZSyncTrack::Section section =
       key == kInserted ? RZSyncTrack::Section::Inserted : RZSyncTrack::Section::Updated;
   const QVariantMap entries = changes.value(key).toMap();
@@ -474,8 +480,10 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes, const QStrin
       }
       if (mine.isValid() && isOwnEdit(*object, value.key()) &&
           json(mine) !=
-              json(RZSyncTrack::transformedValue(object->valueForKey(value.key())).value_or(QVariant())))
-        replaced->insert(uuid);
+              json(RZSyncTrack::transformedValue(object->valueForKey(value.key())).value_or(QVariant()))) {
+        QString& typed = (*replaced)[uuid];
+        if (value.key() == QLatin1String("name")) typed = mine.toString();
+      }
     }
     if (!local.isEmpty() || track_->entries(section).contains(uuid)) track_->setEntry(section, uuid, local);
   }

@@ -130,9 +130,10 @@ class RZSyncManager : public QObject, public RZSyncNetworkDelegate {
   void postChanges(qint64 iteration);
   // Saves local edits, merges a "head" reply's result, saves it unjournaled and sends what is pending.
   void mergeHead(const QVariantMap& result, qint64 iteration);
-  // Adds to `replaced` the records whose pending values here the server's replaced.
+  // Adds to `replaced` the records whose pending values here the server's replaced, each with the name
+  // typed here when that was one of them (else an empty text).
   void mergeWithDictionary(const QVariantMap& changes, const QString& key, const QSet<QString>& pending,
-                           QSet<QString>* replaced);
+                           QHash<QString, QString>* replaced);
   // A record as a notice names it; the records of `uuids` and `names` as a notice lists them (at most
   // three, then how many more), with their number.
   static QString named(const WTObject& record);

@@ -142,7 +142,7 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
        R"(T@WTTask {"name":"Server name","notes":"Local notes","project":"P@WTProject"}
 )",
        R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})",
-       "A change made here to “Server name” was replaced by one made on another device."},
+       "A change made here to “Local name” (now “Server name”) was replaced by one made on another device."},
       {"ServerDeletionTakesOwnedRecordsHere",
        [](Bench& t, WTTask* task) {
          auto* note = t.make<WTNote>("N@WTNote");
