@@ -160,10 +160,15 @@ std::string SaveWork::copyOf(const std::string& original) {
     // Filed where the original was, or under its owner's copy when that owner goes too.
     if (!link || field.name != link->key || field.ref.empty() || stateOf(field.ref) != RecordState::Deleted)
       continue;
-    field.ref = link->rule == SyncSchema::DeleteRule::Cascade ? copyOf(field.ref) : std::string();
-    if (link->rule == SyncSchema::DeleteRule::Cascade && field.ref.empty()) return {};
+    if (link->rule == SyncSchema::DeleteRule::Nullify) {
+      field.ref.clear();
+      field.value = "null";
+      continue;
+    }
+    field.ref = copyOf(field.ref);
+    if (field.ref.empty()) return {};
     field.value.clear();
-    field.ref.empty() ? void(field.value = "null") : appendJsonString(field.value, field.ref);
+    appendJsonString(field.value, field.ref);
   }
   const std::string copy = copyIdentity(original, entity);
   c_.query("INSERT INTO records (account_id, uuid, created_iter, created_device) VALUES (?, ?, ?, ?)",
