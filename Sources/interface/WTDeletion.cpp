@@ -46,6 +46,8 @@ WTDeletion::WTDeletion(const QList<WTObject*>& objects) {
     seen.insert(object);
     objects_.append(object);
     if (isRunningTime(object)) ++running_;
+    if (object->entity() == WTEntity::Project)
+      tasks_ += int(static_cast<const WTProject*>(object)->tasks().size());
     for (const WTItem* item : itemsBelow(object)) {
       ++items_;
       if (isRunningTime(item)) ++running_;
@@ -149,7 +151,10 @@ QString WTDeletion::question() const {
     }
   }
   if (items_ == 0) return tr("Delete %1?").arg(what);
-  const QString items = items_ == 1 ? tr("1 item") : tr("%1 items").arg(items_);
+  QString items = items_ == 1 ? tr("1 item") : tr("%1 items").arg(items_);
+  // A project's items are its tasks': both are said, so that the number is not taken for tasks.
+  if (tasks_ > 0)
+    items = (tasks_ == 1 ? tr("1 task with %1") : tr("%1 tasks with %2").arg(tasks_)).arg(items);
   return count == 1 ? tr("Delete %1 and its %2?").arg(what, items)
                     : tr("Delete %1 and their %2?").arg(what, items);
 }

@@ -29,5 +29,6 @@ class WTDeletion {
  private:
   QList<WTObject*> objects_;
   int items_ = 0;
+  int tasks_ = 0;  // of the projects deleted
   int running_ = 0;
 };

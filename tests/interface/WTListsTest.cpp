@@ -136,9 +136,9 @@ TEST_F(WTObjectListModelTest, ADeletionAsksOnlyWhenItemsOrARunningTimerGoAndName
       {{running}, "Delete this time entry? Its timer is running.", "Delete Time Entry"},
       {{note, running}, "Delete 2 items? A timer is running among them.", "Delete 2 Items"},
       {{build}, "Delete this task and its 2 items? A timer is running in it.", "Delete Task"},
-      {{site}, "Delete “Site” and its 16 items? A timer is running in it.", "Delete “Site”"},
+      {{site}, "Delete “Site” and its 3 tasks with 16 items? A timer is running in it.", "Delete “Site”"},
       {{site, idle},
-       "Delete 2 projects and their 16 items? A timer is running among them.",
+       "Delete 2 projects and their 4 tasks with 16 items? A timer is running among them.",
        "Delete 2 Projects"},
       {{idle}, "", "Delete “Idle”"},  // only an empty task
       {{empty, note}, "", "Delete 2 Rows"},
@@ -219,7 +219,7 @@ TEST_F(WTListControllerTest, TheRowMenuAndTheToolbarActOnTheClickedOrLastSelecte
   shown->window.deletes = false;
   projects->selectObject(a);
   projects->removeSelectedObjects();
-  EXPECT_EQ(shown->window.questions, QStringList{"Delete “A” and its 1 item?"});
+  EXPECT_EQ(shown->window.questions, QStringList{"Delete “A” and its 1 task with 1 item?"});
   shown->window.deletes = true;
   click(rowOf(a));
   menu->actions().last()->trigger();
