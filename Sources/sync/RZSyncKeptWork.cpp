@@ -67,11 +67,14 @@ WTTask* RZSyncKeptWork::copyOf(WTTask* task, const QList<WTObject*>& gone) {
   if (project != task->project()) {
     made->setProject(project);
   } else if (project) {
-    // A project that stays has a new order.
-    const QString tasks = QStringLiteral("tasks");
-    track_.updateValues({{tasks, project->setValues().value(tasks)}}, project->uuid());
+    journalOrder(*project);  // a project that stays has a new order
   }
   return made;
+}
+
+void RZSyncKeptWork::journalOrder(const WTProject& project) {
+  const QString tasks = QStringLiteral("tasks");
+  track_.updateValues({{tasks, project.setValues().value(tasks)}}, project.uuid());
 }
 
 void RZSyncKeptWork::keepFrom(QList<WTObject*>& gone) {
@@ -94,6 +97,10 @@ void RZSyncKeptWork::keepFrom(QList<WTObject*>& gone) {
   gone.removeIf([&](WTObject* record) { return keptHere.contains(record); });
   kept_.unite(keptHere);
   for (WTObject* copy : std::as_const(made_)) journalInsertion(track_, *copy);
+  // A project made again there that took tasks has a new order.
+  for (WTObject* into : std::as_const(copies_))
+    if (auto* project = dynamic_cast<WTProject*>(into); project && !made_.contains(project))
+      journalOrder(*project);
 }
 
 QString RZSyncKeptWork::message() const {

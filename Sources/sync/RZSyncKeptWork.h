@@ -42,6 +42,7 @@ class RZSyncKeptWork {
   // in what that project's work goes to when the project goes too.
   WTProject* copyOf(WTProject* project, const QList<WTObject*>& gone);
   WTTask* copyOf(WTTask* task, const QList<WTObject*>& gone);
+  void journalOrder(const WTProject& project);
   // In the cascade at hand, or deleted by the same head.
   bool goes(const WTObject* record, const QList<WTObject*>& gone) const;
   template <class T>

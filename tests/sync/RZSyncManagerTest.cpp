@@ -265,6 +265,7 @@ TEST(RZSyncKeptWork, WorkKeptFromADeletionMeetsWhatWasMadeAgainByItsName) {
     task->project()->setRate(dec("80.00"));
     t.synced();
     t.make<WTNote>("E@WTNote")->setTask(task);
+    t.make<WTTask>("K@WTTask", "Added")->setProject(task->project());
     t.answer(
         headReply(5, changeSet(json(QStringLiteral(
                                         R"({"P2@WTProject":{"name":"site","rate":%1,"tasks":["T2@WTTask"]},)"
@@ -278,12 +279,17 @@ TEST(RZSyncKeptWork, WorkKeptFromADeletionMeetsWhatWasMadeAgainByItsName) {
     const bool apart = rate[0] == '9';
     EXPECT_EQ(into->uuid() == "T2@WTTask", !apart);
     EXPECT_EQ(t.client.context->fetch<WTProject>().size(), apart ? 2 : 1);
+    if (!apart) {  // the project made again takes the task added here into its order
+      ASSERT_EQ(t.sent("save").size(), 1);
+      EXPECT_EQ(compact(t.sent("save")[0]["data"].toMap()["u"].toMap()["P2@WTProject"]),
+                R"({"tasks":["T2@WTTask","K@WTTask"]})");
+    }
     EXPECT_EQ(
         t.client.presenter.mergeNotices.join('\n').toStdString(),
-        apart
-            ? "A record added here to “Site” after it was deleted on another device is kept, in a new “Site”."
-            : "A record added here to “site” after it was deleted on another device, and made again there, "
-              "is kept in the new “site”.");
+        apart ? "2 records added here to “Site” after it was deleted on another device are kept, in a new "
+                "“Site”."
+              : "2 records added here to “site” after it was deleted on another device, and made again "
+                "there, are kept in the new “site”.");
   }
 }
 
