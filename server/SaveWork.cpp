@@ -73,16 +73,14 @@ void SaveWork::settle() {
     const std::string owner = std::move(deleteQueue_.back());
     deleteQueue_.pop_back();
     for (const SqlRow& row :
-         c_.query("SELECT uuid, name, iter, device FROM fields WHERE account_id = ? AND ref = ?",
-                  {account_, owner})) {
+         c_.query("SELECT uuid, name FROM fields WHERE account_id = ? AND ref = ?", {account_, owner})) {
       const std::optional<std::string_view> entity = SyncSchema::entityOf(row.text(0));
       const std::optional<SyncSchema::OwnerLink> link =
           entity ? SyncSchema::ownerLink(*entity) : std::nullopt;
       if (!link || row.text(1) != link->key) continue;
       // Deletes win over what the sender knew, not over work it never saw filed there.
-      const bool unseen =
-          row.integer(2) > base_ && row.integer(2) < senderIteration_ && row.text(3) != device_;
-      if (link->rule == SyncSchema::DeleteRule::Cascade && unseen && keepUnderCopy(row.text(0), *link, owner))
+      if (link->rule == SyncSchema::DeleteRule::Cascade && filedUnseen(row.text(0), *link) &&
+          keepUnderCopy(row.text(0), *link, owner))
         continue;
       followOwnerDeletion(row.text(0), *link);
     }
@@ -135,6 +133,17 @@ void SaveWork::tombstone(const std::string& uuid, int64_t iteration, const std::
     c_.query("DELETE FROM fields WHERE account_id = ? AND uuid = ?", {account_, uuid});
   }
   deleteQueue_.push_back(uuid);
+}
+
+bool SaveWork::filedUnseen(const std::string& uuid, const SyncSchema::OwnerLink& link) {
+  if (base_ + 1 >= senderIteration_) return false;  // the sender had seen everything
+  // By the record's key: asking the reference index for columns it does not hold makes SQLite scan every
+  // field of the account instead, once for each deletion.
+  const std::vector<SqlRow> rows =
+      c_.query("SELECT iter, device FROM fields WHERE account_id = ? AND uuid = ? AND name = ?",
+               {account_, uuid, std::string(link.key)});
+  return !rows.empty() && rows[0].integer(0) > base_ && rows[0].integer(0) < senderIteration_ &&
+         rows[0].text(1) != device_;
 }
 
 bool SaveWork::keepUnderCopy(const std::string& uuid, const SyncSchema::OwnerLink& link,

@@ -55,6 +55,8 @@ class SaveWork {
   void tombstone(const std::string& uuid, int64_t iteration, const std::string& device);
   void followOwnerDeletion(const std::string& uuid, const SyncSchema::OwnerLink& link);
   void normaliseTaskOrder(const std::string& project);
+  // Whether another device filed `uuid` under its owner after the sender's base.
+  bool filedUnseen(const std::string& uuid, const SyncSchema::OwnerLink& link);
   // Files `uuid` under a copy of `owner`, which this save deletes; false when no copy can be made.
   bool keepUnderCopy(const std::string& uuid, const SyncSchema::OwnerLink& link, const std::string& owner);
   // A new record with the values `original` had before this save deleted it, filed under a copy of its own
