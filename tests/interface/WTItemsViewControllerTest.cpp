@@ -101,7 +101,8 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   // Dropped on another task, or among the tasks, records stay selected where they land.
   for (WTObject* dropped : {static_cast<WTObject*>(time), static_cast<WTObject*>(build)}) {
     const bool task = dropped == build;
-    ASSERT_TRUE(model()->dropMimeData(model()->mimeData({rowOf(dropped)}), Qt::MoveAction, task ? 0 : -1, 0,
+    const std::unique_ptr<QMimeData> drag(model()->mimeData({rowOf(dropped)}));
+    ASSERT_TRUE(model()->dropMimeData(drag.get(), Qt::MoveAction, task ? 0 : -1, 0,
                                       task ? QModelIndex() : rowOf(build)));
     EXPECT_TRUE(QTest::qWaitFor([&] { return outline()->currentIndex() == rowOf(dropped); })) << task;
     EXPECT_EQ(outline()->selectionModel()->selectedRows(), QModelIndexList{rowOf(dropped)}) << task;
