@@ -32,11 +32,10 @@ for target in "${targets[@]}"; do
   fi
 done
 
-ccache=()
-command -v ccache >/dev/null && ccache=(-DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
+source scripts/compiler-cache.sh
 # -O1 keeps the fuzzers fast enough to matter; a Debug build keeps Qt's and our assertions on.
 cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE=Debug -DCMAKE_CXX_FLAGS_DEBUG="-O1 -g1" \
-  -DCMAKE_C_COMPILER=clang-14 -DCMAKE_CXX_COMPILER=clang++-14 "${ccache[@]}" \
+  -DCMAKE_C_COMPILER=clang-14 -DCMAKE_CXX_COMPILER=clang++-14 "${compiler_cache[@]}" \
   -DTESSAL_BUILD_FUZZERS=ON -DTESSAL_BUILD_TESTS=OFF -DTESSAL_BUILD_BENCHMARKS=OFF >/dev/null
 names=()
 for target in "${selected[@]}"; do names+=("${target%% *}"); done

@@ -5,12 +5,14 @@ set -euo pipefail
 cd "$(dirname "$0")/.."
 bash scripts/install-deps.sh
 build=${TESSAL_BUILD_DIR:-build-tests}
+source scripts/compiler-cache.sh
 # shellcheck disable=SC2086
 # Line tables (-g1) are all a failing test's stack trace needs; full debug information would double the
 # time every file takes to compile on a small machine.
 cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE="${TESSAL_BUILD_TYPE:-RelWithDebInfo}" \
   -DCMAKE_CXX_FLAGS_RELWITHDEBINFO="-O2 -g1 -DNDEBUG" -DCMAKE_CXX_FLAGS_DEBUG="-O0 -g1" \
-  -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=ON -DTESSAL_WERROR=ON ${TESSAL_CMAKE_ARGS:-}
+  -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=ON -DTESSAL_WERROR=ON "${compiler_cache[@]}" \
+  ${TESSAL_CMAKE_ARGS:-}
 cmake --build "$build"
 # No test may reach the developer's session bus or display. The sync server's tests run against SQLite
 # and against a throw-away PostgreSQL cluster that lives only as long as ctest. Runs labelled long (many
