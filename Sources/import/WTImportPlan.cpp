@@ -255,6 +255,17 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
   const QList<WTClient*> clients = context.fetch<WTClient>();
   const QList<WTProject*> loneProjects =
       context.fetch<WTProject>([](const WTProject* project) { return !project->client(); });
+  // A project of a client the store has is looked for among its projects; without a client, among the
+  // projects that have none.
+  const auto existingProject = [&](WTClient* client, const QString& clientName, const QString& projectName) {
+    if (client) return named(client->projects(), projectName);
+    return clientName.isEmpty() ? named(loneProjects, projectName) : nullptr;
+  };
+  struct {
+    QSet<const WTClient*> clients;
+    QSet<const WTProject*> projects;
+    QSet<const WTTask*> tasks;
+  } found;  // of the store's records, those the file names
   std::map<QString, ClientNode> nodes;
   std::vector<ClientNode*> order;
   std::vector<std::pair<const WTImportRow*, TaskNode*>> entries;
@@ -277,6 +288,13 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
     const QString sameEntry = sameEntryKey(row->client, projectName, taskName, row->start, *row->end);
     if (present.contains(row->importId) || tracked.contains(sameEntry)) {
       ++plan.alreadyThere;
+      // A file imported again still names what it found: the records its entries are filed under.
+      WTClient* client = row->client.isEmpty() ? nullptr : named(clients, row->client);
+      WTProject* project = existingProject(client, row->client, projectName);
+      WTTask* task = project ? named(project->tasks(), taskName) : nullptr;
+      if (client) found.clients.insert(client);
+      if (project) found.projects.insert(project);
+      if (task) found.tasks.insert(task);
       continue;
     }
     present.insert(row->importId);
@@ -294,10 +312,7 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
     ProjectNode& project = projectIt->second;
     if (newProject) {
       project.name = projectName;
-      if (client.existing)
-        project.existing = named(client.existing->projects(), projectName);
-      else if (row->client.isEmpty())
-        project.existing = named(loneProjects, projectName);
+      project.existing = existingProject(client.existing, row->client, projectName);
     }
     auto [taskIt, newTask] = project.tasks.try_emplace(taskName.toCaseFolded());
     TaskNode& task = taskIt->second;
@@ -323,12 +338,26 @@ WTImportPlan run(WTObjectContext& context, const WTImportFile& file, const Optio
 
   for (ClientNode* client : order) {
     plan.totals.push_back(client->total);
-    if (!client->name.isEmpty()) ++(client->existing ? plan.clients.reused : plan.clients.created);
+    if (client->existing)
+      found.clients.insert(client->existing);
+    else if (!client->name.isEmpty())
+      ++plan.clients.created;
     for (auto& [projectKey, project] : client->projects) {
-      ++(project.existing ? plan.projects.reused : plan.projects.created);
-      for (auto& [taskKey, task] : project.tasks) ++(task.existing ? plan.tasks.reused : plan.tasks.created);
+      if (project.existing)
+        found.projects.insert(project.existing);
+      else
+        ++plan.projects.created;
+      for (auto& [taskKey, task] : project.tasks) {
+        if (task.existing)
+          found.tasks.insert(task.existing);
+        else
+          ++plan.tasks.created;
+      }
     }
   }
+  plan.clients.reused = int(found.clients.size());
+  plan.projects.reused = int(found.projects.size());
+  plan.tasks.reused = int(found.tasks.size());
   plan.entries = int(entries.size());
   if (!make) return plan;
 

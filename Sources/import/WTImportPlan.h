@@ -16,7 +16,7 @@ class WTObjectContext;
 struct WTImportPlan {
   struct Counts {
     int created = 0;
-    int reused = 0;
+    int reused = 0;  // found in the store, for new entries or for those already there
   };
   Counts clients, projects, tasks;
   int entries = 0;

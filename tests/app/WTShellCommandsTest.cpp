@@ -149,7 +149,7 @@ TEST_F(TrackCommand, ADesktopCopyCarriesOutTheChangesItsWindowShows) {
                                  "acme,atlas,Sketch,2026-03-06,09:00,1:00:00\n");
   here.expect({"import", file}, 0, "Found: 1 client, 1 project, 0 tasks\nAlready there: 0 entries\n",
               auckland);
-  here.expect({"import", file}, 0, "Already there: 1 entry\n", auckland);
+  here.expect({"import", file}, 0, "Found: 1 client, 1 project, 1 task\nAlready there: 1 entry\n", auckland);
   here.expect({"log", "--range", "2026-03-06..2026-03-06"}, 0,
               "2026-03-06  09:00–10:00  Atlas › Default Task", auckland);
   EXPECT_EQ(times(), 6);
