@@ -295,6 +295,8 @@ void WTItemCellDelegate::paintNotes(QPainter& painter, const QRectF& row, const 
 
 void WTItemCellDelegate::paintHoverBar(QPainter& painter, const QRectF& row, const WTTableCellView& cell,
                                        const QModelIndex& index) const {
+  // A field open in the row covers the buttons, and the bar's edge would show round it as a white box.
+  if (lineEditorRow_.isValid() && lineEditorRow_ == index) return;
   const QRectF bar = cell.partRect(WTTableCellView::Part::HoverBar, row);
   if (bar.isEmpty()) return;
   painter.save();
@@ -310,7 +312,6 @@ void WTItemCellDelegate::paintHoverBar(QPainter& painter, const QRectF& row, con
       {Part::AddTime, "item_time"},       {Part::AddFlat, "item_flat"}, {Part::AddNote, "item_note"},
       {Part::AddExpense, "item_expense"}, {Part::AddToDo, "item_todo"}, {Part::DateButton, "calendar"},
       {Part::NotesButton, "notes"}};
-  Q_UNUSED(index);
   for (const auto& [part, image] : kButtons) {
     const QRectF button = cell.partRect(part, row);
     if (button.isEmpty()) continue;

@@ -81,5 +81,6 @@ class WTItemCellDelegate : public QStyledItemDelegate {
   mutable Field openField_ = Field::Name;
   mutable QPersistentModelIndex notesIndex_;
   mutable QPointer<WTNotesTextView> notesEditor_;
+  mutable QPersistentModelIndex lineEditorRow_;  // the row a one-line field is open in
   bool pressKept_ = false;
 };

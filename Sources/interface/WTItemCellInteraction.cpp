@@ -73,6 +73,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
     return editor;
   }
   auto* editor = new QLineEdit(parent);
+  lineEditorRow_ = index;
   editor->setFrame(false);
   editor->setProperty("field", static_cast<int>(field));
   editor->setProperty("row", QVariant::fromValue(QPersistentModelIndex(index)));
@@ -106,6 +107,7 @@ QWidget* WTItemCellDelegate::createEditor(QWidget* parent, const QStyleOptionVie
 void WTItemCellDelegate::destroyEditor(QWidget* editor, const QModelIndex& index) const {
   const bool notes = editor == notesEditor_;
   QStyledItemDelegate::destroyEditor(editor, index);
+  if (!notes && lineEditorRow_ == index) lineEditorRow_ = QPersistentModelIndex();
   if (notes) {
     notesEditor_ = nullptr;
     const QPersistentModelIndex row = std::exchange(notesIndex_, QPersistentModelIndex());

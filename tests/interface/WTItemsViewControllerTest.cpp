@@ -318,9 +318,17 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   outline()->endEditing();
   EXPECT_EQ(span(time) + ' ' + time->name(), "11:00-12:45 Drawings");
   EXPECT_EQ(outline()->currentIndex(), rowOf(time));
+  // The row as drawn with the pointer over it or not: an open field hides the hover buttons, whose bar's
+  // edge would show round it.
+  const auto rowWithPointer = [&](bool over) {
+    outline()->setHoverIndex(over ? rowOf(time) : QModelIndex());
+    return outline()->viewport()->grab(outline()->visualRect(rowOf(time))).toImage();
+  };
+  EXPECT_NE(rowWithPointer(true), rowWithPointer(false)) << "no field open: the buttons show";
   controller->cellDelegate()->setEditField(Field::Name);
   outline()->edit(rowOf(time));
   ASSERT_NE(shown->openEditor(), nullptr);
+  EXPECT_EQ(rowWithPointer(true), rowWithPointer(false)) << "the name's field is open";
   QTest::keyClick(shown->openEditor(), Qt::Key_Backtab, Qt::ShiftModifier);
   ASSERT_NE(shown->openEditor(), nullptr);
   EXPECT_EQ(shown->openEditor()->objectName(), "durationEditor");
