@@ -133,11 +133,12 @@ void WTApplication::linkBudgetNotices(WTBudgetWatcher& watcher, WTDesktopNotifie
             if (level == WTBudget::Level::Warning)
               notifier.notify(summary(object, level), WTBudget::standing(object));
           });
-  // The figures of a warning standing on the status line follow the ticks.
+  // The figures of a warning standing on the status line follow the ticks; without one, nothing is
+  // worked out (a running timer moves its budget every tick).
   connect(&watcher, &WTBudgetWatcher::budgetMoved, &window,
           [&window, summary](WTObject* object, WTBudget::Level level) {
             const QString said = summary(object, level);
-            window.renewNotice(said, tr("%1 — %2").arg(said, WTBudget::standing(object)));
+            window.renewNotice(said, [&] { return tr("%1 — %2").arg(said, WTBudget::standing(object)); });
           });
   connect(&notifier, &WTDesktopNotifier::notShown, &window,
           [&window](const QString& summary, const QString& body) {

@@ -568,9 +568,10 @@ void WTMainWindowController::withdrawNotice(const QString& summary) {
   if (line->currentMessage().startsWith(summary)) line->clearMessage();
 }
 
-void WTMainWindowController::renewNotice(const QString& summary, const QString& text) {
+void WTMainWindowController::renewNotice(const QString& summary, const std::function<QString()>& text) {
   const QString standing = statusBar()->currentMessage();
-  if (standing.startsWith(summary) && standing != text) showNotice(text);
+  if (!standing.startsWith(summary)) return;
+  if (const QString renewed = text(); renewed != standing) showNotice(renewed);
 }
 
 bool WTMainWindowController::event(QEvent* event) {

@@ -8,6 +8,8 @@
 #include <QPointer>
 #include <QTimer>
 
+#include <functional>
+
 class QAction;
 class QActionGroup;
 class QToolBar;
@@ -104,8 +106,9 @@ class WTMainWindowController : public QMainWindow, public WTNavigationHost {
   void showNotice(const QString& text);
   // Takes the notice off the status line if it is the one that begins with `summary`.
   void withdrawNotice(const QString& summary);
-  // Shows `text` instead of the notice that begins with `summary`, if that one stands.
-  void renewNotice(const QString& summary, const QString& text);
+  // Shows what `text` gives instead of the notice that begins with `summary`, if that one stands (only
+  // then is `text` asked).
+  void renewNotice(const QString& summary, const std::function<QString()>& text);
   static constexpr int kNoticeMilliseconds = 10 * 60 * 1000;
 
   WTProjectsViewController* projectsViewController() const { return projectsViewController_; }

@@ -10,6 +10,8 @@
 
 #include <QRegularExpression>
 
+#include <algorithm>
+
 namespace {
 
 // A new record with every stored value of `record` but its identity.
@@ -23,6 +25,26 @@ T* copyWithValues(const T& record, WTObjectContext& context) {
 
 void journalInsertion(RZSyncTrack& track, const WTObject& record) {
   track.updateValues(record.setValues(), record.uuid(), RZSyncTrack::Section::Inserted);
+}
+
+// What a notice names of `records`: all but the tasks of a project among them.
+QList<const WTObject*> outermost(const QList<const WTObject*>& records) {
+  QList<const WTObject*> outer;
+  for (const WTObject* record : records) {
+    const auto* task = dynamic_cast<const WTTask*>(record);
+    if (!task || !records.contains(task->project())) outer.append(record);
+  }
+  return outer;
+}
+
+// Their names, quoted, in order, each once.
+QStringList quotedNames(const QList<const WTObject*>& records) {
+  QStringList names;
+  for (const WTObject* record : records)
+    names.append(QStringLiteral("“%1”").arg(record->valueForKey(QStringLiteral("name")).toString()));
+  names.removeDuplicates();
+  names.sort();
+  return names;
 }
 
 }  // namespace
@@ -108,17 +130,11 @@ QString RZSyncKeptWork::message() const {
   qsizetype added = 0;
   for (WTObject* record : kept_) added += !made_.contains(record);
   if (added == 0) return {};
-  const QList<WTObject*> went = copies_.values();
-  QStringList names;
-  bool allNew = true;
-  for (WTObject* into : went) {
-    auto* task = dynamic_cast<WTTask*>(into);
-    if (task && went.contains(task->project())) continue;
-    names.append(QStringLiteral("“%1”").arg(into->valueForKey(QStringLiteral("name")).toString()));
-    allNew &= made_.contains(into);
-  }
-  names.sort();
-  const QString where = names.join(QStringLiteral(", "));
+  const QList<const WTObject*> went = outermost({copies_.cbegin(), copies_.cend()});
+  const bool allNew = std::all_of(went.begin(), went.end(), [&](const WTObject* into) {
+    return made_.contains(const_cast<WTObject*>(into));
+  });
+  const QString where = quotedNames(went).join(QStringLiteral(", "));
   if (!allNew) {
     return added == 1 ? tr("A record added here to %1 after it was deleted on another device, and made again "
                            "there, is kept in the new %1.")
@@ -145,15 +161,10 @@ void RZSyncKeptWork::noteServerCopies(const QVariantMap& inserted) {
 }
 
 QString RZSyncKeptWork::serverCopiesMessage() const {
-  QStringList names;
-  for (const QString& uuid : serverCopies_) {
-    const WTObject* copy = context_.objectWithUUID(uuid, false);
-    const auto* task = dynamic_cast<const WTTask*>(copy);
-    if (!copy || (task && task->project() && serverCopies_.contains(task->project()->uuid()))) continue;
-    names.append(QStringLiteral("“%1”").arg(copy->valueForKey(QStringLiteral("name")).toString()));
-  }
-  names.removeDuplicates();
-  names.sort();
+  QList<const WTObject*> copies;
+  for (const QString& uuid : serverCopies_)
+    if (const WTObject* copy = context_.objectWithUUID(uuid, false)) copies.append(copy);
+  const QStringList names = quotedNames(outermost(copies));
   if (names.isEmpty()) return {};
   return names.size() == 1
              ? tr("%1 was deleted on one device while another added work to it; the work is kept, in a new "
