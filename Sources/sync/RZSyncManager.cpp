@@ -377,9 +377,13 @@ void RZSyncManager::mergeWithDictionary(const QVariantMap& changes) {
   qsizetype count = 0;
   QStringList replacedNames;
   for (const auto& [uuid, typed] : replaced.asKeyValueRange()) {
-    // By the name the user knows it by here, when that was what the other device changed.
-    if (const WTObject* record = context_->objectWithUUID(uuid, false))
-      replacedNames << (typed.isEmpty() ? named(*record) : tr("“%1” (now %2)").arg(typed, named(*record)));
+    // By the name the user knows it by here, when that was what the other device changed, and the name
+    // it has now (an item's own, not its task's).
+    if (const WTObject* record = context_->objectWithUUID(uuid, false)) {
+      const QString now = record->valueForKey(QStringLiteral("name")).toString();
+      const QString current = now.isEmpty() ? named(*record) : QStringLiteral("“%1”").arg(now);
+      replacedNames << (typed.isEmpty() ? named(*record) : tr("“%1” (now %2)").arg(typed, current));
+    }
   }
   if (const QString names = listed(replacedNames, &count); count > 0) {
     presenter_->presentMergeNotice(

@@ -134,15 +134,21 @@ TEST(RZSyncManagerMerge, ServerAndPendingChanges) {
        [](Bench& t, WTTask* task) {
          task->setBudget(dec("500.00"));
          task->setRate(dec("90.00"));
+         auto* note = t.make<WTNote>("N@WTNote");
+         note->setTask(task);
+         note->setStartDate(Date::fromSeconds(1700000000));
          t.synced();
          task->setName("Local name");
          task->setNotes("Local notes");  // not saved yet: the poll saves it first
+         note->setName("PO 4711");
        },
-       R"({"u":{"T@WTTask":{"name":"Server name","budget":null,"rate":null}}})",
+       R"({"u":{"T@WTTask":{"name":"Server name","budget":null,"rate":null},"N@WTNote":{"name":"PO 4712"}}})",
        R"(T@WTTask {"name":"Server name","notes":"Local notes","project":"P@WTProject"}
+N@WTNote {"name":"PO 4712","startDate":1700000000,"task":"T@WTTask"}
 )",
        R"({"i":{},"u":{"T@WTTask":{"notes":"Local notes"}},"x":[]})",
-       "A change made here to “Local name” (now “Server name”) was replaced by one made on another device."},
+       "Changes made here to “Local name” (now “Server name”), “PO 4711” (now “PO 4712”) were replaced by "
+       "ones made on another device."},
       {"ServerDeletionTakesOwnedRecordsHere",
        [](Bench& t, WTTask* task) {
          auto* note = t.make<WTNote>("N@WTNote");
