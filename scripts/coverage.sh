@@ -6,11 +6,10 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 build=${COVERAGE_BUILD_DIR:-build-coverage}
-launcher=()
-command -v ccache >/dev/null && launcher=(-DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
+source scripts/compiler-cache.sh
 cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE=Debug -DCMAKE_CXX_FLAGS_DEBUG="-O0 --coverage -DTESSAL_COVERAGE" \
   -DCMAKE_EXE_LINKER_FLAGS=--coverage -DCMAKE_SHARED_LINKER_FLAGS=--coverage \
-  -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=OFF "${launcher[@]}" >/dev/null
+  -DTESSAL_BUILD_TESTS=ON -DTESSAL_BUILD_BENCHMARKS=OFF "${compiler_cache[@]}" >/dev/null
 if [ $# -eq 0 ]; then
   cmake --build "$build"
   name=all
