@@ -1,4 +1,5 @@
 #include "WTCSVReader.h"
+#include "WTImportFields.h"
 #include "WTImportFile.h"
 #include "WTImportReaders.h"
 
@@ -18,6 +19,7 @@ QString detail::when(const Date& date, const QTimeZone& zone) {
 namespace {
 
 using detail::when;
+using namespace WTImportFields;
 
 // The columns a CSV format names; an empty name is a column the format lacks. A name ending in '('
 // matches a header that starts with it and carries the currency in the parentheses.
@@ -167,132 +169,6 @@ qsizetype requiredPresent(const Header& header, const CSVFormat& format) {
                        [&](const char* name) { return header.column(name) >= 0; });
 }
 
-// Reads the numbers and marks of a date, a time or a duration from left to right. Every row has three
-// or four of them, so a scanner instead of a regular expression per field is most of the reading's speed.
-class Scanner {
- public:
-  explicit Scanner(QStringView text) : text_(text.trimmed()) {}
-  // A number of minDigits to maxDigits digits, or none (and nothing read).
-  std::optional<int> number(qsizetype minDigits, qsizetype maxDigits) {
-    qsizetype end = at_;
-    int value = 0;
-    while (end < text_.size() && end - at_ < maxDigits && text_[end].isDigit() && text_[end].unicode() < 128)
-      value = value * 10 + (text_[end++].unicode() - '0');
-    if (end - at_ < minDigits || (end < text_.size() && text_[end].isDigit())) return std::nullopt;
-    at_ = end;
-    return value;
-  }
-  // The next character when it is one of `marks`, or a null QChar (and nothing read).
-  QChar mark(QStringView marks) {
-    if (at_ >= text_.size() || !marks.contains(text_[at_])) return QChar();
-    return text_[at_++];
-  }
-  void skipSpaces() {
-    while (at_ < text_.size() && text_[at_].isSpace()) ++at_;
-  }
-  bool atEnd() const { return at_ == text_.size(); }
-
- private:
-  QStringView text_;
-  qsizetype at_ = 0;
-};
-
-// How a file writes dates with slashes: month first, as the hosted trackers' American default does, or
-// day first, as the rest of the world does.
-enum class SlashedDates { MonthFirst, DayFirst };
-
-// "2024-03-10", "10.03.2024" or "10-03-2024" (day first), "03/10/2024" (as `slashed` says; unless
-// `strictly`, a date that reads only the other way round is read that way: 25/04/2024 is day first).
-std::optional<QDate> parseDate(const QString& text, SlashedDates slashed = SlashedDates::MonthFirst,
-                               bool strictly = false) {
-  Scanner scan(text);
-  QDate date;
-  if (const auto year = scan.number(4, 4)) {
-    const auto month = scan.mark(u"-").isNull() ? std::nullopt : scan.number(1, 2);
-    const auto day = !month || scan.mark(u"-").isNull() ? std::nullopt : scan.number(1, 2);
-    if (day && scan.atEnd()) date = QDate(*year, *month, *day);
-  } else if (const auto first = scan.number(1, 2)) {
-    const QChar mark = scan.mark(u".-/");
-    const auto second = mark.isNull() ? std::nullopt : scan.number(1, 2);
-    const bool isSlashed = mark == u'/';
-    const bool marked = second && !scan.mark(isSlashed ? u"/" : u".-").isNull();
-    const auto year = marked ? scan.number(4, 4) : std::nullopt;
-    if (year && scan.atEnd()) {
-      const QDate dayFirst(*year, *second, *first), monthFirst(*year, *first, *second);
-      const bool preferDay = !isSlashed || slashed == SlashedDates::DayFirst;
-      date = preferDay ? dayFirst : monthFirst;
-      if (isSlashed && !date.isValid() && !strictly) date = preferDay ? monthFirst : dayFirst;
-    }
-  }
-  if (!date.isValid()) return std::nullopt;
-  return date;
-}
-
-// "13:30", "13:30:15", "1:30 PM", "01:30:00 pm", "1:30 p.m.".
-std::optional<QTime> parseTime(const QString& text) {
-  Scanner scan(text);
-  std::optional<int> hour = scan.number(1, 2);
-  if (!hour || scan.mark(u":").isNull()) return std::nullopt;
-  const std::optional<int> minute = scan.number(2, 2);
-  std::optional<int> second = 0;
-  if (!scan.mark(u":").isNull()) second = scan.number(2, 2);
-  if (!minute || !second) return std::nullopt;
-  scan.skipSpaces();
-  if (const QChar half = scan.mark(u"AaPp"); !half.isNull()) {
-    scan.mark(u".");
-    if (scan.mark(u"Mm").isNull()) return std::nullopt;
-    scan.mark(u".");
-    if (*hour < 1 || *hour > 12) return std::nullopt;
-    hour = *hour % 12 + (half.toLower() == u'p' ? 12 : 0);
-  }
-  const QTime time(*hour, *minute, *second);
-  if (!scan.atEnd() || !time.isValid()) return std::nullopt;
-  return time;
-}
-
-// "1:20:00" or "1:20" as seconds.
-std::optional<qint64> parseDuration(const QString& text) {
-  Scanner scan(text);
-  const std::optional<int> hours = scan.number(1, 9);
-  if (!hours || scan.mark(u":").isNull()) return std::nullopt;
-  const std::optional<int> minutes = scan.number(2, 2);
-  std::optional<int> seconds = 0;
-  if (!scan.mark(u":").isNull()) seconds = scan.number(2, 2);
-  if (!minutes || !seconds || !scan.atEnd()) return std::nullopt;
-  return qint64(*hours) * 3600 + *minutes * 60 + *seconds;
-}
-
-// A number as a spreadsheet or a locale writes it: "1,234.50", "1.234,50", "50,00", with a currency
-// sign or code around it.
-std::optional<Decimal> parseNumber(const QString& text) {
-  QString digits;
-  for (QChar c : text)
-    if (c.isDigit() || c == u'.' || c == u',' || c == u'-') digits.append(c);
-  if (digits.isEmpty()) return std::nullopt;
-  const qsizetype comma = digits.lastIndexOf(u','), point = digits.lastIndexOf(u'.');
-  if (comma > point) {
-    digits.remove(u'.');
-    digits.replace(u',', u'.');
-  } else {
-    digits.remove(u',');
-  }
-  return Decimal::fromString(digits);
-}
-
-std::optional<bool> parseFlag(const QString& text) {
-  const QString word = text.trimmed().toCaseFolded();
-  if (word.isEmpty() || word == u"yes" || word == u"true" || word == u"1" || word == u"billable") return true;
-  if (word == u"no" || word == u"false" || word == u"0" || word == u"non-billable") return false;
-  return std::nullopt;
-}
-
-QStringList splitTags(const QString& text) {
-  QStringList tags;
-  for (const QString& tag : text.split(u',', Qt::SkipEmptyParts))
-    if (!tag.trimmed().isEmpty()) tags.append(tag.trimmed());
-  return tags;
-}
-
 // Formats without ids of their own: the entry's own fields, so that the same entry read again is known.
 QString hashedId(const QString& format, const WTImportRow& row) {
   QByteArray key;
@@ -309,8 +185,7 @@ class ZoneDays {
   explicit ZoneDays(const QTimeZone& zone) : zone_(zone) {}
 
   Date at(const QDate& day, const QTime& time) {
-    auto offset = offsets_.constFind(day.toJulianDay());
-    if (offset == offsets_.constEnd()) offset = offsets_.insert(day.toJulianDay(), steadyOffset(day));
+    auto offset = offsetOn(day);
     if (!*offset) return Date::fromQDateTime(QDateTime(day, time, zone_));
     // The seconds a QDateTime in UTC would count, without making one for every row.
     static const qint64 kDayOf1970 = QDate(1970, 1, 1).toJulianDay();
@@ -318,7 +193,20 @@ class ZoneDays {
     return Date::fromSeconds(double(utc - **offset) + time.msec() / 1000.0);
   }
 
+  // Whether the clocks show `time` on `day`: not in the hour skipped when they go forward.
+  bool shows(const QDate& day, const QTime& time) {
+    if (*offsetOn(day)) return true;
+    const QDateTime shown(day, time, zone_);
+    return shown.isValid() && shown.time() == time;
+  }
+
  private:
+  QHash<qint64, std::optional<int>>::const_iterator offsetOn(const QDate& day) {
+    auto offset = offsets_.constFind(day.toJulianDay());
+    if (offset == offsets_.constEnd()) offset = offsets_.insert(day.toJulianDay(), steadyOffset(day));
+    return offset;
+  }
+
   // The offset when no change falls within a day of either side of the date (offsets stay within a
   // day), else none.
   std::optional<int> steadyOffset(const QDate& day) const {
@@ -373,7 +261,12 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   const QString startDay = value(format.startDate);
   const std::optional<QDate> day = parseDate(startDay, slashed);
   if (!day) {
-    problem = QStringLiteral("the date “%1” cannot be read").arg(startDay);
+    problem = slashed == SlashedDates::OnlyOneWay && parseDate(startDay)
+                  ? QStringLiteral(
+                        "the date “%1” could be day or month first, as the file writes dates both "
+                        "ways")
+                        .arg(startDay)
+                  : QStringLiteral("the date “%1” cannot be read").arg(startDay);
     return std::nullopt;
   }
   const std::optional<QTime> startTime = parseTime(value(format.startTime));
@@ -381,6 +274,18 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     problem = QStringLiteral("the start time “%1” cannot be read").arg(value(format.startTime));
     return std::nullopt;
   }
+  // A time the clocks skip was written in another zone than the one it is read in: moved to the next
+  // hour, the entry would bill an hour less or more than the file says.
+  const auto skipped = [&](const QDate& on, const QTime& time) {
+    if (days.shows(on, time)) return false;
+    problem =
+        QStringLiteral(
+            "there is no %1 on %2 in %3: the clocks go forward then (--tz names the file's "
+            "zone)")
+            .arg(time.toString(u"HH:mm"), on.toString(Qt::ISODate), QString::fromUtf8(options.zone.id()));
+    return true;
+  };
+  if (skipped(*day, *startTime)) return std::nullopt;
   row.start = days.at(*day, *startTime);
   const QString durationText = value(format.duration);
   const std::optional<qint64> duration = parseDuration(durationText);
@@ -393,6 +298,7 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
       problem = QStringLiteral("the end “%1 %2” cannot be read").arg(endDayText, endText).trimmed();
       return std::nullopt;
     }
+    if (skipped(*endDay, *endTime)) return std::nullopt;
     row.end = days.at(*endDay, *endTime);
     if (&format == &kTessal) {
       // Tessal's own file writes one date: the end is on the day that brings it nearest to what the duration
@@ -420,7 +326,13 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     return std::nullopt;
   }
 
-  if (format.amount[0] && row.billable) row.amount = parseNumber(value(format.amount));
+  if (format.amount[0] && row.billable && !value(format.amount).isEmpty()) {
+    row.amount = parseNumber(value(format.amount));
+    if (!row.amount) {
+      problem = numberProblem("amount", value(format.amount));
+      return std::nullopt;
+    }
+  }
   // Tessal's own file says by which rule each entry was billed (a later column: older files lack it).
   if (const QString rule = &format == &kTessal ? value("rounding") : QString(); !rule.isEmpty()) {
     row.rounding = WTRoundingRule::fromText(rule);
@@ -432,17 +344,13 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
   if (format.rate[0] && !value(format.rate).isEmpty()) {
     row.rate = parseNumber(value(format.rate));
     if (!row.rate) {
-      problem = QStringLiteral("the rate “%1” cannot be read").arg(value(format.rate));
+      problem = numberProblem("rate", value(format.rate));
       return std::nullopt;
     }
   } else if (!format.rate[0] && format.amount[0] && !value(format.amount).isEmpty() && row.end &&
              row.billable) {
     // A file without rates: the amount over the hours is the rate the tracker billed, to the cent.
     const double seconds = row.end->secondsSince1970() - row.start.secondsSince1970();
-    if (!row.amount) {
-      problem = QStringLiteral("the amount “%1” cannot be read").arg(value(format.amount));
-      return std::nullopt;
-    }
     if (seconds >= 60)
       row.rate = Decimal::divide(*row.amount * Decimal(3600), *Decimal::fromDouble(seconds))
                      .value_or(Decimal())
@@ -501,7 +409,9 @@ Result<WTImportFile> readCSV(QIODevice& device, const Options& options) {
     }
     records.emplace_back(reader.line(), std::move(fields));
   }
-  const SlashedDates slashed = dayFirst && !monthFirst ? SlashedDates::DayFirst : SlashedDates::MonthFirst;
+  const SlashedDates slashed = dayFirst && monthFirst ? SlashedDates::OnlyOneWay
+                               : dayFirst             ? SlashedDates::DayFirst
+                                                      : SlashedDates::MonthFirst;
   ZoneDays days(options.zone);
   for (const auto& [line, record] : records) {
     QString problem;

@@ -1,3 +1,4 @@
+#include "WTImportFields.h"
 #include "WTImportFile.h"
 
 #include <gtest/gtest.h>
@@ -75,6 +76,16 @@ INSTANTIATE_TEST_SUITE_P(
                 "3 Globex/Mobile App/Code|Review|2024-03-12T03:45:00Z|30|1080.00 USD|not billable|x;y|",
                 "4 Globex/Mobile App/Code|Lunch|2024-03-13T16:00:00Z|60|- USD|billable||"},
                {"5: the date “31/02/2024” cannot be read"}},
+        // Dates written both ways, amounts that could be a thousand times more or less, an hour the
+        // clocks skip: those rows are not read as something else.
+        Sample{"toggl-mixed.csv", "", "Europe/Berlin", {}, "toggl",
+               {"2 Tyrell/Armor/|Month first|2026-09-25T08:00:00Z|60|1080.00 USD|billable||",
+                "3 Tyrell/Armor/|Day first|2026-09-26T08:00:00Z|60|80.00 USD|billable||",
+                "8 Tyrell/Armor/|Euro style|2026-09-23T07:00:00Z|60|1234.50 USD|billable||"},
+               {"4: the date “03/09/2026” could be day or month first, as the file writes dates both ways",
+                "5: the amount “1,000” could be 1 or 1000", "6: the amount “1e3” cannot be read",
+                "7: there is no 02:30 on 2026-03-29 in Europe/Berlin: the clocks go forward then (--tz names "
+                "the file's zone)"}},
         Sample{"clockify-day-first.csv", "", "UTC", {}, "clockify",  // one date can only be day first
                {"2 Globex/App/|Ambiguous|2024-04-03T09:00:00Z|60|- USD|billable||",
                 "3 Globex/App/|Only day first|2024-04-25T09:00:00Z|30|- USD|billable||"},
@@ -100,6 +111,29 @@ INSTANTIATE_TEST_SUITE_P(
                 "6 /Solo/|End typed over|2024-04-02T08:00:00Z|360|- |billable||"},
                {"4: left out, a flat fee"}}));
 // clang-format on
+
+// Numbers as spreadsheets and locales write them, and what is no such number or could be two.
+TEST(WTImportFields, NumbersAreReadOnlyAsWrittenAndNeverAThousandTimesOff) {
+  const std::pair<const char*, const char*> cases[] = {
+      // clang-format off
+      {"50.00", "50.00"}, {"50,5", "50.5"}, {"1,234.50", "1234.50"}, {"1.234,50", "1234.50"},
+      {"1 234,50", "1234.50"}, {"1.234.567,89", "1234567.89"}, {"1,000,000", "1000000"},
+      {"€ 12", "12"}, {"12 EUR", "12"}, {"-1,5", "-1.5"}, {"0,500", "0.500"}, {"1,2345", "1.2345"},
+      {"1,500", "ambiguous"}, {"1.500", "ambiguous"}, {"$1,000", "ambiguous"},
+      {"1e3", "none"}, {"1,23,456", "none"}, {"1.234.56", "none"}, {"1,234.567,8", "none"}, {"12-", "none"},
+      {"EUR", "none"}, {"1..2", "none"},
+      // clang-format on
+  };
+  for (const auto& [text, read] : cases) {
+    bool ambiguous = false;
+    const std::optional<Decimal> number = WTImportFields::parseNumber(QString::fromUtf8(text), &ambiguous);
+    EXPECT_EQ(number      ? number->toString()
+              : ambiguous ? "ambiguous"
+                          : "none",
+              QString::fromUtf8(read))
+        << text;
+  }
+}
 
 struct Refusal {
   const char* name;
