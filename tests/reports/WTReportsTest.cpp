@@ -361,11 +361,11 @@ TEST_F(ReportTest, BuiltInTemplateLinesAddUpToItsTotalsAndItsHeadNamesBothSides)
   }
   for (const char* text :
        {"<b>Ann &lt;Smith&gt;</b>", ">Main St 1\n12345 Town</p>", "<b>Acme</b>\n1 Acme Way\nSpringfield</p>",
-        ">Due in 30 days</p>", ">92.31</td>", ">Budget: 83 % of the budget of 500.00 · 84.59 left</td>"})
+        ">Due in 30 days</p>", ">92.31</td>", ">Budget to date: 83 % of the budget of 500.00 · 84.59 left</td>"})
     EXPECT_TRUE(html.contains(QString::fromUtf8(text))) << text;
   // Task 1 is outside the period: its budget's line shows in the report over every date.
   html = WTReportGenerator({billed}, 0).render().html;
-  EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget: 139 % of the budget of 100.00 · 38.47 over</td>")))
+  EXPECT_TRUE(html.contains(QString::fromUtf8(">Budget to date: 139 % of the budget of 100.00 · 38.47 over</td>")))
       << html.toStdString();
   EXPECT_EQ(html.count("class=\"budget\""), 2);  // tasks 2 and 3 have none
   WTReportGenerator empty({billed}, 0);
