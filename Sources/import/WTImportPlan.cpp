@@ -162,18 +162,27 @@ void placeAtHighestLevel(ClientNode& client, Shared shared, Place place, AtTask 
   }
 }
 
+// A rate as the preview's money reads: in the user's locale, with its currency where there is one (a
+// file's rates may be in another currency than the client bills in).
+QString rateText(const Decimal& rate, const QString& currency) {
+  return MoneyFormat::formatRate(rate, currency) + (currency.isEmpty() ? QString() : u' ' + currency);
+}
+
 // The rates the file gives, each set at the highest level across which it holds.
 void placeRates(ClientNode& client, WTImportPlan& plan) {
   placeAtHighestLevel<Decimal>(
       client, sharedRate, placeRate, [&](TaskNode& task, const std::optional<Decimal>& shared, bool varies) {
         const Decimal rate = shared ? *shared : commonestRate(task.rows);
         const QString label = taskLabel(*task.rows.front());
+        const QString fileRate = rateText(rate, task.rows.front()->currency);
         if (varies)
-          plan.notes.append(QStringLiteral("the entries of %1 have several rates; the task bills %2")
-                                .arg(label, rate.toString()));
+          plan.notes.append(
+              QStringLiteral("the entries of %1 have several rates; the task bills %2").arg(label, fileRate));
         if (!placeRate(task.task(), task.made, rate))
           plan.notes.append(QStringLiteral("%1 keeps its rate %2; the file gives %3")
-                                .arg(label, task.task()->inheritedRate().toString(), rate.toString()));
+                                .arg(label,
+                                     rateText(task.task()->inheritedRate(), task.task()->billingCurrency()),
+                                     fileRate));
       });
 }
 

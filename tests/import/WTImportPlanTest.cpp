@@ -159,6 +159,9 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
 TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
   auto* five = makeClient(QStringLiteral("Five"));
   five->setRate(Decimal(50));
+  auto* seven = makeClient(QStringLiteral("Seven"));
+  seven->setCurrency(QStringLiteral("EUR"));
+  makeTask(makeProject(QStringLiteral("I"), seven), QStringLiteral("x"))->setRate(Decimal(120));
   QByteArray content =
       "client,project,task,kind,name,date,start,end,duration,billed duration,rate,amount,currency,notes\n"
       "One,A,x,time,e1,2024-01-01,09:00,10:00,,,80,,EUR,\n"
@@ -171,13 +174,17 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
       "Three,E,y,time,e8,2024-01-01,11:00,12:00,,,,,,\n"
       "Four,G,x,time,e9,2024-01-01,09:00,10:00,,,100,,,\n"
       "Five,F,x,time,e10,2024-01-01,09:00,10:00,,,60,,,\n"
-      "Six,H,x,time,e11,2024-01-01,09:00,10:00,,,1234.5,1500,JPY,\n";
+      "Six,H,x,time,e11,2024-01-01,09:00,10:00,,,1234.5,1500,JPY,\n"
+      "Seven,I,x,time,e12,2024-01-01,09:00,10:00,,,200,,USD,\n";
   QBuffer buffer(&content);
   buffer.open(QIODevice::ReadOnly);
   const WTImportFile file = read(buffer);
-  // The preview gives the file's amount (rounded up, as Six bills) as the store shows money.
-  EXPECT_TRUE(WTImport::preview(file, WTImport::apply(*context, file, {}), QTimeZone::utc())
-                  .contains("  Six  01:00  1,500 JPY\n"));
+  // The preview gives the file's amount (rounded up, as Six bills) as the store shows money, and the
+  // rates a task keeps with their currencies.
+  const QString preview = WTImport::preview(file, WTImport::apply(*context, file, {}), QTimeZone::utc());
+  EXPECT_TRUE(preview.contains("  Six  01:00  1,500 JPY\n")) << preview.toStdString();
+  EXPECT_TRUE(preview.contains("Note: I › x keeps its rate 120.00 EUR; the file gives 200.00 USD\n"))
+      << preview.toStdString();
   QStringList rates;
   const auto rate = [](const WTObject* object) {
     return object->storedRate() ? object->storedRate()->toString() : QStringLiteral("-");
@@ -194,10 +201,10 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
     rates.append(line);
   }
   EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four 100 | G - x -", "One 80 | A - x - | B - y -",
-                                "Six 1234.5 | H - x -", "Three - | E - x 70 y 60",
+                                "Seven - | I - x 120", "Six 1234.5 | H - x -", "Three - | E - x 70 y 60",
                                 "Two - | C 80 x - | D 90 x - y -"}));
   EXPECT_EQ(clients[0]->storedRate(), Decimal(50));
-  const QStringList currencies = {clients[2]->currency(), clients[5]->currency()};
+  const QStringList currencies = {clients[2]->currency(), clients[6]->currency()};
   EXPECT_EQ(currencies, QStringList({"EUR", QString()}));
 }
 
