@@ -98,6 +98,9 @@ MovedEnd movedEnd(const WTTime& time, bool start, const QString& text) {
     return {{}, WTItemsModel::tr("There is no %1 on that day: the clocks go forward then.").arg(asTyped)};
   if (start && !time.running() && time.endDate() && moved > *time.endDate())
     return {{}, WTItemsModel::tr("The start would come after the end (%1).").arg(clock(*time.endDate()))};
+  // A running entry ends now: a later start would run its clock backwards, into negative time and money.
+  if (start && time.running() && moved > Date::now())
+    return {{}, WTItemsModel::tr("The start would come after now (%1).").arg(clock(Date::now()))};
   if (!start && time.startDate() && moved < *time.startDate())
     return {{}, WTItemsModel::tr("The end would come before the start (%1).").arg(clock(*time.startDate()))};
   const std::optional<Date> end = start ? (time.running() ? std::nullopt : time.endDate()) : moved;

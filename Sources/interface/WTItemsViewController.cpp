@@ -20,6 +20,7 @@
 #include "WTTime.h"
 #include "WTToDo.h"
 
+#include <QCalendarWidget>
 #include <QHBoxLayout>
 #include <QItemSelectionModel>
 #include <QLabel>
@@ -389,7 +390,17 @@ void WTItemsViewController::openDatePicker(WTItem* item, const QRect& anchor) {
   if (!item || (popover_ && popover_->isVisible()) || currentItem_) return;
   currentItem_ = item;
   const QDateTime date = (item->date() ? *item->date() : Date::now()).toQDateTime();
-  popover()->setDate(date.date());
+  // A time entry is offered no day on which it would not be time already spent.
+  QDate latest = QDate(9999, 12, 31);
+  if (const auto* time = dynamic_cast<const WTTime*>(item)) {
+    latest = Date::now().toQDateTime().date();
+    for (int before = 0; before < 366 && !time->isSpentOnDayOf(Date::fromQDateTime(latest.startOfDay()));
+         ++before)
+      latest = latest.addDays(-1);
+  }
+  popover()->datePicker()->setMaximumDate(latest);
+  popover_->setDate(date.date());
+  shownDate_ = popover_->date();
   popover_->showRelativeToRect(anchor);
 }
 
@@ -399,7 +410,7 @@ void WTItemsViewController::popoverWillClose() {
   const QDateTime old = (item->date() ? *item->date() : Date::now()).toQDateTime();
   const QDate picked = popover_->date();
   // Only a new day moves the item: closing without a choice leaves it (and its seconds) alone.
-  if (picked.isValid() && picked != old.date()) {
+  if (picked.isValid() && picked != old.date() && picked != shownDate_) {
     item->setDate(Date::fromQDateTime(QDateTime(picked, old.time())));
     context_->undoManager().setActionName(tr("Move"));
     refreshChildren(item);

@@ -4,6 +4,7 @@
 #include "WTTableCellView.h"
 #include "WTViewController.h"
 
+#include <QDate>
 #include <QHash>
 #include <QPointer>
 #include <QSet>
@@ -140,6 +141,7 @@ class WTItemsViewController : public WTViewController {
   WTItemCellDelegate* delegate_ = nullptr;
   QPointer<WTDatePopover> popover_;
   WTItem* currentItem_ = nullptr;
+  QDate shownDate_;  // the day the date picker opened on
   QHash<QString, WTTableCellView*> cellViewPrototypes_;
   bool autosaveExpandedItems_ = false;
   QSet<QString> goneOpen_;  // the identities of open rows that went, to open again if they come back

@@ -98,17 +98,27 @@ void WTTime::setDate(const std::optional<Date>& date) {
     WTItem::setDate(date);
     return;
   }
-  // The new day, the old hour and minute; seconds are dropped on purpose.
-  RZDate::DateComponents components;
-  RZDate::assignFlags(*date, RZDate::DayUnits, components);
-  RZDate::assignFlags(*startDate(), RZDate::Hour | RZDate::Minute, components);
-  components.second = 0;
   const std::optional<Date> end = endDate();
   const double length = end ? end->timeIntervalSince(*startDate()) : 0;
-  const Date start = RZDate::dateFromComponents(components);
+  const Date start = startOnDayOf(*date);
   setStartDate(start);
   // A running entry has no end to move.
   if (end) setEndDate(start.addingSeconds(length));
+}
+
+Date WTTime::startOnDayOf(const Date& date) const {
+  // Seconds are dropped on purpose.
+  RZDate::DateComponents components;
+  RZDate::assignFlags(date, RZDate::DayUnits, components);
+  RZDate::assignFlags(startDate().value_or(date), RZDate::Hour | RZDate::Minute, components);
+  components.second = 0;
+  return RZDate::dateFromComponents(components);
+}
+
+bool WTTime::isSpentOnDayOf(const Date& date) const {
+  if (!startDate()) return true;
+  const double length = running() || !endDate() ? 0 : endDate()->timeIntervalSince(*startDate());
+  return startOnDayOf(date).addingSeconds(length) <= Date::now();
 }
 
 QString WTTime::title() const {

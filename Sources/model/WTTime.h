@@ -26,6 +26,10 @@ class WTTime final : public WTItem {
   void setDurationKeepingEnd(int minutes);
   // Moves the entry to the day of `date`, keeping hour and minute (seconds dropped) and its length.
   void setDate(const std::optional<Date>& date) override;
+  // Whether on the day of `date` the entry would be time already spent: over by now, or a running one
+  // begun. On a later day it would bill time not spent yet, or a running one count down from a start
+  // still to come.
+  bool isSpentOnDayOf(const Date& date) const;
   // The start time as "HH:mm".
   QString title() const override;
 
@@ -39,6 +43,9 @@ class WTTime final : public WTItem {
   void storedValueDidChange(const QString& key) override;
 
  private:
+  // The start moved to the day of `date`: its hour and minute, no seconds.
+  Date startOnDayOf(const Date& date) const;
+
   std::optional<Date> endDate_;
   std::optional<int> lastDuration_;
   bool running_ = false;

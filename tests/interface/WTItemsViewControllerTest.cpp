@@ -2,6 +2,8 @@
 #include "WTDatePopover.h"
 #include "WTNotesTextView.h"
 
+#include <QCalendarWidget>
+
 namespace {
 
 using Part = WTTableCellView::Part;
@@ -82,6 +84,7 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   WTDatePopover* popover = controller->popover();
   ASSERT_TRUE(controller->currentItem() == time && popover->isVisible());
   EXPECT_EQ(popover->date(), QDate(2024, 3, 14));
+  EXPECT_EQ(popover->datePicker()->maximumDate(), QDate(2024, 3, 14)) << "no day it is not over on";
   controller->openDatePicker(todo, QRect(0, 0, 20, 20));
   EXPECT_EQ(controller->currentItem(), time);
   popover->setDate(QDate(2024, 3, 9));
@@ -92,6 +95,14 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   controller->openDatePicker(todo, QRect(0, 0, 20, 20));
   popover->hide();
   EXPECT_EQ(todo->startDate(), before);
+  // Nor a running entry a day on which it would not have begun (negative time and money).
+  auto* late = makeItem<WTTime>(build, "late", at(2024, 3, 13, 10, 30));
+  late->setRunning(true);
+  controller->openDatePicker(late, QRect(0, 0, 20, 20));
+  EXPECT_EQ(popover->datePicker()->maximumDate(), QDate(2024, 3, 13));
+  popover->datePicker()->setSelectedDate(QDate(2024, 3, 14));
+  popover->hide();
+  EXPECT_EQ(late->startDate(), at(2024, 3, 13, 10, 30));
   // A day's row, never selected, shows when the keyboard is on it (as after Down from its task).
   const QModelIndex day = model()->indexOfContainerOfItem(time);
   outline()->setFocus();
@@ -342,6 +353,15 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   EXPECT_EQ(night->endDate(), at(2024, 3, 13, 1, 15));
   type(night, Part::End, "23:45");
   EXPECT_EQ(night->endDate(), at(2024, 3, 12, 23, 45));
+  // A running entry's start stays before now: a later one would run its clock backwards.
+  controller->toggleTimerOfTask(build);
+  WTTime* running = build->runningTimes().value(0);
+  ASSERT_NE(running, nullptr);
+  endTurn();
+  for (const auto& [typed, after] : {std::pair{"18:30", "18:00-none"}, {"17:45", "17:45-none"}}) {
+    type(running, Part::Label, typed);
+    EXPECT_EQ(span(running), after) << typed;
+  }
 }
 
 // A task's add buttons answer only while shown; an entry's row has none.
