@@ -340,6 +340,15 @@ bool WTItemCellDelegate::keepsRefusedEdit(const QEvent* event) {
 
 bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
   if (object == view_ || object == viewport_) return keepsRefusedEdit(event);
+  // Escape leaves the notes, keeping what was typed: lines of notes are not undone by a key that, in a
+  // field of several lines, is the one way out from the keyboard.
+  if (object == notesEditor_ && event->type() == QEvent::KeyPress &&
+      static_cast<QKeyEvent*>(event)->key() == Qt::Key_Escape) {
+    auto* notes = static_cast<QWidget*>(object);
+    emit commitData(notes);
+    emit closeEditor(notes, QAbstractItemDelegate::NoHint);
+    return true;
+  }
   auto* line = qobject_cast<QLineEdit*>(object);
   if (line && (event->type() == QEvent::KeyPress || event->type() == QEvent::FocusOut)) {
     // A duration, amount or time of day that is not one stays in its field, as typed, with the reason:

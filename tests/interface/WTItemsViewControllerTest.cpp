@@ -137,6 +137,15 @@ TEST_F(WTItemsViewControllerTest, NotesAreStoredWhenTheirEditorIsLeft) {
   controller->cellDelegate()->notesEditor()->setPlainText("kept");
   outline()->setFocus();
   EXPECT_EQ(flat->notes(), "kept");
+  // Escape leaves the field too, keeping the lines typed: a field of several lines has no Return for it.
+  controller->showNotes(flat);
+  editor = controller->cellDelegate()->notesEditor();
+  ASSERT_NE(editor, nullptr);
+  editor->setPlainText("kept\nand more");
+  QTest::keyClick(editor, Qt::Key_Escape);
+  EXPECT_EQ(flat->notes(), "kept\nand more");
+  EXPECT_EQ(shown->openEditor(), nullptr);
+  EXPECT_EQ(controller->cellDelegate()->notesEditor(), nullptr);
 }
 
 // Open rows are remembered per project and found again after a relaunch.
