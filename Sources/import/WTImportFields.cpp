@@ -1,5 +1,9 @@
 #include "WTImportFields.h"
 
+#include <QRegularExpression>
+
+#include <algorithm>
+
 namespace {
 
 // Reads the numbers and marks of a date, a time or a duration from left to right. Every row has three
@@ -110,8 +114,13 @@ std::optional<Decimal> parseNumber(const QString& text, bool* ambiguous) {
   while (!number.isEmpty() && isMarking(number.back())) number.chop(1);
   const bool negative = number.startsWith(u'-');
   if (negative) number.remove(0, 1);
-  // Spaces (also no-break and narrow ones) group digits in many locales.
-  number.removeIf([](QChar c) { return c.isSpace(); });
+  // Spaces (also no-break and narrow ones) group digits in many locales, in threes as any grouping.
+  if (std::any_of(number.begin(), number.end(), [](QChar c) { return c.isSpace(); })) {
+    static const QRegularExpression kSpaced(QStringLiteral("^\\d{1,3}(\\s\\d{3})+([.,]\\d+)?$"),
+                                            QRegularExpression::UseUnicodePropertiesOption);
+    if (!kSpaced.match(number).hasMatch()) return std::nullopt;
+    number.removeIf([](QChar c) { return c.isSpace(); });
+  }
   if (number.isEmpty() || !number.front().isDigit() || !number.back().isDigit()) return std::nullopt;
   for (QChar c : number)
     if (!c.isDigit() && c != u'.' && c != u',') return std::nullopt;

@@ -121,7 +121,7 @@ TEST(WTImportFields, NumbersAreReadOnlyAsWrittenAndNeverAThousandTimesOff) {
       {"€ 12", "12"}, {"12 EUR", "12"}, {"-1,5", "-1.5"}, {"0,500", "0.500"}, {"1,2345", "1.2345"},
       {"1,500", "ambiguous"}, {"1.500", "ambiguous"}, {"$1,000", "ambiguous"},
       {"1e3", "none"}, {"1,23,456", "none"}, {"1.234.56", "none"}, {"1,234.567,8", "none"}, {"12-", "none"},
-      {"EUR", "none"}, {"1..2", "none"},
+      {"EUR", "none"}, {"1..2", "none"}, {"12 34", "none"}, {"1\u00a0234\u00a0567,5", "1234567.5"},
       // clang-format on
   };
   for (const auto& [text, read] : cases) {
