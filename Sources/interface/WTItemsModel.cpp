@@ -506,10 +506,13 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
   const WTUndoManager::NamedStep step(context_->undoManager(), stepName);
   switch (role) {
     case Qt::EditRole:
-    case NameRole:
-      if (object->name() == value.toString()) return false;
-      object->setName(value.toString());
+    case NameRole: {
+      // Spaces typed around a name are not part of it: the commands could not find it by what shows.
+      const QString name = value.toString().trimmed();
+      if (object->name() == name) return false;
+      object->setName(name);
       return true;
+    }
     case NotesRole:
       if (object->notes() == value.toString()) return false;
       object->setNotes(value.toString());

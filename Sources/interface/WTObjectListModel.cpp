@@ -230,10 +230,13 @@ bool WTObjectListModel::setData(const QModelIndex& index, const QVariant& value,
                                       role == ClientRole ? tr("Change Client") : tr("Typing"));
   switch (role) {
     case Qt::EditRole:
-    case NameRole:
-      if (value.toString() == object->name()) return false;
-      object->setName(value.toString());
+    case NameRole: {
+      // Spaces typed around a name are not part of it: the commands could not find it by what shows.
+      const QString name = value.toString().trimmed();
+      if (name == object->name()) return false;
+      object->setName(name);
       return true;
+    }
     case ClientRole: {
       if (object->entity() != WTEntity::Project) return false;
       WTObject* client = objectFromVariant(value);

@@ -328,7 +328,7 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   outline()->edit(rowOf(time));
   for (const auto& [name, text] :
        {std::pair{"startEditor", "11:00"}, std::pair{"endEditor", "12:15"},
-        std::pair{"durationEditor", "1:45"}, std::pair{"nameEditor", "Drawings"}}) {
+        std::pair{"durationEditor", "1:45"}, std::pair{"nameEditor", "Drawings "}}) {
     QLineEdit* editor = shown->openEditor();
     ASSERT_NE(editor, nullptr) << name;
     EXPECT_EQ(editor->objectName(), name);
