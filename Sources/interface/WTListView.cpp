@@ -7,6 +7,9 @@
 #include <QKeyEvent>
 #include <QMouseEvent>
 
+#include <algorithm>
+#include <utility>
+
 WTListView::WTListView(QWidget* parent) : QListView(parent) {
   setSelectionMode(QAbstractItemView::ExtendedSelection);
   setSelectionBehavior(QAbstractItemView::SelectRows);
@@ -30,6 +33,28 @@ void WTListView::editRow(int row, bool scroll) {
   selectionModel()->select(index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
   if (scroll) scrollTo(index);
   edit(index);
+}
+
+void WTListView::setModel(QAbstractItemModel* model) {
+  if (this->model()) disconnect(this->model(), &QAbstractItemModel::rowsRemoved, this, nullptr);
+  QListView::setModel(model);
+  if (!model) return;
+  // The selected rows deleted or archived away, the row that takes their place is selected: the keyboard
+  // is where the list shows it, and Delete or Archive never acts on a row no one sees chosen.
+  connect(model, &QAbstractItemModel::rowsRemoved, this, [this] {
+    if (!std::exchange(selectedRowsGo_, false) || selectionModel()->hasSelection()) return;
+    const QModelIndex current = currentIndex();
+    if (current.isValid())
+      selectionModel()->select(current, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+  });
+}
+
+void WTListView::rowsAboutToBeRemoved(const QModelIndex& parent, int start, int end) {
+  const QModelIndexList selected = selectionModel() ? selectionModel()->selectedRows() : QModelIndexList();
+  selectedRowsGo_ = !selected.isEmpty() &&
+                    std::all_of(selected.begin(), selected.end(),
+                                [&](const auto& row) { return row.row() >= start && row.row() <= end; });
+  QListView::rowsAboutToBeRemoved(parent, start, end);
 }
 
 void WTListView::keyPressEvent(QKeyEvent* event) {

@@ -33,6 +33,8 @@ class WTListView : public QListView {
   // Starts editing the name of `row` (scrolling to it when `scroll`).
   void editRow(int row, bool scroll);
 
+  void setModel(QAbstractItemModel* model) override;
+
  signals:
   // A context menu was asked for at `row` (-1 for no row) at global position `global`.
   void contextMenuRequestedForRow(int row, const QPoint& global);
@@ -40,12 +42,14 @@ class WTListView : public QListView {
   void openRequested(const QModelIndex& index);
 
  protected:
+  void rowsAboutToBeRemoved(const QModelIndex& parent, int start, int end) override;
   void keyPressEvent(QKeyEvent* event) override;
   void mousePressEvent(QMouseEvent* event) override;
   void contextMenuEvent(QContextMenuEvent* event) override;
 
  private:
   int clickedRow_ = -1;
+  bool selectedRowsGo_ = false;  // the rows being removed hold the whole selection
 
  protected:
   void paintEvent(QPaintEvent* event) override;
