@@ -150,7 +150,6 @@ std::optional<Decimal> parseNumber(const QString& text, bool* ambiguous) {
     if (groups.first().isEmpty() || groups.first().size() > 3) return std::nullopt;
     for (qsizetype i = 1; i < groups.size(); ++i)
       if (groups[i].size() != 3) return std::nullopt;
-    if (number.indexOf(grouping, decimalAt) >= 0) return std::nullopt;
   }
   QString plain = whole.toString();
   if (!grouping.isNull()) plain.remove(grouping);
