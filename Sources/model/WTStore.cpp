@@ -208,9 +208,8 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
   sqlite3_extended_result_codes(db, 1);
   sqlite3_busy_timeout(db, kBusyTimeoutMs);
   if (logHasFrames || keepsLog) sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
-  // Opening reads the whole file twice (the check, then the rows) and a merge visits pages all over it:
-  // mapped, the pages are read in place instead of copied through a system call each.
-  sqlite3_exec(db, "PRAGMA mmap_size = 268435456", nullptr, nullptr, nullptr);
+  // The whole-file check reads every page; a command that reads a few records reads them unmapped.
+  if (check != Check::Header) store->readInPlace();
 
   // Reads only: what the file is and which version wrote it.
   qint64 applicationId = 0, version = 0, objects = 0;
@@ -317,6 +316,13 @@ Result<std::unique_ptr<WTStore>> WTStore::open(const QString& path, const char* 
     if (!store->prepareStatements(true)) return damagedError(path);
   }
   return store;
+}
+
+void WTStore::readInPlace() {
+  // Opening reads the whole file twice (the check, then the rows) and a merge visits pages all over it:
+  // mapped, the pages are read in place instead of copied through a system call each. A command that
+  // reads a few pages reads them faster through system calls: each mapped page costs a page fault.
+  sqlite3_exec(db_, "PRAGMA mmap_size = 268435456", nullptr, nullptr, nullptr);
 }
 
 void WTStore::keepLogWhileShort() {

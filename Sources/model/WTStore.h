@@ -158,6 +158,8 @@ class WTStore {
                                                Check check, const JournalImport& import,
                                                LogOnClose logOnClose);
   void keepLogWhileShort();
+  // Maps the file for a read of many pages.
+  void readInPlace();
   // The journal's statements, prepared on first use: a command that never saves never needs them.
   enum JournalStatement {
     SetEntry,

@@ -55,6 +55,7 @@ Result<void> WTStore::loadAll(const std::function<void(WTStoreRecord&&)>& sink, 
                               const QStringList& keys) {
   if (!shaped_) return {};  // a file opened for reading before anything was ever written to it
   if (which == Records::RunningAndNamed) return loadRunningAndNamed(sink, keys);
+  if (which == Records::All || which == Records::ItemsOfTasks) readInPlace();
   int code = SQLITE_OK;
   sqlite3_stmt* s = loadStatement(int(which), &code);
   if (code != SQLITE_OK) return readError(code);
