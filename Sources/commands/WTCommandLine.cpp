@@ -1,12 +1,12 @@
 #include "WTCommandLine.h"
 
+#include "TessalLogging.h"
 #include "WTBackupCommand.h"
 #include "WTReportCommand.h"
 #include "WTTimerCommands.h"
 #include "WTTrackCommand.h"
 
 #include <QCoreApplication>
-#include <QLoggingCategory>
 #include <QTextStream>
 
 #include <cstdint>
@@ -161,8 +161,7 @@ std::optional<int> WTCommandLine::run(int argc, char** argv) {
   if (readsHere) growHeapInHugePages();
   if (command == QLatin1String("report")) return runReportCommand(arguments, out, err);
   if (command == QLatin1String("export")) return runExportCommand(arguments, out, err);
-  // Their output is for people and scripts: the journal's and the store's diary stays out of it.
-  QLoggingCategory::setFilterRules(QStringLiteral("*.debug=false\n*.info=false"));
+  TessalLogging::keepNoDiary();
   if (command == QLatin1String("backup")) return runBackupCommand(arguments, out, err);
   if (command == QLatin1String("restore")) return runRestoreCommand(arguments, out, err);
   if (command == QLatin1String("log")) return runLogCommand(arguments, out, err);

@@ -12,3 +12,11 @@ Q_DECLARE_LOGGING_CATEGORY(lcReport)      // "tessal.report": template errors of
 Q_DECLARE_LOGGING_CATEGORY(lcTracking)    // "tessal.tracking": sleep and wake
 Q_DECLARE_LOGGING_CATEGORY(lcApp)         // "tessal.app": the desktop shell and its single-instance socket
 Q_DECLARE_LOGGING_CATEGORY(lcFoundation)  // "tessal.foundation": calendar and text helpers refusing work
+
+namespace TessalLogging {
+// The commands keep no diary: what they print is for people and scripts, unless the environment asks for
+// log lines. Debug lines on a command's ordinary way ask keepsDiary() before their category, because the
+// first use of a category reads Qt's logging configuration files: half a millisecond of every command.
+void keepNoDiary();
+bool keepsDiary();
+}  // namespace TessalLogging

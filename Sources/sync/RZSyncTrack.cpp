@@ -408,7 +408,7 @@ void RZSyncTrack::updateValues(const QVariantMap& values, const QString& uuid) {
 
 void RZSyncTrack::insertValues(const QVariantMap& values, const QString& uuid) {
   // Only when the log is shown: an import reports thousands of records here.
-  if (lcSync().isDebugEnabled()) {
+  if (TessalLogging::keepsDiary() && lcSync().isDebugEnabled()) {
     QVariantMap logged;
     for (auto it = values.begin(); it != values.end(); ++it)
       if (std::optional<QVariant> transformed = transformedValue(it.value()))
@@ -433,7 +433,7 @@ Result<void> RZSyncTrack::insertNew(const WTObject& record, WTStore::JournalWrit
     if (std::optional<QVariant> transformed = transformedValue(value)) entry.add(key, *transformed);
   });
   const QByteArray text = entry.take();
-  if (lcSync().isDebugEnabled())
+  if (TessalLogging::keepsDiary() && lcSync().isDebugEnabled())
     qCDebug(lcSync).noquote() << QStringLiteral("INSERT(%1) %2").arg(record.uuid(), QString::fromUtf8(text));
   wroteNew_ = true;
   return writer.setEntry(record.uuid(), kInsertedRow, text);
@@ -441,7 +441,7 @@ Result<void> RZSyncTrack::insertNew(const WTObject& record, WTStore::JournalWrit
 
 void RZSyncTrack::deleteObjectWithId(const QString& uuid) {
   if (uuid.isEmpty()) return;
-  qCDebug(lcSync).noquote() << QStringLiteral("DELETE(%1)").arg(uuid);
+  if (TessalLogging::keepsDiary()) qCDebug(lcSync).noquote() << QStringLiteral("DELETE(%1)").arg(uuid);
   touch(uuid);
   addDeletion(uuid);
 }
