@@ -3,6 +3,7 @@
 #include <QAction>
 #include <QDialogButtonBox>
 #include <QHeaderView>
+#include <QKeySequence>
 #include <QLabel>
 #include <QMenu>
 #include <QMenuBar>
@@ -33,6 +34,22 @@ void collect(const QMenu* menu, const QString& path, QList<Shortcut>& into) {
       into.append({path, plainText(action->text()), keys.toString(QKeySequence::NativeText)});
     }
   }
+}
+
+// Keys that act on the current row of a list or of the outline: no menu item carries them.
+QList<Shortcut> rowKeys() {
+  const auto keys = [](std::initializer_list<QKeySequence> sequences) {
+    QStringList texts;
+    for (const QKeySequence& sequence : sequences) texts << sequence.toString(QKeySequence::NativeText);
+    return texts.join(QStringLiteral(", "));
+  };
+  const QString rows = QObject::tr("Rows"), outline = QObject::tr("Outline");
+  return {{rows, QObject::tr("Rename"), keys({Qt::Key_Return})},
+          {rows, QObject::tr("Next Field"), keys({Qt::Key_Tab, Qt::SHIFT | Qt::Key_Tab})},
+          {rows, QObject::tr("The Row’s Menu"), keys({Qt::SHIFT | Qt::Key_F10, Qt::Key_Menu})},
+          {QObject::tr("Lists"), QObject::tr("Open"), keys({Qt::Key_Right})},
+          {outline, QObject::tr("Open, Close"), keys({Qt::Key_Right, Qt::Key_Left})},
+          {outline, QObject::tr("Complete or Reopen To-Do"), keys({Qt::Key_Space})}};
 }
 
 }  // namespace
@@ -72,8 +89,8 @@ QDialog* makeShortcutsDialog(const QMenuBar* menuBar, QWidget* parent) {
   dialog->setObjectName(QStringLiteral("shortcutsDialog"));
   dialog->setWindowTitle(QObject::tr("Keyboard Shortcuts"));
   auto* model = new QStandardItemModel(0, 3, dialog);
-  model->setHorizontalHeaderLabels({QObject::tr("Menu"), QObject::tr("Command"), QObject::tr("Keys")});
-  for (const Shortcut& shortcut : shortcutsOf(menuBar)) {
+  model->setHorizontalHeaderLabels({QObject::tr("Where"), QObject::tr("Command"), QObject::tr("Keys")});
+  for (const Shortcut& shortcut : shortcutsOf(menuBar) + rowKeys()) {
     QList<QStandardItem*> row{new QStandardItem(shortcut.menu), new QStandardItem(shortcut.action),
                               new QStandardItem(shortcut.keys)};
     for (QStandardItem* cell : row) cell->setEditable(false);

@@ -26,4 +26,6 @@ void TessalLogging::keepNoDiary() {
   qputenv("QT_LOGGING_RULES", "*.debug=false;*.info=false");
 }
 
-bool TessalLogging::keepsDiary() { return diaryKept; }
+bool TessalLogging::keepsDiary() {
+  return diaryKept;
+}

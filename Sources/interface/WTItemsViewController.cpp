@@ -194,10 +194,12 @@ QWidget* WTItemsViewController::loadView() {
   connect(outlineView_, &QWidget::customContextMenuRequested, this, [this](const QPoint& point) {
     const QModelIndex index = outlineView_->indexAt(point);
     WTObject* object = treeController_->objectAt(index);
-    if (!object || object->entity() != WTEntity::Task) return;
-    std::unique_ptr<QMenu> menu(taskMenu(static_cast<WTTask*>(object)));
-    menu->exec(outlineView_->viewport()->mapToGlobal(point));
+    std::unique_ptr<QMenu> menu;
+    if (object && object->entity() == WTEntity::Task) menu.reset(taskMenu(static_cast<WTTask*>(object)));
+    if (object && WTEntities::isItem(object->entity())) menu.reset(itemMenu(static_cast<WTItem*>(object)));
+    if (menu) menu->exec(outlineView_->viewport()->mapToGlobal(point));
   });
+  connect(outlineView_, &WTOutlineView::checkRequested, this, &WTItemsViewController::toggleCompleted);
   connect(outlineView_, &QTreeView::expanded, this, &WTItemsViewController::saveExpandedItems);
   connect(outlineView_, &QTreeView::collapsed, this, &WTItemsViewController::saveExpandedItems);
   reopenRowsThatComeBack();
@@ -220,10 +222,48 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
                                     {WTEntity::ToDo, tr("New To-Do")}})
     menu->addAction(title, this, [this, task, kind] { addItem(kind, task); });
   menu->addSeparator();
+  menu->addAction(tr("Notes…"), this, [this, task] { showNotes(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
   menu->addAction(WTBillingDialog::menuTitle(WTEntity::Task), this,
                   [task, outline] { WTBillingDialog::editBilling(task, outline); });
   return menu;
+}
+
+QMenu* WTItemsViewController::itemMenu(WTItem* item) {
+  auto* menu = new QMenu;
+  menu->setObjectName(QStringLiteral("itemMenu"));
+  const QPersistentModelIndex row = treeController_->indexOfObject(item);
+  if (item->entity() == WTEntity::ToDo) {
+    menu->addAction(static_cast<WTToDo*>(item)->completed() ? tr("Reopen To-Do") : tr("Complete To-Do"), this,
+                    [this, row] { toggleCompleted(row); });
+  }
+  if (auto* time = dynamic_cast<WTTime*>(item); time && time->running())
+    menu->addAction(tr("Stop Timer"), this, [this, time] { stopTimer(time); });
+  menu->addAction(tr("Notes…"), this, [this, item] { showNotes(item); });
+  menu->addAction(tr("Change Date…"), this, [this, item, row] {
+    const QRect rect = cellViewPrototypeForIndex(row)
+                           .partRect(WTTableCellView::Part::DateButton, outlineView_->visualRect(row))
+                           .toRect();
+    openDatePicker(item, QRect(outlineView_->viewport()->mapToGlobal(rect.topLeft()), rect.size()));
+  });
+  menu->addSeparator();
+  // The rows chosen, when the row is one of them; else the row alone.
+  menu->addAction(tr("Delete"), this, [this, row] {
+    if (!outlineView_->selectionModel()->isSelected(row))
+      outlineView_->selectionModel()->select(row,
+                                             QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
+    removeSelectedObjects();
+  });
+  return menu;
+}
+
+void WTItemsViewController::toggleCompleted(const QModelIndex& index) {
+  WTObject* object = treeController_->objectAt(index);
+  if (!object || object->entity() != WTEntity::ToDo) return;
+  auto* todo = static_cast<WTToDo*>(object);
+  // The to-do dates itself; it then moves between "Pending" and its day, which is opened.
+  treeController_->setData(index, !todo->completed(), WTItemsModel::CompletedRole);
+  refreshChildren(todo);
 }
 
 void WTItemsViewController::willDisplayView() {
@@ -468,12 +508,7 @@ void WTItemsViewController::partActivated(const QModelIndex& index, WTTableCellV
       if (item && item->entity() == WTEntity::Time) stopTimer(static_cast<WTTime*>(item));
       break;
     case Part::Checkbox:
-      if (item && item->entity() == WTEntity::ToDo) {
-        // The to-do dates itself; it then moves between "Pending" and its day, which is opened.
-        treeController_->setData(index, !static_cast<WTToDo*>(item)->completed(),
-                                 WTItemsModel::CompletedRole);
-        refreshChildren(item);
-      }
+      toggleCompleted(index);
       break;
     case Part::DateButton:
       openDatePicker(item, QRect(outlineView_->viewport()->mapToGlobal(rect.topLeft()), rect.size()));

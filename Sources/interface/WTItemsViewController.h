@@ -111,6 +111,10 @@ class WTItemsViewController : public WTViewController {
   QLineEdit* rateField() const { return rateField_; }
   // The menu of a task row (its rate among others); built anew for each task, owned by the caller.
   QMenu* taskMenu(WTTask* task);
+  // The menu of an item row: what its checkbox and hover buttons do, and Delete; owned by the caller.
+  QMenu* itemMenu(WTItem* item);
+  // Completes the to-do of the row, or reopens it (the row's checkbox, Space); other rows are left.
+  void toggleCompleted(const QModelIndex& index);
 
  signals:
   // The back button or its shortcut asked to go back to the projects.

@@ -119,6 +119,11 @@ void WTOutlineView::keyPressEvent(QKeyEvent* event) {
     emit editRequested(currentIndex());
     return;
   }
+  if (!editing && event->key() == Qt::Key_Space && event->modifiers() == Qt::NoModifier &&
+      currentIndex().isValid()) {
+    emit checkRequested(currentIndex());
+    return;
+  }
   QTreeView::keyPressEvent(event);
 }
 

@@ -42,6 +42,8 @@ class WTOutlineView : public QTreeView {
  signals:
   // Return on a row that is not being edited.
   void editRequested(const QModelIndex& index);
+  // Space on a row that is not being edited: what the row's checkbox does, if it has one.
+  void checkRequested(const QModelIndex& index);
 
  protected:
   void drawRow(QPainter* painter, const QStyleOptionViewItem& option,

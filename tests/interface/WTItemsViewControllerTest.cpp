@@ -1,8 +1,11 @@
 #include "UiFixture.h"
 #include "WTDatePopover.h"
+#include "WTKeyboardContextMenu.h"
 #include "WTNotesTextView.h"
 
+#include <QApplication>
 #include <QCalendarWidget>
+#include <QTimer>
 
 namespace {
 
@@ -69,18 +72,38 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   auto* time = makeItem<WTTime>(design, "meeting", at(2024, 3, 14, 9, 15));
   endTurn();
   controller->expandContainerOfItem(todo);
-  auto tick = [&] {
-    QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, shown->centreOf(todo, Part::Checkbox));
+  // Its checkbox, Space, or the first entry of its row's menu (Shift+F10, as a right click opens it).
+  WTKeyboardContextMenu keyboardMenus;
+  qApp->installEventFilter(&keyboardMenus);
+  enum class By { Click, Space, Menu };
+  auto tick = [&](By by) {
+    outline()->setFocus();
+    outline()->setCurrentIndex(rowOf(todo));
+    if (by == By::Click)
+      QTest::mouseClick(outline()->viewport(), Qt::LeftButton, {}, shown->centreOf(todo, Part::Checkbox));
+    if (by == By::Space) QTest::keyClick(outline(), Qt::Key_Space);
+    if (by == By::Menu) {
+      QTimer::singleShot(0, [] {
+        if (auto* menu = qobject_cast<QMenu*>(QApplication::activePopupWidget())) {
+          menu->actions().value(0)->trigger();
+          menu->close();
+        }
+      });
+      QTest::keyClick(outline(), Qt::Key_F10, Qt::ShiftModifier);
+    }
     return context->undoManager().undoActionName() + ' ' + dayOf(todo);
   };
-  EXPECT_EQ(tick(), "Complete To-Do 03-14 open");
+  EXPECT_EQ(tick(By::Click), "Complete To-Do 03-14 open");
   EXPECT_EQ(outline()->currentIndex(), rowOf(todo)) << "the keyboard stays on it";
   context->undoManager().undo();
   endTurn();
   EXPECT_EQ(dayOf(todo), "Pending open") << "undone: the group comes back as it was left";
-  EXPECT_EQ(tick(), "Complete To-Do 03-14 open");
-  EXPECT_EQ(tick(), "Reopen To-Do Pending open");
-  controller->openDatePicker(time, QRect(100, 100, 20, 20));
+  EXPECT_EQ(tick(By::Space), "Complete To-Do 03-14 open");
+  EXPECT_EQ(tick(By::Menu), "Reopen To-Do Pending open");
+  qApp->removeEventFilter(&keyboardMenus);
+  shown->window.activateWindow();  // the closed menu leaves none active here
+  ASSERT_TRUE(QTest::qWaitFor([&] { return QApplication::activeWindow() == &shown->window; }));
+  actionTitled(std::unique_ptr<QMenu>(controller->itemMenu(time)).get(), "Change Date…")->trigger();
   WTDatePopover* popover = controller->popover();
   ASSERT_TRUE(controller->currentItem() == time && popover->isVisible());
   EXPECT_EQ(popover->date(), QDate(2024, 3, 14));
@@ -146,6 +169,14 @@ TEST_F(WTItemsViewControllerTest, NotesAreStoredWhenTheirEditorIsLeft) {
   EXPECT_EQ(flat->notes(), "kept\nand more");
   EXPECT_EQ(shown->openEditor(), nullptr);
   EXPECT_EQ(controller->cellDelegate()->notesEditor(), nullptr);
+  // The row's menu opens them too, and deletes the row.
+  std::unique_ptr<QMenu> menu(controller->itemMenu(flat));
+  actionTitled(menu.get(), "Notes…")->trigger();
+  ASSERT_NE(controller->cellDelegate()->notesEditor(), nullptr);
+  QTest::keyClick(controller->cellDelegate()->notesEditor(), Qt::Key_Escape);
+  actionTitled(menu.get(), "Delete")->trigger();
+  EXPECT_FALSE(rowOf(flat).isValid());
+  EXPECT_EQ(context->undoManager().undoActionName(), "Delete “fee”");
 }
 
 // Open rows are remembered per project and found again after a relaunch.
