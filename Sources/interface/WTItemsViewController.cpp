@@ -203,6 +203,7 @@ QWidget* WTItemsViewController::loadView() {
   connect(outlineView_, &QTreeView::expanded, this, &WTItemsViewController::saveExpandedItems);
   connect(outlineView_, &QTreeView::collapsed, this, &WTItemsViewController::saveExpandedItems);
   reopenRowsThatComeBack();
+  openRowsOfNewTimers();
   connect(outlineView_->selectionModel(), &QItemSelectionModel::selectionChanged, this,
           &WTViewController::validationChanged);
   refreshHeader();

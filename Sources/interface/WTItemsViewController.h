@@ -129,6 +129,9 @@ class WTItemsViewController : public WTViewController {
   void restoreExpandedItems();
   // A row that goes while open (a day's group emptied) opens again when it comes back.
   void reopenRowsThatComeBack();
+  // A timer started elsewhere (the tray, the timers window, a command, another device) shows its running
+  // row, though a day's group that comes new is closed.
+  void openRowsOfNewTimers();
   // The header (WTItemsViewHeader.cpp).
   void refreshHeader();
   // Shows `text` in `label`, shortened to the label's width (whole in its tip), and again on resizes.

@@ -9,6 +9,7 @@
 #include "WTOutlineView.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTTime.h"
 
 #include <QItemSelectionModel>
 
@@ -73,6 +74,24 @@ void WTItemsViewController::reopenRowsThatComeBack() {
             for (int row = first; row <= last && !goneOpen_.isEmpty(); ++row) {
               const QModelIndex index = treeController_->index(row, 0, parent);
               if (goneOpen_.remove(treeController_->persistentIdentity(index))) outlineView_->expand(index);
+            }
+          });
+}
+
+void WTItemsViewController::openRowsOfNewTimers() {
+  connect(treeController_, &QAbstractItemModel::rowsInserted, this,
+          [this](const QModelIndex& parent, int first, int last) {
+            // A day's group comes with its items, an item alone into a group there already.
+            for (int row = first; row <= last; ++row) {
+              const QModelIndex index = treeController_->index(row, 0, parent);
+              for (int child = -1; child < treeController_->rowCount(index); ++child) {
+                auto* time = dynamic_cast<WTTime*>(
+                    treeController_->objectAt(child < 0 ? index : treeController_->index(child, 0, index)));
+                if (time && time->running()) {
+                  expandContainerOfItem(time);
+                  break;
+                }
+              }
             }
           });
 }

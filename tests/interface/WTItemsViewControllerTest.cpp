@@ -126,9 +126,16 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   popover->datePicker()->setSelectedDate(QDate(2024, 3, 14));
   popover->hide();
   EXPECT_EQ(late->startDate(), at(2024, 3, 13, 10, 30));
+  // A timer started elsewhere (the tray, a command) opens its new day's group: its running row shows.
+  auto* elsewhere = makeItem<WTTime>(build, "from the tray", at(2024, 3, 12, 8, 0));
+  elsewhere->setRunning(true);
+  endTurn();
+  EXPECT_EQ(dayOf(elsewhere), "03-12 open");
   // A day's row, never selected, shows when the keyboard is on it (as after Down from its task).
   const QModelIndex day = model()->indexOfContainerOfItem(time);
+  shown->window.activateWindow();  // the closed date picker leaves none active here
   outline()->setFocus();
+  ASSERT_TRUE(QTest::qWaitFor([&] { return outline()->hasFocus(); }));
   const QImage plain = outline()->viewport()->grab(outline()->visualRect(day)).toImage();
   outline()->setCurrentIndex(day);
   EXPECT_NE(outline()->viewport()->grab(outline()->visualRect(day)).toImage(), plain);
