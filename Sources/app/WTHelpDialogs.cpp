@@ -49,7 +49,8 @@ QList<Shortcut> rowKeys() {
           {rows, QObject::tr("The Row’s Menu"), keys({Qt::SHIFT | Qt::Key_F10, Qt::Key_Menu})},
           {QObject::tr("Lists"), QObject::tr("Open"), keys({Qt::Key_Right})},
           {outline, QObject::tr("Open, Close"), keys({Qt::Key_Right, Qt::Key_Left})},
-          {outline, QObject::tr("Complete or Reopen To-Do"), keys({Qt::Key_Space})}};
+          {outline, QObject::tr("Complete or Reopen To-Do"), keys({Qt::Key_Space})},
+          {outline, QObject::tr("From a Field to the Notes"), keys({Qt::SHIFT | Qt::Key_Return})}};
 }
 
 }  // namespace

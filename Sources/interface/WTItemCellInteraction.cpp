@@ -362,6 +362,18 @@ bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
   }
   if (!line || event->type() != QEvent::KeyPress) return QStyledItemDelegate::eventFilter(object, event);
   const auto* key = static_cast<QKeyEvent*>(event);
+  if ((key->key() == Qt::Key_Return || key->key() == Qt::Key_Enter) &&
+      (key->modifiers() & Qt::ShiftModifier)) {
+    // A new line goes on in the row's notes. Ending the field instead made the next line typed a search,
+    // and the Return after it a rename that typed over the first line.
+    const auto* model = qobject_cast<const WTItemsModel*>(view_->currentIndex().model());
+    WTObject* record = model ? model->objectAt(view_->currentIndex()) : nullptr;
+    if (!record) return QStyledItemDelegate::eventFilter(object, event);
+    emit commitData(line);
+    emit closeEditor(line, QAbstractItemDelegate::NoHint);
+    QTimer::singleShot(0, view_, [this, record] { controller_->showNotes(record); });
+    return true;
+  }
   const bool forward = key->key() == Qt::Key_Tab && !(key->modifiers() & Qt::ShiftModifier);
   const bool backward = key->key() == Qt::Key_Backtab || (key->key() == Qt::Key_Tab && !forward);
   if (!forward && !backward) return QStyledItemDelegate::eventFilter(object, event);

@@ -176,6 +176,18 @@ TEST_F(WTItemsViewControllerTest, NotesAreStoredWhenTheirEditorIsLeft) {
   EXPECT_EQ(flat->notes(), "kept\nand more");
   EXPECT_EQ(shown->openEditor(), nullptr);
   EXPECT_EQ(controller->cellDelegate()->notesEditor(), nullptr);
+  // Shift+Return in a row's name goes on in its notes: the next line is not typed over the first.
+  auto* note = makeItem<WTNote>(design, "", at(2024, 3, 14));
+  endTurn();
+  outline()->setCurrentIndex(rowOf(note));
+  emit outline()->editRequested(rowOf(note));
+  ASSERT_NE(shown->openEditor(), nullptr);
+  type(shown->openEditor(), "First line");
+  QTest::keyClick(shown->openEditor(), Qt::Key_Return, Qt::ShiftModifier);
+  ASSERT_TRUE(QTest::qWaitFor([&] { return controller->cellDelegate()->notesEditor() != nullptr; }));
+  QTest::keyClicks(controller->cellDelegate()->notesEditor(), "Second line");
+  QTest::keyClick(controller->cellDelegate()->notesEditor(), Qt::Key_Escape);
+  EXPECT_EQ(note->name() + " / " + note->notes(), "First line / Second line");
   // The row's menu opens them too, and deletes the row.
   std::unique_ptr<QMenu> menu(controller->itemMenu(flat));
   actionTitled(menu.get(), "Notes…")->trigger();
