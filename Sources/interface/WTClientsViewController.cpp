@@ -24,7 +24,7 @@ void WTClientsViewController::addObject() {
   context()->undoManager().setActionName(tr("New Client"));
   context()->processPendingChanges();
   arrayController()->rearrangeObjects();
-  editObject(client, false);
+  editNewObject(client, false);
 }
 
 void WTClientsViewController::addRowMenuItems(QMenu* menu) {

@@ -308,6 +308,7 @@ void WTItemsViewController::addObject() {
       index, QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
   delegate_->setEditField(WTItemCellDelegate::Field::Name);
   outlineView_->edit(index);
+  takeBackUnlessNamed(outlineView_, context_);
   outlineView_->scrollTo(index);
 }
 

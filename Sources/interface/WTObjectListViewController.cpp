@@ -160,10 +160,11 @@ void WTObjectListViewController::showRowMenu(int row, const QPoint& global) {
   }
 }
 
-bool WTObjectListViewController::editObject(WTObject* object, bool scroll) {
+bool WTObjectListViewController::editNewObject(WTObject* object, bool scroll) {
   const int row = arrayController_->rowOfObject(object);
   if (row < 0) return false;
   tableView()->editRow(row, scroll);
+  takeBackUnlessNamed(tableView(), context_);
   return true;
 }
 

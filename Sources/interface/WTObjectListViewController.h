@@ -57,8 +57,9 @@ class WTObjectListViewController : public WTViewController {
 
  protected:
   QWidget* loadView() override;
-  // Starts editing the name of `object` when it is listed; returns whether it is.
-  bool editObject(WTObject* object, bool scroll);
+  // Starts editing the name of `object`, just added, when it is listed; returns whether it is. Escape
+  // before a name is typed takes the addition back.
+  bool editNewObject(WTObject* object, bool scroll);
   virtual void partActivated(const QModelIndex& index, WTTableCellView::Part part, const QRect& rect);
   virtual void addRowMenuItems(QMenu* menu);
   // The record the row menu acts on: the clicked row's.

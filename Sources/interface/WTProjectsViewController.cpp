@@ -41,7 +41,7 @@ void WTProjectsViewController::addObject() {
   context()->undoManager().setActionName(tr("New Project"));
   context()->processPendingChanges();
   arrayController()->rearrangeObjects();
-  editObject(project, true);
+  editNewObject(project, true);
 }
 
 void WTProjectsViewController::openProject(WTProject* project) {

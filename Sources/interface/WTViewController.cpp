@@ -4,7 +4,10 @@
 #include "WTNavigationController.h"
 #include "WTObjectContext.h"
 
+#include <QAbstractItemView>
 #include <QTimer>
+
+#include <memory>
 
 WTViewController::WTViewController(QObject* parent) : QObject(parent) {}
 
@@ -52,4 +55,20 @@ bool WTViewController::deleteObjects(WTObjectContext* context, const QList<WTObj
   for (WTObject* object : deletion.objects()) context->deleteObject(object);
   context->undoManager().setActionName(deletion.undoName());
   return true;
+}
+
+void WTViewController::takeBackUnlessNamed(QAbstractItemView* view, WTObjectContext* context) {
+  if (!view->indexWidget(view->currentIndex())) return;  // no name editor opened
+  const QPersistentModelIndex row = view->currentIndex();
+  const QString step = context->undoManager().undoActionName();
+  auto once = std::make_shared<QMetaObject::Connection>();
+  *once = connect(view->itemDelegate(), &QAbstractItemDelegate::closeEditor, this,
+                  [once, view, row, step, context](QWidget*, QAbstractItemDelegate::EndEditHint hint) {
+                    disconnect(*once);
+                    // Escape is the one way a name editor closes without storing what it holds.
+                    WTUndoManager& undo = context->undoManager();
+                    if (hint == QAbstractItemDelegate::RevertModelCache && row.isValid() &&
+                        view->currentIndex() == row && undo.canUndo() && undo.undoActionName() == step)
+                      undo.undo();
+                  });
 }

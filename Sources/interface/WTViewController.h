@@ -4,6 +4,7 @@
 #include <QPointer>
 #include <QWidget>
 
+class QAbstractItemView;
 class WTNavigationController;
 class WTObject;
 class WTObjectContext;
@@ -66,6 +67,10 @@ class WTViewController : public QObject {
   // items or a running timer would go, the host window asks first (outside one nobody can be asked);
   // returns false when the user kept them.
   bool deleteObjects(WTObjectContext* context, const QList<WTObject*>& objects);
+  // Escape in the name of the record just added in `view`'s current row, before anything is typed, takes
+  // the addition back as Undo would: a nameless row stayed, one the commands cannot name. Called with the
+  // name's editor open, the addition the last step of `context`'s undo.
+  void takeBackUnlessNamed(QAbstractItemView* view, WTObjectContext* context);
 
  private:
   QPointer<QWidget> view_;

@@ -54,6 +54,14 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
     EXPECT_TRUE(item && item->entity() == kind && item->task() == design) << title;
   }
   EXPECT_EQ(controller->addItem(WTEntity::Flat, nullptr), nullptr);
+  // A new task left with Escape before it has a name is taken back; one named stays.
+  for (const QString& name : {QString(), QString("Review")}) {
+    controller->addObject();
+    ASSERT_NE(shown->openEditor(), nullptr);
+    if (!name.isEmpty()) type(shown->openEditor(), name, true);
+    if (name.isEmpty()) QTest::keyClick(shown->openEditor(), Qt::Key_Escape);
+    EXPECT_EQ(project->tasks().size(), name.isEmpty() ? 2 : 3) << name.toStdString();
+  }
 
   controller->toggleTimerOfTask(design);
   ASSERT_EQ(design->runningTimes().size(), 1);

@@ -301,6 +301,11 @@ TEST_F(WTListControllerTest, TheClientChooserAndOpeningAProject) {
   projects->tableView()->setFocus();
   QTest::qWait(10);
   EXPECT_EQ(fresh->name(), "Brand new");
+  // Escape before a name is typed takes a new project back.
+  projects->addObject();
+  QTest::keyClick(projects->tableView()->findChild<QLineEdit*>("nameEditor"), Qt::Key_Escape);
+  EXPECT_EQ(context->fetch<WTProject>().size(), 3);
+  EXPECT_EQ(context->undoManager().redoActionName(), "New Project");
   projects->setArchivedPredicate([](const WTObject* object) { return !object->name().isEmpty(); });
   projects->addObject();
   EXPECT_EQ(context->fetch<WTProject>().size(), 4);
