@@ -501,7 +501,15 @@ bool WTItemsModel::setData(const QModelIndex& index, const QVariant& value, int 
   Node* node = nodeOf(index);
   if (!node->object) return false;
   WTObject* object = node->object;
-  QString stepName = tr("Typing");
+  // The Edit menu names the step by what it changed, not by the keys that changed it.
+  static const QHash<int, const char*> kSteps = {{NotesRole, QT_TR_NOOP("Change Notes")},
+                                                 {DurationEditRole, QT_TR_NOOP("Change Duration")},
+                                                 {SpentDurationEditRole, QT_TR_NOOP("Change Duration")},
+                                                 {StartTimeEditRole, QT_TR_NOOP("Change Start")},
+                                                 {EndTimeEditRole, QT_TR_NOOP("Change End")},
+                                                 {AmountEditRole, QT_TR_NOOP("Change Amount")}};
+  QString stepName = tr(kSteps.value(
+      role, object->entity() == WTEntity::Task ? QT_TR_NOOP("Rename") : QT_TR_NOOP("Change Description")));
   if (role == CompletedRole) stepName = value.toBool() ? tr("Complete To-Do") : tr("Reopen To-Do");
   const WTUndoManager::NamedStep step(context_->undoManager(), stepName);
   switch (role) {

@@ -227,7 +227,7 @@ bool WTObjectListModel::setData(const QModelIndex& index, const QVariant& value,
   if (!checkIndex(index, CheckIndexOption::IndexIsValid | CheckIndexOption::ParentIsInvalid)) return false;
   WTObject* object = arranged_[index.row()];
   const WTUndoManager::NamedStep step(context_->undoManager(),
-                                      role == ClientRole ? tr("Change Client") : tr("Typing"));
+                                      role == ClientRole ? tr("Change Client") : tr("Rename"));
   switch (role) {
     case Qt::EditRole:
     case NameRole: {

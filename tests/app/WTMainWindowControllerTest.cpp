@@ -199,7 +199,7 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
     return (undo->text() + " / " + action("redo")->text() + " / " + presenter.deletionQuestions.join(" | "))
         .toStdString();
   };
-  EXPECT_EQ(undo->text(), "&Undo Typing");
+  EXPECT_EQ(undo->text(), "&Undo Rename");
   QTest::keyClick(outline, Qt::Key_Delete);  // an empty task goes without a question
   context->processPendingChanges();
   EXPECT_EQ(project->tasks(), QList<WTTask*>{task});
@@ -208,7 +208,7 @@ TEST_F(WTMainWindowControllerTest, DeleteTakesOnlyTheRowJustAddedAndAsksBeforeAR
   undo->trigger();
   context->processPendingChanges();
   EXPECT_EQ(project->tasks().size(), 2);
-  EXPECT_EQ(said(), "&Undo Typing / &Redo Delete “Temp” / ");
+  EXPECT_EQ(said(), "&Undo Rename / &Redo Delete “Temp” / ");
 
   // Renaming with Return also leaves the renamed row selected alone.
   outline->selectionModel()->select(rowOf(task), QItemSelectionModel::Select | QItemSelectionModel::Rows);

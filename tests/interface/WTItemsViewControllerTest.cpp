@@ -306,6 +306,7 @@ TEST_F(WTItemsViewControllerTest, TimeAlreadySpentIsEnteredStoppedByTypingItsDur
     EXPECT_EQ(time->duration(), typed == std::string("1:30") ? 90 : 0) << typed;
   }
   EXPECT_FALSE(time->running());
+  EXPECT_EQ(context->undoManager().undoActionName(), "Change Duration");  // what changed, not "Typing"
   EXPECT_EQ(time->endDate(), clockNow);
   EXPECT_EQ(span(time) + ' ' + rowOf(time).data(WTItemsModel::LabelRole).toString(), "08:30-10:00 08:30");
 }
