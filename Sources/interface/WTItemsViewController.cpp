@@ -233,23 +233,29 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
 QMenu* WTItemsViewController::itemMenu(WTItem* item) {
   auto* menu = new QMenu;
   menu->setObjectName(QStringLiteral("itemMenu"));
+  // The record is looked up again when an entry is chosen: a sync may have taken it while the menu was open.
   const QPersistentModelIndex row = treeController_->indexOfObject(item);
+  const auto itemNow = [this, row] { return static_cast<WTItem*>(treeController_->objectAt(row)); };
   if (item->entity() == WTEntity::ToDo) {
     menu->addAction(static_cast<WTToDo*>(item)->completed() ? tr("Reopen To-Do") : tr("Complete To-Do"), this,
                     [this, row] { toggleCompleted(row); });
   }
   if (auto* time = dynamic_cast<WTTime*>(item); time && time->running())
-    menu->addAction(tr("Stop Timer"), this, [this, time] { stopTimer(time); });
-  menu->addAction(tr("Notes…"), this, [this, item] { showNotes(item); });
-  menu->addAction(tr("Change Date…"), this, [this, item, row] {
+    menu->addAction(tr("Stop Timer"), this, [this, itemNow] { stopTimer(dynamic_cast<WTTime*>(itemNow())); });
+  menu->addAction(tr("Notes…"), this, [this, itemNow] {
+    if (WTItem* item = itemNow()) showNotes(item);
+  });
+  menu->addAction(tr("Change Date…"), this, [this, itemNow, row] {
+    if (!row.isValid()) return;
     const QRect rect = cellViewPrototypeForIndex(row)
                            .partRect(WTTableCellView::Part::DateButton, outlineView_->visualRect(row))
                            .toRect();
-    openDatePicker(item, QRect(outlineView_->viewport()->mapToGlobal(rect.topLeft()), rect.size()));
+    openDatePicker(itemNow(), QRect(outlineView_->viewport()->mapToGlobal(rect.topLeft()), rect.size()));
   });
   menu->addSeparator();
   // The rows chosen, when the row is one of them; else the row alone.
   menu->addAction(tr("Delete"), this, [this, row] {
+    if (!row.isValid()) return;
     if (!outlineView_->selectionModel()->isSelected(row))
       outlineView_->selectionModel()->select(row,
                                              QItemSelectionModel::ClearAndSelect | QItemSelectionModel::Rows);
