@@ -252,6 +252,12 @@ bool WTItemCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
     default:
       break;
   }
+  // A figure cut short shows whole in the tip, above what the tip says of it.
+  if (part == Part::Duration || part == Part::Cost) {
+    const int role = part == Part::Cost ? WTItemsModel::CostTextRole : WTItemsModel::DurationTextRole;
+    const QString whole = cell.clippedFigure(*part, row, option.font, index.data(role).toString());
+    if (!whole.isEmpty()) text = text.isEmpty() ? whole : whole + u'\n' + text;
+  }
   if (text.isEmpty()) {
     QToolTip::hideText();
     event->ignore();

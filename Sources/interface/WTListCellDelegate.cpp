@@ -152,15 +152,21 @@ void WTListCellDelegate::updateEditorGeometry(QWidget* editor, const QStyleOptio
 
 bool WTListCellDelegate::helpEvent(QHelpEvent* event, QAbstractItemView* view,
                                    const QStyleOptionViewItem& option, const QModelIndex& index) {
-  // Over the cost of a row with a budget, the tip says where the budget stands.
-  const QVariant budget = index.data(WTObjectListModel::BudgetRole);
-  if (event->type() == QEvent::ToolTip && budget.isValid() &&
-      cell_.partAt(event->pos(), option.rect, false) == WTTableCellView::Part::Cost) {
-    QToolTip::showText(event->globalPos(), budget.value<WTBudgetState>().text, view,
-                       cell_.partRect(WTTableCellView::Part::Cost, option.rect).toRect());
-    return true;
-  }
-  return QStyledItemDelegate::helpEvent(event, view, option, index);
+  // Over a figure cut short the tip shows it whole; over the cost of a row with a budget, it says where
+  // the budget stands.
+  using Part = WTTableCellView::Part;
+  const std::optional<Part> part = cell_.partAt(event->pos(), option.rect, false);
+  if (event->type() != QEvent::ToolTip || (part != Part::Cost && part != Part::Duration))
+    return QStyledItemDelegate::helpEvent(event, view, option, index);
+  const int role = part == Part::Cost ? WTObjectListModel::CostTextRole : WTObjectListModel::DurationTextRole;
+  QStringList tip{cell_.clippedFigure(*part, option.rect, option.font, index.data(role).toString())};
+  if (const QVariant budget = index.data(WTObjectListModel::BudgetRole);
+      budget.isValid() && part == Part::Cost)
+    tip << budget.value<WTBudgetState>().text;
+  tip.removeAll(QString());
+  if (tip.isEmpty()) return QStyledItemDelegate::helpEvent(event, view, option, index);
+  QToolTip::showText(event->globalPos(), tip.join(u'\n'), view, cell_.partRect(*part, option.rect).toRect());
+  return true;
 }
 
 bool WTListCellDelegate::editorEvent(QEvent* event, QAbstractItemModel* model,

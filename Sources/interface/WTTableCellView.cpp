@@ -218,3 +218,8 @@ void WTTableCellView::drawFigure(QPainter& painter, Part part, const QRectF& row
   painter.drawText(rect, Qt::AlignRight | Qt::AlignVCenter,
                    QFontMetricsF(painter.font()).elidedText(text, Qt::ElideRight, rect.width()));
 }
+
+QString WTTableCellView::clippedFigure(Part part, const QRectF& row, QFont font, const QString& text) const {
+  font.setBold(true);
+  return QFontMetricsF(font).horizontalAdvance(text) > partRect(part, row).width() ? text : QString();
+}

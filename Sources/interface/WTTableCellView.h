@@ -75,6 +75,9 @@ class WTTableCellView {
   // digits and ends in "…", rather than losing them at the left edge, where 100,000,000,080.82 read as
   // 80.82.
   void drawFigure(QPainter& painter, Part part, const QRectF& row, const QString& text) const;
+  // The figure drawn so, when it does not fit in `font` (bold, as totals are, to be sure) and a tip is to
+  // show it whole; empty when it fits.
+  QString clippedFigure(Part part, const QRectF& row, QFont font, const QString& text) const;
 
   static QFont notesFont();
   static constexpr qreal kMinimumNotesHeight = 20.0;

@@ -325,6 +325,11 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
   ASSERT_FALSE(design->buttonTitle().isEmpty());
   design->setBudget(dec("100"));
   endTurn();
+  auto* large = makeItem<WTExpense>(build, "Server", at(2024, 3, 13));
+  large->setExpense(dec("999999999.99"));
+  endTurn();
+  controller->expandContainerOfItem(large);
+  const QString largeAmount = rowOf(large).data(WTItemsModel::CostTextRole).toString();
   const std::tuple<const WTObject*, Part, QString> tips[] = {
       // all of a task's tip, else a part of it; empty: no tip
       {design, Part::TimerButton, design->buttonTitle()},
@@ -335,6 +340,7 @@ TEST_F(WTItemsViewControllerTest, AnEntrysFieldsAreChangedInItsRowEachKeepingThe
       {time, Part::Duration, "the end moves"},
       {time, Part::Cost, {}},
       {expense, Part::Cost, "double-click"},
+      {large, Part::Cost, largeAmount + "\nAmount"},  // cut short on the row: whole in the tip
   };
   for (const auto& [object, part, says] : tips) {
     const QString tip = tipAt(outline(), shown->centreOf(object, part));
