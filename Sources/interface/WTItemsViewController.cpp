@@ -223,6 +223,16 @@ QMenu* WTItemsViewController::taskMenu(WTTask* task) {
                                     {WTEntity::ToDo, tr("New To-Do")}})
     menu->addAction(title, this, [this, task, kind] { addItem(kind, task); });
   menu->addSeparator();
+  // What dragging a task does, one place at a time.
+  const qsizetype place = project_ ? project_->tasks().indexOf(task) : -1;
+  for (const auto& [title, step] : {std::pair{tr("Move Up"), -1}, {tr("Move Down"), 1}}) {
+    QAction* move = menu->addAction(title, this, [this, task, place, step] {
+      const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
+      project_->moveTask(task, int(place + step));
+      revealObjects({task});
+    });
+    move->setEnabled(place >= 0 && place + step >= 0 && place + step < project_->tasks().size());
+  }
   menu->addAction(tr("Notes…"), this, [this, task] { showNotes(task); });
   menu->addAction(tr("Set Rate…"), this, [task, outline] { WTRateDialog::editRate(task, outline); });
   menu->addAction(WTBillingDialog::menuTitle(WTEntity::Task), this,
@@ -245,6 +255,20 @@ QMenu* WTItemsViewController::itemMenu(WTItem* item) {
   menu->addAction(tr("Notes…"), this, [this, itemNow] {
     if (WTItem* item = itemNow()) showNotes(item);
   });
+  // What dragging the row onto another task does: the item keeps its date.
+  QMenu* tasks = menu->addMenu(tr("Move to Task"));
+  for (WTTask* task : project_ ? project_->tasks() : QList<WTTask*>()) {
+    if (task == item->task()) continue;
+    tasks->addAction(task->name().isEmpty() ? tr("Untitled Task") : task->name(), this,
+                     [this, task, itemNow] {
+                       WTItem* item = itemNow();
+                       if (!item) return;
+                       const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
+                       const QList<WTItem*> moved = task->adoptItems({item});
+                       revealObjects({moved.begin(), moved.end()});
+                     });
+  }
+  tasks->setEnabled(!tasks->isEmpty());
   menu->addAction(tr("Change Date…"), this, [this, itemNow, row] {
     if (!row.isValid()) return;
     const QRect rect = cellViewPrototypeForIndex(row)

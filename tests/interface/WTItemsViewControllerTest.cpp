@@ -63,6 +63,17 @@ TEST_F(WTItemsViewControllerTest, ANewTimeEntryRunsIsSelectedAndEditedInsideOpen
     EXPECT_EQ(project->tasks().size(), name.isEmpty() ? 2 : 3) << name.toStdString();
   }
 
+  // The task's menu moves it among the others, a place at a time, as a drag does.
+  for (int i = 0; i < 3; ++i) {
+    const std::unique_ptr<QMenu> taskMenu(controller->taskMenu(design));
+    QAction* down = actionTitled(taskMenu.get(), "Move Down");
+    ASSERT_NE(down, nullptr);
+    EXPECT_EQ(down->isEnabled(), i < 2);  // not past the last
+    if (i < 2) down->trigger();
+  }
+  EXPECT_EQ(project->tasks().indexOf(design), 2);
+  EXPECT_EQ(context->undoManager().undoActionName(), "Move");
+  EXPECT_EQ(outline()->currentIndex(), rowOf(design));
   controller->toggleTimerOfTask(design);
   ASSERT_EQ(design->runningTimes().size(), 1);
   EXPECT_EQ(outline()->currentIndex(), rowOf(design->runningTimes()[0]));
@@ -156,6 +167,13 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
     EXPECT_TRUE(QTest::qWaitFor([&] { return outline()->currentIndex() == rowOf(dropped); })) << task;
     EXPECT_EQ(outline()->selectionModel()->selectedRows(), QModelIndexList{rowOf(dropped)}) << task;
   }
+  // The item's menu moves it to another task as a drop there does, keeping its day.
+  std::unique_ptr<QMenu> menu(controller->itemMenu(time));
+  QAction* moveTo = actionTitled(menu.get(), "Move to Task");
+  ASSERT_TRUE(moveTo && moveTo->menu() && actionTitled(moveTo->menu(), "Design"));
+  actionTitled(moveTo->menu(), "Design")->trigger();
+  EXPECT_EQ(time->task()->name() + ' ' + dayOf(time), "Design 03-09 open");
+  EXPECT_EQ(outline()->selectionModel()->selectedRows(), QModelIndexList{rowOf(time)});
 }
 
 // A note is stored once its editor is left; an emptied one closes with nothing stored.
