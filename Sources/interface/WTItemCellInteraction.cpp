@@ -372,8 +372,7 @@ bool WTItemCellDelegate::eventFilter(QObject* object, QEvent* event) {
       (key->modifiers() & Qt::ShiftModifier)) {
     // A new line goes on in the row's notes. Ending the field instead made the next line typed a search,
     // and the Return after it a rename that typed over the first line.
-    const auto* model = qobject_cast<const WTItemsModel*>(view_->currentIndex().model());
-    WTObject* record = model ? model->objectAt(view_->currentIndex()) : nullptr;
+    WTObject* record = controller_->treeController()->objectAt(view_->currentIndex());
     if (!record) return QStyledItemDelegate::eventFilter(object, event);
     emit commitData(line);
     emit closeEditor(line, QAbstractItemDelegate::NoHint);

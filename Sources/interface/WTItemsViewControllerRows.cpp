@@ -79,19 +79,19 @@ void WTItemsViewController::reopenRowsThatComeBack() {
 }
 
 void WTItemsViewController::openRowsOfNewTimers() {
+  const auto runningAt = [this](const QModelIndex& index) {
+    auto* time = dynamic_cast<WTTime*>(treeController_->objectAt(index));
+    return time && time->running() ? time : nullptr;
+  };
   connect(treeController_, &QAbstractItemModel::rowsInserted, this,
-          [this](const QModelIndex& parent, int first, int last) {
+          [this, runningAt](const QModelIndex& parent, int first, int last) {
             // A day's group comes with its items, an item alone into a group there already.
             for (int row = first; row <= last; ++row) {
               const QModelIndex index = treeController_->index(row, 0, parent);
-              for (int child = -1; child < treeController_->rowCount(index); ++child) {
-                auto* time = dynamic_cast<WTTime*>(
-                    treeController_->objectAt(child < 0 ? index : treeController_->index(child, 0, index)));
-                if (time && time->running()) {
-                  expandContainerOfItem(time);
-                  break;
-                }
-              }
+              WTTime* time = runningAt(index);
+              for (int child = 0; !time && child < treeController_->rowCount(index); ++child)
+                time = runningAt(treeController_->index(child, 0, index));
+              if (time) expandContainerOfItem(time);
             }
           });
 }

@@ -7,8 +7,6 @@
 #include <QAbstractItemView>
 #include <QTimer>
 
-#include <memory>
-
 WTViewController::WTViewController(QObject* parent) : QObject(parent) {}
 
 WTViewController::~WTViewController() {
@@ -61,14 +59,14 @@ void WTViewController::takeBackUnlessNamed(QAbstractItemView* view, WTObjectCont
   if (!view->indexWidget(view->currentIndex())) return;  // no name editor opened
   const QPersistentModelIndex row = view->currentIndex();
   const QString step = context->undoManager().undoActionName();
-  auto once = std::make_shared<QMetaObject::Connection>();
-  *once = connect(view->itemDelegate(), &QAbstractItemDelegate::closeEditor, this,
-                  [once, view, row, step, context](QWidget*, QAbstractItemDelegate::EndEditHint hint) {
-                    disconnect(*once);
-                    // Escape is the one way a name editor closes without storing what it holds.
-                    WTUndoManager& undo = context->undoManager();
-                    if (hint == QAbstractItemDelegate::RevertModelCache && row.isValid() &&
-                        view->currentIndex() == row && undo.canUndo() && undo.undoActionName() == step)
-                      undo.undo();
-                  });
+  connect(
+      view->itemDelegate(), &QAbstractItemDelegate::closeEditor, this,
+      [view, row, step, context](QWidget*, QAbstractItemDelegate::EndEditHint hint) {
+        // Escape is the one way a name editor closes without storing what it holds.
+        WTUndoManager& undo = context->undoManager();
+        if (hint == QAbstractItemDelegate::RevertModelCache && row.isValid() && view->currentIndex() == row &&
+            undo.canUndo() && undo.undoActionName() == step)
+          undo.undo();
+      },
+      Qt::SingleShotConnection);
 }
