@@ -3,6 +3,7 @@
 #include "Date.h"
 #include "Decimal.h"
 #include "WTItem.h"
+#include "WTTask.h"
 
 #include <QAbstractItemModel>
 #include <QHash>
@@ -20,7 +21,6 @@ class WTItemContainer;
 class WTObject;
 class WTObjectContext;
 class WTProject;
-class WTTask;
 
 // One project as a tree for the items outline: its tasks in their stored order (level 0), each
 // task's groups, "Pending" first and then one per day, newest first (level 1), and the groups' items
@@ -127,6 +127,8 @@ class WTItemsModel : public QAbstractItemModel {
   Qt::DropActions supportedDropActions() const override;
   Qt::DropActions supportedDragActions() const override;
 
+  // Why a move onto `task` is refused: the entry would share time with another of the task's there.
+  static QString clashRefusal(const WTTask& task, const WTTask::Clash& clash);
   // The uuids and the flag of a drag, as mimeData wrote them.
   static QStringList objectUUIDs(const QMimeData* data);
   static bool containsTasks(const QMimeData* data);
@@ -139,6 +141,8 @@ class WTItemsModel : public QAbstractItemModel {
   // A drop moved these tasks (in the project's order) or items (to another task, day or back to
   // "Pending").
   void recordsDropped(const QList<WTObject*>& records);
+  // A drop moved nothing, for this reason (clashRefusal).
+  void dropRefused(const QString& reason);
 
  private:
   struct Node;  // WTItemsModelNode.h

@@ -1,14 +1,17 @@
 #include "WTItemsModel.h"
 
+#include "RZDate.h"
 #include "WTItem.h"
 #include "WTItemContainer.h"
 #include "WTItemsModelNode.h"
 #include "WTObjectContext.h"
 #include "WTProject.h"
 #include "WTTask.h"
+#include "WTTime.h"
 
 #include <QDataStream>
 #include <QIODevice>
+#include <QLocale>
 #include <QMimeData>
 
 #include <algorithm>
@@ -117,9 +120,17 @@ bool WTItemsModel::dropMimeData(const QMimeData* data, Qt::DropAction action, in
   } else {
     const QList<WTItem*> items = objectsOfDrag<WTItem>(context_, uuids);
     const Node* target = nodeOf(parent);
+    WTTask* task =
+        target->kind == Node::Task ? static_cast<WTTask*>(target->object) : target->container->task();
+    const std::optional<Date> day = target->kind == Node::Task ? std::nullopt : target->container->date();
+    // Onto "Pending" only to-dos move: no time entry can clash there.
+    if (const std::optional<WTTask::Clash> clash =
+            target->kind == Node::Task || day ? task->clashOfAdopting(items, day) : std::nullopt) {
+      emit dropRefused(clashRefusal(*task, *clash));
+      return false;
+    }
     const QList<WTItem*> adopted =
-        target->kind == Node::Task ? static_cast<WTTask*>(target->object)->adoptItems(items)
-                                   : target->container->task()->adoptItems(items, target->container->date());
+        target->kind == Node::Task ? task->adoptItems(items) : task->adoptItems(items, day);
     moved = {adopted.begin(), adopted.end()};
   }
   if (!moved.isEmpty()) emit recordsDropped(moved);
@@ -132,4 +143,12 @@ Qt::DropActions WTItemsModel::supportedDropActions() const {
 
 Qt::DropActions WTItemsModel::supportedDragActions() const {
   return Qt::MoveAction;
+}
+
+QString WTItemsModel::clashRefusal(const WTTask& task, const WTTask::Clash& clash) {
+  const auto clock = [](Date date) { return RZDate::stringWithPattern(date, QStringLiteral("HH:mm")); };
+  return tr("The entry would share time with the entry %1–%2 of “%3” on %4.")
+      .arg(clock(clash.otherStart), clash.other->running() ? tr("now") : clock(clash.otherEnd),
+           task.name().isEmpty() ? tr("Untitled Task") : task.name(),
+           QLocale().toString(clash.otherStart.toQDateTime().date(), QLocale::ShortFormat));
 }

@@ -21,6 +21,7 @@
 #include "WTToDo.h"
 
 #include <QCalendarWidget>
+#include <QCursor>
 #include <QHBoxLayout>
 #include <QItemSelectionModel>
 #include <QLabel>
@@ -31,6 +32,7 @@
 #include <QShortcut>
 #include <QTimer>
 #include <QToolButton>
+#include <QToolTip>
 #include <QVBoxLayout>
 
 WTItemsViewController::WTItemsViewController(WTObjectContext* context, QObject* parent)
@@ -43,6 +45,8 @@ WTItemsViewController::WTItemsViewController(WTObjectContext* context, QObject* 
   connect(treeController_, &WTItemsModel::recordsDropped, this, [this](const QList<WTObject*>& records) {
     QTimer::singleShot(0, this, [this, records] { revealObjects(records); });
   });
+  connect(treeController_, &WTItemsModel::dropRefused, this,
+          [this](const QString& reason) { showMoveRefusal(reason, QRect(QCursor::pos(), QSize(1, 1))); });
   // Records that undo or redo puts back are shown and selected, not left inside a closed row.
   connect(context_, &WTObjectContext::objectValueDidChange, this, [this](WTObject* object, const QString&) {
     const WTUndoManager& undo = context_->undoManager();
@@ -259,14 +263,18 @@ QMenu* WTItemsViewController::itemMenu(WTItem* item) {
   QMenu* tasks = menu->addMenu(tr("Move to Task"));
   for (WTTask* task : project_ ? project_->tasks() : QList<WTTask*>()) {
     if (task == item->task()) continue;
-    tasks->addAction(task->name().isEmpty() ? tr("Untitled Task") : task->name(), this,
-                     [this, task, itemNow] {
-                       WTItem* item = itemNow();
-                       if (!item) return;
-                       const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
-                       const QList<WTItem*> moved = task->adoptItems({item});
-                       revealObjects({moved.begin(), moved.end()});
-                     });
+    tasks->addAction(
+        task->name().isEmpty() ? tr("Untitled Task") : task->name(), this, [this, task, itemNow] {
+          WTItem* item = itemNow();
+          if (!item) return;
+          if (const std::optional<WTTask::Clash> clash = task->clashOfAdopting({item}, std::nullopt)) {
+            showMoveRefusal(WTItemsModel::clashRefusal(*task, *clash), rowRect(item));
+            return;
+          }
+          const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
+          const QList<WTItem*> moved = task->adoptItems({item});
+          revealObjects({moved.begin(), moved.end()});
+        });
   }
   tasks->setEnabled(!tasks->isEmpty());
   menu->addAction(tr("Change Date…"), this, [this, itemNow, row] {
@@ -483,10 +491,27 @@ void WTItemsViewController::popoverWillClose() {
   const QDate picked = popover_->date();
   // Only a new day moves the item: closing without a choice leaves it (and its seconds) alone.
   if (picked.isValid() && picked != old.date() && picked != shownDate_) {
-    item->setDate(Date::fromQDateTime(QDateTime(picked, old.time())));
+    const Date day = Date::fromQDateTime(QDateTime(picked, old.time()));
+    WTTask* task = item->task();
+    if (const std::optional<WTTask::Clash> clash = task ? task->clashOfAdopting({item}, day) : std::nullopt) {
+      showMoveRefusal(WTItemsModel::clashRefusal(*task, *clash), rowRect(item));
+      return;
+    }
+    item->setDate(day);
     context_->undoManager().setActionName(tr("Move"));
     refreshChildren(item);
   }
+}
+
+QRect WTItemsViewController::rowRect(WTItem* item) const {
+  const QRect row = outlineView_->visualRect(treeController_->indexOfObject(item));
+  return QRect(outlineView_->viewport()->mapToGlobal(row.topLeft()), row.size());
+}
+
+void WTItemsViewController::showMoveRefusal(const QString& reason, const QRect& anchor) {
+  // Under the row, where the eye is; it stays while the pointer is over the outline.
+  QWidget* viewport = outlineView_->viewport();
+  QToolTip::showText(anchor.bottomLeft(), reason, viewport, viewport->rect(), 10000);
 }
 
 bool WTItemsViewController::isRowBeingEdited(const QModelIndex& index) const {

@@ -82,7 +82,8 @@ class WTItemsViewController : public WTViewController {
 
   // Opens the date pop-over for `item` under `anchor` (global coordinates); ignored while it is open.
   void openDatePicker(WTItem* item, const QRect& anchor);
-  // Books the item on the picked day (when it changed) and opens its new group.
+  // Books the item on the picked day (when it changed) and opens its new group; a day on which the entry
+  // would share time with another of its task's is refused, and says so.
   void popoverWillClose();
   WTItem* currentItem() const { return currentItem_; }
   WTDatePopover* popover();
@@ -92,6 +93,10 @@ class WTItemsViewController : public WTViewController {
   void expandContainerOfItem(WTItem* item);
   // Opens the rows above the given tasks and items of this project and selects them.
   void revealObjects(const QList<WTObject*>& objects);
+  // Tells why a move (a drop, a new day, another task) did not happen, at `anchor` (global coordinates).
+  void showMoveRefusal(const QString& reason, const QRect& anchor);
+  // The item's row in global coordinates.
+  QRect rowRect(WTItem* item) const;
 
   // Row heights: a task or group row takes its cell's height, an item row at least 30 points.
   qreal heightOfRow(const QModelIndex& index);

@@ -94,11 +94,13 @@ void WTTask::setProject(WTProject* project, int index) {
 }
 
 QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items) {
+  if (clashOfAdopting(items, std::nullopt)) return {};
   for (WTItem* item : items) item->setTask(this);
   return items;
 }
 
 QList<WTItem*> WTTask::adoptItems(const QList<WTItem*>& items, std::optional<Date> day) {
+  if (day && clashOfAdopting(items, day)) return {};
   QList<WTItem*> adopted;
   for (WTItem* item : items) {
     if (day) {
@@ -256,6 +258,42 @@ const WTTime* WTTask::timeOverlapping(Date start, Date end, const WTTime* except
       earliest = time;
   }
   return earliest;
+}
+
+std::optional<WTTask::Clash> WTTask::clashOfAdopting(const QList<WTItem*>& items,
+                                                     std::optional<Date> day) const {
+  const Date now = Date::now();
+  struct Span {
+    const WTTime* time;
+    Date start, end;
+  };
+  // As timeOverlapping sees an entry: a running one up to now, one without an end as a moment.
+  const auto spanOf = [&](const WTTime& time, Date start) {
+    const Date end = time.endDate().value_or(*time.startDate());
+    return Span{&time, start,
+                time.running() ? now : start.addingSeconds(end.timeIntervalSince(*time.startDate()))};
+  };
+  std::vector<Span> moving;
+  for (const WTItem* item : items) {
+    const auto* time = item->entity() == WTEntity::Time ? static_cast<const WTTime*>(item) : nullptr;
+    if (time && time->startDate())
+      moving.push_back(spanOf(*time, day ? time->startOnDayOf(*day) : *time->startDate()));
+  }
+  std::vector<Span> others;
+  for (const WTTime* time : times()) {
+    const bool moves =
+        std::any_of(moving.begin(), moving.end(), [&](const Span& span) { return span.time == time; });
+    if (!moves && time->startDate()) others.push_back(spanOf(*time, *time->startDate()));
+  }
+  std::sort(others.begin(), others.end(), [](const Span& a, const Span& b) { return a.start < b.start; });
+  others.insert(others.end(), moving.begin(), moving.end());
+  for (const Span& span : moving) {
+    for (const Span& other : others) {
+      if (other.time != span.time && other.start < span.end && span.start < other.end)
+        return Clash{span.time, other.time, other.start, other.end};
+    }
+  }
+  return std::nullopt;
 }
 
 QList<WTItem*> WTTask::pendingToDos() const {

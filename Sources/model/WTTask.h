@@ -36,12 +36,24 @@ class WTTask final : public WTBillingRecord {
 
   // Every item of the task, of every kind, in no particular order.
   const QList<WTItem*>& items() const { return items_; }
-  // Takes `items` into this task, each keeping its date. Returns them.
+  // Takes `items` into this task, each keeping its date. Returns them; none when a time entry among them
+  // would share time with another of the task's (clashOfAdopting).
   QList<WTItem*> adoptItems(const QList<WTItem*>& items);
   // Takes `items` into this task's group of `day`: a day books them on it (WTItem::setDate); none is
   // "Pending", where only to-dos come, opened again, and other items stay where they were. Returns the
-  // items that came.
+  // items that came; none when a day would make two of the task's time entries share time.
   QList<WTItem*> adoptItems(const QList<WTItem*>& items, std::optional<Date> day);
+
+  // A time entry that adopting would make share time with another of this task's entries: where each
+  // would be. The other is one the task keeps, or another entry that moves with it.
+  struct Clash {
+    const WTTime* moving = nullptr;
+    const WTTime* other = nullptr;
+    Date otherStart, otherEnd;
+  };
+  // The clash that adoptItems(items, *day) would cause, or adoptItems(items) without a day; none when
+  // every entry fits. Checked before a move, so that the same minute is never billed twice in a task.
+  std::optional<Clash> clashOfAdopting(const QList<WTItem*>& items, std::optional<Date> day) const;
 
   // Own rate, else the project's inherited rate; without a project "WTDefaultRate", else builtInRate().
   Decimal rateFromAbove() const override;

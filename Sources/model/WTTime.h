@@ -26,6 +26,8 @@ class WTTime final : public WTItem {
   void setDurationKeepingEnd(int minutes);
   // Moves the entry to the day of `date`, keeping hour and minute (seconds dropped) and its length.
   void setDate(const std::optional<Date>& date) override;
+  // Where setDate(date) puts the start: on the day of `date`, at its hour and minute, no seconds.
+  Date startOnDayOf(const Date& date) const;
   // Whether on the day of `date` the entry would be time already spent: over by now, or a running one
   // begun. On a later day it would bill time not spent yet, or a running one count down from a start
   // still to come.
@@ -43,9 +45,6 @@ class WTTime final : public WTItem {
   void storedValueDidChange(const QString& key) override;
 
  private:
-  // The start moved to the day of `date`: its hour and minute, no seconds.
-  Date startOnDayOf(const Date& date) const;
-
   std::optional<Date> endDate_;
   std::optional<int> lastDuration_;
   bool running_ = false;

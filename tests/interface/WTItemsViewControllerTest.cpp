@@ -6,6 +6,7 @@
 #include <QApplication>
 #include <QCalendarWidget>
 #include <QTimer>
+#include <QToolTip>
 
 namespace {
 
@@ -174,6 +175,29 @@ TEST_F(WTItemsViewControllerTest, ItemsMoveIntoTheOpenGroupOfTheirNewDay) {
   actionTitled(moveTo->menu(), "Design")->trigger();
   EXPECT_EQ(time->task()->name() + ' ' + dayOf(time), "Design 03-09 open");
   EXPECT_EQ(outline()->selectionModel()->selectedRows(), QModelIndexList{rowOf(time)});
+  // No move bills a minute twice in a task: a new day, another task or a drop where the entry would share
+  // time with another is refused, naming that one, and moves nothing.
+  makeItem<WTTime>(design, "call", at(2024, 3, 5, 9));
+  auto* talk = makeItem<WTTime>(design, "talk", at(2024, 3, 6, 9, 15));
+  auto* review = makeItem<WTTime>(build, "review", at(2024, 3, 5, 9, 15));
+  endTurn();
+  const auto refused = [&](WTTime* entry, WTTask* task, Date start) {
+    const bool told =
+        QToolTip::isVisible() &&
+        QToolTip::text().startsWith("The entry would share time with the entry 09:00–09:30 of “Design”");
+    QToolTip::hideText();
+    return told && entry->task() == task && entry->startDate() == start;
+  };
+  controller->openDatePicker(talk, QRect(0, 0, 20, 20));
+  popover->setDate(QDate(2024, 3, 5));
+  popover->hide();
+  EXPECT_TRUE(refused(talk, design, at(2024, 3, 6, 9, 15))) << "a new day";
+  menu.reset(controller->itemMenu(review));
+  actionTitled(actionTitled(menu.get(), "Move to Task")->menu(), "Design")->trigger();
+  EXPECT_TRUE(refused(review, build, at(2024, 3, 5, 9, 15))) << "another task";
+  const std::unique_ptr<QMimeData> drag(model()->mimeData({rowOf(review)}));
+  EXPECT_FALSE(model()->dropMimeData(drag.get(), Qt::MoveAction, -1, 0, rowOf(design)));
+  EXPECT_TRUE(refused(review, build, at(2024, 3, 5, 9, 15))) << "a drop";
 }
 
 // A note is stored once its editor is left; an emptied one closes with nothing stored.

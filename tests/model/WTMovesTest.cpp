@@ -42,6 +42,49 @@ TEST_F(WTMovesTest, ATaskAdoptsItemsOntoADayOntoPendingOrKeepingTheirDates) {
   EXPECT_EQ(where(note), std::pair(QString("design"), std::optional(berlin(2024, 3, 12, 9))));
 }
 
+// No move makes two entries of a task share a minute: the task adopts nothing then, and names the clash.
+TEST_F(WTMovesTest, AMoveThatWouldBillAMinuteTwiceInATaskMovesNothing) {
+  setNow(berlin(2024, 3, 14, 12));
+  WTTask* design = makeTask(nullptr, "design");
+  WTTask* build = makeTask(nullptr, "build");
+  WTTime* kept = makeTime(design, berlin(2024, 3, 11, 9), berlin(2024, 3, 11, 10));
+  WTTime* running = makeTime(design, berlin(2024, 3, 14, 9, 30), berlin(2024, 3, 14, 9, 30));
+  running->setRunning(true);
+  WTTime* early = makeTime(build, berlin(2024, 3, 12, 8), berlin(2024, 3, 12, 9));
+  WTTime* late = makeTime(build, berlin(2024, 3, 13, 9, 30), berlin(2024, 3, 13, 10, 30));
+  WTTime* inside = makeTime(build, berlin(2024, 3, 12, 9, 45), berlin(2024, 3, 12, 10));
+  WTTime* lunch = makeTime(build, berlin(2024, 3, 14, 11, 30), berlin(2024, 3, 14, 11, 45));
+  struct Row {
+    const char* what;
+    QList<WTItem*> items;
+    std::optional<Date> day;  // none: the dates kept
+    const WTTime* moving;
+    const WTTime* other;
+  };
+  const Row rows[] = {
+      {"onto the day of an entry it overlaps", {late}, berlin(2024, 3, 11), late, kept},
+      {"only touching it", {early}, berlin(2024, 3, 11), nullptr, nullptr},
+      {"its dates kept, at a time the task has free", {late, early}, std::nullopt, nullptr, nullptr},
+      {"its dates kept, into what a running entry has run so far", {lunch}, std::nullopt, lunch, running},
+      {"two that move meet each other", {inside, late}, berlin(2024, 3, 12), inside, late},
+      {"a running entry onto the day of another", {running}, berlin(2024, 3, 11), running, kept},
+      {"an entry of the task onto a free day of its own", {kept}, berlin(2024, 3, 13), nullptr, nullptr},
+  };
+  using Pair = std::pair<const WTTime*, const WTTime*>;
+  for (const Row& row : rows) {
+    const std::optional<WTTask::Clash> clash = design->clashOfAdopting(row.items, row.day);
+    EXPECT_EQ(clash ? Pair(clash->moving, clash->other) : Pair(), Pair(row.moving, row.other)) << row.what;
+  }
+  // The other entry is named where it would be: the one that moves with it, on the new day.
+  const WTTask::Clash clash = *design->clashOfAdopting({inside, late}, berlin(2024, 3, 12));
+  EXPECT_EQ(std::pair(clash.otherStart, clash.otherEnd),
+            std::pair(berlin(2024, 3, 12, 9, 30), berlin(2024, 3, 12, 10, 30)));
+  EXPECT_TRUE(design->adoptItems({late}, berlin(2024, 3, 11)).isEmpty());
+  EXPECT_TRUE(design->adoptItems({lunch}).isEmpty());
+  EXPECT_EQ(std::tuple(late->task(), late->startDate(), lunch->task()),
+            std::tuple(build, std::optional(berlin(2024, 3, 13, 9, 30)), build));
+}
+
 // Completing dates a to-do once; reopening it or the stored flag alone (sync, undo) keeps that date.
 TEST_F(WTMovesTest, ACompletedToDoIsDatedThenAndOpenedAgainKeepsThatDate) {
   auto* todo = makeItem<WTToDo>(makeTask(), berlin(2024, 3, 1));
