@@ -127,11 +127,7 @@ TEST(WTImportFields, NumbersAreReadOnlyAsWrittenAndNeverAThousandTimesOff) {
   for (const auto& [text, read] : cases) {
     bool ambiguous = false;
     const std::optional<Decimal> number = WTImportFields::parseNumber(QString::fromUtf8(text), &ambiguous);
-    EXPECT_EQ(number      ? number->toString()
-              : ambiguous ? "ambiguous"
-                          : "none",
-              QString::fromUtf8(read))
-        << text;
+    EXPECT_EQ(number ? number->toString() : QString(ambiguous ? "ambiguous" : "none"), read) << text;
   }
 }
 
@@ -140,7 +136,7 @@ struct Refusal {
   QByteArray content;
   const char* format;
   const char* error;  // empty: read, with `rows` entries and `problems` rows that cannot be read
-  int rows;
+  int rows = 0;
   int problems = 0;
 };
 
@@ -170,45 +166,37 @@ const QByteArray kTogglHeader = "Client,Project,Task,Description,Billable,Start 
 const QByteArray kGoodRow = ",P,,ok,Yes,2024-01-01,10:00,1:00:00\n";
 const QByteArray kBadRow = ",P,,bad,Yes,someday,10:00,1:00:00\n";
 
+const char* const kNoFormat =
+    "the file is none of the formats Tessal imports (toggl, clockify, timewarrior, kimai, tessal)";
+
+// clang-format off
 INSTANTIATE_TEST_SUITE_P(
     Files, ImportRefusalTest,
     testing::Values(
-        Refusal{"Empty", "", "", "the file is empty", 0},
-        Refusal{"Blank", "\xEF\xBB\xBF\n \n", "", "the file is empty", 0},
-        Refusal{
-            "AnotherFormat", "name,amount\nrent,100\n", "",
-            "the file is none of the formats Tessal imports (toggl, clockify, timewarrior, kimai, tessal)",
-            0},
-        Refusal{
-            "AnotherJSON", "{\"start\": \"20231001T103000Z\"}", "",
-            "the file is none of the formats Tessal imports (toggl, clockify, timewarrior, kimai, tessal)",
-            0},
-        Refusal{
-            "UnknownName", "a\n", "harvest",
-            "there is no format named “harvest”; the formats are toggl, clockify, timewarrior, kimai, tessal",
-            0},
+        Refusal{"Empty", "", "", "the file is empty"},
+        Refusal{"Blank", "\xEF\xBB\xBF\n \n", "", "the file is empty"},
+        Refusal{"AnotherFormat", "name,amount\nrent,100\n", "", kNoFormat},
+        Refusal{"AnotherJSON", "{\"start\": \"20231001T103000Z\"}", "", kNoFormat},
+        Refusal{"UnknownName", "a\n", "harvest",
+                "there is no format named “harvest”; the formats are toggl, clockify, timewarrior, kimai, tessal"},
         Refusal{"MissingColumn", "Client,Project,Description,Start date,Duration\nA,B,C,2024-01-01,1:00:00\n",
-                "", "line 1: the header lacks the column “Start time” of a toggl file", 0},
-        Refusal{
-            "InvalidUTF8",
-            kTogglHeader + ",P,,ok,Yes,2024-01-01,10:00,1:00:00\n,P,,caf\xE9,Yes,2024-01-01,11:00,1:00:00\n",
-            "", "line 3 is not UTF-8 text", 0},
+                "", "line 1: the header lacks the column “Start time” of a toggl file"},
+        Refusal{"InvalidUTF8", kTogglHeader + kGoodRow + ",P,,caf\xE9,Yes,2024-01-01,11:00,1:00:00\n",
+                "", "line 3 is not UTF-8 text"},
         Refusal{"UnclosedQuote", kTogglHeader + ",P,,\"open,Yes,2024-01-01,10:00,1:00:00\n", "",
-                "line 2: a quoted field is never closed", 0},
-        Refusal{"LongLine", kTogglHeader + QByteArray(2 << 20, 'x'), "",
-                "line 2 is longer than 1048576 bytes", 0},
+                "line 2: a quoted field is never closed"},
+        Refusal{"LongLine", kTogglHeader + QByteArray(2 << 20, 'x'), "", "line 2 is longer than 1048576 bytes"},
         Refusal{"LongJSON", "[{\"annotation\": \"" + QByteArray(2 << 20, 'x') + "\"}]", "",
-                "line 1: an entry longer than 1048576 bytes", 0},
+                "line 1: an entry longer than 1048576 bytes"},
         Refusal{"BrokenJSON", "[{\"start\": \"20231001T103000Z\",\n\"tags\": [}]", "",
-                "line 2: the JSON cannot be read", 0},
+                "line 2: the JSON cannot be read"},
         Refusal{"BOMAndCRLF",
                 "\xEF\xBB\xBF" + kTogglHeader + ",P,,\"two\r\nlines\",Yes,2024-01-01,10:00,1:00:00\r\n\r\n",
                 "", "", 1},
-        Refusal{"Semicolons",
-                "Client;Project;Task;Description;Billable;Start date;Start time;Duration\n"
-                ";P;;\"a;b\";Yes;2024-01-01;10:00;1:00:00\n",
-                "", "", 1},
+        Refusal{"Semicolons", "Client;Project;Task;Description;Billable;Start date;Start time;Duration\n"
+                              ";P;;\"a;b\";Yes;2024-01-01;10:00;1:00:00\n", "", "", 1},
         Refusal{"ManyBadRows", kTogglHeader + kGoodRow + kBadRow.repeated(1500), "", "", 1, 1500}),
     [](const testing::TestParamInfo<Refusal>& info) { return std::string(info.param.name); });
+// clang-format on
 
 }  // namespace

@@ -39,9 +39,8 @@ class ImportPlanTest : public ModelTest {
 };
 
 TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdits) {
-  auto* client = makeClient(QStringLiteral("ACME"));
-  auto* project = makeProject(QStringLiteral("website"), client);
-  makeTask(project, QStringLiteral("design"));
+  makeTask(makeProject(QStringLiteral("website"), makeClient(QStringLiteral("ACME"))),
+           QStringLiteral("design"));
   saveAndReopen();
 
   const WTImportFile file = sample("toggl.csv");
@@ -52,8 +51,7 @@ TEST_F(ImportPlanTest, ReusesRecordsByNameAndASecondImportAddsNothingAndKeepsEdi
                  plan.tasks.created, plan.tasks.reused, plan.entries, plan.alreadyThere, plan.running.size()),
       std::tuple(0, 1, 0, 1, 1, 1, 2, 0, size_t(1)));
   ASSERT_EQ(plan.totals.size(), size_t(1));
-  EXPECT_EQ(plan.totals[0].minutes, 225);
-  EXPECT_EQ(plan.totals[0].money, Decimal(150));
+  EXPECT_EQ(std::pair(plan.totals[0].minutes, plan.totals[0].money), std::pair(qint64(225), Decimal(150)));
 
   WTImport::apply(*context, file, {});
   // One step of undo takes the whole import back, and redo brings it again.
@@ -96,31 +94,15 @@ TEST_F(ImportPlanTest, ASpreadsheetExportImportsIntoAnEmptyStoreAsTheSameEntries
   client->setRoundingMode("up");
   lone->setRoundingMinutes(30);
   lone->setRoundingMode("down");
-  const QTimeZone zone("Europe/Berlin");
-  const struct {
-    WTTask* task;
-    const char* name;
-    const char* notes;
-    QDateTime start;
-    int minutes;
-  } entries[] = {
-      {makeTask(site, QStringLiteral("design")), "Header, \"hero\"", "",
-       QDateTime(QDate(2024, 3, 9), QTime(9, 0), zone), 90},
-      {site->tasks().first(), "Call\nwith client", "line one\nline, two",
-       QDateTime(QDate(2024, 3, 9), QTime(23, 30), zone), 44},
-      {makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234",
-       QDateTime(QDate(2024, 10, 27), QTime(14, 5), zone), 1},
-      {lone->tasks().first(), "left running over the weekend", "",
-       QDateTime(QDate(2024, 3, 8), QTime(20, 31), zone), 54 * 60},
+  const auto add = [&](WTTask* task, const char* name, const char* notes, Date start, int minutes) {
+    WTTime* time = makeTime(task, start, start.addingSeconds(minutes * 60.0));
+    time->setName(QString::fromUtf8(name));
+    if (*notes) time->setNotes(QString::fromUtf8(notes));
   };
-  for (const auto& entry : entries) {
-    auto* time = WTTime::insertNewObject(context.get());
-    time->setTask(entry.task);
-    time->setName(QString::fromUtf8(entry.name));
-    if (*entry.notes) time->setNotes(QString::fromUtf8(entry.notes));
-    time->setStartDate(Date::fromQDateTime(entry.start));
-    time->setEndDate(Date::fromQDateTime(entry.start.addSecs(entry.minutes * 60)));
-  }
+  add(makeTask(site, QStringLiteral("design")), "Header, \"hero\"", "", berlin(2024, 3, 9, 9), 90);
+  add(site->tasks().first(), "Call\nwith client", "line one\nline, two", berlin(2024, 3, 9, 23, 30), 44);
+  add(makeTask(lone, QStringLiteral("admin")), "=SUM(A1:A2)", "+49 30 1234", berlin(2024, 10, 27, 14, 5), 1);
+  add(lone->tasks().first(), "left running over the weekend", "", berlin(2024, 3, 8, 20, 31), 54 * 60);
   const auto entriesOf = [](const WTObjectContext& records) {
     QStringList found;
     for (const WTTime* time : records.fetch<WTTime>()) {
@@ -203,9 +185,7 @@ TEST_F(ImportPlanTest, PlacesRatesWhereTheyHold) {
   EXPECT_EQ(rates, QStringList({"Five 50 | F 60 x -", "Four 100 | G - x -", "One 80 | A - x - | B - y -",
                                 "Seven - | I - x 120", "Six 1234.5 | H - x -", "Three - | E - x 70 y 60",
                                 "Two - | C 80 x - | D 90 x - y -"}));
-  EXPECT_EQ(clients[0]->storedRate(), Decimal(50));
-  const QStringList currencies = {clients[2]->currency(), clients[6]->currency()};
-  EXPECT_EQ(currencies, QStringList({"EUR", QString()}));
+  EXPECT_EQ(QStringList({clients[2]->currency(), clients[6]->currency()}), QStringList({"EUR", QString()}));
 }
 
 }  // namespace
