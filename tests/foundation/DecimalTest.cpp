@@ -201,7 +201,6 @@ TEST(DecimalTest, FromDoubleAndVariants) {
     EXPECT_FALSE(Decimal::fromVariant(none).has_value()) << none.toString().toStdString();
 
   const QVariant a = QVariant::fromValue(dec("12.30"));
-  EXPECT_EQ(a.value<Decimal>().exponent(), -2);
   EXPECT_EQ(a, QVariant::fromValue(dec("12.3")));
   EXPECT_EQ(QVariant::compare(a, QVariant::fromValue(dec("12.31"))), QPartialOrdering::Less);
   EXPECT_NE(a, QVariant(12.3));  // different types are never equal, and comparing them is safe

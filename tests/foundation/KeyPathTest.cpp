@@ -172,8 +172,6 @@ TEST(KeyPathTest, CompareValuesAcrossTypes) {
   EXPECT_LT(KeyPath::compareValues(QString("apple"), QString("Banana"), true), 0);
 }
 
-const auto names = [](const QVariantList& sorted) { return eval(sorted, "name").toStringList(); };
-
 TEST(KeyPathTest, SortIsStableAndFollowsDescriptorsInTurn) {
   Records records;
   const QVariantList values{
@@ -184,24 +182,18 @@ TEST(KeyPathTest, SortIsStableAndFollowsDescriptorsInTurn) {
       records.make({{"name", "a2"}, {"group", "alpha"}, {"date", dateVar(3)}}),
       records.make({{"name", "b3"}, {"group", "beta"}, {"date", dateVar(2)}}),
   };
-  using KeyPath::SortDescriptor;
-  // clang-format off
-  const std::pair<QList<SortDescriptor>, const char*> orders[] = {
-      {{{"group", true, true}}, "n1 a1 a2 b1 b2 b3"}, {{{"group", true, false}}, "n1 a1 b2 a2 b1 b3"},
-      {{{"group", false, true}}, "b1 b2 b3 a1 a2 n1"},
-      {{{"group", true, true}, {"date", false}}, "n1 a2 a1 b1 b3 b2"}, {{}, "b1 a1 n1 b2 a2 b3"}};
-  // clang-format on
-  for (const auto& [descriptors, expected] : orders)
-    EXPECT_EQ(names(KeyPath::sorted(values, descriptors)).join(' '), expected);
-
-  const QVariant acme = records.make({{"name", "acme"}});
-  const QVariant zeta = records.make({{"name", "Zeta"}});
-  const QVariantList projects{records.make({{"name", "p1"}, {"client", zeta}}),
-                              records.make({{"name", "p2"}, {"client", acme}}),
+  const QVariantList projects{records.make({{"name", "p1"}, {"client", records.make({{"name", "Zeta"}})}}),
+                              records.make({{"name", "p2"}, {"client", records.make({{"name", "acme"}})}}),
                               records.make({{"name", "p3"}})};
-  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, true}})), QStringList({"p3", "p2", "p1"}));
-  EXPECT_EQ(names(KeyPath::sorted(projects, {{"client.name", true, false}})),
-            QStringList({"p3", "p1", "p2"}));
+  // clang-format off
+  const std::tuple<QVariantList, QList<KeyPath::SortDescriptor>, const char*> orders[] = {
+      {values, {{"group", true, true}}, "n1 a1 a2 b1 b2 b3"}, {values, {{"group", true, false}}, "n1 a1 b2 a2 b1 b3"},
+      {values, {{"group", false, true}}, "b1 b2 b3 a1 a2 n1"},
+      {values, {{"group", true, true}, {"date", false}}, "n1 a2 a1 b1 b3 b2"}, {values, {}, "b1 a1 n1 b2 a2 b3"},
+      {projects, {{"client.name", true, true}}, "p3 p2 p1"}, {projects, {{"client.name", true, false}}, "p3 p1 p2"}};
+  // clang-format on
+  for (const auto& [list, descriptors, expected] : orders)
+    EXPECT_EQ(eval(KeyPath::sorted(list, descriptors), "name").toStringList().join(' '), expected);
 
   const QVariantList numbers{3, decVar("1.5"), QVariant(), 2.0};
   EXPECT_EQ(KeyPath::sorted(numbers, {{"", true, false}}), (QVariantList{QVariant(), decVar("1.5"), 2.0, 3}));
