@@ -384,45 +384,34 @@ TEST_F(WTStoreTest, PartialLoadsReadTheOwnersAndTheChosenItemsOnly) {
   makeStore(records);
   auto store = open();
   ASSERT_TRUE(store);
-  using Pick = std::function<bool(const WTStoreRecord&)>;
-  const auto owner = [](const WTStoreRecord& r) {
-    return r.entity == u"WTClient" || r.entity == u"WTProject" || r.entity == u"WTTask";
-  };
-  const auto ownersAnd = [&](Pick item) -> Pick { return [=](auto& r) { return owner(r) || item(r); }; };
-  const auto ofTasks = [&](QStringList tasks) -> Pick {
-    return ownersAnd([=](auto& r) { return tasks.contains(r.taskUuid); });
-  };
-  // The running entries and the tasks `named`, with their projects, every task of those and their clients.
-  const auto runningAnd = [&](QStringList tasks) -> Pick {
-    QStringList projects, clients;
-    for (const auto& [uuid, r] : records)
-      if (r.running && !owner(r)) tasks.append(r.taskUuid);
-    for (const auto& [uuid, r] : records)
-      if (tasks.contains(uuid) && !r.projectUuid.isNull()) projects.append(r.projectUuid);
-    for (const auto& [uuid, r] : records)
-      if (projects.contains(uuid) && !r.clientUuid.isNull()) clients.append(r.clientUuid);
-    return [=](auto& r) {
-      return (r.running && !owner(r)) || tasks.contains(r.uuid) || projects.contains(r.uuid) ||
-             clients.contains(r.uuid) || (r.entity == u"WTTask" && projects.contains(r.projectUuid));
-    };
-  };
+  // Every load but the one by names reads all clients, projects and tasks.
+  const QStringList owners = {"C1@WTClient",  "C2@WTClient",  "C4@WTClient",  "P1@WTProject",
+                              "P2@WTProject", "P3@WTProject", "P4@WTProject", "T1@WTTask",
+                              "T2@WTTask",    "T9@WTTask",    quoted,         "E@WTTask",
+                              "X@WTTask",     "K@WTTask",     "O@WTTask",     "S@WTTask"};
+  const QStringList running = {"I1@WTTime", "R@WTTime"};
+  // The load by names reads the running entries and their tasks, the tasks named, their projects with
+  // every task of those, and their clients.
+  const QStringList runningTask =
+      running + QStringList{"T1@WTTask", "T2@WTTask", "P1@WTProject", "C1@WTClient"};
   // The statement is used again: the next load's tasks replace the last one's.
-  const std::tuple<WTStore::Records, QStringList, Pick> cases[] = {
-      {WTStore::Records::Timers, {"T1@WTTask"}, ownersAnd([](auto& r) { return r.running; })},
-      {WTStore::Records::ItemsOfTasks, {"T1@WTTask", quoted}, ofTasks({"T1@WTTask", quoted})},
-      {WTStore::Records::ItemsOfTasks, {}, ofTasks({})},
-      {WTStore::Records::ItemsOfTasks, {quoted}, ofTasks({quoted})},
-      {WTStore::Records::RunningAndNamed, {}, runningAnd({})},
+  const std::tuple<WTStore::Records, QStringList, QStringList> cases[] = {
+      {WTStore::Records::Timers, {"T1@WTTask"}, owners + running},
+      {WTStore::Records::ItemsOfTasks,
+       {"T1@WTTask", quoted},
+       owners + running + QStringList{"I2@WTFlat", "I3@WTExpense", "I4@WTNote", quoted + "-item@WTNote"}},
+      {WTStore::Records::ItemsOfTasks, {}, owners},
+      {WTStore::Records::ItemsOfTasks, {quoted}, owners + QStringList{quoted + "-item@WTNote"}},
+      {WTStore::Records::RunningAndNamed, {}, runningTask},
       {WTStore::Records::RunningAndNamed,
        {"école", "KELVIN"},
-       runningAnd({"E@WTTask", "O@WTTask", "K@WTTask"})},
-      {WTStore::Records::RunningAndNamed, {"STRASSE", "Review", " other"}, runningAnd({})}};
+       runningTask + QStringList{"E@WTTask", "O@WTTask", "K@WTTask", "X@WTTask", "P2@WTProject",
+                                 "P3@WTProject", "C2@WTClient"}},
+      {WTStore::Records::RunningAndNamed, {"STRASSE", "Review", " other"}, runningTask}};
   for (const auto& [which, keys, picked] : cases) {
     SCOPED_TRACE(keys.join(',').toStdString());
     Records expected;
-    for (const auto& [uuid, r] : records)
-      if (picked(r)) expected[uuid] = r;
-    ASSERT_LT(expected.size(), records.size());
+    for (const QString& uuid : picked) expected[uuid] = records.at(uuid);
     expectSameRecords(loadAll(*store, which, keys), expected);
   }
 }
