@@ -19,6 +19,7 @@ class RangePredicateTest : public ModelTest {
 
   void SetUp() override {
     ModelTest::SetUp();
+    setNow(berlin(2024, 4, 2, 12));  // a Tuesday
     task = makeTask();
   }
   WTTask* task = nullptr;
@@ -28,7 +29,6 @@ class RangePredicateTest : public ModelTest {
 
 // Ranges include both bounds; weeks begin on Sunday: Tuesday 2 April 2024's week began on 31 March.
 TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
-  setNow(berlin(2024, 4, 2, 12));
   // clang-format off
   const std::pair<Date, const char*> entries[] = {
       {berlin(2024, 4, 2), "11101010"}, {berlin(2024, 4, 1, 23, 59), "01101010"}, {berlin(2024, 3, 31), "00110110"},
@@ -42,7 +42,6 @@ TEST_F(RangePredicateTest, PresetsAcrossDaylightChangesAndYearEnds) {
 
 // A custom range covers its end day; "any date" takes undated items; incomplete tags give no predicate.
 TEST_F(RangePredicateTest, CustomRangesAndAnyDate) {
-  setNow(berlin(2024, 4, 2, 12));
   const Date march3 = berlin(2024, 3, 3, 15, 20);
   const WTItemPredicate custom = WTRangePredicate::predicateForTag(WTRangePredicate::Custom, march3, march3);
   ASSERT_TRUE(custom);
@@ -65,7 +64,6 @@ TEST_F(RangePredicateTest, CustomRangesAndAnyDate) {
 
 // Whether each word of the command line takes an entry of Monday 1 April 2024 and one of June 2023.
 TEST_F(RangePredicateTest, CommandLineWords) {
-  setNow(berlin(2024, 4, 2, 12));
   const WTItem* monday = entryAt(berlin(2024, 4, 1, 9));
   const WTItem* lastYear = entryAt(berlin(2023, 6, 1, 9));
   // clang-format off
