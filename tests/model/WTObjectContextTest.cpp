@@ -65,8 +65,7 @@ QMap<QString, QString> storedValues(WTObjectContext& context) {
 }
 
 TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
-  auto* client = WTClient::insertNewObject(context.get());
-  client->setName("Client Ü");
+  auto* client = makeClient("Client Ü");
   client->setAddressBookUID("ab:1");
   client->setTotalsUID("tot");
   client->setRate(dec("120.00"));
@@ -76,8 +75,7 @@ TEST_F(WTObjectContextTest, EveryValueSurvivesTheStoreFile) {
   client->setAddress("1 Main St\nSpringfield");
   client->setRoundingMinutes(15);
   client->setRoundingMode("up");
-  auto* project = WTProject::insertNewObject(context.get());
-  project->setClient(client);
+  auto* project = makeProject({}, client);
   project->setBudget(dec("2500.00"));
   project->setRoundingMinutes(6);
   WTTask* first = makeTask(project, "first");
