@@ -21,6 +21,10 @@ std::string requestHead(const std::string& extraHeaders) {
   return "POST /sync/tessal/sync.php HTTP/1.1\r\nHost: 127.0.0.1\r\nContent-Type: application/json\r\n" +
          extraHeaders + "\r\n";
 }
+// The whole request for `body`, after which the server closes the connection.
+std::string closingRequest(const std::string& body) {
+  return requestHead("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+}
 
 class ServerHardeningTest : public ServerTest {
  protected:
@@ -91,20 +95,19 @@ TEST_P(ServerHardeningTest, BodiesInFlightShareOneBudget) {
   const std::string user = newUser("owner");
   const std::string padding(80 << 10, ' '),
       body = requestBody(user, "password-of-" + user, "head", 0, "laptop");
-  const std::string sized = requestHead(
-      "Connection: close\r\nContent-Length: " + std::to_string(padding.size() + body.size()) + "\r\n");
+  const std::string whole = closingRequest(padding + body);
   auto chunk = [](const std::string& bytes) {
     return (std::stringstream() << std::hex << bytes.size()).str() + "\r\n" + bytes + "\r\n";
   };
   auto holder = std::make_unique<RawConnection>(port());
-  ASSERT_TRUE(holder->send(sized + padding));  // and never the rest
-  std::this_thread::sleep_for(300ms);          // read by the server
+  ASSERT_TRUE(holder->send(whole.substr(0, whole.size() - body.size())));  // and never the rest
+  std::this_thread::sleep_for(300ms);                                      // read by the server
   const std::pair<std::string, int> rows[] = {
-      {sized + padding + body, 503},
+      {whole, 503},
       {requestHead("Connection: close\r\nTransfer-Encoding: chunked\r\n") + chunk(padding) + chunk(body) +
            "0\r\n\r\n",
        503},
-      {sized + padding + body, 200}};  // once the holder is gone
+      {whole, 200}};  // once the holder is gone
   for (const auto& row : rows) {
     if (row.second == 200) holder.reset(), std::this_thread::sleep_for(200ms);  // the server saw it close
     RawConnection connection(port());
@@ -125,9 +128,7 @@ TEST_P(ServerHardeningTest, RepliesWaitingForTheirReadersShareOneBudget) {
   const std::string user = newUser("owner");
   const std::string note = R"({"i":{"big@WTNote":{"text":")" + std::string(8 << 20, 'n') + R"("}}})";
   ASSERT_EQ(sync(user, "save", 0, "laptop", note).integer("iteration"), 1);
-  const std::string body = requestBody(user, "password-of-" + user, "head", 0, "reader");
-  const std::string ask =
-      requestHead("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+  const std::string ask = closingRequest(requestBody(user, "password-of-" + user, "head", 0, "reader"));
   // Two readers that do not read: the first reply (about 16 MiB) waits, the second does not fit.
   RawConnection first(port()), second(port());
   ASSERT_TRUE(first.send(ask) && second.send(ask));
@@ -158,9 +159,7 @@ TEST_P(ServerHardeningTest, ConnectionsAreCappedPerAddress) {
   options.limits.maxConnectionsPerAddress = 3;
   startServer();
   const std::string user = newUser("owner");
-  const std::string body = requestBody(user, "password-of-" + user, "head", 0, "laptop");
-  const std::string ask =
-      requestHead("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+  const std::string ask = closingRequest(requestBody(user, "password-of-" + user, "head", 0, "laptop"));
   std::vector<std::unique_ptr<RawConnection>> held;
   for (int i = 0; i < 3; ++i) held.push_back(std::make_unique<RawConnection>(port()));
   std::this_thread::sleep_for(200ms);  // accepted
