@@ -114,31 +114,17 @@ int RawConnection::status(const std::string& response) {
   return response.rfind("HTTP/1.1 ", 0) == 0 && response.size() >= 12 ? std::stoi(response.substr(9, 3)) : 0;
 }
 
-LocalServer::LocalServer(const std::string& location, const std::string& email, const std::string& password)
-    : location_(location) {
-  options_.threads = 8;
-  EXPECT_TRUE(start());
-  EXPECT_EQ(server_->authenticator().createAccount(email, password),
-            tessal::server::PasswordAuthenticator::SignUp::Created);
-}
-
-namespace {
-
-// A server over `location` on loopback, started; null, with the failure recorded, when it did not start.
-std::unique_ptr<SyncServer> startedServer(const std::string& location, const SyncServer::Options& options) {
+std::unique_ptr<SyncServer> startedServer(const std::string& location, const SyncServer::Options& options,
+                                          const std::string& email, const std::string& password) {
   std::string error;
   std::unique_ptr<SyncServer> server = SyncServer::create(location, options, error);
-  if (server && server->start(error)) return server;
-  ADD_FAILURE() << "the server did not start: " << error;
-  return nullptr;
-}
-
-}  // namespace
-
-bool LocalServer::start() {
-  server_ = startedServer(location_, options_);
-  if (server_) options_.port = server_->port();  // a restart comes back on the same port
-  return server_ != nullptr;
+  if (!server || !server->start(error)) {
+    ADD_FAILURE() << "the server did not start: " << error;
+    return nullptr;
+  }
+  EXPECT_TRUE(email.empty() || server->authenticator().createAccount(email, password) ==
+                                   tessal::server::PasswordAuthenticator::SignUp::Created);
+  return server;
 }
 
 void StorageTest::SetUp() {

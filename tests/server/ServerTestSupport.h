@@ -72,21 +72,13 @@ class RawConnection {
   bool connected_ = false;
 };
 
-// The sync server in this process over `location`, with one account; a restart takes the same port.
-class LocalServer {
- public:
-  LocalServer(const std::string& location, const std::string& email, const std::string& password);
-  ~LocalServer() { stop(); }
-  bool start();
-  void stop() { server_.reset(); }  // a server stops as it goes
-  int port() const { return options_.port; }
-  QString address() const { return QStringLiteral("http://127.0.0.1:%1").arg(options_.port); }
-
- private:
-  std::string location_;
-  SyncServer::Options options_;
-  std::unique_ptr<SyncServer> server_;
-};
+// A sync server in this process over `location`, started (it stops as it goes); null, with the failure
+// recorded, when it did not start. With an `email`, the storage gets that account.
+std::unique_ptr<SyncServer> startedServer(const std::string& location, const SyncServer::Options& options,
+                                          const std::string& email = {}, const std::string& password = {});
+inline QString address(const SyncServer& server) {
+  return QStringLiteral("http://127.0.0.1:%1").arg(server.port());
+}
 
 // Each test on each storage (PostgreSQL when TESSAL_TEST_POSTGRES names a cluster).
 class StorageTest : public testing::TestWithParam<Storage> {

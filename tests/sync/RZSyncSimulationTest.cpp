@@ -26,6 +26,9 @@ using namespace synctest;
 
 namespace {
 
+// The account every device syncs.
+const QString kUser = QStringLiteral("sim@example.org"), kPassword = QStringLiteral("simulation password");
+
 // A save the server applied: the request's "data", base and device, and the iteration its changes got.
 struct AppliedSave {
   QVariantMap data;
@@ -153,16 +156,17 @@ class Servers {
 
 class OneServer final : public Servers {
  public:
-  OneServer(servertest::LocalServer& server, const std::string& location)
-      : Servers(location), server_(server) {}
+  OneServer(const std::string& location, std::unique_ptr<servertest::SyncServer> server)
+      : Servers(location), location_(location), server_(std::move(server)) {}
   servertest::Reply deliver(const std::string& path, const std::string& body, bool&) override {
-    return servertest::post(server_.port(), path, body);
+    return server_ ? servertest::post(server_->port(), path, body) : servertest::Reply{};  // none while down
   }
-  void stop() override { server_.stop(); }
-  bool start() override { return server_.start(); }
+  void stop() override { server_.reset(); }
+  bool start() override { return (server_ = servertest::startedServer(location_, {})) != nullptr; }
 
  private:
-  servertest::LocalServer& server_;
+  std::string location_;
+  std::unique_ptr<servertest::SyncServer> server_;
 };
 
 // Three server processes over one database. Each request goes to any of them; now and then the one
@@ -229,8 +233,6 @@ class Simulation {
     for (int i = std::uniform_int_distribution<int>(3, 5)(random_); i > 0; --i)
       clients_.push_back(std::make_unique<SyncClient>(proxy_.address(), kUser, kPassword));
   }
-  static inline const QString kUser = QStringLiteral("sim@example.org");
-  static inline const QString kPassword = QStringLiteral("simulation password");
 
   void run(int steps) {
     for (int step = 0; step < steps; ++step) {
@@ -494,9 +496,8 @@ TEST_P(RZSyncSimulation, RandomEditsLossesAndARestartConverge) {
   for (const unsigned seed : seeds(2)) {
     SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
     const servertest::StorageLocation storage(GetParam());
-    servertest::LocalServer server(storage.location(), Simulation::kUser.toStdString(),
-                                   Simulation::kPassword.toStdString());
-    OneServer one(server, storage.location());
+    OneServer one(storage.location(), servertest::startedServer(storage.location(), {}, kUser.toStdString(),
+                                                                kPassword.toStdString()));
     Simulation simulation(seed, one);
     simulation.run(600);
     ASSERT_TRUE(simulation.settle()) << "no quiescence";
@@ -511,12 +512,9 @@ TEST(RZSyncReplicaSimulation, RandomEditsOnThreeReplicasKilledWhileTheyAnswerCon
   for (const unsigned seed : seeds(1)) {
     SCOPED_TRACE(testing::Message() << "TESSAL_SYNC_SEED=" << seed);
     const servertest::StorageLocation storage(servertest::Storage::PostgreSQL);
-    {
-      servertest::LocalServer accounts(storage.location(), Simulation::kUser.toStdString(),
-                                       Simulation::kPassword.toStdString());
-    }
-    Replicas replicas(storage.location(), Simulation::kUser.toStdString(),
-                      Simulation::kPassword.toStdString(), seed);
+    // The account is made by a server that goes at once.
+    servertest::startedServer(storage.location(), {}, kUser.toStdString(), kPassword.toStdString());
+    Replicas replicas(storage.location(), kUser.toStdString(), kPassword.toStdString(), seed);
     Simulation simulation(seed, replicas);
     simulation.run(600);
     replicas.killPercent = 0;
@@ -534,13 +532,12 @@ class RZSyncTwoDevices : public servertest::StorageTest {
   void SetUp() override {
     StorageTest::SetUp();
     if (IsSkipped()) return;
-    const QString user = Simulation::kUser, password = Simulation::kPassword;
-    server = std::make_unique<servertest::LocalServer>(storage_->location(), user.toStdString(),
-                                                       password.toStdString());
-    here = std::make_unique<SyncClient>(server->address(), user, password);
-    there = std::make_unique<SyncClient>(server->address(), user, password);
+    server =
+        servertest::startedServer(storage_->location(), {}, kUser.toStdString(), kPassword.toStdString());
+    here = std::make_unique<SyncClient>(servertest::address(*server), kUser, kPassword);
+    there = std::make_unique<SyncClient>(servertest::address(*server), kUser, kPassword);
   }
-  std::unique_ptr<servertest::LocalServer> server;
+  std::unique_ptr<servertest::SyncServer> server;
   std::unique_ptr<SyncClient> here, there;
 };
 
@@ -593,7 +590,7 @@ TEST_P(RZSyncTwoDevices, ARestoredCopyNeitherResurrectsNorDrops) {
   EXPECT_EQ(names, QStringList({"Added here", "Added there", "Renamed since"}));
   EXPECT_EQ(snapshot(*here.context), snapshot(*there.context));
   // A device set up afresh gets the same from the server, also with settings copied from another device.
-  SyncClient fresh(server->address(), Simulation::kUser, Simulation::kPassword);
+  SyncClient fresh(servertest::address(*server), kUser, kPassword);
   fresh.defaults->setValue("WTSyncDevice", there.defaults->stringForKey("WTSyncDevice"));
   fresh.defaults->setValue("WTSyncDeviceMachine", "another machine");
   fresh.reopen();
