@@ -214,9 +214,8 @@ TEST_P(ServerHardeningTest, GuessesLockOutNoDeviceAndStrangersCannotSignUp) {
   // above but the laptop's proof; it remembers no success, so every row is verified.
   SyncServer::Options fresh = options;
   fresh.authentication.successLifetime = 0ms;
-  std::string error;
-  const std::unique_ptr<SyncServer> replica = SyncServer::create(storage_->location(), fresh, error);
-  ASSERT_TRUE(replica && replica->start(error)) << error;
+  const std::unique_ptr<SyncServer> replica = startedServer(storage_->location(), fresh);
+  ASSERT_TRUE(replica);
   // Secret, device, X-Forwarded-For (as a proxy on loopback names a client): a status, or 2 for the error
   // code. The laptop is proven: past the lock on its address; the phone is new, at the guesser's address.
   // clang-format off
