@@ -16,6 +16,7 @@
 
 #include <algorithm>
 #include <functional>
+#include <vector>
 
 WT_ENTITY_CLASS_IMPL(WTTask)
 
@@ -279,6 +280,7 @@ std::optional<WTTask::Clash> WTTask::clashOfAdopting(const QList<WTItem*>& items
     if (time && time->startDate())
       moving.push_back(spanOf(*time, day ? time->startOnDayOf(*day) : *time->startDate()));
   }
+  // What a moving entry may meet: the entries the task keeps, earliest first, then the others that move.
   std::vector<Span> others;
   for (const WTTime* time : times()) {
     const bool moves =
