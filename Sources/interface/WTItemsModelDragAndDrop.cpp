@@ -120,17 +120,16 @@ bool WTItemsModel::dropMimeData(const QMimeData* data, Qt::DropAction action, in
   } else {
     const QList<WTItem*> items = objectsOfDrag<WTItem>(context_, uuids);
     const Node* target = nodeOf(parent);
-    WTTask* task =
-        target->kind == Node::Task ? static_cast<WTTask*>(target->object) : target->container->task();
-    const std::optional<Date> day = target->kind == Node::Task ? std::nullopt : target->container->date();
-    // Onto "Pending" only to-dos move: no time entry can clash there.
+    const bool keepsDates = target->kind == Node::Task;
+    WTTask* task = keepsDates ? static_cast<WTTask*>(target->object) : target->container->task();
+    const std::optional<Date> day = keepsDates ? std::nullopt : target->container->date();
+    // Onto "Pending" (no day) only to-dos move: no time entry can clash there.
     if (const std::optional<WTTask::Clash> clash =
-            target->kind == Node::Task || day ? task->clashOfAdopting(items, day) : std::nullopt) {
+            keepsDates || day ? task->clashOfAdopting(items, day) : std::nullopt) {
       emit dropRefused(clashRefusal(*task, *clash));
       return false;
     }
-    const QList<WTItem*> adopted =
-        target->kind == Node::Task ? task->adoptItems(items) : task->adoptItems(items, day);
+    const QList<WTItem*> adopted = keepsDates ? task->adoptItems(items) : task->adoptItems(items, day);
     moved = {adopted.begin(), adopted.end()};
   }
   if (!moved.isEmpty()) emit recordsDropped(moved);

@@ -263,18 +263,15 @@ QMenu* WTItemsViewController::itemMenu(WTItem* item) {
   QMenu* tasks = menu->addMenu(tr("Move to Task"));
   for (WTTask* task : project_ ? project_->tasks() : QList<WTTask*>()) {
     if (task == item->task()) continue;
-    tasks->addAction(
-        task->name().isEmpty() ? tr("Untitled Task") : task->name(), this, [this, task, itemNow] {
-          WTItem* item = itemNow();
-          if (!item) return;
-          if (const std::optional<WTTask::Clash> clash = task->clashOfAdopting({item}, std::nullopt)) {
-            showMoveRefusal(WTItemsModel::clashRefusal(*task, *clash), rowRect(item));
-            return;
-          }
-          const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
-          const QList<WTItem*> moved = task->adoptItems({item});
-          revealObjects({moved.begin(), moved.end()});
-        });
+    tasks->addAction(task->name().isEmpty() ? tr("Untitled Task") : task->name(), this,
+                     [this, task, itemNow] {
+                       WTItem* item = itemNow();
+                       if (!item) return;
+                       if (moveRefused(*task, item, std::nullopt)) return;
+                       const WTUndoManager::NamedStep named(context_->undoManager(), tr("Move"));
+                       const QList<WTItem*> moved = task->adoptItems({item});
+                       revealObjects({moved.begin(), moved.end()});
+                     });
   }
   tasks->setEnabled(!tasks->isEmpty());
   menu->addAction(tr("Change Date…"), this, [this, itemNow, row] {
@@ -493,19 +490,20 @@ void WTItemsViewController::popoverWillClose() {
   if (picked.isValid() && picked != old.date() && picked != shownDate_) {
     const Date day = Date::fromQDateTime(QDateTime(picked, old.time()));
     WTTask* task = item->task();
-    if (const std::optional<WTTask::Clash> clash = task ? task->clashOfAdopting({item}, day) : std::nullopt) {
-      showMoveRefusal(WTItemsModel::clashRefusal(*task, *clash), rowRect(item));
-      return;
-    }
-    item->setDate(day);
+    if (!task || moveRefused(*task, item, day)) return;
+    task->adoptItems({item}, day);
     context_->undoManager().setActionName(tr("Move"));
     refreshChildren(item);
   }
 }
 
-QRect WTItemsViewController::rowRect(WTItem* item) const {
+bool WTItemsViewController::moveRefused(const WTTask& task, WTItem* item, std::optional<Date> day) {
+  const std::optional<WTTask::Clash> clash = task.clashOfAdopting({item}, day);
+  if (!clash) return false;
   const QRect row = outlineView_->visualRect(treeController_->indexOfObject(item));
-  return QRect(outlineView_->viewport()->mapToGlobal(row.topLeft()), row.size());
+  showMoveRefusal(WTItemsModel::clashRefusal(task, *clash),
+                  QRect(outlineView_->viewport()->mapToGlobal(row.topLeft()), row.size()));
+  return true;
 }
 
 void WTItemsViewController::showMoveRefusal(const QString& reason, const QRect& anchor) {

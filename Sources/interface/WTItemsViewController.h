@@ -1,5 +1,6 @@
 #pragma once
 
+#include "Date.h"
 #include "WTEntity.h"
 #include "WTTableCellView.h"
 #include "WTViewController.h"
@@ -8,6 +9,8 @@
 #include <QHash>
 #include <QPointer>
 #include <QSet>
+
+#include <optional>
 
 class QLabel;
 class QLineEdit;
@@ -95,8 +98,9 @@ class WTItemsViewController : public WTViewController {
   void revealObjects(const QList<WTObject*>& objects);
   // Tells why a move (a drop, a new day, another task) did not happen, at `anchor` (global coordinates).
   void showMoveRefusal(const QString& reason, const QRect& anchor);
-  // The item's row in global coordinates.
-  QRect rowRect(WTItem* item) const;
+  // Whether moving the item onto `task` (onto `day`, or keeping its date) would make it share time with
+  // another entry there; if so, says so under its row.
+  bool moveRefused(const WTTask& task, WTItem* item, std::optional<Date> day);
 
   // Row heights: a task or group row takes its cell's height, an item row at least 30 points.
   qreal heightOfRow(const QModelIndex& index);
