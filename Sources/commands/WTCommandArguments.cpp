@@ -4,6 +4,8 @@
 
 #include <QCollator>
 
+#include <algorithm>
+
 #include <cstdio>
 #include <cstdlib>
 
@@ -42,6 +44,14 @@ QString parse(QCommandLineParser& parser, const QStringList& arguments, const QS
 bool sortsBefore(const QString& a, const QString& b) {
   static const QCollator collator;
   return collator.compare(a, b) < 0;
+}
+
+void writeText(QTextStream& out, QStringView text) {
+  // The stream encodes and writes what it holds once it holds more than 16 Ki units.
+  constexpr qsizetype kSlice = 16 << 10;
+  for (qsizetype at = 0; at < text.size(); at += kSlice)
+    out << text.sliced(at, std::min(kSlice, text.size() - at));
+  out.flush();
 }
 
 void endProcess(int status, QTextStream& out, QTextStream& err, WTObjectContext& context) {

@@ -18,6 +18,7 @@ using WTCommandArguments::endProcess;
 using WTCommandArguments::failure;
 using WTCommandArguments::parse;
 using WTCommandArguments::usage;
+using WTCommandArguments::writeText;
 
 constexpr char kReportUsage[] =
     "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--range RANGE] [--template FILE] "
@@ -39,10 +40,12 @@ ReportFormat formatOf(const QString& path) {
 
 bool reportCommandWritesPDF(const QStringList& arguments) {
   for (qsizetype i = 0; i + 1 < arguments.size(); ++i) {
-    if (arguments[i] == QLatin1String("--out") && formatOf(arguments[i + 1]) == ReportFormat::PDF) return true;
+    if (arguments[i] == QLatin1String("--out") && formatOf(arguments[i + 1]) == ReportFormat::PDF)
+      return true;
   }
   for (const QString& argument : arguments) {
-    if (argument.startsWith(QLatin1String("--out=")) && formatOf(argument.mid(6)) == ReportFormat::PDF) return true;
+    if (argument.startsWith(QLatin1String("--out=")) && formatOf(argument.mid(6)) == ReportFormat::PDF)
+      return true;
   }
   return false;
 }
@@ -71,14 +74,16 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const QString outPath = parser.value(QStringLiteral("out"));
   const ReportFormat format = outPath.isEmpty() ? ReportFormat::HTML : formatOf(outPath);
   if (format == ReportFormat::Unknown)
-    return usage(err, kReportUsage, QStringLiteral("%1: the file name must end in .html, .pdf or .csv").arg(outPath));
+    return usage(err, kReportUsage,
+                 QStringLiteral("%1: the file name must end in .html, .pdf or .csv").arg(outPath));
   const QString templatePath = parser.value(QStringLiteral("template"));
   if (!templatePath.isEmpty() && !QFileInfo(templatePath).isFile())
     return usage(err, kReportUsage, QStringLiteral("%1: no such file").arg(templatePath));
 
   const std::optional<WTNamedProjects> named =
-      byProject ? WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")))
-                : WTNamedProjects::read(err, WTNamedProjects::Client, parser.value(QStringLiteral("client")));
+      byProject
+          ? WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")))
+          : WTNamedProjects::read(err, WTNamedProjects::Client, parser.value(QStringLiteral("client")));
   if (!named) return 1;
   const QList<WTProject*>& projects = named->projects;
   const QString& title = named->title;
@@ -97,12 +102,13 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
       return failure(err, QStringLiteral("%1: could not be read as a template").arg(path));
     }
     if (!report.errors.empty()) {
-      for (const WTReportTemplateError& error : report.errors) err << "error " << error.code << ": " << error.message << '\n';
+      for (const WTReportTemplateError& error : report.errors)
+        err << "error " << error.code << ": " << error.message << '\n';
       err.flush();
       return 1;
     }
     if (outPath.isEmpty()) {
-      out << report.html;
+      writeText(out, report.html);
       endProcess(0, out, err, named->snapshot->context());
     }
     if (format == ReportFormat::HTML) {
@@ -145,10 +151,10 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
   const WTProject* project = scope->project;
   const QString outPath = parser.value(QStringLiteral("out"));
   if (outPath.isEmpty()) {
-    out << (spreadsheet ? WTCSVExport::spreadsheetCSV(
-                              WTCSVExport::billableItemsMatching(context, predicate.value(), project))
-                        : WTCSVExport::timesCSV(
-                              WTRangePredicate::timesMatching(context, predicate.value(), project)));
+    writeText(out, spreadsheet ? WTCSVExport::spreadsheetCSV(
+                                     WTCSVExport::billableItemsMatching(context, predicate.value(), project))
+                               : WTCSVExport::timesCSV(
+                                     WTRangePredicate::timesMatching(context, predicate.value(), project)));
     out.flush();
     return 0;
   }

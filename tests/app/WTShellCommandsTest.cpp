@@ -1,6 +1,7 @@
 // The real `tessal` commands over a real store file, alone or beside a desktop copy holding the store.
 #include "CommandLineInstallation.h"
 #include "TestFiles.h"
+#include "WTCommandArguments.h"
 #include "WTSingleInstance.h"
 
 #include <QColor>
@@ -80,8 +81,9 @@ TEST_F(TrackCommand, StartsStopsAndTellsWhatRunsOnTheStoreItself) {
   EXPECT_EQ(here.expect({"status"}, 1, "").out, "No timer is running\n");
   EXPECT_EQ(here.out({"start", "design", "--project", "ATLAS"}), "Started Atlas › Design\n");
   // A developer's logging rules still show the journal's lines; without them stderr stays empty.
-  EXPECT_TRUE(here.expect({"start", kQuoted.toUpper()}, 0, "", {{"QT_LOGGING_RULES", "tessal.sync.debug=true"}})
-                  .err.contains("tessal.sync: INSERT("));
+  EXPECT_TRUE(
+      here.expect({"start", kQuoted.toUpper()}, 0, "", {{"QT_LOGGING_RULES", "tessal.sync.debug=true"}})
+          .err.contains("tessal.sync: INSERT("));
   EXPECT_EQ(running(), QStringList({"Atlas/" + kQuoted, "Atlas/Design"}));
   EXPECT_EQ(times(), 3);
 
@@ -456,6 +458,21 @@ TEST_F(ReportCommand, WritesTheReportAsHtmlPdfAndCsvAndExportsARange) {
   EXPECT_EQ(
       here.out({"export", "--format", "spreadsheet", "--range", "2026-03-02..2026-03-02"}).find("Design"),
       std::string::npos);
+}
+
+// A report or an export goes to stdout in slices: each character arrives, in UTF-8, even a pair of
+// surrogates across the end of a slice, and all of it is out when the writing returns (the process may end
+// without unwinding).
+TEST(WTCommandArguments, ALongTextReachesItsFileWholeInUtf8) {
+  const QString grin = QStringLiteral("\U0001F600");
+  const QString text = QString(16383, u'a') + grin + QString(16382, u'ä') + grin + QString(40000, u'z');
+  QTemporaryDir folder;
+  QFile file(folder.filePath("out.txt"));
+  ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+  QTextStream out(&file);
+  out << "head ";
+  WTCommandArguments::writeText(out, text);
+  EXPECT_EQ(fileBytes(file.fileName()), "head " + text.toUtf8());
 }
 
 // Names that fit no record or several (1, naming the candidates) and broken templates write nothing.
