@@ -62,8 +62,17 @@ QVariant WTMoneyFilter::filterInvoked(const QString& filter, const QStringList& 
     currency = GXTemplateValue::isNil(named) ? args.first() : GXTemplateValue::description(named);
   }
   if (!isCurrencyCode(currency)) currency.clear();
-  if (rate) return MoneyFormat::formatRate(*amount, currency);
-  return currency.isEmpty() ? MoneyFormat::format(*amount) : MoneyFormat::format(*amount, currency);
+  for (const Written& written : written_) {
+    if (written.rate == rate && written.amount == *amount && written.currency == currency &&
+        !written.text.isNull())
+      return written.text;
+  }
+  QString text = rate                 ? MoneyFormat::formatRate(*amount, currency)
+                 : currency.isEmpty() ? MoneyFormat::format(*amount)
+                                      : MoneyFormat::format(*amount, currency);
+  written_[nextWritten_] = {rate, *amount, currency, text};
+  nextWritten_ = (nextWritten_ + 1) % written_.size();
+  return text;
 }
 
 void loadReportFilters(GXTemplateEngine& engine) {

@@ -1,6 +1,11 @@
 #pragma once
 
+#include "Decimal.h"
 #include "GXTemplateFilter.h"
+
+#include <QString>
+
+#include <array>
 
 // The filters of the report window, which loads them for its reports (and the template command with it):
 // "digiclock" writes the value's integer value as minutes of duration text ("01:30"), "decimal" writes a
@@ -28,7 +33,18 @@ class WTMoneyFilter : public GXTemplateFilter {
   QVariant filterInvoked(const QString& filter, const QStringList& args, const QVariant& value) override;
 
  private:
+  // A text written lately. A report writes its task's rate on every line and the same few amounts on many
+  // lines; the text of an amount in a currency does not change while a report is written.
+  struct Written {
+    bool rate = false;
+    Decimal amount;
+    QString currency;
+    QString text;
+  };
+
   GXTemplateEngine* engine_;
+  std::array<Written, 8> written_;
+  size_t nextWritten_ = 0;
 };
 
 // Loads every filter a report uses (these two, "html" and "item_kind") on `engine`: the report and the

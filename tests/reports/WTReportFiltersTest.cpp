@@ -22,7 +22,8 @@ class WTReportFiltersTest : public ::testing::Test {
 };
 
 // "money" takes its currency from a variable, else as written; without one, two places as "decimal". A
-// rate keeps the places it has beyond the currency's: the yen's 85.5, a cent's fraction.
+// rate keeps the places it has beyond the currency's: the yen's 85.5, a cent's fraction. One filter writes
+// every row, as in a report: an amount written before in another currency or as a rate is written anew.
 TEST_F(WTReportFiltersTest, DurationsAndMoneyAreWrittenOfNumbersOnly) {
   GXTemplateEngine engine;
   engine.setObject(QStringLiteral("JPY"), QStringLiteral("currency"));
@@ -43,7 +44,7 @@ TEST_F(WTReportFiltersTest, DurationsAndMoneyAreWrittenOfNumbersOnly) {
       {"money", dec("-1.2345"), {"KWD"}, "-1.235"}, {"money", dec("2.345"), {}, "2.35"},
       {"money", dec("2.345"), {"client.none"}, "2.35"}, {"money", QStringLiteral("12"), {"EUR"}, nullptr},
       {"rate", dec("85.50"), {"currency"}, "85.5"}, {"rate", dec("12.345"), {"EUR"}, "12.345"},
-      {"rate", dec("2"), {"KWD"}, "2.000"}};
+      {"rate", dec("2"), {"KWD"}, "2.000"}, {"money", dec("12.345"), {"EUR"}, "12.35"}};
   // clang-format on
   for (const auto& c : cases) {
     const std::string_view name = c.filter;  // "money" and "rate" are the money filter's
