@@ -326,8 +326,17 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     return std::nullopt;
   }
 
+  // Tessal's own file writes numbers plainly, a point before the places and no grouping ("11.110" in a
+  // currency of three places); another tracker's may follow any convention.
+  const auto number = [&](const char* name) {
+    if (&format == &kTessal)
+      if (std::optional<Decimal> plain = Decimal::fromString(value(name))) return plain;
+    return parseNumber(value(name));
+  };
+  row.currency = format.currency[0] ? value(format.currency).toUpper()
+                                    : header.currencyIn(format.rate[0] ? format.rate : format.amount);
   if (format.amount[0] && row.billable && !value(format.amount).isEmpty()) {
-    row.amount = parseNumber(value(format.amount));
+    row.amount = number(format.amount);
     if (!row.amount) {
       problem = numberProblem("amount", value(format.amount));
       return std::nullopt;
@@ -342,7 +351,7 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     }
   }
   if (format.rate[0] && !value(format.rate).isEmpty()) {
-    row.rate = parseNumber(value(format.rate));
+    row.rate = number(format.rate);
     if (!row.rate) {
       problem = numberProblem("rate", value(format.rate));
       return std::nullopt;
@@ -356,8 +365,6 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
                      .value_or(Decimal())
                      .rounded(2);
   }
-  row.currency = format.currency[0] ? value(format.currency).toUpper()
-                                    : header.currencyIn(format.rate[0] ? format.rate : format.amount);
   row.importId = hashedId(QString::fromUtf8(format.name), row);
   return row;
 }

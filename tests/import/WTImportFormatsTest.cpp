@@ -108,7 +108,9 @@ INSTANTIATE_TEST_SUITE_P(
         Sample{"tessal.csv", "", "Europe/Berlin", {}, "tessal",
                {"2 Acme/Website/Design|Late, late|2024-03-30T22:30:00Z|90|50.00 EUR|billable||two\nlines",
                 "5 /Solo/|Own time|2024-04-02T07:00:00Z|30|- |billable||",
-                "6 /Solo/|End typed over|2024-04-02T08:00:00Z|360|- |billable||"},
+                "6 /Solo/|End typed over|2024-04-02T08:00:00Z|360|- |billable||",
+                // Its own plain numbers: three places are a currency's, never a thousand.
+                "7 Gulf Co/Portal/Dev|Dev work|2024-04-04T06:00:00Z|20|33.330 KWD|billable||"},
                {"4: left out, a flat fee"}}));
 // clang-format on
 
