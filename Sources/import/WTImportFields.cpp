@@ -157,6 +157,27 @@ std::optional<Decimal> parseNumber(const QString& text, bool* ambiguous) {
   return Decimal::fromString(negative ? u'-' + plain : plain);
 }
 
+std::optional<Decimal> rateOfAmount(const Decimal& amount, qint64 seconds, int places) {
+  if (seconds <= 0) return std::nullopt;
+  const Decimal time{std::int64_t(seconds)}, hour(3600);
+  const auto perHour = [&](const Decimal& cost) {
+    return Decimal::divide(cost * hour, time).value_or(Decimal());
+  };
+  if (!amount.isNegative()) {
+    // The costs that round to the amount, half a unit of its last place either side (rounding goes up
+    // from the half).
+    const int last = std::max(places, -amount.exponent());
+    const Decimal half = *Decimal::fromString(QStringLiteral("5e%1").arg(-last - 1));
+    const Decimal low = perHour(amount - half), high = perHour(amount + half);
+    for (int fewest = 0; fewest <= 2; ++fewest) {
+      Decimal rate = low.rounded(fewest);
+      if (rate < low) rate += *Decimal::fromString(QStringLiteral("1e%1").arg(-fewest));
+      if (rate < high) return rate.rounded(2);
+    }
+  }
+  return perHour(amount).rounded(2);
+}
+
 QString numberProblem(const char* what, const QString& text) {
   bool ambiguous = false;
   parseNumber(text, &ambiguous);

@@ -29,6 +29,11 @@ std::optional<qint64> parseDuration(const QString& text);
 // "1,234.50", "1.234,50", "50,00", "1 234,50", "€ 12": none for what is no such number, and for one mark
 // alone before three digits ("1,500": 1.5 or 1500?), which sets `ambiguous`.
 std::optional<Decimal> parseNumber(const QString& text, bool* ambiguous = nullptr);
+// The rate a tracker billed `amount` for `seconds` by, to the cent: of the rates whose cost for that time,
+// rounded to `places`, is the amount, the one written with the fewest places (85 for 28.33 over twenty
+// minutes, where the amount over the hours is 84.99); the amount over the hours where none of up to two
+// places is.
+std::optional<Decimal> rateOfAmount(const Decimal& amount, qint64 seconds, int places);
 // Why a number column's text is not read: "the rate “1,500” could be 1.5 or 1500".
 QString numberProblem(const char* what, const QString& text);
 // "yes", "true", "1", "billable" or empty; "no", "false", "0", "non-billable".

@@ -1,3 +1,4 @@
+#include "MoneyFormat.h"
 #include "WTCSVReader.h"
 #include "WTImportFields.h"
 #include "WTImportFile.h"
@@ -358,12 +359,11 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     }
   } else if (!format.rate[0] && format.amount[0] && !value(format.amount).isEmpty() && row.end &&
              row.billable) {
-    // A file without rates: the amount over the hours is the rate the tracker billed, to the cent.
-    const double seconds = row.end->secondsSince1970() - row.start.secondsSince1970();
+    // A file without rates: the rate the tracker billed the amount by.
+    const qint64 seconds = qint64(std::llround(row.end->secondsSince1970() - row.start.secondsSince1970()));
     if (seconds >= 60)
-      row.rate = Decimal::divide(*row.amount * Decimal(3600), *Decimal::fromDouble(seconds))
-                     .value_or(Decimal())
-                     .rounded(2);
+      row.rate = rateOfAmount(*row.amount, seconds,
+                              row.currency.isEmpty() ? 2 : MoneyFormat::minorUnitDigits(row.currency));
   }
   row.importId = hashedId(QString::fromUtf8(format.name), row);
   return row;

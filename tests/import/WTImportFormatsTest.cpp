@@ -81,7 +81,9 @@ INSTANTIATE_TEST_SUITE_P(
         Sample{"toggl-mixed.csv", "", "Europe/Berlin", {}, "toggl",
                {"2 Tyrell/Armor/|Month first|2026-09-25T08:00:00Z|60|1080.00 USD|billable||",
                 "3 Tyrell/Armor/|Day first|2026-09-26T08:00:00Z|60|80.00 USD|billable||",
-                "8 Tyrell/Armor/|Euro style|2026-09-23T07:00:00Z|60|1234.50 USD|billable||"},
+                "8 Tyrell/Armor/|Euro style|2026-09-23T07:00:00Z|60|1234.50 USD|billable||",
+                // The rate that bills 28.33 for twenty minutes, not 28.33 over a third of an hour.
+                "9 Tyrell/Armor/|A third of an hour|2026-09-24T07:00:00Z|20|85.00 USD|billable||"},
                {"4: the date “03/09/2026” could be day or month first, as the file writes dates both ways",
                 "5: the amount “1,000” could be 1 or 1000", "6: the amount “1e3” cannot be read",
                 "7: there is no 02:30 on 2026-03-29 in Europe/Berlin: the clocks go forward then (--tz names "
