@@ -301,10 +301,10 @@ std::optional<WTImportRow> readRecord(const CSVFormat& format, const Header& hea
     }
     if (skipped(*endDay, *endTime)) return std::nullopt;
     row.end = days.at(*endDay, *endTime);
-    if (&format == &kTessal) {
-      // Tessal's own file writes one date: the end is on the day that brings it nearest to what the duration
-      // says (a timer left running over a weekend ends days later; an end time edited by hand moves less
-      // than a day), and never before the start.
+    if (&format == &kTessal || (!format.endDate[0] && duration)) {
+      // A file that writes one date (Tessal's own, kimai's): the end is on the day that brings it nearest to
+      // what the duration says (a night shift ends the next morning, a timer left running over a weekend
+      // days later; an end time edited by hand moves less than a day), and never before the start.
       const double wanted = row.start.secondsSince1970() + double(duration.value_or(0));
       const auto away = [&](Date end) {
         return end < row.start ? std::numeric_limits<double>::infinity()
