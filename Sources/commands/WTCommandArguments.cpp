@@ -41,6 +41,11 @@ QString parse(QCommandLineParser& parser, const QStringList& arguments, const QS
   return {};
 }
 
+QString clientWithoutProject(const QCommandLineParser& parser) {
+  if (!parser.isSet(QStringLiteral("client")) || parser.isSet(QStringLiteral("project"))) return {};
+  return QStringLiteral("--client says whose --project is meant; name the project too");
+}
+
 bool sortsBefore(const QString& a, const QString& b) {
   static const QCollator collator;
   return collator.compare(a, b) < 0;

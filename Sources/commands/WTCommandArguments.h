@@ -18,6 +18,8 @@ int failure(QTextStream& err, const QString& message);
 // Parses `arguments` (those after the command's name) for options that each take one value, given at
 // most once; nothing else is allowed. Gives the problem, or an empty text.
 QString parse(QCommandLineParser& parser, const QStringList& arguments, const QStringList& options);
+// The problem of a "--client" without the "--project" it tells apart from its namesakes, or an empty text.
+QString clientWithoutProject(const QCommandLineParser& parser);
 // Whether `a` comes before `b` in a list of names shown to the user (their language's order). One collator
 // serves the whole process and goes with it: QString::localeAwareCompare keeps one per thread, which a
 // process without an application object never gives back.

@@ -21,10 +21,11 @@ using WTCommandArguments::usage;
 using WTCommandArguments::writeText;
 
 constexpr char kReportUsage[] =
-    "usage: tessal report (--project NAME | --client NAME) [--mode 0-3] [--range RANGE] [--template FILE] "
-    "[--out FILE]\n";
+    "usage: tessal report (--project NAME [--client NAME] | --client NAME) [--mode 0-3] [--range RANGE]\n"
+    "                     [--template FILE] [--out FILE]\n";
 constexpr char kExportUsage[] =
-    "usage: tessal export [--range RANGE] [--project NAME] [--format times|spreadsheet] [--out FILE.csv]\n";
+    "usage: tessal export [--range RANGE] [--project NAME [--client NAME]] [--format times|spreadsheet]\n"
+    "                     [--out FILE.csv]\n";
 
 enum class ReportFormat { HTML, PDF, CSV, Unknown };
 
@@ -57,9 +58,12 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
                                 {QStringLiteral("project"), QStringLiteral("client"), QStringLiteral("mode"),
                                  QStringLiteral("range"), QStringLiteral("template"), QStringLiteral("out")});
   if (!problem.isEmpty()) return usage(err, kReportUsage, problem);
+  // A client alone reports all its projects; with a project, it says whose project is meant.
   const bool byProject = parser.isSet(QStringLiteral("project"));
-  if (byProject == parser.isSet(QStringLiteral("client")))
-    return usage(err, kReportUsage, QStringLiteral("name either --project or --client"));
+  const QString client =
+      parser.isSet(QStringLiteral("client")) ? parser.value(QStringLiteral("client")) : QString();
+  if (!byProject && client.isNull())
+    return usage(err, kReportUsage, QStringLiteral("name --project or --client"));
   int mode = 0;
   if (parser.isSet(QStringLiteral("mode"))) {
     bool number = false;
@@ -81,9 +85,9 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
     return usage(err, kReportUsage, QStringLiteral("%1: no such file").arg(templatePath));
 
   const std::optional<WTNamedProjects> named =
-      byProject
-          ? WTNamedProjects::read(err, WTNamedProjects::Project, parser.value(QStringLiteral("project")))
-          : WTNamedProjects::read(err, WTNamedProjects::Client, parser.value(QStringLiteral("client")));
+      byProject ? WTNamedProjects::read(err, WTNamedProjects::Project,
+                                        parser.value(QStringLiteral("project")), client)
+                : WTNamedProjects::read(err, WTNamedProjects::Client, client);
   if (!named) return 1;
   const QList<WTProject*>& projects = named->projects;
   const QString& title = named->title;
@@ -125,10 +129,12 @@ int runReportCommand(const QStringList& arguments, QTextStream& out, QTextStream
 
 int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
   QCommandLineParser parser;
-  const QString problem = parse(
-      parser, arguments,
-      {QStringLiteral("range"), QStringLiteral("project"), QStringLiteral("format"), QStringLiteral("out")});
+  const QString problem = parse(parser, arguments,
+                                {QStringLiteral("range"), QStringLiteral("project"), QStringLiteral("client"),
+                                 QStringLiteral("format"), QStringLiteral("out")});
   if (!problem.isEmpty()) return usage(err, kExportUsage, problem);
+  if (const QString alone = WTCommandArguments::clientWithoutProject(parser); !alone.isEmpty())
+    return usage(err, kExportUsage, alone);
   const QString formatWord = parser.isSet(QStringLiteral("format")) ? parser.value(QStringLiteral("format"))
                                                                     : QStringLiteral("times");
   if (formatWord != QLatin1String("times") && formatWord != QLatin1String("spreadsheet"))

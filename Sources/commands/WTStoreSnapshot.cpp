@@ -48,10 +48,10 @@ WTStoreSnapshot::~WTStoreSnapshot() {
 namespace {
 
 Result<WTNamedProjects> namedIn(std::unique_ptr<WTStoreSnapshot> snapshot, WTNamedProjects::Kind kind,
-                                const QString& name) {
+                                const QString& name, const QString& clientName) {
   WTNamedProjects named;
   if (kind == WTNamedProjects::Project) {
-    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), name);
+    const Result<WTProject*> project = WTNamedRecords::project(snapshot->context(), name, clientName);
     if (!project) return project.error();
     named.projects = {project.value()};
     named.title = project.value()->name();
@@ -70,10 +70,11 @@ Result<WTNamedProjects> namedIn(std::unique_ptr<WTStoreSnapshot> snapshot, WTNam
 
 }  // namespace
 
-std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind, const QString& name) {
+std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind, const QString& name,
+                                                     const QString& clientName) {
   std::unique_ptr<WTStoreSnapshot> owners = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks);
   if (!owners) return std::nullopt;
-  Result<WTNamedProjects> found = namedIn(std::move(owners), kind, name);
+  Result<WTNamedProjects> found = namedIn(std::move(owners), kind, name, clientName);
   if (!found) {
     WTCommandArguments::failure(err, found.error().message);
     return std::nullopt;
@@ -86,7 +87,7 @@ std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind
   std::unique_ptr<WTStoreSnapshot> scoped = WTStoreSnapshot::open(err, WTStore::Records::ItemsOfTasks, tasks);
   if (!scoped) return std::nullopt;
   // Looked up again in what was read: the desktop copy may have renamed something in between.
-  Result<WTNamedProjects> read = namedIn(std::move(scoped), kind, name);
+  Result<WTNamedProjects> read = namedIn(std::move(scoped), kind, name, clientName);
   if (!read) {
     WTCommandArguments::failure(err, read.error().message);
     return std::nullopt;
@@ -97,8 +98,10 @@ std::optional<WTNamedProjects> WTNamedProjects::read(QTextStream& err, Kind kind
 std::optional<WTProjectScope> WTProjectScope::read(QTextStream& err, const QCommandLineParser& options) {
   WTProjectScope scope;
   if (options.isSet(QStringLiteral("project"))) {
-    std::optional<WTNamedProjects> named =
-        WTNamedProjects::read(err, WTNamedProjects::Project, options.value(QStringLiteral("project")));
+    const QString client =
+        options.isSet(QStringLiteral("client")) ? options.value(QStringLiteral("client")) : QString();
+    std::optional<WTNamedProjects> named = WTNamedProjects::read(
+        err, WTNamedProjects::Project, options.value(QStringLiteral("project")), client);
     if (!named) return std::nullopt;
     scope.snapshot = std::move(named->snapshot);
     scope.project = named->projects.first();
@@ -172,8 +175,14 @@ bool sameName(const QString& a, const QString& b) {
 
 }  // namespace
 
-Result<WTProject*> project(const WTObjectContext& context, const QString& name) {
-  return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"),
+Result<WTProject*> project(const WTObjectContext& context, const QString& name, const QString& clientName) {
+  if (clientName.isNull())
+    return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"),
+                            describeProject);
+  const QList<WTProject*> ofClient = context.fetch<WTProject>([&](const WTProject* project) {
+    return project->client() && sameName(project->client()->name(), clientName);
+  });
+  return named<WTProject>(ofClient, name, "project", QStringLiteral("projects of %1").arg(quoted(clientName)),
                           describeProject);
 }
 

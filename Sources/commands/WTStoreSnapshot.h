@@ -46,15 +46,18 @@ class WTStoreSnapshot {
 struct WTNamedProjects {
   enum Kind { Project, Client };
   // On failure writes why to `err` as "tessal: MESSAGE" and gives none.
-  static std::optional<WTNamedProjects> read(QTextStream& err, Kind kind, const QString& name);
+  // A project is looked for among the client's named `clientName` when that is not null (two clients
+  // may each have a "Website").
+  static std::optional<WTNamedProjects> read(QTextStream& err, Kind kind, const QString& name,
+                                             const QString& clientName = {});
 
   std::unique_ptr<WTStoreSnapshot> snapshot;
   QList<WTProject*> projects;
   QString title;  // the project's or the client's name
 };
 
-// What a command reads when its "--project NAME" option narrows it: that project with its own items
-// alone, or without the option the whole store (`project` null).
+// What a command reads when its "--project NAME" option (and "--client NAME", which says whose) narrows it:
+// that project with its own items alone, or without the option the whole store (`project` null).
 struct WTProjectScope {
   // On failure writes why to `err` as "tessal: MESSAGE" and gives none.
   static std::optional<WTProjectScope> read(QTextStream& err, const QCommandLineParser& options);
@@ -68,7 +71,9 @@ struct WTProjectScope {
 // most a screenful).
 namespace WTNamedRecords {
 
-Result<WTProject*> project(const WTObjectContext& context, const QString& name);
+// Among the projects of clients named `clientName` when that is not null.
+Result<WTProject*> project(const WTObjectContext& context, const QString& name,
+                           const QString& clientName = {});
 Result<WTClient*> client(const WTObjectContext& context, const QString& name);
 // The task named `name` among those of projects named `projectName` and of clients named `clientName`;
 // a null filter lets every task through. "PROJECT › TASK" (label()) names a task too. Of several tasks so

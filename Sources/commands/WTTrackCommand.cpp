@@ -206,7 +206,10 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
     err << "tessal: " << find(context, name).error().message << '\n';
     return true;
   };
-  if (unknown(context.fetch<WTProject>(), QStringLiteral("project"), WTNamedRecords::project) ||
+  const auto project = [](const WTObjectContext& in, const QString& name) {
+    return WTNamedRecords::project(in, name);
+  };
+  if (unknown(context.fetch<WTProject>(), QStringLiteral("project"), project) ||
       unknown(context.fetch<WTClient>(), QStringLiteral("client"), WTNamedRecords::client))
     return 1;
   QStringList names;
@@ -235,10 +238,11 @@ int runListCommand(const QStringList& arguments, QTextStream& out, QTextStream& 
 }
 
 int runLogCommand(const QStringList& arguments, QTextStream& out, QTextStream& err) {
-  constexpr char kUsage[] = "usage: tessal log [--range RANGE] [--project NAME]\n";
+  constexpr char kUsage[] = "usage: tessal log [--range RANGE] [--project NAME [--client NAME]]\n";
   QCommandLineParser parser;
-  QString problem =
-      WTCommandArguments::parse(parser, arguments, {QStringLiteral("range"), QStringLiteral("project")});
+  QString problem = WTCommandArguments::parse(
+      parser, arguments, {QStringLiteral("range"), QStringLiteral("project"), QStringLiteral("client")});
+  if (problem.isEmpty()) problem = WTCommandArguments::clientWithoutProject(parser);
   const QString rangeWord =
       parser.isSet(QStringLiteral("range")) ? parser.value(QStringLiteral("range")) : QStringLiteral("today");
   // A billing period, as a report takes it: consecutive ranges never list an entry twice.

@@ -176,7 +176,7 @@ TEST_F(TrackCommand, RefusedArgumentsChangeNothing) {
       {"stop", "--create"}, {"add", "Review"}, {"add", "Review", "soon"}, {"add", "Review", "0"},
       {"add", "Review", "24:00-25:00"}, {"add", "Review", "0:45", "--date", "someday"}, {"add", "Review", "1:30:00"},
       {"add", "Review", "9:00-10:00", "--note", "a", "--note", "b"}, {"list", "notes"},
-      {"report"}, {"report", "--project", "Hermes", "--client", "Acme"}, {"report", "--project", "Hermes", "--mode", "4"},
+      {"report"}, {"log", "--client", "Acme"}, {"export", "--client", "Acme"}, {"report", "--project", "Hermes", "--mode", "4"},
       {"report", "--project", "Hermes", "--mode", "one"}, {"report", "--project", "Hermes", "--out", here.path("r.doc")},
       {"report", "--project", "Hermes", "--template", here.path("missing.txt")},
       {"report", "--project", "Hermes", "--project", "Atlas"}, {"report", "--project", "Hermes", "stray"},
@@ -487,6 +487,14 @@ TEST_F(ReportCommand, RefusesNamesAndBrokenTemplatesWritingNothingAndUsesTheUser
     const Outcome run = here.expect(arguments, 1, says.first());
     EXPECT_EQ(run.out, "");
     for (const QString& said : says) EXPECT_TRUE(run.err.contains(said)) << run.err.toStdString();
+  }
+  // --client says whose project is meant: Acme's Atlas has the entries, Other's none.
+  for (const char* command : {"log", "export", "report"}) {
+    const QStringList atlas = {command, "--project", "ATLAS", "--range", "any"};
+    EXPECT_TRUE(here.expect(atlas + QStringList{"--client", "acme"}, 0, "").out.contains("Design"))
+        << command;
+    EXPECT_FALSE(here.expect(atlas + QStringList{"--client", "Other"}, 0, "").out.contains("Design"))
+        << command;
   }
   const QString out = here.path("never.html");
   const QString broken =
