@@ -7,8 +7,6 @@
 #include <QLocale>
 #include <QObject>
 
-#include <cmath>
-
 namespace WTBudget {
 
 namespace {
@@ -40,6 +38,19 @@ std::optional<double> fraction(const Decimal& billed, const std::optional<Decima
   return billed.toDouble() / budget->toDouble();
 }
 
+std::optional<std::int64_t> percent(const Decimal& billed, const std::optional<Decimal>& budget) {
+  if (!measurable(budget)) return std::nullopt;
+  // In decimals: as a double, 57 of 100 is 56.99… percent.
+  const Decimal exact = Decimal::divide(billed * Decimal(100), *budget).value_or(Decimal());
+  std::int64_t whole = exact.toInt64();  // toward zero
+  if (billed > *budget) {
+    if (Decimal(whole) < exact) ++whole;
+  } else if (Decimal(whole) > exact) {
+    --whole;
+  }
+  return whole;
+}
+
 Decimal billed(const WTObject* object) {
   const bool budgeted = object->entity() == WTEntity::Task || object->entity() == WTEntity::Project;
   return budgeted ? static_cast<const WTBillingRecord*>(object)->billedCost() : Decimal();
@@ -59,14 +70,10 @@ std::optional<Decimal> budget(const WTObject* object) {
 QString standing(const WTObject* object) {
   const std::optional<Decimal> limit = budget(object);
   const Decimal spent = billed(object);
-  const std::optional<double> share = fraction(spent, limit);
-  if (!share) return {};
-  // Whole percents, cut rather than rounded: "80 %" never shows before the line is reached; over the
-  // budget, raised: "100 %" never shows past it.
+  const std::optional<std::int64_t> whole = percent(spent, limit);
+  if (!whole) return {};
   const Decimal left = *limit - spent;
-  const double percent = *share * 100.0;
-  const QString percentText =
-      QLocale().toString(qint64(left.isNegative() ? std::ceil(percent) : std::floor(percent)));
+  const QString percentText = QLocale().toString(qint64(*whole));
   const QString currency = static_cast<const WTBillingRecord*>(object)->billingCurrency();
   const QString rest = left.isNegative() ? QObject::tr("%1 over").arg(MoneyFormat::format(-left, currency))
                                          : QObject::tr("%1 left").arg(MoneyFormat::format(left, currency));

@@ -5,6 +5,7 @@
 #include <QString>
 #include <QVariant>
 
+#include <cstdint>
 #include <optional>
 
 class WTObject;
@@ -25,6 +26,11 @@ std::optional<Level> crossed(const Decimal& before, const Decimal& after,
 
 // billed / budget (1.0 is the whole budget), for drawing; none without a budget.
 std::optional<double> fraction(const Decimal& billed, const std::optional<Decimal>& budget);
+
+// Whole percents of the budget billed, of the exact quotient: cut below the budget, so that "80 %" never
+// shows before that line is reached, and raised past it, so that "100 %" never shows past it. None without
+// a budget.
+std::optional<std::int64_t> percent(const Decimal& billed, const std::optional<Decimal>& budget);
 
 // What a task or project bills, and its budget; nothing for other records.
 Decimal billed(const WTObject* object);

@@ -313,22 +313,26 @@ TEST_F(WTRatesTest, TotalChangesReachObserversThreeLevelsUp) {
 }
 
 // The lines are 80 % (reached) and 100 % (passed); a step across both names the higher one, going down
-// names none, and without a budget above zero nothing is measured.
+// names none, and without a budget above zero nothing is measured. The whole percent shown is cut below
+// the budget and raised past it, and exact (57 of 100 is 57 %).
 TEST(WTBudgetTest, LevelsAndTheLineAStepCrosses) {
   using L = WTBudget::Level;
+  using P = std::optional<std::int64_t>;
   // clang-format off
-  const std::tuple<const char*, const char*, const char*, std::optional<L>, std::optional<L>> rows[] = {
-      // billed before, after, budget; level after; line crossed
-      {"0", "79.99", "100", L::Within, {}}, {"79.99", "80", "100", L::Warning, L::Warning},
-      {"80", "100", "100", L::Warning, {}}, {"100", "100.01", "100", L::Over, L::Over},
-      {"10", "150", "100", L::Over, L::Over},
-      {"150", "10", "100", L::Within, {}}, {"0.0007", "0.0008", "0.001", L::Warning, L::Warning},
-      {"0", "5", "0", {}, {}}, {"0", "5", "-1", {}, {}}};
+  const std::tuple<const char*, const char*, const char*, std::optional<L>, std::optional<L>, P> rows[] = {
+      // billed before, after, budget; level after; line crossed; percent after
+      {"0", "79.99", "100", L::Within, {}, 79}, {"79.99", "80", "100", L::Warning, L::Warning, 80},
+      {"80", "100", "100", L::Warning, {}, 100}, {"100", "100.01", "100", L::Over, L::Over, 101},
+      {"10", "150", "100", L::Over, L::Over, 150}, {"0", "57", "100", L::Within, {}, 57},
+      {"0", "110", "100", L::Over, L::Over, 110}, {"0", "-5.5", "100", L::Within, {}, -6},
+      {"150", "10", "100", L::Within, {}, 10}, {"0.0007", "0.0008", "0.001", L::Warning, L::Warning, 80},
+      {"0", "5", "0", {}, {}, {}}, {"0", "5", "-1", {}, {}, {}}};
   // clang-format on
-  for (const auto& [before, after, budget, level, crossed] : rows) {
+  for (const auto& [before, after, budget, level, crossed, percent] : rows) {
     SCOPED_TRACE(std::string(before) + " → " + after + " of " + budget);
     EXPECT_EQ(WTBudget::level(dec(after), dec(budget)), level);
     EXPECT_EQ(WTBudget::crossed(dec(before), dec(after), dec(budget)), crossed);
+    EXPECT_EQ(WTBudget::percent(dec(after), dec(budget)), percent);
   }
   EXPECT_EQ(WTBudget::level(dec("1000"), std::nullopt), std::nullopt);
 }
