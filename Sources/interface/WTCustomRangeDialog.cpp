@@ -11,6 +11,8 @@
 #include <QLocale>
 #include <QVBoxLayout>
 
+#include <algorithm>
+
 namespace {
 
 // A day typed in full ("26.11.2026") is the day typed. Two digits take the field on to the next part by
@@ -71,12 +73,19 @@ WTCustomRangeDialog::WTCustomRangeDialog(UserDefaults* defaults, const QString& 
   layout->addWidget(buttons);
 
   load();
-  // A range never ends before it begins: a later first day takes the last along.
+  // A range never ends before it begins: a later first day takes the last along. A last day typed before
+  // the first becomes the first when the dialog closes, not as it is typed: a field bounded below refuses
+  // the digits of such a day one by one and makes another year of what is left.
   connect(begin_, &QDateEdit::dateChanged, this, [this](QDate day) {
     store(beginKey_, day);
-    end_->setMinimumDate(day);
+    if (end_->date() < day) end_->setDate(day);
   });
   connect(end_, &QDateEdit::dateChanged, this, [this](QDate day) { store(endKey_, day); });
+}
+
+void WTCustomRangeDialog::done(int result) {
+  if (end_->date() < begin_->date()) end_->setDate(begin_->date());
+  QDialog::done(result);
 }
 
 QString WTCustomRangeDialog::dayFormat() {
@@ -92,8 +101,7 @@ QString WTCustomRangeDialog::dayText(Date date) {
 void WTCustomRangeDialog::load() {
   const Date now = Date::now();
   begin_->setDate(dayOf(defaults_->dateForKey(beginKey_).value_or(RZDate::addMonth(now, -1))));
-  end_->setMinimumDate(begin_->date());
-  end_->setDate(dayOf(defaults_->dateForKey(endKey_).value_or(now)));
+  end_->setDate(std::max(begin_->date(), dayOf(defaults_->dateForKey(endKey_).value_or(now))));
   // What the dialog shows is the range, even when it is closed untouched.
   store(beginKey_, begin_->date());
   store(endKey_, end_->date());

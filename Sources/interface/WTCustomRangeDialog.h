@@ -24,6 +24,9 @@ class WTCustomRangeDialog : public QDialog {
   static QString dayFormat();
   static QString dayText(Date date);
 
+ protected:
+  void done(int result) override;
+
  private:
   void load();
   void store(const QString& key, QDate day);
