@@ -103,6 +103,12 @@ void WTExportController::updateFormatNote() {
           : tr("Time entries, flat fees and expenses are written as a spreadsheet with a header row: client, "
                "project, task, kind, name, date, start, end, duration, billed duration, rate, amount, "
                "currency, notes and rounding rule."));
+  // The spreadsheet's note takes more lines: an open window grows to hold them, or the layout would
+  // squeeze the choices above it.
+  if (isVisible()) {
+    const int needed = layout()->totalHeightForWidth(width());
+    if (needed > height()) resize(width(), needed);
+  }
 }
 
 WTCSVExport::Format WTExportController::format() const {
