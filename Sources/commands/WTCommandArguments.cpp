@@ -5,7 +5,6 @@
 #include <QCollator>
 
 #include <algorithm>
-
 #include <cstdio>
 #include <cstdlib>
 

@@ -161,7 +161,6 @@ int runExportCommand(const QStringList& arguments, QTextStream& out, QTextStream
                                      WTCSVExport::billableItemsMatching(context, predicate.value(), project))
                                : WTCSVExport::timesCSV(
                                      WTRangePredicate::timesMatching(context, predicate.value(), project)));
-    out.flush();
     return 0;
   }
   const Result<int> exported =
