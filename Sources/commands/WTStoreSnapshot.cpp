@@ -173,17 +173,20 @@ bool sameName(const QString& a, const QString& b) {
   return WTObject::sameName(a, b);
 }
 
+// Whether `project` is one of a client named `clientName`; a null name lets every project through.
+bool ofClient(const WTProject* project, const QString& clientName) {
+  return clientName.isNull() ||
+         (project && project->client() && sameName(project->client()->name(), clientName));
+}
+
 }  // namespace
 
 Result<WTProject*> project(const WTObjectContext& context, const QString& name, const QString& clientName) {
-  if (clientName.isNull())
-    return named<WTProject>(context.fetch<WTProject>(), name, "project", QStringLiteral("projects"),
-                            describeProject);
-  const QList<WTProject*> ofClient = context.fetch<WTProject>([&](const WTProject* project) {
-    return project->client() && sameName(project->client()->name(), clientName);
-  });
-  return named<WTProject>(ofClient, name, "project", QStringLiteral("projects of %1").arg(quoted(clientName)),
-                          describeProject);
+  const QList<WTProject*> candidates =
+      context.fetch<WTProject>([&](const WTProject* project) { return ofClient(project, clientName); });
+  const QString kinds = clientName.isNull() ? QStringLiteral("projects")
+                                            : QStringLiteral("projects of %1").arg(quoted(clientName));
+  return named<WTProject>(candidates, name, "project", kinds, describeProject);
 }
 
 Result<WTClient*> client(const WTObjectContext& context, const QString& name) {
@@ -196,10 +199,7 @@ Result<WTTask*> task(const WTObjectContext& context, const QString& name, const 
   const QList<WTTask*> candidates = context.fetch<WTTask>([&](const WTTask* task) {
     const WTProject* project = task->project();
     if (!projectName.isNull() && !(project && sameName(project->name(), projectName))) return false;
-    if (!clientName.isNull() &&
-        !(project && project->client() && sameName(project->client()->name(), clientName)))
-      return false;
-    return true;
+    return ofClient(project, clientName);
   });
   // "PROJECT › TASK", the way status and `list tasks --qualified` name a task, names it too, unless a task
   // is called that. Either name may hold the separator itself: the first split that finds a task is meant.
@@ -234,7 +234,7 @@ Result<WTTask*> taskMadeIfMissing(WTObjectContext& context, const QString& name,
   if (found) return found;
   auto passes = [&](const WTProject* project, const QString& wantedProject) {
     return project && (wantedProject.isNull() || sameName(project->name(), wantedProject)) &&
-           (clientName.isNull() || (project->client() && sameName(project->client()->name(), clientName)));
+           ofClient(project, clientName);
   };
   auto carried = [&](const QString& taskName, const QString& wantedProject) {
     const QList<WTTask*> tasks = context.fetch<WTTask>([&](const WTTask* task) {
